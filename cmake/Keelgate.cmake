@@ -1,0 +1,75 @@
+# SPDX-License-Identifier: Apache-2.0
+# What every target shares: the language, the warnings, where programs land, and how tests join.
+
+include(GNUInstallDirs)
+
+if(NOT CMAKE_BUILD_TYPE)
+  set(CMAKE_BUILD_TYPE Release CACHE STRING "" FORCE)
+endif()
+
+set(CMAKE_CXX_STANDARD 20)
+set(CMAKE_CXX_STANDARD_REQUIRED ON)
+set(CMAKE_CXX_EXTENSIONS OFF)
+set(CMAKE_POSITION_INDEPENDENT_CODE ON)
+set(CMAKE_CXX_VISIBILITY_PRESET hidden)
+set(CMAKE_VISIBILITY_INLINES_HIDDEN ON)
+set(CMAKE_RUNTIME_OUTPUT_DIRECTORY ${CMAKE_BINARY_DIR}/bin)
+set(CMAKE_LIBRARY_OUTPUT_DIRECTORY ${CMAKE_BINARY_DIR}/lib)
+set(CMAKE_ARCHIVE_OUTPUT_DIRECTORY ${CMAKE_BINARY_DIR}/lib)
+
+add_compile_options(-Wall -Wextra -Wpedantic -Wconversion -Werror)
+add_compile_options(-fno-omit-frame-pointer -fstack-protector-strong)
+if(CMAKE_CXX_COMPILER_ID STREQUAL "GNU")
+  add_compile_options(-Werror=missing-field-initializers)
+else()
+  add_compile_options(-Werror=reorder-init-list)
+endif()
+if(CMAKE_BUILD_TYPE STREQUAL "Debug")
+  add_compile_definitions(_GLIBCXX_ASSERTIONS)
+else()
+  # Bounds checks of the standard library stay on where hostile bytes are read: they cost little
+  # beside what an unchecked index can cost.
+  add_compile_definitions(_GLIBCXX_ASSERTIONS _FORTIFY_SOURCE=2)
+endif()
+
+if(KEELGATE_SANITIZE)
+  add_compile_options(-fsanitize=${KEELGATE_SANITIZE} -fno-sanitize-recover=all)
+  add_link_options(-fsanitize=${KEELGATE_SANITIZE})
+  # The seal kills what a sanitizer's runtime needs, so such a build is made without it.
+  add_compile_definitions(KEELGATE_UNSEALED)
+endif()
+if(KEELGATE_FUZZ)
+  add_compile_options(-fsanitize=fuzzer-no-link)
+endif()
+
+if(KEELGATE_TESTS)
+  enable_testing()
+  find_package(GTest REQUIRED)
+  include(GoogleTest)
+endif()
+
+# keelgate_library(NAME SOURCES ... [PUBLIC libs...] [PRIVATE libs...])
+# A module of the tree. Headers are included by their path from the root.
+function(keelgate_library name)
+  cmake_parse_arguments(arg "" "" "SOURCES;PUBLIC;PRIVATE" ${ARGN})
+  add_library(${name} STATIC ${arg_SOURCES})
+  target_include_directories(${name} PUBLIC ${PROJECT_SOURCE_DIR} ${PROJECT_SOURCE_DIR}/include)
+  target_link_libraries(${name} PUBLIC ${arg_PUBLIC} PRIVATE ${arg_PRIVATE})
+endfunction()
+
+# keelgate_test(NAME SOURCES ... LIBRARIES ...): one test program for a module.
+function(keelgate_test name)
+  if(NOT KEELGATE_TESTS)
+    return()
+  endif()
+  cmake_parse_arguments(arg "" "TIMEOUT" "SOURCES;LIBRARIES" ${ARGN})
+  if(NOT arg_TIMEOUT)
+    set(arg_TIMEOUT 120)
+  endif()
+  add_executable(${name} ${arg_SOURCES})
+  target_include_directories(${name} PRIVATE ${PROJECT_SOURCE_DIR} ${PROJECT_SOURCE_DIR}/include)
+  target_link_libraries(${name} PRIVATE ${arg_LIBRARIES} GTest::gtest_main)
+  set_target_properties(${name} PROPERTIES RUNTIME_OUTPUT_DIRECTORY ${CMAKE_BINARY_DIR}/tests)
+  add_test(NAME ${name} COMMAND ${name})
+  set_tests_properties(${name} PROPERTIES TIMEOUT ${arg_TIMEOUT})
+endfunction()
