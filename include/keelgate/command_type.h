@@ -1,0 +1,43 @@
+// SPDX-License-Identifier: Apache-2.0
+/// The command numbers that the framework knows.
+#pragma once
+
+#include <keelgate/enumeration.h>
+#include <keelgate/values.h>
+
+#include <string_view>
+
+#include <keelgate/describe_begin.h>
+
+namespace Keelgate {
+
+/// A known command. There is no way to hold an unknown one.
+class CommandType {
+ public:
+  NESTED_ENUMERATION(Case, UInt64, sampleMessage = 1, sampleReply = 2, checkInStart = 3,
+                     checkInUpdate = 4, checkInEnd = 5, sessionPrepare = 231,
+                     sessionInvitation = 232, sessionAccept = 233, sessionDecline = 234,
+                     sessionCancel = 235, sessionMessage = 236, sessionDeclineElsewhere = 237,
+                     sessionReinitiate = 238, sessionEnd = 239, livePhoto = 245);
+
+  /// The command with this number, or nothing when the framework does not know it.
+  static constexpr Optional<CommandType> fromRawValue(UInt64 rawValue) {
+    const Optional<Case> known = Keelgate::fromRawValue<Case>(rawValue);
+    if (!known) return std::nullopt;
+    return CommandType(*known);
+  }
+
+  constexpr CommandType(Case which) : which_(which) {}
+
+  [[nodiscard]] constexpr UInt64 rawValue() const { return rawValueOf(which_); }
+  [[nodiscard]] constexpr std::string_view name() const { return nameOf(which_); }
+
+  bool operator==(const CommandType&) const = default;
+
+ private:
+  Case which_;
+};
+
+}  // namespace Keelgate
+
+#include <keelgate/describe_end.h>

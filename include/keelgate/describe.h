@@ -1,0 +1,200 @@
+// SPDX-License-Identifier: Apache-2.0
+/// Structs that describe themselves.
+///
+/// A struct lists its members once, with FIELD, and closes with CODING_KEYS (a schema) or LABELS
+/// (a record). It stays an aggregate. Everything that has to know the members walks that one list:
+/// decoding, mirror encoding, transport, JSON and `keelgate describe`.
+///
+///     struct Point {
+///       FIELD(Int, x);
+///       FIELD(Optional<Int>, height, "h");   // travels under the key "h"
+///       CODING_KEYS(Point);
+///     };
+///
+///     FieldsOf<Point>::each([&](auto field) { print(field.name, point.*field.member); });
+///
+/// The macros exist only between <keelgate/describe_begin.h> and <keelgate/describe_end.h>.
+///
+/// How a list is found: every FIELD also declares an overload of `keelgateField` for its own source
+/// line, and the closing macro asks each of the lines above it whether there is one. Lines are the
+/// same in every translation unit, which __COUNTER__ is not. A walker is instantiated per type of
+/// value and not per field, because fields are passed as values; with structs of 156 fields that is
+/// the difference between seconds and minutes of compile time.
+#pragma once
+
+#include <keelgate/enumeration.h>
+#include <keelgate/type_name.h>
+#include <keelgate/values.h>
+
+#include <algorithm>
+#include <array>
+#include <concepts>
+#include <cstddef>
+#include <string_view>
+#include <type_traits>
+#include <utility>
+
+namespace Keelgate {
+
+/// One described member: where it is, what it is called, and the key that it travels under.
+template <class S, class V>
+struct Field {
+  using Struct = S;
+  using Value = V;
+
+  V S::*member;
+  std::string_view name;
+  std::string_view key;
+
+  constexpr Field(V S::*itsMember, std::string_view itsName) : Field(itsMember, itsName, itsName) {}
+  constexpr Field(V S::*itsMember, std::string_view itsName, std::string_view itsKey)
+      : member(itsMember), name(itsName), key(itsKey) {}
+};
+
+namespace Detail {
+
+template <int line>
+struct Line;
+
+template <class S, int line>
+concept HasField = requires {
+  S::template keelgateField<S>(static_cast<Line<line>*>(nullptr));
+};
+
+// How far above its closing macro a struct may begin. A list that begins further up is caught by
+// the test that counts the initialisers which each struct takes.
+constexpr int span = 240;
+
+template <class F>
+struct FieldCount : std::integral_constant<std::size_t, 1> {};
+template <class F, std::size_t n>
+struct FieldCount<std::array<F, n>> : std::integral_constant<std::size_t, n> {};
+
+}  // namespace Detail
+
+/// The list of S, whose closing macro stands on the line `end`.
+template <class S, int end>
+class FieldList {
+  static constexpr int first = end > Detail::span ? end - Detail::span : 1;
+
+  template <int... offsets>
+  static constexpr std::size_t countLines(std::integer_sequence<int, offsets...>) {
+    constexpr bool has[] = {Detail::HasField<S, first + offsets>...};
+    return static_cast<std::size_t>(std::count(std::begin(has), std::end(has), true));
+  }
+
+  template <int... offsets>
+  static constexpr auto findLines(std::integer_sequence<int, offsets...> range) {
+    constexpr bool has[] = {Detail::HasField<S, first + offsets>...};
+    std::array<int, countLines(range)> found{};
+    std::size_t n = 0;
+    for (int i = 0; i < end - first; ++i) {
+      if (has[i]) found[n++] = first + i;
+    }
+    return found;
+  }
+
+  static constexpr auto lines = findLines(std::make_integer_sequence<int, end - first>());
+
+  template <std::size_t i>
+  static constexpr auto onLine() {
+    return S::template keelgateField<S>(static_cast<Detail::Line<lines[i]>*>(nullptr));
+  }
+
+  template <class Visitor, class V>
+  static constexpr void visit(Visitor& visitor, Field<S, V> field) {
+    visitor(field);
+  }
+  template <class Visitor, class V, std::size_t n>
+  static constexpr void visit(Visitor& visitor, const std::array<Field<S, V>, n>& family) {
+    for (const auto& field : family) visitor(field);
+  }
+
+  template <class Visitor, std::size_t... i>
+  static constexpr void eachOf(Visitor& visitor, std::index_sequence<i...>) {
+    // An initialiser list and not a fold: clang nests folds at most 256 deep.
+    const int sequence[] = {0, (visit(visitor, onLine<i>()), 0)...};
+    static_cast<void>(sequence);
+  }
+
+  template <std::size_t... i>
+  static constexpr std::size_t total(std::index_sequence<i...>) {
+    const std::size_t counts[] = {0, Detail::FieldCount<decltype(onLine<i>())>::value...};
+    std::size_t sum = 0;
+    for (std::size_t count : counts) sum += count;
+    return sum;
+  }
+
+  using Lines = std::make_index_sequence<lines.size()>;
+
+ public:
+  static constexpr std::size_t size = total(Lines());
+
+  /// Calls `visitor(field)` for every field in declaration order.
+  template <class Visitor>
+  static constexpr void each(Visitor&& visitor) {
+    eachOf(visitor, Lines());
+  }
+
+  /// The names, and the keys, in declaration order.
+  static constexpr std::array<std::string_view, size> names = [] {
+    std::array<std::string_view, size> all{};
+    std::size_t n = 0;
+    each([&](auto field) { all[n++] = field.name; });
+    return all;
+  }();
+  static constexpr std::array<std::string_view, size> keys = [] {
+    std::array<std::string_view, size> all{};
+    std::size_t n = 0;
+    each([&](auto field) { all[n++] = field.key; });
+    return all;
+  }();
+};
+
+template <class T>
+concept Schema = requires {
+  typename T::CodingKeys;
+};
+
+template <class T>
+concept Record = requires {
+  typename T::Labels;
+};
+
+template <class T>
+concept Described = Schema<T> || Record<T>;
+
+namespace Detail {
+template <class T>
+struct FieldsOf;
+template <Schema T>
+struct FieldsOf<T> {
+  using Type = typename T::CodingKeys;
+};
+template <Record T>
+struct FieldsOf<T> {
+  using Type = typename T::Labels;
+};
+}  // namespace Detail
+
+template <Described T>
+using FieldsOf = typename Detail::FieldsOf<T>::Type;
+
+/// An enumeration whose cases each carry a record: a std::variant that knows its cases' names.
+template <class T>
+concept CaseKeyed = requires {
+  T::caseNames;
+};
+
+template <class T>
+constexpr bool isOptional = false;
+template <class T>
+constexpr bool isOptional<Optional<T>> = true;
+
+/// An array of values. Data is not one: it is an octet string.
+template <class T>
+constexpr bool isArray = false;
+template <class T>
+constexpr bool isArray<Array<T>> = !std::same_as<T, std::byte>;
+
+}  // namespace Keelgate

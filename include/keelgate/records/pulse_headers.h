@@ -1,0 +1,26 @@
+// SPDX-License-Identifier: Apache-2.0
+/// The HTTP headers that push payloads and web-tunnel responses carry.
+#pragma once
+
+#include <keelgate/describe.h>
+#include <keelgate/values.h>
+
+#include <keelgate/describe_begin.h>
+
+namespace Keelgate {
+
+/// Every value is as it was received.
+struct PulseUserPayloadHttpHeaders {
+  FIELD(Optional<String>, adhocServiceOverride);
+  FIELD(Optional<String>, responseIdentifierString);
+  FIELD(Optional<String>, strictTransportSecurity);
+  FIELD(Optional<String>, traceId);
+  FIELD(Optional<String>, splunkHint);
+  FIELD(Optional<String>, asHttpHeader);
+
+  LABELS(PulseUserPayloadHttpHeaders);
+};
+
+}  // namespace Keelgate
+
+#include <keelgate/describe_end.h>

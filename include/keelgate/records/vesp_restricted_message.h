@@ -1,0 +1,22 @@
+// SPDX-License-Identifier: Apache-2.0
+/// The marker that stands for a message whose content never leaves the sandbox.
+#pragma once
+
+#include <keelgate/describe.h>
+#include <keelgate/values.h>
+
+#include <keelgate/describe_begin.h>
+
+namespace Keelgate {
+
+ENUMERATION(ClientMessageType, UInt, unrestricted = 0, restricted = 1);
+
+struct VespRestrictedMessage {
+  FIELD(ClientMessageType, messageType);
+
+  LABELS(VespRestrictedMessage);
+};
+
+}  // namespace Keelgate
+
+#include <keelgate/describe_end.h>

@@ -1,0 +1,98 @@
+// SPDX-License-Identifier: Apache-2.0
+/// The records of the call services: an invitation to a session, its answers and follow-ups.
+#pragma once
+
+#include <keelgate/describe.h>
+#include <keelgate/values.h>
+
+#include <keelgate/describe_begin.h>
+
+namespace Keelgate {
+
+/// A call is offered.
+struct VespSessionInvitation {
+  /// How the media of the call travel.
+  NESTED_ENUMERATION(TransportType, UInt, peerToPeer = 0, relay = 1, multiwayRelay = 2);
+
+  FIELD(TransportType, transportType);
+  FIELD(UInt, version);
+  FIELD(Optional<UInt>, connectionCountHint);
+  FIELD(Optional<Bool>, disableEncryption);
+  FIELD(Optional<Bool>, singleChannelDirectMode);
+  FIELD(Optional<Bool>, useStunMessageIntegrity);
+  FIELD(Optional<Bool>, useSecureHLControlMessage);
+  FIELD(Optional<Data>, blob);
+  FIELD(Optional<Bool>, messageIsRealTime);
+  FIELD(Optional<Data>, unauthenticatedPublicKey);
+  FIELD(Optional<Bool>, assumeRemoteDeviceEncryption);
+  FIELD(Optional<Data>, sessionMessageContext);
+  FIELD(Optional<Bool>, usePhoneTetherLocalMessage);
+  FIELD(String, participantID);
+  FIELD(Bool, declineOnNetworkError);
+  FIELD(String, sessionID);
+  FIELD(Optional<Bool>, needsToWaitForPreConnectionData);
+  FIELD(Optional<Bool>, useCloudPairedControlChannel);
+
+  LABELS(VespSessionInvitation);
+};
+
+/// The call is taken.
+struct VespSessionAccept {
+  FIELD(UInt, version);
+  FIELD(Optional<Data>, blob);
+  FIELD(String, sessionID);
+  FIELD(String, participantID);
+  FIELD(Optional<Data>, sessionMessageContext);
+  FIELD(Optional<Bool>, useCloudPairedControlChannel);
+  FIELD(Optional<Bool>, useStunMessageIntegrity);
+  FIELD(Optional<Bool>, useSecureHLControlMessage);
+  FIELD(Optional<Data>, unauthenticatedPublicKey);
+  FIELD(Optional<Bool>, remoteUsePhoneTetherLocalMessage);
+  FIELD(Optional<Data>, remoteKeyMaterialData);
+  FIELD(Optional<Int>, remoteSSRC);
+  FIELD(Optional<Int>, remoteSecStart);
+
+  LABELS(VespSessionAccept);
+};
+
+/// The call is refused.
+struct VespSessionDecline {
+  FIELD(UInt, version);
+  FIELD(String, sessionID);
+  FIELD(String, participantID);
+  FIELD(Optional<Data>, sessionMessageContext);
+
+  LABELS(VespSessionDecline);
+};
+
+/// The caller takes the offer back, or a participant leaves.
+struct VespSessionCancel {
+  NESTED_ENUMERATION(VespSessionEndedReason, UInt, unknown = 0, localHangUp = 1, remoteHangUp = 2,
+                     noAnswer = 3, answeredElsewhere = 4, declinedElsewhere = 5, busy = 6,
+                     networkFailure = 7, mediaFailure = 8);
+
+  FIELD(UInt, version);
+  FIELD(String, sessionID);
+  FIELD(String, participantID);
+  FIELD(Optional<VespSessionEndedReason>, remoteEndReason);
+  FIELD(Optional<Data>, sessionMessageContext);
+
+  LABELS(VespSessionCancel);
+};
+
+/// A running session is set up anew.
+struct VespSessionReinitiate {
+  NESTED_ENUMERATION(VespSessionReinitiateSubcommand, UInt, restartConnection = 0,
+                     renegotiateMedia = 1, switchTransport = 2, rekey = 3);
+
+  FIELD(UInt, version);
+  FIELD(String, sessionID);
+  FIELD(String, participantID);
+  FIELD(VespSessionReinitiateSubcommand, sessionReinitiateSubcommand);
+
+  LABELS(VespSessionReinitiate);
+};
+
+}  // namespace Keelgate
+
+#include <keelgate/describe_end.h>

@@ -1,0 +1,81 @@
+// SPDX-License-Identifier: Apache-2.0
+/// The record of a safety check-in. A code that the framework does not know is its default case.
+#pragma once
+
+#include <keelgate/describe.h>
+#include <keelgate/values.h>
+
+#include <keelgate/describe_begin.h>
+
+namespace Keelgate {
+
+DEFAULTING_ENUMERATION(WMMessageType, UInt, unknown, unknown = 0, sessionStart = 1,
+                       sessionUpdate = 2, sessionEnd = 3, trigger = 4, cacheUpdate = 5,
+                       locationUpdate = 6);
+
+DEFAULTING_ENUMERATION(WMsessionType, UInt, unknown, unknown = 0, timer = 1, destination = 2,
+                       workout = 3);
+
+DEFAULTING_ENUMERATION(WMSessionDestinationType, UInt, unknown, unknown = 0, home = 1, work = 2,
+                       school = 3, other = 4);
+
+DEFAULTING_ENUMERATION(WMDeviceConfigurationLowPowerModeWarningState, UInt, unknown, unknown = 0,
+                       notShown = 1, shown = 2, dismissed = 3);
+
+DEFAULTING_ENUMERATION(GLClientLocationReferenceFrame, UInt, unknown, unknown = 0, wgs84 = 1,
+                       shifted = 2);
+
+DEFAULTING_ENUMERATION(WMTriggerCategory, UInt, unknown, unknown = 0, timerExpired = 1,
+                       noProgress = 2, offRoute = 3, unresponsive = 4, emergency = 5);
+
+/// One group of recipients. Receivers know a group by its number, not by its place in the list.
+struct WaymarkGroupFields {
+  FIELD(UInt, groupNumber);
+  FIELD(Optional<String>, receiverHandle);
+  FIELD(Optional<String>, sharingInvitationData);
+  FIELD(Optional<String>, shareURL);
+  FIELD(Optional<String>, participantID);
+
+  LABELS(WaymarkGroupFields);
+};
+
+/// Times, angles, lengths and speeds are as the sender counts them. The first group of recipients
+/// stands in the record itself; `groupFields` has the groups 2 to 32, empty ones too.
+struct WaymarkMessage {
+  FIELD(WMMessageType, messageType);
+  FIELD(UInt, interfaceVersion);
+  FIELD(Double, sendDate);
+  FIELD(String, messageID);
+  FIELD(String, sessionID);
+  FIELD(Optional<String>, summaryText);
+  FIELD(Optional<String>, receiverHandle);
+  FIELD(Optional<String>, sharingInvitationData);
+  FIELD(Optional<String>, shareURL);
+  FIELD(Optional<String>, participantID);
+  FIELD(Optional<WMsessionType>, sessionType);
+  FIELD(Optional<Double>, estimatedEndTime);
+  FIELD(Optional<Double>, coarseEstimatedEndTime);
+  FIELD(Optional<WMSessionDestinationType>, sessionDestinationType);
+  FIELD(Optional<String>, sessionDestinationMapItem);
+  FIELD(Optional<WMDeviceConfigurationLowPowerModeWarningState>, lowPowerModeWarningState);
+  FIELD(Optional<Double>, triggerTime);
+  FIELD(Optional<Double>, latitude);
+  FIELD(Optional<Double>, longitude);
+  FIELD(Optional<Double>, hunc);
+  FIELD(Optional<Double>, altitude);
+  FIELD(Optional<Double>, vunc);
+  FIELD(Optional<Double>, timeOfLocation);
+  FIELD(Optional<GLClientLocationReferenceFrame>, referenceFrame);
+  FIELD(Optional<Double>, speed);
+  FIELD(Optional<WMTriggerCategory>, triggerType);
+  FIELD(Optional<String>, safetyCacheKey);
+  FIELD(Optional<String>, safetyCacheToken);
+  FIELD(Optional<Bool>, isSOSTrigger);
+  FIELD(Optional<Array<WaymarkGroupFields>>, groupFields);
+
+  LABELS(WaymarkMessage);
+};
+
+}  // namespace Keelgate
+
+#include <keelgate/describe_end.h>
