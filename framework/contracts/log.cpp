@@ -1,0 +1,32 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "framework/contracts/log.h"
+
+#include <cstdio>
+
+namespace Keelgate {
+
+namespace {
+thread_local LogCapture* innermost = nullptr;
+}
+
+LogCapture::LogCapture() : outer_(innermost) {
+  innermost = this;
+}
+LogCapture::~LogCapture() {
+  innermost = outer_;
+}
+
+// A member on purpose, though it needs no state: lines are logged *on* the handle.
+// NOLINTNEXTLINE(readability-convert-member-functions-to-static)
+void LogHandle::error(std::string_view format, std::string_view argument) const {
+  String line(format);
+  if (const std::size_t at = line.find("%@"); at != String::npos) line.replace(at, 2, argument);
+  if (innermost != nullptr) {
+    innermost->lines.push_back(std::move(line));
+    return;
+  }
+  line += '\n';
+  std::fwrite(line.data(), 1, line.size(), stderr);
+}
+
+}  // namespace Keelgate

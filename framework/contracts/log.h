@@ -1,0 +1,46 @@
+// SPDX-License-Identifier: Apache-2.0
+/// The log of the service: one handle, one level.
+#pragma once
+
+#include <keelgate/values.h>
+
+#include <concepts>
+#include <string>
+#include <string_view>
+
+namespace Keelgate {
+
+/// A handle logs from any thread. A line goes to the capture of the calling thread, or to standard
+/// error where there is none.
+class LogHandle {
+ public:
+  /// At error level. `format` holds "%@" once, which `argument` takes the place of.
+  void error(std::string_view format, std::string_view argument) const;
+};
+
+namespace Log {
+inline constexpr LogHandle keelgate;
+}
+
+/// Takes the lines that are logged on this thread for as long as it lives: a sealed worker has no
+/// standard error, so that its lines travel with its reply.
+class LogCapture {
+ public:
+  LogCapture();
+  ~LogCapture();
+  LogCapture(const LogCapture&) = delete;
+  LogCapture& operator=(const LogCapture&) = delete;
+
+  Array<String> lines;
+
+ private:
+  LogCapture* outer_;
+};
+
+/// Renders an optional number for a log line.
+template <std::integral T>
+String rendered(const Optional<T>& value) {
+  return value ? std::to_string(*value) : "nil";
+}
+
+}  // namespace Keelgate

@@ -1,0 +1,77 @@
+// SPDX-License-Identifier: Apache-2.0
+/// The server that owns a service process once it has been resumed.
+///
+/// Registration happens on the main thread, before `resume`, and never changes afterwards. `answer`
+/// only reads what was registered: it may be called from any thread.
+#pragma once
+
+#include "framework/contracts/unpacker.h"
+#include "framework/transport/frames.h"
+#include "framework/transport/record_coding.h"
+
+#include <array>
+#include <functional>
+#include <string_view>
+
+namespace Keelgate {
+
+/// The sandboxes that a service can be resumed in.
+enum class SandboxID { keelgate };
+
+/// One message, as it arrived. Everything is borrowed for the time of the call.
+struct Request {
+  /// recordNumber<Record> of the record that is asked for.
+  std::size_t record;
+  Bytes message;
+  UInt64 command;
+  std::string_view service;
+};
+
+/// The one answer to a request: the body of a record frame or of an error frame, and what was
+/// logged on the way.
+struct Reply {
+  Transport::ReplyKind kind;
+  Data body;
+  Array<String> log;
+};
+
+class KeelgateServer {
+ public:
+  /// The shared server of this process.
+  static KeelgateServer& service();
+
+  /// Registers the unpacker for the record that it gives, which no other may be registered for.
+  template <OutputRecord R, MessageUnpacker U>
+  requires std::same_as<typename U::SchemaType, R>
+  void registerUnpacker(U unpacker) {
+    add(recordNumber<R>, [unpacker = std::move(unpacker)](const Request& request) {
+      return Transport::encodeRecord(unpacker.unpack(request.message));
+    });
+  }
+  template <OutputRecord R, ContextualUnpacker U>
+  requires std::same_as<typename U::SchemaType, R>
+  void registerUnpacker(U unpacker) {
+    add(recordNumber<R>, [unpacker = std::move(unpacker)](const Request& request) {
+      return Transport::encodeRecord(unpacker.unpack(
+          request.message,
+          typename U::Context{.command = request.command, .service = String(request.service)}));
+    });
+  }
+
+  /// Serves under this identifier until the channel closes. Without one there is no sandbox to
+  /// serve in, and it returns at once.
+  void resume(Optional<SandboxID> sandboxID);
+
+  /// Unpacks one message. Errors of the message are in the reply; std::bad_alloc comes through. A
+  /// request for a record that nobody is registered for gives a Breach.
+  [[nodiscard]] Reply answer(const Request& request) const;
+
+ private:
+  using Handler = std::function<Data(const Request&)>;
+
+  void add(std::size_t record, Handler handler);
+
+  std::array<Handler, OutputRecords::size> handlers_;
+};
+
+}  // namespace Keelgate

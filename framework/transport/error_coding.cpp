@@ -1,0 +1,119 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "framework/transport/error_coding.h"
+
+#include "framework/transport/wire.h"
+
+namespace Keelgate::Transport {
+
+using VespKeelgateService::VespClientMessageUnpackingError;
+
+namespace {
+
+enum class ErrorKind : std::uint8_t { decoding, breach, unpacking };
+
+/// A path leads through at most 512 nested containers, one step for each.
+constexpr std::size_t maximumPathLength = 512;
+
+Writer begin(ErrorKind kind) {
+  Writer to;
+  to.byte(static_cast<std::uint8_t>(kind));
+  return to;
+}
+
+void writeOptional(Writer& to, const Optional<String>& text) {
+  to.byte(text ? 1 : 0);
+  if (text) to.text(*text);
+}
+
+Optional<String> readOptional(Reader& from) {
+  if (!from.flag()) return std::nullopt;
+  return String(from.text());
+}
+
+CodingKey readCodingKey(Reader& from) {
+  if (from.flag()) return static_cast<std::size_t>(from.word());
+  return String(from.text());
+}
+
+DecodingError readDecodingError(Reader& from) {
+  const std::uint8_t kind = from.byte();
+  if (kind > static_cast<std::uint8_t>(DecodingError::Kind::dataCorrupted)) throw MalformedReply();
+  Optional<String> key = readOptional(from);
+  if (key.has_value() != (DecodingError::Kind{kind} == DecodingError::Kind::keyNotFound)) {
+    throw MalformedReply();
+  }
+  const std::size_t steps = from.count();
+  if (steps > maximumPathLength) throw MalformedReply();
+  Array<CodingKey> path;
+  for (std::size_t i = 0; i < steps; ++i) path.push_back(readCodingKey(from));
+  return {DecodingError::Kind{kind}, std::move(key), std::move(path), String(from.text())};
+}
+
+Breach readBreach(Reader& from) {
+  String domain(from.text());
+  String errorType(from.text());
+  return {std::move(domain), std::move(errorType), readOptional(from)};
+}
+
+VespClientMessageUnpackingError readUnpackingError(Reader& from) {
+  if (from.flag()) {
+    return VespClientMessageUnpackingError::noUnpackerForService(String(from.text()));
+  }
+  const Optional<CommandType> command = CommandType::fromRawValue(from.word());
+  if (!command) throw MalformedReply();
+  return VespClientMessageUnpackingError::unimplementedCommand(*command);
+}
+
+template <class E>
+[[noreturn]] void throwRead(Reader& from, E (*read)(Reader&)) {
+  E error = read(from);
+  from.end();
+  throw error;
+}
+
+}  // namespace
+
+Data encodeError(const DecodingError& error) {
+  Writer to = begin(ErrorKind::decoding);
+  to.byte(static_cast<std::uint8_t>(error.kind));
+  writeOptional(to, error.key);
+  to.word(error.codingPath.size());
+  for (const CodingKey& step : error.codingPath) {
+    to.byte(static_cast<std::uint8_t>(step.index()));
+    if (const auto* index = std::get_if<std::size_t>(&step)) to.word(*index);
+    if (const auto* key = std::get_if<String>(&step)) to.text(*key);
+  }
+  to.text(error.debugDescription);
+  return std::move(to).take();
+}
+
+Data encodeError(const Breach& error) {
+  Writer to = begin(ErrorKind::breach);
+  to.text(error.domain);
+  to.text(error.errorType);
+  writeOptional(to, error.keyPath);
+  return std::move(to).take();
+}
+
+Data encodeError(const VespClientMessageUnpackingError& error) {
+  Writer to = begin(ErrorKind::unpacking);
+  to.byte(static_cast<std::uint8_t>(error.code()));
+  if (error.command) to.word(error.command->rawValue());
+  if (error.service) to.text(*error.service);
+  return std::move(to).take();
+}
+
+void throwError(Bytes body) {
+  Reader from(body);
+  switch (ErrorKind{from.byte()}) {
+    case ErrorKind::decoding:
+      throwRead(from, readDecodingError);
+    case ErrorKind::breach:
+      throwRead(from, readBreach);
+    case ErrorKind::unpacking:
+      throwRead(from, readUnpackingError);
+  }
+  throw MalformedReply();
+}
+
+}  // namespace Keelgate::Transport

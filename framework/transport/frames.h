@@ -1,0 +1,106 @@
+// SPDX-License-Identifier: Apache-2.0
+/// What travels between the client and the service: two kinds of channel, one dispatch table each.
+///
+/// *Control* (client <-> zygote, SOCK_SEQPACKET): fixed ControlFrames, one per packet.
+///
+///     client                          zygote
+///     hello{options}            ->
+///                               <-    ready{layers}            or it exits (cannot be sealed)
+///     fork{slot} + descriptor   ->                             a worker on that descriptor
+///     kill{slot}                ->                             SIGKILL for that slot's worker
+///                               <-    exit{slot, status, ...}  exactly one for every fork
+///
+/// *Data* (client <-> one worker, SOCK_STREAM, half-duplex, one request in flight): a RequestHeader
+/// with the service identifier and the message behind it; then at most `maximumLogFrames` log
+/// frames and exactly one record or error frame, each a ReplyHeader with its body behind it.
+///
+/// Both sides are of one build on one machine, so integers are in the machine's own order, and a
+/// frame that is not exactly right is fatal. The client trusts no reply: a worker may be taken
+/// over.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+
+namespace Keelgate::Transport {
+
+constexpr std::uint32_t magic = 0x4b47'4154;
+constexpr std::uint16_t protocolVersion = 1;
+
+/// The channel's number in every process of the service.
+constexpr int serviceDescriptor = 3;
+
+enum class ControlKind : std::uint16_t { hello = 1, ready, fork, kill, exit };
+
+/// The walls that a service process has behind the ones without which it does not start.
+enum Layer : std::uint32_t {
+  layerUserNamespace = 1u << 0,
+  layerPidNamespace = 1u << 1,
+  layerMountNamespace = 1u << 2,
+  layerNetworkNamespace = 1u << 3,
+  layerIpcNamespace = 1u << 4,
+  layerUtsNamespace = 1u << 5,
+  layerCgroupNamespace = 1u << 6,
+  layerEmptyRoot = 1u << 7,
+  layerLandlock = 1u << 8,
+  layerNoSupplementaryGroups = 1u << 9,
+  /// Never missing in a service that said it was ready.
+  layerStrictFilter = 1u << 10,
+  layerNoNewPrivileges = 1u << 11,
+  layerOneDescriptor = 1u << 12,
+  layerNoCapabilities = 1u << 13,
+  layerLimits = 1u << 14,
+  layerNotDumpable = 1u << 15,
+};
+
+/// `numbers` is named by the functions of the frames' own modules; what each kind carries:
+///   hello: [0] largest message in bytes, [1] messages per worker, [2] CPU seconds per worker
+///   ready: [0] layers (Layer), [1] Landlock ABI
+///   exit:  [0] wait status as wait4 gives it, [1] peak resident bytes, [2] CPU microseconds
+struct ControlFrame {
+  std::uint32_t magic;
+  std::uint16_t version;
+  ControlKind kind;
+  std::uint32_t slot;
+  std::uint32_t reserved;
+  std::uint64_t numbers[4];
+};
+static_assert(sizeof(ControlFrame) == 48);
+
+struct RequestHeader {
+  std::uint32_t magic;
+  std::uint16_t version;
+  /// recordNumber<Record> of the record that is asked for.
+  std::uint16_t record;
+  /// Counts the requests of a worker from 0; the reply repeats it.
+  std::uint32_t sequence;
+  std::uint32_t serviceLength;
+  std::uint64_t bodyLength;
+  std::uint64_t command;
+};
+static_assert(sizeof(RequestHeader) == 32);
+
+enum class ReplyKind : std::uint16_t { log = 1, record, error };
+
+struct ReplyHeader {
+  std::uint32_t magic;
+  std::uint16_t version;
+  ReplyKind kind;
+  std::uint32_t sequence;
+  std::uint32_t reserved;
+  std::uint64_t bodyLength;
+};
+static_assert(sizeof(ReplyHeader) == 24);
+
+/// One log line is all that the program ever writes for a message; a few more are harmless, a
+/// stream of them is an attack on the log.
+constexpr std::size_t maximumLogFrames = 8;
+constexpr std::size_t maximumLogLength = 512;
+
+/// A topic identifier has some forty characters; this bounds what a caller can make us copy.
+constexpr std::size_t maximumServiceLength = 64 * 1024;
+
+/// The exit status of a worker whose heap did not suffice.
+constexpr int resourceExitStatus = 75;
+
+}  // namespace Keelgate::Transport

@@ -1,0 +1,150 @@
+// SPDX-License-Identifier: Apache-2.0
+/// Records as the bytes of a reply, both ways, walked from their one description.
+///
+/// Written: integers and floating-point numbers as their 8 bytes, a boolean and the presence of an
+/// optional as a byte, text and octets behind their length, an array behind its count, an
+/// enumeration as its raw value, a case-keyed one as the case's position and then its record.
+#pragma once
+
+#include "framework/contracts/construct.h"
+#include "framework/transport/wire.h"
+
+#include <keelgate/describe.h>
+
+#include <bit>
+#include <cmath>
+#include <cstddef>
+#include <utility>
+#include <variant>
+
+namespace Keelgate::Transport {
+
+// ---------------------------------------------------------------------------------- writing
+
+template <class T>
+void write(Writer& to, const T& value);
+
+template <class T>
+void write(Writer& to, const Optional<T>& value) {
+  to.byte(value ? 1 : 0);
+  if (value) write(to, *value);
+}
+
+template <class T>
+requires(isArray<Array<T>>) void write(Writer& to, const Array<T>& values) {
+  to.word(values.size());
+  for (const T& value : values) write(to, value);
+}
+
+template <class T>
+void write(Writer& to, const T& value) {
+  if constexpr (std::same_as<T, Bool>) {
+    to.byte(value ? 1 : 0);
+  } else if constexpr (std::integral<T> || Enumeration<T>) {
+    to.word(static_cast<std::uint64_t>(value));
+  } else if constexpr (std::same_as<T, Double>) {
+    to.word(std::bit_cast<std::uint64_t>(value));
+  } else if constexpr (std::same_as<T, Date>) {
+    to.word(std::bit_cast<std::uint64_t>(value.secondsSinceReferenceDate));
+  } else if constexpr (std::same_as<T, UUID>) {
+    for (std::uint8_t octet : value.octets) to.byte(octet);
+  } else if constexpr (std::same_as<T, String>) {
+    to.text(value);
+  } else if constexpr (std::same_as<T, Data>) {
+    to.octets(value);
+  } else if constexpr (CaseKeyed<T>) {
+    to.byte(static_cast<std::uint8_t>(value.index()));
+    std::visit([&](const auto& payload) { write(to, payload); }, value);
+  } else {
+    FieldsOf<T>::each([&](auto field) { write(to, value.*field.member); });
+  }
+}
+
+// ---------------------------------------------------------------------------------- reading
+
+/// Property lists nest 512 containers, and a payload inside a payload takes two of them. No honest
+/// record is deeper; a lying one must not reach the end of the client's stack.
+constexpr int maximumDepth = 512;
+
+template <class T>
+void read(Reader& from, T& value, int depth);
+
+template <class T>
+void read(Reader& from, Optional<T>& value, int depth) {
+  if (from.flag()) read(from, value.emplace(), depth);
+}
+
+template <class T>
+requires(isArray<Array<T>>) void read(Reader& from, Array<T>& values, int depth) {
+  // Grown with the elements that arrive and not by the count: a record may be hundreds of times as
+  // large as the shortest bytes that claim to be one.
+  for (std::size_t rest = from.count(); rest > 0; --rest) {
+    read(from, values.emplace_back(T{}), depth);
+  }
+}
+
+template <class T, std::size_t... i>
+void readCase(Reader& from, T& value, int depth, std::index_sequence<i...>) {
+  const std::size_t which = from.byte();
+  const bool known =
+      ((which == i ? (read(from, value.template emplace<i>(), depth), true) : false) || ...);
+  if (!known) throw MalformedReply();
+}
+
+template <class T>
+void readRecord(Reader& from, T& value, int depth) {
+  if (depth >= maximumDepth) throw MalformedReply();
+  FieldsOf<T>::each([&](auto field) { read(from, value.*field.member, depth + 1); });
+  // What the framework refuses in the service is refused here too.
+  admit(typeName<T>());
+}
+
+template <class T>
+void read(Reader& from, T& value, int depth) {
+  if constexpr (std::same_as<T, Bool>) {
+    value = from.flag();
+  } else if constexpr (std::integral<T>) {
+    value = static_cast<T>(from.word());
+  } else if constexpr (Enumeration<T>) {
+    const Optional<T> known = fromRawValue<T>(from.word());
+    if (!known) throw MalformedReply();
+    value = *known;
+  } else if constexpr (std::same_as<T, Double>) {
+    value = std::bit_cast<double>(from.word());
+  } else if constexpr (std::same_as<T, Date>) {
+    value.secondsSinceReferenceDate = std::bit_cast<double>(from.word());
+    if (!std::isfinite(value.secondsSinceReferenceDate)) throw MalformedReply();
+  } else if constexpr (std::same_as<T, UUID>) {
+    for (std::uint8_t& octet : value.octets) octet = from.byte();
+  } else if constexpr (std::same_as<T, String>) {
+    value = from.text();
+  } else if constexpr (std::same_as<T, Data>) {
+    const Bytes bytes = from.octets();
+    value.assign(bytes.begin(), bytes.end());
+  } else if constexpr (CaseKeyed<T>) {
+    readCase(from, value, depth,
+             std::make_index_sequence<std::variant_size_v<typename T::variant>>());
+  } else {
+    readRecord(from, value, depth);
+  }
+}
+
+/// The body of a record frame.
+template <Record T>
+Data encodeRecord(const T& record) {
+  Writer to;
+  write(to, record);
+  return std::move(to).take();
+}
+
+/// The record that a body holds. Throws MalformedReply, or what the record's constructor throws.
+template <Record T>
+T decodeRecord(Bytes body) {
+  Reader from(body);
+  T record{};
+  read(from, record, 0);
+  from.end();
+  return record;
+}
+
+}  // namespace Keelgate::Transport

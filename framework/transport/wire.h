@@ -1,0 +1,90 @@
+// SPDX-License-Identifier: Apache-2.0
+/// The bytes of a reply's body: how values are written down, and the strict reader of them.
+///
+/// The reader faces a process that may be taken over. It accepts exactly one spelling of every
+/// value, checks before it allocates, and allocates only what bytes at hand justify.
+#pragma once
+
+#include <keelgate/values.h>
+
+#include <cstddef>
+#include <cstring>
+#include <exception>
+#include <string_view>
+
+namespace Keelgate::Transport {
+
+/// Thrown by Reader: the bytes are none that an honest service writes.
+class MalformedReply : public std::exception {
+ public:
+  [[nodiscard]] const char* what() const noexcept override { return "malformed reply"; }
+};
+
+class Writer {
+ public:
+  void byte(std::uint8_t value) { out_.push_back(std::byte{value}); }
+  void word(std::uint64_t value) { append(&value, sizeof value); }
+  void octets(Bytes value) {
+    word(value.size());
+    append(value.data(), value.size());
+  }
+  void text(std::string_view value) {
+    octets(std::as_bytes(std::span(value.data(), value.size())));
+  }
+  [[nodiscard]] Data take() && { return std::move(out_); }
+
+ private:
+  void append(const void* from, std::size_t size) {
+    const auto* bytes = static_cast<const std::byte*>(from);
+    out_.insert(out_.end(), bytes, bytes + size);
+  }
+
+  Data out_;
+};
+
+class Reader {
+ public:
+  explicit Reader(Bytes reply) : rest_(reply) {}
+
+  std::uint8_t byte() { return static_cast<std::uint8_t>(take(1)[0]); }
+  std::uint64_t word() {
+    std::uint64_t value;
+    std::memcpy(&value, take(sizeof value).data(), sizeof value);
+    return value;
+  }
+  /// A flag is 0 or 1 and nothing else.
+  bool flag() {
+    const std::uint8_t value = byte();
+    if (value > 1) throw MalformedReply();
+    return value == 1;
+  }
+  /// A view into the reply.
+  Bytes octets() { return take(word()); }
+  /// The same, checked to be UTF-8.
+  std::string_view text();
+  /// How many elements follow; each takes one byte at least.
+  std::size_t count() {
+    const std::uint64_t value = word();
+    if (value > rest_.size()) throw MalformedReply();
+    return value;
+  }
+  /// An honest reply ends where its record ends.
+  void end() const {
+    if (!rest_.empty()) throw MalformedReply();
+  }
+
+ private:
+  Bytes take(std::uint64_t size) {
+    if (size > rest_.size()) throw MalformedReply();
+    const Bytes taken = rest_.first(size);
+    rest_ = rest_.subspan(size);
+    return taken;
+  }
+
+  Bytes rest_;
+};
+
+/// Whether the text is UTF-8 in its shortest form, without surrogates.
+bool isUtf8(std::string_view text) noexcept;
+
+}  // namespace Keelgate::Transport

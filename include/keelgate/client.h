@@ -1,0 +1,96 @@
+// SPDX-License-Identifier: Apache-2.0
+/// Hands untrusted messages to a sandboxed service and gets typed records back.
+///
+///     Keelgate::Client client;
+///     auto payload = client.unpack<Keelgate::PulseUserPayload>(bytes);
+///     auto result  = client.unpackClientMessage(
+///         bytes, {.command = 232, .service = "com.tessen.private.braid.viso.video"});
+///
+/// No byte of a message is parsed in the calling process. By default every message has a freshly
+/// forked, sealed process to itself.
+#pragma once
+
+#include <keelgate/errors.h>
+#include <keelgate/records.h>
+#include <keelgate/values.h>
+
+#include <chrono>
+#include <cstddef>
+#include <functional>
+#include <memory>
+#include <string_view>
+
+namespace Keelgate {
+
+/// One of the walls around the service's processes.
+struct SandboxLayer {
+  String name;
+  Bool present;
+};
+
+/// What the running service said of itself.
+struct ServiceReport {
+  String version;
+  /// Strongest first. Those that a service never starts without are listed too.
+  Array<SandboxLayer> layers;
+};
+
+/// A running service. All members may be called from many threads at once; each call holds one of
+/// the service's processes, and waits for one while all are taken. The client makes no threads,
+/// installs no signal handlers and leaves the application's children alone. In a process that was
+/// forked from the application it starts a service of its own at its first use.
+class Client {
+ public:
+  struct Options {
+    /// Messages that can be in work at once; 0 stands for one for each processor.
+    unsigned processes = 0;
+    /// From the call until the record; a message that takes longer is given up.
+    std::chrono::milliseconds timeLimit{5000};
+    /// In bytes, at most 4 GiB - 1.
+    std::size_t largestMessage = std::size_t{64} << 20;
+    /// How many messages a process may see before a fresh one takes its place. With 1 a process
+    /// that was taken over by a message never sees another sender's message.
+    std::size_t messagesPerProcess = 1;
+    /// Refuse to run where namespaces or Landlock are missing.
+    bool requireLayers = false;
+    /// The VespKeelgateService to start; empty: the installed one, or the one beside the command.
+    String servicePath;
+    /// The socket of an activated service, which is used in place of a started one.
+    String socket;
+    /// Takes each line that the service logs, control characters escaped, from any thread; by
+    /// default they go to standard error.
+    std::function<void(std::string_view line)> log;
+  };
+
+  /// Starts the service. Throws HostError (startFailed).
+  Client();
+  explicit Client(Options options);
+  /// Ends it, within 200 ms. No call may be under way.
+  ~Client();
+  Client(const Client&) = delete;
+  Client& operator=(const Client&) = delete;
+
+  /// The record that a message holds. Throws what the unpacker threw (DecodingError, Breach), or
+  /// HostError.
+  template <OutputRecord R>
+  requires(!std::same_as<R, VespClientMessageResult>) R unpack(Bytes message);
+
+  /// The same for a client message, which comes with the command and the service that it arrived
+  /// under. Throws VespClientMessageUnpackingError too.
+  VespClientMessageResult unpackClientMessage(Bytes message,
+                                              const VespClientMessageContext& context);
+
+  /// Which walls the running service has. Throws HostError when none is running and none starts.
+  ServiceReport report();
+
+ private:
+  class Implementation;
+  std::unique_ptr<Implementation> implementation_;
+};
+
+extern template PulseUserPayload Client::unpack(Bytes);
+extern template VespCommandResponse Client::unpack(Bytes);
+extern template VespCommandWebTunnelResponse Client::unpack(Bytes);
+extern template VespInvitation Client::unpack(Bytes);
+
+}  // namespace Keelgate
