@@ -5,10 +5,13 @@
 ///
 ///     client                          zygote
 ///     hello{options}            ->
-///                               <-    ready{layers}            or it exits (cannot be sealed)
+///                               <-    ready{layers}            or refused{obstacle} and it exits
 ///     fork{slot} + descriptor   ->                             a worker on that descriptor
 ///     kill{slot}                ->                             SIGKILL for that slot's worker
 ///                               <-    exit{slot, status, ...}  exactly one for every fork
+///
+/// A slot is any number that no living worker has; it is free again with its exit. A kill for a
+/// slot without a worker is ignored: the worker may have ended meanwhile.
 ///
 /// *Data* (client <-> one worker, SOCK_STREAM, half-duplex, one request in flight): a RequestHeader
 /// with the service identifier and the message behind it; then at most `maximumLogFrames` log
@@ -30,33 +33,51 @@ constexpr std::uint16_t protocolVersion = 1;
 /// The channel's number in every process of the service.
 constexpr int serviceDescriptor = 3;
 
-enum class ControlKind : std::uint16_t { hello = 1, ready, fork, kill, exit };
+enum class ControlKind : std::uint16_t { hello = 1, ready, fork, kill, exit, refused };
 
-/// The walls that a service process has behind the ones without which it does not start.
+/// The walls around a worker. layers.h names them.
 enum Layer : std::uint32_t {
-  layerUserNamespace = 1u << 0,
-  layerPidNamespace = 1u << 1,
-  layerMountNamespace = 1u << 2,
-  layerNetworkNamespace = 1u << 3,
-  layerIpcNamespace = 1u << 4,
-  layerUtsNamespace = 1u << 5,
-  layerCgroupNamespace = 1u << 6,
-  layerEmptyRoot = 1u << 7,
-  layerLandlock = 1u << 8,
-  layerNoSupplementaryGroups = 1u << 9,
-  /// Never missing in a service that said it was ready.
-  layerStrictFilter = 1u << 10,
-  layerNoNewPrivileges = 1u << 11,
-  layerOneDescriptor = 1u << 12,
-  layerNoCapabilities = 1u << 13,
-  layerLimits = 1u << 14,
-  layerNotDumpable = 1u << 15,
+  /// The first walls: never missing in a service that said it was ready.
+  layerStrictFilter = 1u << 0,
+  layerOneDescriptor = 1u << 1,
+  layerNoNewPrivileges = 1u << 2,
+  layerNoCapabilities = 1u << 3,
+  layerLimits = 1u << 4,
+  layerNotDumpable = 1u << 5,
+  /// The second walls: a machine may lack them.
+  layerUserNamespace = 1u << 8,
+  layerPidNamespace = 1u << 9,
+  layerMountNamespace = 1u << 10,
+  layerNetworkNamespace = 1u << 11,
+  layerIpcNamespace = 1u << 12,
+  layerUtsNamespace = 1u << 13,
+  layerCgroupNamespace = 1u << 14,
+  layerEmptyRoot = 1u << 15,
+  layerLandlock = 1u << 16,
+  layerNotRoot = 1u << 17,
+  layerNoSupplementaryGroups = 1u << 18,
+};
+
+/// Why a service does not start. layers.h has the sentence for each.
+enum class Obstacle : std::uint64_t {
+  badFrame = 1,
+  descriptors,
+  process,
+  noNewPrivileges,
+  capabilities,
+  dumpable,
+  limits,
+  heap,
+  filter,
+  selfCheck,
 };
 
 /// `numbers` is named by the functions of the frames' own modules; what each kind carries:
 ///   hello: [0] largest message in bytes, [1] messages per worker, [2] CPU seconds per worker
 ///   ready: [0] layers (Layer), [1] Landlock ABI
-///   exit:  [0] wait status as wait4 gives it, [1] peak resident bytes, [2] CPU microseconds
+///   exit:  [0] wait status as wait4 gives it, [1] peak resident bytes, [2] CPU microseconds;
+///          a worker that could not be forked has the status of one whose heap did not suffice
+///   refused: [0] Obstacle, [1] errno or 0
 struct ControlFrame {
   std::uint32_t magic;
   std::uint16_t version;
@@ -102,5 +123,11 @@ constexpr std::size_t maximumServiceLength = 64 * 1024;
 
 /// The exit status of a worker whose heap did not suffice.
 constexpr int resourceExitStatus = 75;
+
+/// The exit status of a worker that was sent a frame which is not exactly right.
+constexpr int protocolExitStatus = 76;
+
+/// The exit status of a service that refused to start.
+constexpr int refusedExitStatus = 77;
 
 }  // namespace Keelgate::Transport
