@@ -65,6 +65,10 @@ concept HasField = requires {
 // the test that counts the initialisers which each struct takes.
 constexpr int span = 240;
 
+/// An object of its own for each type, so that types can be compared in a table.
+template <class T>
+inline constexpr char typeIdentity = 0;
+
 template <class F>
 struct FieldCount : std::integral_constant<std::size_t, 1> {};
 template <class F, std::size_t n>
@@ -127,6 +131,16 @@ class FieldList {
 
   using Lines = std::make_index_sequence<lines.size()>;
 
+  template <class Other, class Visitor, std::size_t... i>
+  static constexpr void eachPair(Visitor& visitor, std::index_sequence<i...>) {
+    const int sequence[] = {
+        0, (static_cast<void>(visitor(onLine<i>(), Other::template onLine<i>())), 0)...};
+    static_cast<void>(sequence);
+  }
+
+  template <class, int>
+  friend class FieldList;
+
  public:
   static constexpr std::size_t size = total(Lines());
 
@@ -134,6 +148,14 @@ class FieldList {
   template <class Visitor>
   static constexpr void each(Visitor&& visitor) {
     eachOf(visitor, Lines());
+  }
+
+  /// Calls `visitor(field, otherField)` for the fields of two lists of one length, neither of which
+  /// has a numbered family.
+  template <class Other, class Visitor>
+  static constexpr void eachWith(Other, Visitor&& visitor) {
+    static_assert(size == Other::size && size == lines.size() && size == Other::lines.size());
+    eachPair<Other>(visitor, Lines());
   }
 
   /// The names, and the keys, in declaration order.

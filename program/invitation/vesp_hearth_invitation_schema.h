@@ -1,0 +1,71 @@
+// SPDX-License-Identifier: Apache-2.0
+/// An invitation to join a home. The spellings of the keys are not uniform, and are exactly these.
+#pragma once
+
+#include "program/schema/values.h"
+
+#include <keelgate/describe.h>
+
+#include <keelgate/describe_begin.h>
+
+namespace VespKeelgateService {
+
+struct VespHearthInvitationRequestedCapabilitiesSchema {
+  FIELD(Double, hearthdVersion, "kHearthdVersionKey");
+  FIELD(Array<Int64>, homeSupportedFeatures, "kHearthdSupportedFeaturesKey");
+
+  CODING_KEYS(VespHearthInvitationRequestedCapabilitiesSchema);
+};
+
+struct VespHearthInviteeScheduleWeekDayRuleSchema {
+  FIELD(Optional<Int64>, startTime, "HRWeekDayScheduleRuleCodingKeyStartTime");
+  FIELD(Optional<Int64>, endTime, "HRWeekDayScheduleRuleCodingKeyEndTime");
+  FIELD(Optional<Int64>, daysOfTheWeek, "HRWeekDayScheduleRuleCodingKeyDaysOfTheWeek");
+
+  CODING_KEYS(VespHearthInviteeScheduleWeekDayRuleSchema);
+};
+
+struct VespHearthInviteeScheduleYearDayRuleSchema {
+  FIELD(Optional<Date>, startDate, "HRDStartDateKey");
+  FIELD(Optional<Date>, endDate, "HRDEndDateKey");
+
+  CODING_KEYS(VespHearthInviteeScheduleYearDayRuleSchema);
+};
+
+struct VespHearthInviteeScheduleSchema {
+  FIELD(Optional<Array<VespHearthInviteeScheduleWeekDayRuleSchema>>, weekDayRules,
+        "HRWeekDayScheduleRules");
+  FIELD(Optional<Array<VespHearthInviteeScheduleYearDayRuleSchema>>, yearDayRules,
+        "HRYearDayScheduleRules");
+
+  CODING_KEYS(VespHearthInviteeScheduleSchema);
+};
+
+struct VespHearthInvitationSchema {
+  FIELD(Optional<String>, homeName, "kHomeName");
+  FIELD(Optional<Date>, invitationExpiryDate, "kInvitationExpiryDateKey");
+  FIELD(Optional<VespHearthInvitationRequestedCapabilitiesSchema>, requestedCapabilities,
+        "kRequestedCapabilitiesKey");
+  FIELD(Optional<Bool>, suppressInviteNotification, "HRDHomeSuppressInviteNotificationKey");
+  FIELD(Optional<Int64>, inviteePrivilege, "HRHomeInviteePrivilegeCodingKey");
+  FIELD(Optional<Bool>, doesHomeHaveCameras, "HRIncomingInvitationHomeHasCamerasCodingKey");
+  FIELD(Optional<VespHearthInviteeScheduleSchema>, inviteeSchedule, "HR.RG.Schedule");
+  FIELD(Optional<UUID>, homeUUID, "kHomeUUID");
+  FIELD(Optional<Data>, controllerPublicKey, "kControllerPublicKey");
+  FIELD(Optional<String>, controllerPairingName, "kControllerPairingNameKey");
+  FIELD(Optional<UUID>, invitationIdentifier, "kInvitationIdentifierKey");
+  // Deliberate: its type is checked and it reaches no record.
+  FIELD(Optional<String>, invitationShareURL, "HRDHomeInvitationShareURLKey");
+  FIELD(Optional<Data>, invitationShareToken, "HRDHomeInvitationShareTokenKey");
+  FIELD(Optional<String>, userId, "kUserIDKey");
+  FIELD(Optional<Int64>, invitationState, "kInvitationStateKey");
+  FIELD(Optional<Int64>, presenceAuthorizationStatus, "kUserPresenceAuthorizationStatusKey");
+  FIELD(Optional<Data>, issuerPublicKeyExternalRepresentation,
+        "HRDIssuerPublicKeyExternalRepresentationKey");
+
+  CODING_KEYS(VespHearthInvitationSchema);
+};
+
+}  // namespace VespKeelgateService
+
+#include <keelgate/describe_end.h>

@@ -1,0 +1,111 @@
+// SPDX-License-Identifier: Apache-2.0
+/// From a schema to the record that agrees with it, told only what changes.
+///
+///     return construct(fieldByField<PulseUserPayload>(
+///         std::move(schema), label<&PulseUserPayload::httpHeaders> = std::move(headers)));
+///
+/// The two lists are compared at compile time, position by position: they have the same length and
+/// the same names in the same order, and a field whose type changes must be given by its label. A
+/// field that moved, went missing or was forgotten does not compile.
+#pragma once
+
+#include <keelgate/describe.h>
+
+#include <array>
+#include <concepts>
+#include <cstddef>
+#include <tuple>
+#include <utility>
+
+namespace VespKeelgateService {
+
+namespace Detail {
+
+template <auto member, class V>
+struct Labelled {
+  V value;
+};
+
+template <auto member>
+struct Label {
+  template <class V>
+  constexpr auto operator=(V&& value) const {
+    return Labelled<member, std::decay_t<V>>{std::forward<V>(value)};
+  }
+};
+
+/// The type of a field's value as a number that can be compared in a table.
+template <class V>
+constexpr const void* typeTag() {
+  return &Keelgate::Detail::typeIdentity<V>;
+}
+
+template <class S>
+constexpr auto typeTags() {
+  std::array<const void*, Keelgate::FieldsOf<S>::size> tags{};
+  std::size_t n = 0;
+  Keelgate::FieldsOf<S>::each(
+      [&](auto field) { tags[n++] = typeTag<typename decltype(field)::Value>(); });
+  return tags;
+}
+
+template <class S, class R>
+consteval bool namesAgree() {
+  return Keelgate::FieldsOf<S>::names == Keelgate::FieldsOf<R>::names;
+}
+
+template <class A, class B>
+constexpr bool isSameMember(A one, B other) {
+  if constexpr (std::same_as<A, B>) {
+    return one == other;
+  } else {
+    return false;
+  }
+}
+
+/// Whether every field whose type changes has a label.
+template <class S, class R, auto... members>
+consteval bool changesAreLabelled() {
+  std::array<bool, Keelgate::FieldsOf<R>::size> labelled{};
+  std::size_t n = 0;
+  Keelgate::FieldsOf<R>::each([&]([[maybe_unused]] auto field) {
+    labelled[n++] = (isSameMember(members, field.member) || ...);
+  });
+  const auto from = typeTags<S>();
+  const auto to = typeTags<R>();
+  for (std::size_t i = 0; i < n; ++i) {
+    if (from[i] != to[i] && !labelled[i]) return false;
+  }
+  return true;
+}
+
+}  // namespace Detail
+
+template <auto member>
+inline constexpr Detail::Label<member> label{};
+
+template <class R, class S, auto... members, class... V>
+R fieldByField(S&& schema, Detail::Labelled<members, V>... changes) {
+  static_assert(!std::is_lvalue_reference_v<S>, "fieldByField consumes its schema: move it");
+  using From = Keelgate::FieldsOf<S>;
+  using To = Keelgate::FieldsOf<R>;
+  static_assert(From::size == To::size,
+                "fieldByField: the schema and the record have different numbers of fields");
+  if constexpr (From::size == To::size) {
+    static_assert(Detail::namesAgree<S, R>(),
+                  "fieldByField: a field of the record has another name than the schema's field "
+                  "at its position");
+    static_assert(Detail::changesAreLabelled<S, R, members...>(),
+                  "fieldByField: a field changes its type on the way and has no label");
+  }
+  R record{};
+  From::eachWith(To(), [&](auto from, auto to) {
+    if constexpr (std::same_as<typename decltype(from)::Value, typename decltype(to)::Value>) {
+      record.*to.member = std::move(schema.*from.member);
+    }
+  });
+  ((record.*members = std::move(changes.value)), ...);
+  return record;
+}
+
+}  // namespace VespKeelgateService

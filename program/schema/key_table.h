@@ -1,0 +1,76 @@
+// SPDX-License-Identifier: Apache-2.0
+/// From a wire key to the position of its field, through a table made at compile time.
+///
+/// Open addressing over the schema's own keys, at most a quarter full. A message cannot add to the
+/// table: whatever keys it brings, a look-up compares with no more of them than the longest run of
+/// neighbours, which stands when the program is built.
+#pragma once
+
+#include <keelgate/describe.h>
+
+#include <array>
+#include <bit>
+#include <cstddef>
+#include <cstdint>
+#include <string_view>
+
+namespace VespKeelgateService {
+
+/// The wire keys of a schema are told apart by their length and five of their characters.
+constexpr std::uint32_t keyHash(std::string_view key) {
+  const std::size_t n = key.size();
+  if (n == 0) return 0;
+  const auto at = [&](std::size_t i) {
+    return static_cast<unsigned char>(key[i]);
+  };
+  std::uint32_t hash = static_cast<std::uint32_t>(n);
+  hash = hash * 31 + at(0);
+  hash = hash * 31 + at(n / 3);
+  hash = hash * 31 + at(n / 2);
+  hash = hash * 31 + at(n - 1 - (n > 1 ? 1 : 0));
+  hash = hash * 31 + at(n - 1);
+  return hash * 0x9e37'79b1u;
+}
+
+template <Keelgate::Schema S>
+class KeyTable {
+  static constexpr std::size_t count = S::CodingKeys::size;
+  static constexpr std::size_t capacity = std::bit_ceil(4 * count);
+  static constexpr int shift = 32 - std::countr_zero(capacity);
+  static constexpr std::uint16_t vacant = 0xffff;
+
+  static constexpr std::size_t home(std::string_view key) {
+    return shift == 32 ? 0 : keyHash(key) >> shift;
+  }
+
+  static constexpr auto slots = [] {
+    std::array<std::uint16_t, capacity> all{};
+    all.fill(vacant);
+    for (std::size_t field = 0; field < count; ++field) {
+      std::size_t at = home(S::CodingKeys::keys[field]);
+      while (all[at] != vacant) at = (at + 1) % capacity;
+      all[at] = static_cast<std::uint16_t>(field);
+    }
+    return all;
+  }();
+
+  static consteval bool keysAreDistinct() {
+    auto sorted = S::CodingKeys::keys;
+    std::sort(sorted.begin(), sorted.end());
+    return std::adjacent_find(sorted.begin(), sorted.end()) == sorted.end();
+  }
+  static_assert(keysAreDistinct(), "two fields of a schema travel under one wire key");
+
+ public:
+  static constexpr std::size_t none = vacant;
+
+  /// The position of the field that travels under this key, or `none`.
+  static constexpr std::size_t find(std::string_view key) {
+    for (std::size_t at = home(key);; at = (at + 1) % capacity) {
+      const std::uint16_t field = slots[at];
+      if (field == vacant || S::CodingKeys::keys[field] == key) return field;
+    }
+  }
+};
+
+}  // namespace VespKeelgateService

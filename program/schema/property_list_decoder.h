@@ -1,0 +1,208 @@
+// SPDX-License-Identifier: Apache-2.0
+/// Keyed decoding: from the bytes of a property list to a schema.
+///
+///     auto schema = PropertyListDecoder().decode<VespSampleMessageSchema>(from);
+///
+/// The whole document is checked before any field is read. Fields are read in declaration order and
+/// the first failure ends the decoding: what is thrown is a DecodingError (or what a schema's own
+/// decoding throws), and nothing partial escapes. A plain field is required, an Optional one may be
+/// missing or null; a value of the wrong type fails the message in both. Keys that the schema does
+/// not have are ignored.
+///
+/// A decoder is used for one message and by one thread.
+#pragma once
+
+#include "plist/document.h"
+#include "plist/expansion_budget.h"
+#include "program/schema/coding_path.h"
+#include "program/schema/decoding_errors.h"
+#include "program/schema/key_table.h"
+#include "program/schema/scalars.h"
+
+#include <keelgate/describe.h>
+
+#include <array>
+#include <concepts>
+#include <cstddef>
+#include <utility>
+#include <variant>
+
+namespace VespKeelgateService {
+
+class KeyedContainer;
+
+/// A schema that cannot be decoded field by field says how it is decoded.
+template <class S>
+concept DecodesItself = requires(const KeyedContainer& container) {
+  { S::decode(container) } -> std::same_as<S>;
+};
+
+/// What the readers of one message share.
+struct Decoding {
+  PropertyList::ExpansionBudget& budget;
+};
+
+template <class T>
+void decodeValue(Decoding& decoding, const PropertyList::Value& value, const CodingPath& path,
+                 T& into);
+
+/// A dictionary as the fields of a schema see it. Borrowed by the schemas that decode themselves.
+class KeyedContainer {
+ public:
+  KeyedContainer(Decoding& decoding, const PropertyList::Value& value, const CodingPath& path,
+                 std::string_view schema)
+      : decoding_(decoding), value_(value), path_(path) {
+    using PropertyList::Type;
+    if (value.type() != Type::dictionary) throw Errors::typeMismatch(path, schema, value.type());
+  }
+
+  /// Reads the value under a key. A search from the start: made for the few fields of a schema that
+  /// decodes itself.
+  template <class T>
+  [[nodiscard]] T decode(std::string_view key) const {
+    for (const PropertyList::Entry entry : value_.entries()) {
+      if (entry.key != key) continue;
+      T decoded{};
+      decodeValue(decoding_, entry.value, CodingPath(path_, key), decoded);
+      return decoded;
+    }
+    throw Errors::keyNotFound(path_, key);
+  }
+
+  [[nodiscard]] const PropertyList::Value& value() const { return value_; }
+  [[nodiscard]] const CodingPath& path() const { return path_; }
+
+ private:
+  Decoding& decoding_;
+  const PropertyList::Value& value_;
+  const CodingPath& path_;
+};
+
+using FoundValue = Keelgate::Optional<PropertyList::Value>;
+
+// Not inlined, so that a struct of 156 fields does not make a frame of 156 fields' temporaries:
+// payloads nest 256 deep, and a sealed worker's stack is small.
+template <class T>
+[[gnu::noinline]] void decodeField(Decoding& decoding, const FoundValue& found,
+                                   const CodingPath& outer, std::string_view key, T& into) {
+  if (!found) throw Errors::keyNotFound(outer, key);
+  decodeValue(decoding, *found, CodingPath(outer, key), into);
+}
+
+template <class T>
+[[gnu::noinline]] void decodeField(Decoding& decoding, const FoundValue& found,
+                                   const CodingPath& outer, std::string_view key,
+                                   Keelgate::Optional<T>& into) {
+  if (!found || found->type() == PropertyList::Type::null) return;
+  decodeValue(decoding, *found, CodingPath(outer, key), into.emplace());
+}
+
+/// The values of a dictionary, each at the position of its field. Kept as bare numbers: there is
+/// one of these on the stack for every nested payload.
+template <Keelgate::Schema S>
+class FieldValues {
+ public:
+  explicit FieldValues(const PropertyList::Value& dictionary) : dictionary_(dictionary) {
+    numbers_.fill(absent);
+    for (const PropertyList::Entry entry : dictionary.entries()) {
+      const std::size_t field = KeyTable<S>::find(entry.key);
+      if (field != KeyTable<S>::none) numbers_[field] = entry.value.number();
+    }
+  }
+
+  [[nodiscard]] Keelgate::Optional<PropertyList::Value> at(std::size_t field) const {
+    if (numbers_[field] == absent) return std::nullopt;
+    return dictionary_.child(numbers_[field]);
+  }
+
+ private:
+  static constexpr std::uint32_t absent = 0xffff'ffff;
+
+  const PropertyList::Value& dictionary_;
+  std::array<std::uint32_t, S::CodingKeys::size> numbers_;
+};
+
+template <Keelgate::Schema S>
+void decodeSchema(Decoding& decoding, const PropertyList::Value& value, const CodingPath& path,
+                  S& into) {
+  const KeyedContainer container(decoding, value, path, Keelgate::typeName<S>());
+  decoding.budget.spend(value, sizeof(S));
+  if constexpr (DecodesItself<S>) {
+    into = S::decode(container);
+  } else {
+    const FieldValues<S> values(value);
+    std::size_t position = 0;
+    S::CodingKeys::each([&](auto field) {
+      decodeField(decoding, values.at(position++), path, field.key, into.*field.member);
+    });
+  }
+}
+
+template <class T>
+void decodeArray(Decoding& decoding, const PropertyList::Value& value, const CodingPath& path,
+                 Keelgate::Array<T>& into) {
+  using PropertyList::Type;
+  if (value.type() != Type::array) throw Errors::typeMismatch(path, "an array", value.type());
+  decoding.budget.spend(value, value.count() * sizeof(T));
+  into.reserve(value.count());
+  for (const PropertyList::Value element : value.elements()) {
+    decodeValue(decoding, element, CodingPath(path, into.size()), into.emplace_back(T{}));
+  }
+}
+
+/// The case-keyed form of an enumeration: {case: {"_0": payload}}, and no other key beside the
+/// case.
+template <Keelgate::CaseKeyed T, std::size_t... i>
+void decodeCase(Decoding& decoding, const PropertyList::Value& value, const CodingPath& path,
+                T& into, std::index_sequence<i...>) {
+  const KeyedContainer container(decoding, value, path, Keelgate::typeName<T>());
+  decoding.budget.spend(value, sizeof(T));
+  if (value.count() != 1) throw Errors::notOneKey(path);
+  const PropertyList::Entry entry = *value.entries().begin();
+  const CodingPath inner(path, entry.key);
+  const auto decodeAs = [&]<std::size_t which>() {
+    using Payload = std::variant_alternative_t<which, typename T::variant>;
+    const KeyedContainer nested(decoding, entry.value, inner, T::caseNames[which]);
+    into.template emplace<which>(nested.template decode<Payload>("_0"));
+    return true;
+  };
+  const bool named = ((T::caseNames[i] == entry.key && decodeAs.template operator()<i>()) || ...);
+  if (!named) throw Errors::notOneKey(path);
+}
+
+template <class T>
+void decodeValue(Decoding& decoding, const PropertyList::Value& value, const CodingPath& path,
+                 T& into) {
+  if (value.type() == PropertyList::Type::null) {
+    throw Errors::valueNotFound(path, Scalars::expectation<T>());
+  }
+  if constexpr (Keelgate::CaseKeyed<T>) {
+    decodeCase(decoding, value, path, into,
+               std::make_index_sequence<std::variant_size_v<typename T::variant>>());
+  } else if constexpr (Keelgate::Schema<T>) {
+    decodeSchema(decoding, value, path, into);
+  } else if constexpr (Keelgate::isArray<T>) {
+    decodeArray(decoding, value, path, into);
+  } else {
+    Scalars::decode(decoding.budget, value, path, into);
+  }
+}
+
+class PropertyListDecoder {
+ public:
+  template <Keelgate::Schema S>
+  [[nodiscard]] S decode(Keelgate::Bytes from) {
+    try {
+      const PropertyList::Document document(from);
+      PropertyList::ExpansionBudget budget(from.size());
+      Decoding decoding{budget};
+      S schema{};
+      decodeSchema(decoding, document.top(), CodingPath(), schema);
+      return schema;
+    } catch (const PropertyList::Damage& damage) {
+      throw Errors::damaged(damage);
+    }
+  }
+};
+
+}  // namespace VespKeelgateService

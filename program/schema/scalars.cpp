@@ -1,0 +1,112 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "program/schema/scalars.h"
+
+#include <cmath>
+
+namespace VespKeelgateService::Scalars {
+
+using Keelgate::Bool;
+using Keelgate::Data;
+using Keelgate::Date;
+using Keelgate::Double;
+using Keelgate::Int64;
+using Keelgate::String;
+using Keelgate::UInt64;
+using Keelgate::UUID;
+using PropertyList::Integer;
+using PropertyList::Type;
+
+namespace {
+
+void expect(Type type, const Value& value, const CodingPath& path, std::string_view expected) {
+  if (value.type() != type) throw Errors::typeMismatch(path, expected, value.type());
+}
+
+/// The value of a hexadecimal digit, or -1.
+int digitValue(char c) {
+  if (c >= '0' && c <= '9') return c - '0';
+  if (c >= 'a' && c <= 'f') return c - 'a' + 10;
+  if (c >= 'A' && c <= 'F') return c - 'A' + 10;
+  return -1;
+}
+
+bool isDashPlace(std::size_t at) {
+  return at == 8 || at == 13 || at == 18 || at == 23;
+}
+
+}  // namespace
+
+Int64 decodeSigned(const Value& value, const CodingPath& path, std::string_view expected) {
+  expect(Type::integer, value, path, expected);
+  const Integer integer = value.integer();
+  const auto number = static_cast<Int64>(integer.bits);
+  if (!integer.negative && number < 0) throw Errors::numberDoesNotFit(path, expected);
+  return number;
+}
+
+UInt64 decodeUnsigned(const Value& value, const CodingPath& path, std::string_view expected) {
+  expect(Type::integer, value, path, expected);
+  const Integer integer = value.integer();
+  if (integer.negative) throw Errors::numberDoesNotFit(path, expected);
+  return integer.bits;
+}
+
+void decode(ExpansionBudget&, const Value& value, const CodingPath& path, Double& into) {
+  if (value.type() == Type::real) {
+    into = value.real();
+    return;
+  }
+  expect(Type::integer, value, path, "Double");
+  const Integer integer = value.integer();
+  const std::uint64_t magnitude = integer.negative ? 0 - integer.bits : integer.bits;
+  const auto rounded = static_cast<double>(magnitude);
+  // 2^64 itself is what the largest numbers round to, and is out of range for the way back.
+  constexpr double beyond = 18446744073709551616.0;
+  if (rounded >= beyond || static_cast<std::uint64_t>(rounded) != magnitude) {
+    throw Errors::numberDoesNotFit(path, "Double");
+  }
+  into = integer.negative ? -rounded : rounded;
+}
+
+void decode(ExpansionBudget&, const Value& value, const CodingPath& path, Bool& into) {
+  expect(Type::boolean, value, path, "Bool");
+  into = value.boolean();
+}
+
+void decode(ExpansionBudget& budget, const Value& value, const CodingPath& path, String& into) {
+  expect(Type::string, value, path, "String");
+  const std::string_view text = value.string();
+  budget.spend(value, text.size());
+  into = text;
+}
+
+void decode(ExpansionBudget& budget, const Value& value, const CodingPath& path, Data& into) {
+  expect(Type::data, value, path, "Data");
+  const PropertyList::Bytes bytes = value.data();
+  budget.spend(value, bytes.size());
+  into.assign(bytes.begin(), bytes.end());
+}
+
+void decode(ExpansionBudget&, const Value& value, const CodingPath& path, Date& into) {
+  expect(Type::date, value, path, "Date");
+  into.secondsSinceReferenceDate = value.date();
+}
+
+void decode(ExpansionBudget&, const Value& value, const CodingPath& path, UUID& into) {
+  expect(Type::string, value, path, "UUID");
+  const std::string_view text = value.string();
+  if (text.size() != 36) throw Errors::invalidUUID(path);
+  std::size_t digits = 0;
+  for (std::size_t at = 0; at < text.size(); ++at) {
+    if (isDashPlace(at)) {
+      if (text[at] != '-') throw Errors::invalidUUID(path);
+      continue;
+    }
+    const int digit = digitValue(text[at]);
+    if (digit < 0) throw Errors::invalidUUID(path);
+    std::uint8_t& octet = into.octets[digits++ / 2];
+    octet = static_cast<std::uint8_t>(octet << 4 | digit);
+  }
+}
+
+}  // namespace VespKeelgateService::Scalars

@@ -1,0 +1,26 @@
+// SPDX-License-Identifier: Apache-2.0
+/// The framework's value types under the program's own names, for the schema headers.
+#pragma once
+
+#include <keelgate/values.h>
+
+namespace VespKeelgateService {
+
+using Keelgate::Array;
+using Keelgate::Bool;
+using Keelgate::Bytes;
+using Keelgate::Data;
+using Keelgate::Date;
+using Keelgate::Double;
+using Keelgate::Int;
+using Keelgate::Int64;
+using Keelgate::Optional;
+using Keelgate::String;
+using Keelgate::UInt;
+using Keelgate::UInt64;
+using Keelgate::UUID;
+
+/// A dictionary as a schema that decodes itself sees it.
+class KeyedContainer;
+
+}  // namespace VespKeelgateService

@@ -1,0 +1,36 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "program/session/viso_audio_video_message_unpacker.h"
+
+#include "framework/contracts/construct.h"
+#include "program/schema/field_by_field.h"
+#include "program/schema/property_list_decoder.h"
+
+namespace VespKeelgateService {
+
+using Keelgate::construct;
+
+namespace {
+
+template <class Row>
+VespClientMessageResult unpackAs(Bytes from) {
+  auto schema = PropertyListDecoder().decode<typename Row::Schema>(from);
+  return {.result = construct(fieldByField<typename Row::Record>(std::move(schema)))};
+}
+
+template <class... Row>
+VespClientMessageResult unpackCommand(Keelgate::TypeList<Row...>, CommandType command, Bytes from) {
+  VespClientMessageResult (*unpack)(Bytes) = nullptr;
+  ((command.rawValue() == Row::command ? void(unpack = unpackAs<Row>) : void()), ...);
+  if (unpack == nullptr) throw VespClientMessageUnpackingError::unimplementedCommand(command);
+  return unpack(from);
+}
+
+}  // namespace
+
+VespClientMessageResult VisoAudioVideoMessageUnpacker::unpack(Bytes from,
+                                                              const Context& with) const {
+  return checkingCommand(
+      with, [&](CommandType command) { return unpackCommand(Commands(), command, from); });
+}
+
+}  // namespace VespKeelgateService

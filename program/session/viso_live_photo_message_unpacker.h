@@ -1,0 +1,18 @@
+// SPDX-License-Identifier: Apache-2.0
+/// The live-photo service. Its messages are answered with a marker and never decoded, so that
+/// nothing of their content crosses the sandbox's wall.
+#pragma once
+
+#include "program/service/vesp_service_unpacker.h"
+
+namespace VespKeelgateService {
+
+struct VisoLivePhotoMessageUnpacker {
+  using SchemaType = VespClientMessageResult;
+  using Context = VespClientMessageContext;
+  using Commands = Keelgate::TypeList<On<245, NoSchema, Keelgate::VespRestrictedMessage>>;
+
+  VespClientMessageResult unpack(Bytes from, const Context& with) const;
+};
+
+}  // namespace VespKeelgateService

@@ -1,0 +1,18 @@
+// SPDX-License-Identifier: Apache-2.0
+/// Safety check-ins. Every known command of the service carries the same message.
+#pragma once
+
+#include "program/service/vesp_service_unpacker.h"
+#include "program/waymark/waymark_schema.h"
+
+namespace VespKeelgateService {
+
+struct WaymarkMessageUnpacker {
+  using SchemaType = VespClientMessageResult;
+  using Context = VespClientMessageContext;
+  using Commands = Keelgate::TypeList<OnAnyCommand<WaymarkSchema, Keelgate::WaymarkMessage>>;
+
+  VespClientMessageResult unpack(Bytes from, const Context& with) const;
+};
+
+}  // namespace VespKeelgateService
