@@ -1,0 +1,65 @@
+// SPDX-License-Identifier: Apache-2.0
+// Walks all of a document into a tree, as a reader that pays for what it copies; shared by the
+// fuzz harnesses and the tests of plist/.
+#pragma once
+
+#include <string>
+
+#include "plist/document.h"
+#include "plist/expansion_budget.h"
+#include "plist/tree.h"
+
+namespace PropertyList {
+
+// Throws Damage when sharing makes the tree too large. Depth is at most 512, as Document checks.
+// UIDs become 0: they have no accessor, because no field takes one.
+inline Tree treeOf(const Value& value, ExpansionBudget& budget) {
+  budget.spend(value, sizeof(Tree));
+  switch (value.type()) {
+    case Type::null:
+      return nullptr;
+    case Type::boolean:
+      return value.boolean();
+    case Type::integer: {
+      const Integer integer = value.integer();
+      if (integer.bits >> 63 != 0 && !integer.negative) return integer.bits;
+      return static_cast<std::int64_t>(integer.bits);
+    }
+    case Type::real:
+      return value.real();
+    case Type::date:
+      return Date{value.date()};
+    case Type::string:
+      budget.spend(value, value.string().size());
+      return value.string();
+    case Type::data:
+      budget.spend(value, value.data().size());
+      return Data(value.data().begin(), value.data().end());
+    case Type::uid:
+      return Uid{0};
+    case Type::array:
+    case Type::set: {
+      Array elements;
+      for (const Value element : value.elements()) elements.push_back(treeOf(element, budget));
+      if (value.type() == Type::set) return Set{std::move(elements)};
+      return elements;
+    }
+    case Type::dictionary: {
+      Dictionary entries;
+      for (const Entry entry : value.entries()) {
+        budget.spend(value, entry.key.size() + 1);
+        entries.emplace_back(std::string(entry.key), treeOf(entry.value, budget));
+      }
+      return entries;
+    }
+  }
+  __builtin_unreachable();
+}
+
+inline Tree treeOf(Bytes message) {
+  const Document document(message);
+  ExpansionBudget budget(message.size());
+  return treeOf(document.top(), budget);
+}
+
+}  // namespace PropertyList

@@ -1,0 +1,12 @@
+// SPDX-License-Identifier: Apache-2.0
+// A view of message bytes. Whoever makes one keeps the bytes alive and unchanged.
+#pragma once
+
+#include <cstddef>
+#include <span>
+
+namespace PropertyList {
+
+using Bytes = std::span<const std::byte>;
+
+}  // namespace PropertyList

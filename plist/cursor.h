@@ -1,0 +1,103 @@
+// SPDX-License-Identifier: Apache-2.0
+// The one place where pointers move over message bytes.
+//
+// A cursor walks a window of a message and cannot leave it: every read is checked against the
+// window's end, and every amount that the message claims is compared with what remains before it
+// is added to anything, so that no claim can overflow. Binary reads throw Damage when the window
+// is too short; text reads see '\0' at the end, a character that no XML may hold.
+//
+// A value; not for use by several threads at once. The message must outlive it.
+#pragma once
+
+#include <bit>
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+#include <string_view>
+
+#include "plist/bytes.h"
+#include "plist/damage.h"
+
+namespace PropertyList {
+
+class Cursor {
+ public:
+  explicit Cursor(Bytes message) noexcept : Cursor(message, 0, message.size()) {}
+  // The window [from, to) of the message, with from <= to <= its length.
+  Cursor(Bytes message, std::size_t from, std::size_t to) noexcept
+      : begin_(message.data()), here_(begin_ + from), end_(begin_ + to) {}
+
+  // Bytes from the message's beginning.
+  std::size_t position() const noexcept { return static_cast<std::size_t>(here_ - begin_); }
+  // Bytes up to the window's end.
+  std::size_t remaining() const noexcept { return static_cast<std::size_t>(end_ - here_); }
+
+  // --- binary: each throws Damage(objectOutside) rather than leave the window ---
+
+  std::uint8_t byte() { return std::to_integer<std::uint8_t>(take(1)[0]); }
+  // The next `length` bytes, as a view into the message.
+  Bytes take(std::uint64_t length) {
+    if (length > remaining()) throw Damage(Problem::objectOutside, position());
+    const Bytes taken(here_, static_cast<std::size_t>(length));
+    here_ += length;
+    return taken;
+  }
+  // An unsigned number of 1 to 8 bytes, most significant first.
+  std::uint64_t bigEndian(std::size_t width) {
+    std::uint64_t number = 0;
+    for (const std::byte next : take(width)) {
+      number = (number << 8) | std::to_integer<std::uint64_t>(next);
+    }
+    return number;
+  }
+
+  // The number of `width` bytes (1 to 8) at `offset`. For offset tables and references, which the
+  // caller has checked and which lie before the 32-byte trailer, so that 8 bytes can be loaded at
+  // once whatever the width. Requires offset + 8 <= message.size().
+  static std::uint64_t bigEndianAt(Bytes message, std::size_t offset, std::size_t width) noexcept {
+    std::uint64_t number;
+    std::memcpy(&number, message.data() + offset, sizeof number);
+    if constexpr (std::endian::native == std::endian::little) number = __builtin_bswap64(number);
+    return number >> (64 - 8 * width);
+  }
+  // The view of `length` bytes at `offset`; both checked by the caller when the node was made.
+  static std::string_view textAt(Bytes message, std::size_t offset, std::size_t length) noexcept {
+    return {reinterpret_cast<const char*>(message.data() + offset), length};
+  }
+
+  // --- text: nothing throws ---
+
+  bool atEnd() const noexcept { return here_ == end_; }
+  // The byte so many places ahead, or '\0' beyond the end.
+  char peek(std::size_t ahead = 0) const noexcept {
+    return ahead < remaining() ? static_cast<char>(here_[ahead]) : '\0';
+  }
+  // All that is left of the window.
+  std::string_view rest() const noexcept {
+    return {reinterpret_cast<const char*>(here_), remaining()};
+  }
+  // From an earlier position of this cursor up to here.
+  std::string_view since(std::size_t start) const noexcept {
+    return {reinterpret_cast<const char*>(begin_ + start), position() - start};
+  }
+  // Moves on by at most what remains.
+  void skip(std::size_t length) noexcept { here_ += length < remaining() ? length : remaining(); }
+  // Moves past the literal if it stands here; says whether it did.
+  bool skipIf(std::string_view literal) noexcept {
+    if (!rest().starts_with(literal)) return false;
+    here_ += literal.size();
+    return true;
+  }
+  // Moves past white space as XML knows it; says whether there was any.
+  bool skipSpace() noexcept;
+  // Moves to the next byte that text gives a meaning to or forbids: '<', '&', ']', a carriage
+  // return, another control character, or any byte above 0x7F. Or to the end.
+  void skipPlain() noexcept;
+
+ private:
+  const std::byte* begin_;
+  const std::byte* here_;
+  const std::byte* end_;
+};
+
+}  // namespace PropertyList

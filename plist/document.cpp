@@ -1,0 +1,63 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "plist/document.h"
+
+#include <bit>
+#include <stdexcept>
+
+#include "plist/limits.h"
+
+namespace PropertyList {
+
+void Value::refuse() {
+  throw std::logic_error("A property-list value was asked for another type");
+}
+
+Integer Value::integer() const {
+  const Node& node = expect(Type::integer);
+  return {node.bits, node.has(Node::negative)};
+}
+
+double Value::real() const {
+  return std::bit_cast<double>(expect(Type::real).bits);
+}
+
+double Value::date() const {
+  return std::bit_cast<double>(expect(Type::date).bits);
+}
+
+std::string_view Value::string() const {
+  return store_->text(expect(Type::string));
+}
+
+Bytes Value::data() const {
+  return std::as_bytes(std::span(store_->text(expect(Type::data))));
+}
+
+std::size_t Value::count() const {
+  if (!isContainer(type())) refuse();
+  return node().count;
+}
+
+ArrayRange Value::elements() const {
+  if (type() != Type::array && type() != Type::set) refuse();
+  return {*store_, store_->firstChild(number_), node().count, shared_};
+}
+
+EntryRange Value::entries() const {
+  const std::uint32_t count = expect(Type::dictionary).count;
+  const std::size_t key = store_->firstChild(number_);
+  const std::size_t apart = store_->referenceSize == 0 ? 1 : store_->referenceSize * count;
+  return {*store_, key, key + apart, count, shared_};
+}
+
+Document::Document(Bytes message) {
+  if (message.size() > Limits::messageLength) throw Damage(Problem::messageTooLarge, 0);
+  store_.message = message;
+  if (Cursor(message).rest().starts_with("bplist")) {
+    readBinary(store_);
+  } else {
+    readXml(store_);
+  }
+}
+
+}  // namespace PropertyList

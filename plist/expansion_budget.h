@@ -1,0 +1,39 @@
+// SPDX-License-Identifier: Apache-2.0
+// The amplification guard.
+//
+// The attack: a binary property list may reference one object from many places. An array of two
+// references to an array of two references to ..., 64 levels deep, takes 300 bytes and has 2^64
+// leaves. Checking it is cheap, because every object is checked once; whoever copies what it
+// means would never end. The same works at one level with one long string and a million one-byte
+// references to it. So whoever turns values into something that takes memory spends from a budget
+// before each step, and shared values alone cost anything: what is referenced once is paid for by
+// its own bytes in the message.
+//
+// A resource of one decoding; one thread at a time.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+
+#include "plist/document.h"
+
+namespace PropertyList {
+
+class ExpansionBudget {
+ public:
+  // The allowance follows from the length of the message, in bytes; limits.h has the numbers.
+  explicit ExpansionBudget(std::size_t messageLength) noexcept;
+
+  // To be called before `bytes` of memory, at least 1, are made from the value. Free unless the
+  // value is shared. Throws Damage(Problem::excessiveExpansion) when the allowance is used up.
+  void spend(const Value& value, std::size_t bytes) {
+    if (value.isShared()) take(bytes);
+  }
+
+ private:
+  void take(std::size_t bytes);
+
+  std::uint64_t left_;
+};
+
+}  // namespace PropertyList

@@ -1,0 +1,142 @@
+// SPDX-License-Identifier: Apache-2.0
+#include <cmath>
+#include <limits>
+
+#include "plist/test_messages.h"
+#include "plist/writer.h"
+
+namespace PropertyList {
+namespace {
+
+constexpr std::int64_t lowest = std::numeric_limits<std::int64_t>::min();
+constexpr std::uint64_t highest = std::numeric_limits<std::uint64_t>::max();
+
+std::string integer(std::string_view text) {
+  return xml("<integer>" + std::string(text) + "</integer>");
+}
+std::string real(std::string_view text) {
+  return xml("<real>" + std::string(text) + "</real>");
+}
+std::string date(std::string_view text) {
+  return xml("<date>" + std::string(text) + "</date>");
+}
+
+Tree readBack(const Tree& tree) {
+  const std::string text = writeXml(tree);
+  const Tree back = treeOf(writeBinary(tree));
+  EXPECT_EQ(back, read(text));
+  return back;
+}
+
+TEST(Numbers, EveryPowerOfTwoPlusMinusOne) {
+  for (unsigned shift = 0; shift < 64; ++shift) {
+    for (const std::uint64_t offset : {highest, std::uint64_t{0}, std::uint64_t{1}}) {
+      const std::uint64_t number = (std::uint64_t{1} << shift) + offset;
+      const auto asSigned = static_cast<std::int64_t>(number);
+      EXPECT_EQ(readBack(asSigned), Tree(asSigned));
+      EXPECT_EQ(readBack(number), number >> 63 != 0 ? Tree(number) : Tree(asSigned));
+      EXPECT_EQ(readBack(-static_cast<double>(number)), Tree(-static_cast<double>(number)));
+    }
+  }
+}
+
+TEST(Numbers, BinaryIntegers) {
+  const std::string ones(8, '\xFF');
+  const std::string zeros(8, '\0');
+  const std::string top = "\x80" + std::string(7, '\0');
+  EXPECT_EQ(read(binary({"\x10\xFF"})), Tree(255));
+  EXPECT_EQ(read(binary({"\x11\xFF\xFF"})), Tree(0xFFFF));
+  EXPECT_EQ(read(binary({"\x12\xFF\xFF\xFF\xFF"})), Tree(0xFFFF'FFFFll));
+  EXPECT_EQ(read(binary({"\x13" + ones})), Tree(-1));
+  EXPECT_EQ(read(binary({"\x14" + zeros + ones})), Tree(highest));
+  EXPECT_EQ(read(binary({"\x14" + zeros + zeros})), Tree(0));
+  EXPECT_EQ(read(binary({"\x14" + ones + ones})), Tree(-1));
+  EXPECT_EQ(read(binary({"\x14" + ones + top})), Tree(lowest));
+  EXPECT_EQ(problemIn(binary({"\x14" + ones + zeros})), Problem::integerTooLarge);
+  EXPECT_EQ(problemIn(binary({"\x14" + bigEndian(1, 8) + zeros})), Problem::integerTooLarge);
+  EXPECT_EQ(problemIn(binary({"\x14" + top + ones})), Problem::integerTooLarge);
+}
+
+TEST(Numbers, XmlIntegers) {
+  const std::vector<std::pair<const char*, Tree>> sound = {
+      {"0", 0},
+      {"-0", 0},
+      {"+7", 7},
+      {"\n -007\t", -7},
+      {"0x1F", 31},
+      {"0XaB", 171},
+      {"0x0", 0},
+      {"0xFFFFFFFFFFFFFFFF", highest},
+      {"18446744073709551615", highest},
+      {"-9223372036854775808", lowest},
+      {"00000000000000000000000000000000000012", 12},
+      {"1<!-- -->2", 12},
+      {"&#49;", 1}};
+  for (const auto& [text, number] : sound) EXPECT_EQ(read(integer(text)), number) << text;
+  for (const char* text :
+       {"", " ", "+", "-", "1 2", "1.0", "1e3", "0x", "0x1G", "-0x1", "+0x1", "0x-1", "x1", "+-1",
+        "18446744073709551616", "-9223372036854775809", "0x00000000000000001", "\xD9\xA1"}) {
+    EXPECT_EQ(problemIn(integer(text)), Problem::badInteger) << text;
+  }
+}
+
+TEST(Numbers, Reals) {
+  constexpr double infinity = std::numeric_limits<double>::infinity();
+  const std::vector<std::pair<const char*, double>> sound = {
+      {"1", 1},
+      {"-1.5", -1.5},
+      {"+.5", .5},
+      {"5.", 5},
+      {" 1e3\n", 1000},
+      {"1E-2", .01},
+      {"2.5e+1", 25},
+      {"inf", infinity},
+      {"-Infinity", -infinity},
+      {"+INF", infinity},
+      {"5e-324", 5e-324},
+      {"1.7976931348623157e308", 1.7976931348623157e308},
+      {"0e999999999999", 0},
+      {"0.1", 0.1}};
+  for (const auto& [text, number] : sound) EXPECT_EQ(read(real(text)), Tree(number)) << text;
+  for (const char* text : {"nan", "NaN", "-NAN"}) {
+    EXPECT_TRUE(std::isnan(std::get<double>(read(real(text)).value))) << text;
+  }
+  EXPECT_TRUE(std::signbit(std::get<double>(read(real("-0.0")).value)));
+  for (const char* text : {"", ".", "+", "e5", "1e", "1e+", "0x1p3", "1,5", "1.2.3", "nan(1)",
+                           "infi", "1 e5", "--1", "1e309", "-1e99999", "1e-400", "1f"}) {
+    EXPECT_EQ(problemIn(real(text)), Problem::badReal) << text;
+  }
+  EXPECT_EQ(read(binary({bytes("\x22\xBF\x00\x00\x00")})), Tree(-0.5));
+}
+
+TEST(Numbers, Dates) {
+  const std::vector<std::pair<const char*, double>> sound = {
+      {"2001-01-01T00:00:00Z", 0},
+      {" 2000-12-31T23:59:59Z\n", -1},
+      {"1970-01-01T00:00:00Z", -978307200},
+      {"2000-02-29T12:00:00Z", -26481600},
+      {"0001-01-01T00:00:00Z", -63113904000},
+      {"9999-12-31T23:59:59Z", 252423993599}};
+  for (const auto& [text, seconds] : sound)
+    EXPECT_EQ(read(date(text)), Tree(Date{seconds})) << text;
+  for (const char* text :
+       {"0000-01-01T00:00:00Z", "2001-00-01T00:00:00Z", "2001-13-01T00:00:00Z",
+        "2001-01-00T00:00:00Z", "2001-02-29T00:00:00Z", "1900-02-29T00:00:00Z",
+        "2001-04-31T00:00:00Z", "2001-01-01T24:00:00Z", "2001-01-01T00:60:00Z",
+        "2001-01-01T00:00:60Z", "2001-01-01T00:00:00", "2001-01-01T00:00:00z",
+        "2001-01-01 00:00:00Z", "2001-01-01T00:00:00.5Z", "2001-01-01T00:00:00+00:00",
+        "+2001-01-01T00:00:00Z", "2001-1-01T00:00:00Z", "12001-01-01T00:00:00Z"}) {
+    EXPECT_EQ(problemIn(date(text)), Problem::badDate) << text;
+  }
+}
+
+// The writer finds the calendar date in another way than the reader finds the day.
+TEST(Numbers, DaysOfTheWholeCalendar) {
+  for (int day = -730'485; day <= 2'921'573; day += 97) {
+    const Date noon{day * 86400.0 + 43200};
+    EXPECT_EQ(read(writeXml(noon)), Tree(noon)) << day;
+  }
+}
+
+}  // namespace
+}  // namespace PropertyList

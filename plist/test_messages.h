@@ -1,0 +1,82 @@
+// SPDX-License-Identifier: Apache-2.0
+// Messages made by hand, for the tests of plist/.
+#pragma once
+
+#include <gtest/gtest.h>
+
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "fuzz/plist_walk.h"
+
+namespace PropertyList {
+
+inline Bytes bytesOf(std::string_view text) {
+  return std::as_bytes(std::span(text));
+}
+
+// A string with zero bytes in it: bytes("\x10\x00") has length 2.
+template <std::size_t N>
+std::string bytes(const char (&literal)[N]) {
+  return {literal, N - 1};
+}
+
+inline std::string bigEndian(std::uint64_t number, std::size_t width) {
+  std::string out;
+  for (std::size_t i = width; i-- > 0;) out.push_back(static_cast<char>(number >> (8 * i)));
+  return out;
+}
+
+// A binary property list with these objects as they stand, the first one on top.
+struct Raw {
+  std::vector<std::string> objects;
+  std::size_t referenceSize = 1;
+  std::size_t offsetSize = 4;
+
+  std::string message() const {
+    std::string out = "bplist00";
+    std::string table;
+    for (const std::string& object : objects) {
+      table += bigEndian(out.size(), offsetSize);
+      out += object;
+    }
+    const std::size_t tableStart = out.size();
+    return out + table + trailer(tableStart);
+  }
+  std::string trailer(std::uint64_t tableStart) const {
+    return bytes("unused") + bigEndian(offsetSize, 1) + bigEndian(referenceSize, 1) +
+           bigEndian(objects.size(), 8) + bigEndian(0, 8) + bigEndian(tableStart, 8);
+  }
+};
+
+inline std::string binary(std::vector<std::string> objects) {
+  return Raw{std::move(objects)}.message();
+}
+
+inline std::string xml(std::string_view content) {
+  return "<plist>" + std::string(content) + "</plist>";
+}
+
+// What is wrong with a message; nothing where it is read.
+inline std::optional<Problem> problemIn(std::string_view message) {
+  try {
+    const Document document(bytesOf(message));
+    return std::nullopt;
+  } catch (const Damage& damage) {
+    EXPECT_LE(damage.offset(), message.size());
+    EXPECT_EQ(damage.what(), sentence(damage.problem()));
+    return damage.problem();
+  }
+}
+
+inline std::optional<Problem> problemIn(const std::vector<std::byte>& message) {
+  return problemIn({reinterpret_cast<const char*>(message.data()), message.size()});
+}
+
+inline Tree read(std::string_view message) {
+  return treeOf(bytesOf(message));
+}
+
+}  // namespace PropertyList

@@ -1,0 +1,31 @@
+// SPDX-License-Identifier: Apache-2.0
+// How XML property lists spell scalars. No locale has a say in any of it.
+//
+// Pure functions; may be used from any thread. Each gives nothing for a misspelt text; white space
+// around numbers and dates is allowed.
+#pragma once
+
+#include <optional>
+#include <string_view>
+
+#include "plist/document.h"
+
+namespace PropertyList {
+
+// [+-]?digits, or 0x and 1 to 16 hexadecimal digits; from -2^63 to 2^64 - 1.
+std::optional<Integer> parseInteger(std::string_view text) noexcept;
+
+// Decimal or exponent form, nan, inf or infinity, with or without a sign, in any case. What a
+// double cannot hold is refused: too large, and also a number that only rounding would make zero.
+std::optional<double> parseReal(std::string_view text) noexcept;
+
+// YYYY-MM-DDTHH:MM:SSZ, years 0001 to 9999 of the Gregorian calendar carried back, no leap
+// seconds. In seconds since 2001-01-01T00:00:00Z.
+std::optional<double> parseDate(std::string_view text) noexcept;
+
+// Base64 with full padding and white space anywhere. `out` has room for 3 bytes per 4 characters,
+// and may be where the text is: no byte is written before its characters are read. Returns how
+// many bytes were written.
+std::optional<std::size_t> decodeBase64(std::string_view text, char* out) noexcept;
+
+}  // namespace PropertyList

@@ -1,0 +1,218 @@
+// SPDX-License-Identifier: Apache-2.0
+// Text, references, tags' details, comments and instructions. The prolog is in xml_prolog.cpp.
+#include "plist/xml_scanner.h"
+
+#include <algorithm>
+#include <array>
+
+#include "plist/duplicates.h"
+#include "plist/unicode.h"
+
+namespace PropertyList {
+
+void XmlScanner::miscellany() {
+  for (;;) {
+    cursor_.skipSpace();
+    if (cursor_.skipIf("<!--")) {
+      comment();
+    } else if (cursor_.skipIf("<?")) {
+      instruction();
+    } else {
+      return;
+    }
+  }
+}
+
+void XmlScanner::comment() {
+  while (!cursor_.skipIf("--")) character();
+  if (!cursor_.skipIf(">")) fail(Problem::badComment);
+}
+
+void XmlScanner::instruction() {
+  const std::string_view target = name(Problem::badInstruction);
+  const auto isLetter = [&](std::size_t at, char lower) {
+    return (target[at] | 0x20) == lower;
+  };
+  if (target.size() == 3 && isLetter(0, 'x') && isLetter(1, 'm') && isLetter(2, 'l')) {
+    fail(Problem::badInstruction);
+  }
+  if (cursor_.skipIf("?>")) return;
+  if (!cursor_.skipSpace()) fail(Problem::badInstruction);
+  while (!cursor_.skipIf("?>")) character();
+}
+
+// Passes one character of any kind and checks that XML admits it.
+char32_t XmlScanner::character() {
+  if (cursor_.atEnd()) fail(Problem::truncated);
+  const Character next = firstCharacter(cursor_.rest());
+  if (next.length == 0) fail(Problem::badUtf8);
+  if (!isXmlCharacter(next.codePoint)) fail(Problem::forbiddenCharacter);
+  cursor_.skip(next.length);
+  return next.codePoint;
+}
+
+std::string_view XmlScanner::name(Problem problem) {
+  const std::size_t start = cursor_.position();
+  while (!cursor_.atEnd()) {
+    const Character next = firstCharacter(cursor_.rest());
+    const bool isFirst = cursor_.position() == start;
+    if (next.length == 0) fail(Problem::badUtf8);
+    if (!(isFirst ? isXmlNameStart(next.codePoint) : isXmlNameCharacter(next.codePoint))) break;
+    cursor_.skip(next.length);
+  }
+  if (cursor_.position() == start) fail(cursor_.atEnd() ? Problem::truncated : problem);
+  return cursor_.since(start);
+}
+
+void XmlScanner::attributes() {
+  SmallBuffer<std::string_view, 8> names;
+  for (;;) {
+    const bool separated = cursor_.skipSpace();
+    const char next = cursor_.peek();
+    if (next == '>' || next == '/') break;
+    if (!separated) fail(cursor_.atEnd() ? Problem::truncated : Problem::badTag);
+    names.push(name(Problem::badTag));
+    cursor_.skipSpace();
+    if (!cursor_.skipIf("=")) fail(Problem::badTag);
+    cursor_.skipSpace();
+    attributeValue();
+  }
+  if (hasDuplicates(names.all())) fail(Problem::duplicateAttribute);
+}
+
+void XmlScanner::attributeValue() {
+  const char quote = cursor_.peek();
+  if (quote != '"' && quote != '\'') fail(Problem::badTag);
+  cursor_.skip(1);
+  while (cursor_.peek() != quote) {
+    if (cursor_.peek() == '<') fail(Problem::badTag);
+    if (cursor_.skipIf("&")) {
+      reference();
+    } else {
+      character();
+    }
+  }
+  cursor_.skip(1);
+}
+
+void XmlScanner::endTag(std::string_view name) {
+  if (!cursor_.skipIf("</") || !cursor_.skipIf(name)) fail(Problem::mismatchedEnd);
+  cursor_.skipSpace();
+  if (!cursor_.skipIf(">")) fail(Problem::mismatchedEnd);
+}
+
+// Past the '&'.
+char32_t XmlScanner::reference() {
+  if (cursor_.skipIf("#")) return characterReference();
+  struct Entity {
+    std::string_view name;
+    char32_t character;
+  };
+  static constexpr std::array<Entity, 5> entities = {
+      {{"lt;", '<'}, {"gt;", '>'}, {"amp;", '&'}, {"quot;", '"'}, {"apos;", '\''}}};
+  for (const Entity& entity : entities) {
+    if (cursor_.skipIf(entity.name)) return entity.character;
+  }
+  fail(Problem::badReference);
+}
+
+// Past the "&#".
+char32_t XmlScanner::characterReference() {
+  const bool isHex = cursor_.skipIf("x");
+  const char32_t base = isHex ? 16 : 10;
+  const std::size_t start = cursor_.position();
+  char32_t codePoint = 0;
+  for (; cursor_.peek() != ';'; cursor_.skip(1)) {
+    const char digit = cursor_.peek();
+    const char letter = static_cast<char>(digit | 0x20);
+    if (digit >= '0' && digit <= '9') {
+      codePoint = codePoint * base + static_cast<char32_t>(digit - '0');
+    } else if (isHex && letter >= 'a' && letter <= 'f') {
+      codePoint = codePoint * base + static_cast<char32_t>(letter - 'a' + 10);
+    } else {
+      fail(Problem::badReference);
+    }
+    if (codePoint > 0x10FFFF) fail(Problem::badReference);
+  }
+  if (cursor_.position() == start || !isXmlCharacter(codePoint)) fail(Problem::badReference);
+  cursor_.skip(1);
+  return codePoint;
+}
+
+// Passes text that means what it says, up to a '<', '&' or carriage return.
+void XmlScanner::plainText() {
+  for (;;) {
+    cursor_.skipPlain();
+    const char next = cursor_.peek();
+    if (next == '<' || next == '&' || next == '\r') return;
+    if (cursor_.rest().starts_with("]]>")) fail(Problem::strayText);
+    do {
+      character();
+    } while ((cursor_.peek() & 0x80) != 0);
+  }
+}
+
+XmlScanner::Text XmlScanner::text(std::string_view element) {
+  const std::size_t start = cursor_.position();
+  plainText();
+  if (cursor_.peek() == '<' && cursor_.peek(1) == '/') {
+    const std::size_t length = cursor_.position() - start;
+    endTag(element);
+    return {start, length, false};
+  }
+  const std::size_t side = side_.size();
+  assemble(start);
+  endTag(element);
+  return {side, side_.size() - side, true};
+}
+
+void XmlScanner::assemble(std::size_t start) {
+  append(start);
+  while (!cursor_.rest().starts_with("</")) {
+    if (cursor_.skipIf("&")) {
+      std::array<char, 4> bytes{};
+      side_.append(bytes.data(), encodeUtf8(reference(), bytes.data()));
+    } else if (cursor_.peek() == '\r') {
+      newline();
+    } else if (cursor_.skipIf("<![CDATA[")) {
+      section();
+    } else if (cursor_.skipIf("<!--")) {
+      comment();
+    } else if (cursor_.skipIf("<?")) {
+      instruction();
+    } else {
+      fail(Problem::misplacedElement);
+    }
+    const std::size_t piece = cursor_.position();
+    plainText();
+    append(piece);
+  }
+}
+
+void XmlScanner::section() {
+  std::size_t piece = cursor_.position();
+  while (!cursor_.rest().starts_with("]]>")) {
+    if (cursor_.peek() == '\r') {
+      append(piece);
+      newline();
+      piece = cursor_.position();
+    } else {
+      character();
+    }
+  }
+  append(piece);
+  cursor_.skip(3);
+}
+
+void XmlScanner::append(std::size_t start) {
+  const std::string_view piece = cursor_.since(start);
+  side_.append(piece.data(), piece.size());
+}
+
+// A carriage return, with or without a line feed, is one line end.
+void XmlScanner::newline() {
+  cursor_.skip(cursor_.peek(1) == '\n' ? 2 : 1);
+  side_.push('\n');
+}
+
+}  // namespace PropertyList

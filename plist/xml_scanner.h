@@ -1,0 +1,70 @@
+// SPDX-License-Identifier: Apache-2.0
+// The lexical layer of XML: text, references, comments, instructions, attributes and the prolog.
+//
+// Everything is checked as it is passed, also where the content is ignored: nothing in a message
+// is skipped by searching for its end. No entity is ever declared, so none can expand, and nothing
+// names a file or an address that would be fetched.
+//
+// A resource of one reading; one thread. Every function that moves throws Damage.
+#pragma once
+
+#include <cstddef>
+#include <string_view>
+
+#include "plist/cursor.h"
+#include "plist/damage.h"
+#include "plist/small_buffer.h"
+
+namespace PropertyList {
+
+class XmlScanner {
+ public:
+  // Reads the message's text; text that does not stand in the message as it is meant, because of
+  // references, CDATA or line ends, is assembled at the end of `side`.
+  XmlScanner(Bytes message, SmallBuffer<char, 512>& side) noexcept
+      : cursor_(message), side_(side) {}
+
+  Cursor& cursor() noexcept { return cursor_; }
+
+  // Byte order mark, XML declaration and document type, with what may stand around them.
+  void prolog();
+  // White space, comments and instructions, in any number.
+  void miscellany();
+  // The attributes of a start tag and white space, up to its '>' or "/>". They mean nothing here.
+  void attributes();
+  // A closing "</name>" with white space where XML allows it.
+  void endTag(std::string_view name);
+
+  // The text that stands here, up to the end tag of `element`, which is passed.
+  struct Text {
+    std::size_t offset;  // in the message or in the side buffer
+    std::size_t length;
+    bool inSide;
+  };
+  Text text(std::string_view element);
+
+  [[noreturn]] void fail(Problem problem) const { throw Damage(problem, cursor_.position()); }
+
+ private:
+  void declaration();
+  bool pseudoAttribute(std::string_view name, std::string_view& value);
+  void documentType();
+  void quoted(bool isPublic);
+  void comment();
+  void instruction();
+  std::string_view name(Problem problem);
+  void attributeValue();
+  char32_t character();
+  char32_t reference();
+  char32_t characterReference();
+  void plainText();
+  void assemble(std::size_t start);
+  void section();
+  void append(std::size_t start);
+  void newline();
+
+  Cursor cursor_;
+  SmallBuffer<char, 512>& side_;
+};
+
+}  // namespace PropertyList

@@ -1,0 +1,171 @@
+// SPDX-License-Identifier: Apache-2.0
+#include <array>
+#include <charconv>
+#include <cmath>
+#include <cstdio>
+#include <stdexcept>
+
+#include "plist/unicode.h"
+#include "plist/writer.h"
+
+namespace PropertyList {
+namespace {
+
+constexpr double secondsPerDay = 86400;
+
+void appendEscaped(std::string& out, std::string_view text) {
+  while (!text.empty()) {
+    const Character next = firstCharacter(text);
+    if (next.length == 0 || !isXmlCharacter(next.codePoint)) {
+      throw std::invalid_argument("A string holds what XML cannot");
+    }
+    switch (next.codePoint) {
+      case '<':
+        out += "&lt;";
+        break;
+      case '>':
+        out += "&gt;";
+        break;
+      case '&':
+        out += "&amp;";
+        break;
+      // A bare one would be read as a line feed.
+      case '\r':
+        out += "&#13;";
+        break;
+      default:
+        out += text.substr(0, next.length);
+    }
+    text.remove_prefix(next.length);
+  }
+}
+
+std::string base64(const Data& data) {
+  constexpr std::string_view alphabet =
+      "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";
+  std::string out;
+  for (std::size_t i = 0; i < data.size(); i += 3) {
+    const auto at = [&](std::size_t j) {
+      return j < data.size() ? std::to_integer<std::size_t>(data[j]) : 0;
+    };
+    const std::size_t group = at(i) << 16 | at(i + 1) << 8 | at(i + 2);
+    out += alphabet[group >> 18];
+    out += alphabet[group >> 12 & 63];
+    out += i + 1 < data.size() ? alphabet[group >> 6 & 63] : '=';
+    out += i + 2 < data.size() ? alphabet[group & 63] : '=';
+  }
+  return out;
+}
+
+std::string spelt(double number) {
+  if (std::isnan(number)) return "nan";
+  std::array<char, 32> text{};
+  const auto end = std::to_chars(text.data(), text.data() + text.size(), number).ptr;
+  return {text.data(), end};
+}
+
+// The calendar date so many days after 2001-01-01, found by going from years to days.
+std::string spelt(Date date) {
+  const double day = std::floor(date.seconds / secondsPerDay);
+  constexpr double firstDay = -730'485;  // 0001-01-01
+  constexpr double lastDay = 2'921'573;  // 9999-12-31
+  if (!(day >= firstDay && day <= lastDay) || date.seconds != std::floor(date.seconds)) {
+    throw std::invalid_argument("XML has no spelling for this date");
+  }
+  const auto isLeap = [](int year) {
+    return year % 4 == 0 && (year % 100 != 0 || year % 400 == 0);
+  };
+  int left = static_cast<int>(day - firstDay);
+  int year = 1 + 400 * (left / 146'097);
+  left %= 146'097;
+  for (; left >= (isLeap(year) ? 366 : 365); ++year) left -= isLeap(year) ? 366 : 365;
+  const std::array<int, 12> lengths = {
+      31, isLeap(year) ? 29 : 28, 31, 30, 31, 30, 31, 31, 30, 31, 30, 31};
+  std::size_t month = 0;
+  for (; left >= lengths[month]; ++month) left -= lengths[month];
+  const int second = static_cast<int>(date.seconds - day * secondsPerDay);
+  std::array<char, 32> text{};
+  const int length = std::snprintf(text.data(), text.size(), "%04d-%02d-%02dT%02d:%02d:%02dZ", year,
+                                   static_cast<int>(month) + 1, left + 1, second / 3600,
+                                   second / 60 % 60, second % 60);
+  return {text.data(), static_cast<std::size_t>(length)};
+}
+
+class XmlWriter {
+ public:
+  std::string write(const Tree& tree);
+
+  // One per type: scalars are written, containers opened.
+  void operator()(std::nullptr_t) { throw std::invalid_argument("XML has no null"); }
+  void operator()(Uid) { throw std::invalid_argument("XML has no UIDs"); }
+  void operator()(const Set&) { throw std::invalid_argument("XML has no sets"); }
+  void operator()(bool boolean) { line(boolean ? "<true/>" : "<false/>"); }
+  void operator()(std::int64_t number) { element("integer", std::to_string(number)); }
+  void operator()(std::uint64_t number) { element("integer", std::to_string(number)); }
+  void operator()(double number) { element("real", spelt(number)); }
+  void operator()(Date date) { element("date", spelt(date)); }
+  void operator()(const std::string& text) { element("string", text); }
+  void operator()(const Data& data) { element("data", base64(data)); }
+  void operator()(const Array& elements) { open({&elements, nullptr, 0}); }
+  void operator()(const Dictionary& entries) { open({nullptr, &entries, 0}); }
+
+ private:
+  struct Frame {
+    const Array* array;
+    const Dictionary* dictionary;
+    std::size_t next;
+  };
+
+  void line(std::string_view text);
+  void element(std::string_view name, std::string_view text);
+  void open(Frame frame);
+  void step();
+
+  std::string out_;
+  std::vector<Frame> frames_;
+};
+
+void XmlWriter::line(std::string_view text) {
+  out_.append(frames_.size(), '\t').append(text).push_back('\n');
+}
+
+void XmlWriter::element(std::string_view name, std::string_view text) {
+  out_.append(frames_.size(), '\t').append("<").append(name).append(">");
+  appendEscaped(out_, text);
+  out_.append("</").append(name).append(">\n");
+}
+
+void XmlWriter::open(Frame frame) {
+  line(frame.array != nullptr ? "<array>" : "<dict>");
+  frames_.push_back(frame);
+}
+
+void XmlWriter::step() {
+  Frame& frame = frames_.back();
+  const bool isArray = frame.array != nullptr;
+  const std::size_t count = isArray ? frame.array->size() : frame.dictionary->size();
+  if (frame.next == count) {
+    frames_.pop_back();
+    return line(isArray ? "</array>" : "</dict>");
+  }
+  const std::size_t index = frame.next++;
+  if (isArray) return std::visit(*this, (*frame.array)[index].value);
+  const auto& [key, value] = (*frame.dictionary)[index];
+  element("key", key);
+  std::visit(*this, value.value);
+}
+
+std::string XmlWriter::write(const Tree& tree) {
+  out_ = "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<plist version=\"1.0\">\n";
+  std::visit(*this, tree.value);
+  while (!frames_.empty()) step();
+  return std::move(out_ += "</plist>\n");
+}
+
+}  // namespace
+
+std::string writeXml(const Tree& tree) {
+  return XmlWriter().write(tree);
+}
+
+}  // namespace PropertyList
