@@ -49,6 +49,10 @@ class Value {
   ArrayRange elements() const;  // of an array or set, in order
   EntryRange entries() const;   // of a dictionary, in order
 
+  // A value of this container as a bare number, and back: for who keeps many of them.
+  std::uint32_t number() const noexcept { return number_; }
+  Value child(std::uint32_t number) const noexcept { return {*store_, number, shared_}; }
+
   // Whether this object, or any container on the way to it, is referenced more than once, so that
   // it may be reached more often than its bytes can justify. Never in XML.
   bool isShared() const noexcept { return shared_; }
