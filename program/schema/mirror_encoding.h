@@ -40,8 +40,7 @@ PropertyList::Tree mirror(const T& value) {
     PropertyList::Tree payload =
         std::visit([](const auto& schema) { return mirror(schema); }, value);
     PropertyList::Dictionary body{{"_0", std::move(payload)}};
-    return PropertyList::Dictionary{
-        {std::string(T::caseNames[value.index()]), std::move(body)}};
+    return PropertyList::Dictionary{{std::string(T::caseNames[value.index()]), std::move(body)}};
   } else if constexpr (Keelgate::Schema<T>) {
     PropertyList::Dictionary entries;
     T::CodingKeys::each([&](auto field) {

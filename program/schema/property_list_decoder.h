@@ -145,8 +145,9 @@ void decodeArray(Decoding& decoding, const PropertyList::Value& value, const Cod
   if (value.type() != Type::array) throw Errors::typeMismatch(path, "an array", value.type());
   decoding.budget.spend(value, value.count() * sizeof(T));
   into.reserve(value.count());
+  std::size_t index = 0;
   for (const PropertyList::Value element : value.elements()) {
-    decodeValue(decoding, element, CodingPath(path, into.size()), into.emplace_back(T{}));
+    decodeValue(decoding, element, CodingPath(path, index++), into.emplace_back(T{}));
   }
 }
 

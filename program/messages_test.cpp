@@ -1,0 +1,515 @@
+// SPDX-License-Identifier: Apache-2.0
+// What each kind of message gives, and which error, in tables. Every row runs in both encodings.
+#include "program/schema/mirror_encoding.h"
+#include "program/service/tables.h"
+#include "program/test_support.h"
+
+#include "framework/contracts/log.h"
+#include "program/schema/property_list_decoder.h"
+
+#include <gtest/gtest.h>
+
+#include <limits>
+#include <thread>
+
+namespace VespKeelgateService::Testing {
+
+namespace {
+
+using PropertyList::Array;
+using PropertyList::Dictionary;
+using PropertyList::Tree;
+
+const Target sample{"com.tessen.private.braid.rtcengine.rtctester", 1};
+const Target payload{"PulseUserPayload"};
+const Target response{"VespCommandResponse"};
+const Target tunnel{"VespCommandWebTunnelResponse"};
+const Target invitation{"VespInvitation"};
+const Target checkIn{"com.tessen.private.braid.waymark", 3};
+const char* const video = "com.tessen.private.braid.viso.video";
+const char* const audio = "com.tessen.private.braid.viso.audio";
+const char* const livePhoto = "com.tessen.private.braid.viso.lp";
+
+Tree data(std::string_view text) {
+  const auto bytes = std::as_bytes(std::span(text));
+  return PropertyList::Data(bytes.begin(), bytes.end());
+}
+
+/// Entries of the first over those of the second.
+Dictionary with(Dictionary changes, Dictionary base) {
+  for (auto& [key, value] : base) {
+    const auto same = [&](const auto& entry) {
+      return entry.first == key;
+    };
+    if (std::none_of(changes.begin(), changes.end(), same)) changes.emplace_back(key, value);
+  }
+  return changes;
+}
+
+struct Row {
+  const char* name;
+  Target target;
+  Tree message;
+  std::string expected;
+};
+
+void check(const std::vector<Row>& rows) {
+  for (const Row& row : rows) EXPECT_EQ(outcome(row.target, row.message), row.expected) << row.name;
+}
+
+const std::string sampleRecord = ".result.vespSampleMessage";
+const Dictionary sampleMessage{{"command", 7}, {"client", "a"}};
+
+TEST(Decoding, ReadsFieldsByTheirKeysAndStopsAtTheFirstFailureInDeclarationOrder) {
+  const std::string least = sampleRecord + ".command=7 " + sampleRecord + ".clientName=a";
+  check({
+      {"least", sample, sampleMessage, least},
+      {"unknown keys are ignored", sample, with({{"x", Dictionary{{"client", 1}}}}, sampleMessage),
+       least},
+      {"another order", sample, Dictionary{{"client", "a"}, {"command", 7}}, least},
+      {"the field's name is no key", sample, Dictionary{{"command", 7}, {"clientName", "a"}},
+       "keyNotFound client @"},
+      {"keys are case-sensitive", sample, Dictionary{{"Command", 7}, {"client", "a"}},
+       "keyNotFound command @"},
+      {"a mistyped optional is not dropped", sample, with({{"version", "3"}}, sampleMessage),
+       "typeMismatch @version"},
+      {"declaration order, not message order", sample,
+       Dictionary{{"version", "3"}, {"date", 1}, {"command", 7}}, "keyNotFound client @"},
+      {"the first of two mismatches", sample,
+       Dictionary{{"version", "3"}, {"date", 1}, {"command", 7}, {"client", "a"}},
+       "typeMismatch @date"},
+      {"no boolean for an integer", sample, with({{"command", true}}, sampleMessage),
+       "typeMismatch @command"},
+      {"no real for an integer", sample, with({{"command", 7.0}}, sampleMessage),
+       "typeMismatch @command"},
+      {"too large for a signed field", sample,
+       with({{"command", std::numeric_limits<std::uint64_t>::max()}}, sampleMessage),
+       "dataCorrupted @command"},
+      {"an array at the top", sample, Array{sampleMessage}, "typeMismatch @"},
+      {"a string at the top", sample, "a", "typeMismatch @"},
+      {"an empty dictionary", sample, Dictionary{}, "keyNotFound command @"},
+  });
+}
+
+TEST(Decoding, TellsNullFromAbsentAndFromValues) {
+  const auto binaryOnly = [](const Tree& tree) {
+    return outcome(sample, Keelgate::Bytes(PropertyList::writeBinary(tree)));
+  };
+  EXPECT_EQ(binaryOnly(with({{"version", nullptr}}, sampleMessage)),
+            sampleRecord + ".command=7 " + sampleRecord + ".clientName=a");
+  EXPECT_EQ(binaryOnly(with({{"client", nullptr}}, sampleMessage)), "valueNotFound @client");
+  EXPECT_EQ(binaryOnly(nullptr), "typeMismatch @");
+  EXPECT_EQ(binaryOnly(with({{"version", PropertyList::Uid{7}}}, sampleMessage)),
+            "typeMismatch @version");
+  EXPECT_EQ(outcome(payload, Keelgate::Bytes(PropertyList::writeBinary(
+                                 Dictionary{{"c", 1}, {"dul", Array{"a", nullptr}}}))),
+            "valueNotFound @dul.1");
+}
+
+TEST(Decoding, DamageIsFoundBeforeAnyFieldIsRead) {
+  for (const char* damaged :
+       {"", "bplist00", "<plist", "<plist><dict><key>command</key></dict></plist>",
+        "<plist><dict><key>x</key><integer>1e3</integer></dict></plist>"}) {
+    EXPECT_EQ(outcome(sample, std::as_bytes(std::span(std::string_view(damaged)))),
+              "dataCorrupted @")
+        << damaged;
+  }
+}
+
+TEST(Decoding, NumbersFillTheFieldsThatHoldThemExactly) {
+  const Dictionary base{{"kHearthdVersionKey", 1.5}, {"kHearthdSupportedFeaturesKey", Array{}}};
+  const auto version = [&](Tree number) {
+    const Dictionary capabilities = with({{"kHearthdVersionKey", std::move(number)}}, base);
+    return outcome(invitation,
+                   Dictionary{{"c", Dictionary{{"cS", "ht-invite-v1"},
+                                               {"cT", 1},
+                                               {"cD", Dictionary{{"kRequestedCapabilitiesKey",
+                                                                  capabilities}}}}},
+                              {"s", 1},
+                              {"uID", "u"}})
+        .starts_with(".context.schema=");
+  };
+  for (int bits = 0; bits < 64; ++bits) {
+    const std::uint64_t power = std::uint64_t{1} << bits;
+    EXPECT_TRUE(version(power)) << "2^" << bits;
+    EXPECT_EQ(version(power + 1), bits <= 53 - (bits == 53)) << "2^" << bits << " + 1";
+    EXPECT_EQ(version(power - 1), bits <= 53) << "2^" << bits << " - 1";
+  }
+  EXPECT_TRUE(version(std::numeric_limits<std::int64_t>::min()));
+  EXPECT_FALSE(version(std::numeric_limits<std::uint64_t>::max()));
+  EXPECT_FALSE(version(true));
+}
+
+TEST(Routing, FindsTheServiceAndChecksTheCommandFirst) {
+  const Tree damaged = "not a dictionary";
+  check({
+      {"letter case",
+       {"com.tessen.private.braid.viso.Video", 232},
+       damaged,
+       "unpacking 1: com.tessen.private.braid.viso.Video"},
+      {"trailing space",
+       {"com.tessen.private.braid.waymark ", 3},
+       damaged,
+       "unpacking 1: com.tessen.private.braid.waymark "},
+      {"empty", {"", 1}, damaged, "unpacking 1: "},
+      {"unknown service and command", {"x", 999}, damaged, "unpacking 1: x"},
+      {"below the calls", {video, 231}, damaged, "unpacking 0: 231"},
+      {"the gap", {video, 236}, damaged, "unpacking 0: 236"},
+      {"above the calls", {video, 239}, damaged, "unpacking 0: 239"},
+      {"a call for live photos", {livePhoto, 232}, damaged, "unpacking 0: 232"},
+      {"a live photo is never read",
+       {livePhoto, 245},
+       damaged,
+       ".result.messageTypeRestricted.messageType=1"},
+  });
+  EXPECT_EQ(outcome({livePhoto, 245}, Keelgate::Bytes()),
+            ".result.messageTypeRestricted.messageType=1");
+}
+
+TEST(Routing, AnUnknownCommandIsLoggedAndRefusedUnread) {
+  for (const char* service : {"com.tessen.private.braid.rtcengine.rtctester", video, audio,
+                              livePhoto, "com.tessen.private.braid.waymark"}) {
+    for (const std::uint64_t command :
+         {std::uint64_t{0}, std::uint64_t{999}, std::numeric_limits<std::uint64_t>::max()}) {
+      Keelgate::LogCapture log;
+      const std::string number = std::to_string(command);
+      EXPECT_EQ(outcome({service, command}, Keelgate::Bytes()),
+                "breach com.tessen.Keelgate.VespServiceUnpacker: Invalid command ID " + number);
+      EXPECT_EQ(log.lines, Keelgate::Array<String>{"Invalid command ID " + number});
+    }
+  }
+  Keelgate::LogCapture log;
+  EXPECT_EQ(outcome(sample, Keelgate::Bytes()), "dataCorrupted @");
+  EXPECT_EQ(log.lines.size(), 0u) << "a decoding error is not logged";
+}
+
+TEST(Sessions, TheCommandAloneSelectsTheSchema) {
+  const Dictionary offer{{"t", 1}, {"v", 2}, {"p", "P"}, {"d", true}, {"s", "S"}};
+  const Dictionary triple{{"v", 1}, {"s", "S"}, {"p", "P"}};
+  const std::string cancelled =
+      ".result.sessionCancel.version=1 .result.sessionCancel.sessionID=S "
+      ".result.sessionCancel.participantID=P";
+  check({
+      {"an offer sent as an accept",
+       {video, 233},
+       offer,
+       ".result.sessionAccept.version=2 .result.sessionAccept.sessionID=S "
+       ".result.sessionAccept.participantID=P"},
+      {"least cancel", {audio, 235}, triple, cancelled},
+      {"known end reason",
+       {audio, 235},
+       with({{"e", 4}}, triple),
+       cancelled + " .result.sessionCancel.remoteEndReason=4"},
+      {"unknown end reason", {audio, 235}, with({{"e", 77}}, triple), "dataCorrupted @e"},
+      {"negative end reason", {audio, 235}, with({{"e", -1}}, triple), "dataCorrupted @e"},
+      {"end reason as text", {audio, 235}, with({{"e", "4"}}, triple), "typeMismatch @e"},
+      {"decline sent as reinitiate", {video, 238}, triple, "keyNotFound ri @"},
+      {"unknown subcommand", {video, 238}, with({{"ri", 99}}, triple), "dataCorrupted @ri"},
+      {"unknown transport", {video, 232}, with({{"t", 99}}, offer), "dataCorrupted @t"},
+      {"negative version", {video, 232}, with({{"v", -1}}, offer), "dataCorrupted @v"},
+      {"an offer without d",
+       {video, 232},
+       Dictionary{{"t", 1}, {"v", 2}, {"p", "P"}, {"s", "S"}},
+       "keyNotFound d @"},
+      {"negative version of an accept",
+       {video, 233},
+       with({{"v", -1}}, triple),
+       "dataCorrupted @v"},
+      {"empty octets are not absent",
+       {video, 234},
+       with({{"c", data("")}}, triple),
+       ".result.sessionDecline.version=1 .result.sessionDecline.sessionID=S "
+       ".result.sessionDecline.participantID=P .result.sessionDecline.sessionMessageContext="},
+  });
+}
+
+TEST(Payloads, AreStrictAtEveryDepth) {
+  check({
+      {"least", payload, Dictionary{{"c", 1}}, ".command=1"},
+      {"no command", payload, Dictionary{{"v", 1}}, "keyNotFound c @"},
+      {"text where the answers have a number", payload, Dictionary{{"c", 1}, {"i", 5}},
+       "typeMismatch @i"},
+      {"gdr is no boolean", payload, Dictionary{{"c", 1}, {"gdr", true}}, "typeMismatch @gdr"},
+      {"ack is no boolean", payload, Dictionary{{"c", 1}, {"ack", true}}, "typeMismatch @ack"},
+      {"second inner payload without command", payload,
+       Dictionary{{"c", 1}, {"mml", Array{Dictionary{{"c", 1}}, Dictionary{}}}},
+       "keyNotFound c @mml.1"},
+      {"deep in the headers", payload,
+       Dictionary{{"c", 1},
+                  {"mml", Array{Dictionary{{"c", 1}},
+                                Dictionary{{"c", 1}, {"h", Dictionary{{"ri", 1}}}}}}},
+       "typeMismatch @mml.1.h.ri"},
+      {"keys differ by case", payload,
+       Dictionary{{"c", 1}, {"ri", "text"}, {"rI", data("octets")}, {"h", Dictionary{}}, {"H", 9}},
+       ".command=1 .storageFlags=9 .responseIdentifier=octets .responseIdentifierString=text "
+       ".httpHeaders={}"},
+      {"headers by their names", payload, Dictionary{{"c", 1}, {"h", Dictionary{{"traceId", "t"}}}},
+       ".command=1 .httpHeaders={}"},
+      {"negative participant", payload,
+       Dictionary{{"c", 1}, {"qal", Array{Dictionary{{"hli", -1}}}}}, "dataCorrupted @qal.0.hli"},
+      {"message number as text", response, Dictionary{{"c", 1}, {"i", "5"}}, "typeMismatch @i"},
+      {"hlss as a number", response, Dictionary{{"c", 1}, {"hlss", 1}}, "typeMismatch @hlss"},
+      {"no headers", tunnel, Dictionary{{"c", 1}}, ".command=1"},
+      {"empty headers", tunnel, Dictionary{{"c", 1}, {"h", Dictionary{}}},
+       ".command=1 .httpHeaders={}"},
+      {"beyond 64 signed bits", tunnel,
+       Dictionary{{"c", 1}, {"e", std::numeric_limits<std::uint64_t>::max()}}, "dataCorrupted @e"},
+  });
+}
+
+TEST(Payloads, NestAsDeepAsPropertyListsDo) {
+  const auto nested = [](int payloads) {
+    Tree tree = Dictionary{{"c", payloads}};
+    for (int n = payloads - 1; n > 0; --n) {
+      tree = Dictionary{{"c", n}, {n % 2 == 0 ? "mml" : "dtl", Array{std::move(tree)}}};
+    }
+    return outcome(payload, tree);
+  };
+  // Each payload but the innermost is a dictionary and an array: 511 containers.
+  EXPECT_TRUE(nested(256).ends_with(".command=256")) << nested(256).substr(0, 200);
+  EXPECT_EQ(nested(257), "dataCorrupted @");
+}
+
+TEST(Payloads, SharedOnesAreRefusedBeforeMemoryGrows) {
+  // A list of two references to the next list, thirty levels deep, would be 2^30 payloads. Nobody
+  // reads it under an unknown key, and there it is an ordinary message.
+  const auto doubling = [](const char* key) {
+    std::string objects = "bplist00";
+    std::vector<std::size_t> offsets;
+    const auto add = [&](std::string object) {
+      offsets.push_back(objects.size());
+      objects += object;
+    };
+    constexpr int levels = 30;
+    add(std::string("\x51") + "c");
+    add(std::string("\x10") + '\1');
+    add(std::string(1, static_cast<char>(0x50 + std::string_view(key).size())) + key);
+    for (int level = 0; level < levels; ++level) {
+      const auto next = static_cast<char>(offsets.size() + 1);
+      const auto after = static_cast<char>(offsets.size() + 2);
+      add(std::string("\xd2") + '\0' + '\2' + '\1' + next);
+      add(std::string("\xa2") + after + after);
+    }
+    add(std::string("\xd1") + '\0' + '\1');
+    const std::size_t table = objects.size();
+    for (const std::size_t offset : offsets) {
+      objects += {static_cast<char>(offset >> 8), static_cast<char>(offset & 0xff)};
+    }
+    std::string trailer(32, '\0');
+    trailer[6] = 2;
+    trailer[7] = 1;
+    trailer[15] = static_cast<char>(offsets.size());
+    trailer[23] = 3;
+    trailer[30] = static_cast<char>(table >> 8);
+    trailer[31] = static_cast<char>(table & 0xff);
+    objects += trailer;
+    return outcome(payload, std::as_bytes(std::span(objects)));
+  };
+  EXPECT_EQ(doubling("mml"), "dataCorrupted @");
+  EXPECT_EQ(doubling("zzz"), ".command=1");
+}
+
+TEST(Payloads, LargeOnesAreOrdinary) {
+  Dictionary large{{"c", 1}, {"P", PropertyList::Data(4u << 20, std::byte{7})}};
+  for (int i = 0; i < 10'000; ++i) large.emplace_back("unknown-" + std::to_string(i), i);
+  const std::string got = outcome(payload, large);
+  EXPECT_EQ(got.size(), std::string(".command=1 .payload=").size() + (4u << 20));
+}
+
+TEST(Invitations, FailInTheOrderOfTheirFields) {
+  const auto envelope = [](Dictionary context) {
+    return Dictionary{{"c", std::move(context)}, {"s", -5}, {"uID", "u"}};
+  };
+  const Dictionary vitals{{"cS", "1"}, {"cT", 1}, {"cD", Dictionary{{"ObjectDataKey", data("x")}}}};
+  const auto unknown = [](const std::string& schema) {
+    return "breach com.tessen.Keelgate.VespKeelgateService: Unknown invitation schema: (" + schema +
+           ")";
+  };
+  const auto kind = [&](const char* schema, Tree contents) {
+    return envelope(Dictionary{{"cS", schema}, {"cT", 1}, {"cD", std::move(contents)}});
+  };
+  const Dictionary coffer{
+      {"groupID", "g"}, {"shareURL", "u"}, {"invitationToken", data("t")}, {"inviteeHandle", "h"}};
+  const char* const cofferSchema = "com.tessen.coffersharingmessagingd";
+  const std::string token = "breach com.tessen.Keelgate.SkyvaultSharingToken: ";
+  check({
+      {"vitals", invitation, envelope(vitals),
+       ".context.schema=1 .context.contextType=1 "
+       ".context.context.dictionary.vespVitalsInvitation.untrustedData=x .state=-5 "
+       ".identifier=u"},
+      {"another context type", invitation, envelope(with({{"cT", 2}}, vitals)),
+       "dataCorrupted @c.cT"},
+      {"context type before schema", invitation, envelope(Dictionary{{"cS", "x"}, {"cT", 2}}),
+       "dataCorrupted @c.cT"},
+      {"schema before data", invitation, envelope(Dictionary{{"cS", "x"}, {"cT", 1}}),
+       unknown("x")},
+      {"near miss", invitation, kind("ht-invite-v2", Dictionary{}), unknown("ht-invite-v2")},
+      {"letter case", invitation, kind("Stride-sharing-invite", Dictionary{}),
+       unknown("Stride-sharing-invite")},
+      {"no data", invitation, envelope(Dictionary{{"cS", "1"}, {"cT", 1}}), "keyNotFound cD @c"},
+      {"context before state", invitation, Dictionary{{"c", Dictionary{}}}, "keyNotFound cS @c"},
+      {"no state", invitation, Dictionary{{"c", vitals}, {"uID", "u"}}, "keyNotFound s @"},
+      {"data of another type", invitation, kind("1", "text"), "typeMismatch @c.cD"},
+      {"text for octets", invitation, kind("1", Dictionary{{"ObjectDataKey", "x"}}),
+       "typeMismatch @c.cD.ObjectDataKey"},
+      {"stride without payload", invitation, kind("stride-sharing-invite", Dictionary{{"item", 1}}),
+       "keyNotFound payload @c.cD"},
+      {"empty sample", invitation, kind("com.tessen.Vesp.schema.invitation", Dictionary{}),
+       ".context.schema=com.tessen.Vesp.schema.invitation .context.contextType=1 "
+       ".context.context.dictionary.vespSampleInvitation={} .state=-5 .identifier=u"},
+      {"the share URL's type is checked", invitation,
+       kind("ht-invite-v1", Dictionary{{"HRDHomeInvitationShareURLKey", 1}}),
+       "typeMismatch @c.cD.HRDHomeInvitationShareURLKey"},
+      {"half of the capabilities", invitation,
+       kind("ht-invite-v1",
+            Dictionary{{"kRequestedCapabilitiesKey", Dictionary{{"kHearthdVersionKey", 1.0}}}}),
+       "keyNotFound kHearthdSupportedFeaturesKey @c.cD.kRequestedCapabilitiesKey"},
+      {"a UUID without dashes", invitation,
+       kind("ht-invite-v1", Dictionary{{"kHomeUUID", "0f8fad5bd9cb469fa16570867728950e"}}),
+       "dataCorrupted @c.cD.kHomeUUID"},
+      {"an empty home token", invitation,
+       kind("ht-invite-v1", Dictionary{{"HRDHomeInvitationShareTokenKey", data("")}}),
+       token + "Empty sharing token"},
+      {"an empty coffer token", invitation,
+       kind(cofferSchema, with({{"invitationToken", data("")}}, coffer)),
+       token + "Empty sharing token"},
+      {"an empty share URL", invitation, kind(cofferSchema, with({{"shareURL", ""}}, coffer)),
+       token + "Empty share URL"},
+      {"the display name's own name is no key", invitation,
+       kind(cofferSchema, with({{"displayName", "n"}}, coffer)),
+       ".context.schema=com.tessen.coffersharingmessagingd .context.contextType=1 "
+       ".context.context.dictionary.vespCofferSharingInvitation.groupID=g "
+       ".context.context.dictionary.vespCofferSharingInvitation.invitationToken.tokenData=t "
+       ".context.context.dictionary.vespCofferSharingInvitation.inviteeHandle=h .state=-5 "
+       ".identifier=u"},
+  });
+}
+
+TEST(Invitations, TheMirrorOfAContextIsCaseKeyedAndDoesNotComeBack) {
+  const auto mirrored = [](VespDictionaryContextClientSchema kind, const char* schema) {
+    return mirror(
+        VespInvitationSchema{.context = {.schema = schema,
+                                         .contextType = VespInvitationContextType::dictionary,
+                                         .contextData = std::move(kind)},
+                             .state = 1,
+                             .expiration = {},
+                             .identifier = "u"});
+  };
+  const Tree stride =
+      mirrored(VespStrideSharingInvitationSchema{.protobufItem = 3, .protobufPayload = {}},
+               "stride-sharing-invite");
+  const Tree form = Dictionary{
+      {"dictionaryContext",
+       Dictionary{{"_0", Dictionary{{"vespStrideSharingInvitation",
+                                     Dictionary{{"_0", Dictionary{{"item", 3},
+                                                                  {"payload", data("")}}}}}}}}}};
+  EXPECT_EQ(stride, Tree(Dictionary{
+                        {"c", Dictionary{{"cS", "stride-sharing-invite"}, {"cT", 1}, {"cD", form}}},
+                        {"s", 1},
+                        {"uID", "u"}}));
+  EXPECT_EQ(outcome(invitation, stride), "keyNotFound item @c.cD");
+  const Tree home = mirrored(VespHearthInvitationSchema{}, "ht-invite-v1");
+  EXPECT_NE(outcome(invitation, home).find("vespHearthInvitation={}"), std::string::npos);
+}
+
+TEST(Invitations, TheStandardDecodersOfTheCaseKeyedFormWantExactlyOneKey) {
+  const auto decoded = [](const Tree& tree) {
+    struct Holder {
+      static std::string decode(const Tree& from) {
+        const auto bytes = PropertyList::writeBinary(from);
+        const PropertyList::Document document(bytes);
+        PropertyList::ExpansionBudget budget(bytes.size());
+        Decoding decoding{budget};
+        VespDictionaryContextData contextData;
+        return errorOf([&] {
+          try {
+            decodeValue(decoding, document.top(), CodingPath(), contextData);
+          } catch (const Keelgate::DecodingError& error) {
+            if (error.debugDescription == "Invalid number of keys found, expected one.") {
+              throw Keelgate::Breach("not one key", std::to_string(error.codingPath.size()));
+            }
+            throw;
+          }
+        });
+      }
+    };
+    return Holder::decode(tree);
+  };
+  const auto form = [](Dictionary kind) {
+    return Dictionary{{"dictionaryContext", Dictionary{{"_0", std::move(kind)}}}};
+  };
+  const Dictionary body{{"_0", Dictionary{}}};
+  EXPECT_EQ(decoded(form({{"vespSampleInvitation", body}})), "");
+  EXPECT_EQ(decoded(Dictionary{}), "breach not one key: 0");
+  EXPECT_EQ(decoded(form({})), "breach not one key: 2");
+  EXPECT_EQ(decoded(form({{"vespSampleInvitation", body}, {"vespHearthInvitation", body}})),
+            "breach not one key: 2");
+  EXPECT_EQ(decoded(form({{"vespSampleInvitation", Dictionary{}}})),
+            "keyNotFound _0 @dictionaryContext._0.vespSampleInvitation");
+}
+
+TEST(CheckIns, FoldTheirGroupsAndTolerateUnknownCodes) {
+  const Dictionary least{{"messageType", 2},
+                         {"interfaceVersion", 1},
+                         {"sendDate", 5.5},
+                         {"messageID", "m"},
+                         {"sessionID", "s"}};
+  const auto unpacked = [&](Dictionary changes) {
+    return outcome(checkIn, with(std::move(changes), least));
+  };
+  std::string groups;
+  for (int n = 2; n <= 32; ++n) {
+    groups += " .result.waymarkMessage.groupFields[" + std::to_string(n - 2) +
+              "].groupNumber=" + std::to_string(n);
+  }
+  const std::string plain = unpacked({});
+  EXPECT_TRUE(plain.ends_with(groups)) << plain;
+  EXPECT_EQ(unpacked({{"receiverHandle1", "x"}, {"receiverHandle33", 5}, {"shareURL02", "x"}}),
+            plain);
+  EXPECT_NE(unpacked({{"messageType", 12345}}).find("messageType=0"), std::string::npos);
+  EXPECT_EQ(plain.find("triggerType"), std::string::npos) << "absent is not the default";
+  EXPECT_NE(unpacked({{"triggerType", 12345}}).find("triggerType=0"), std::string::npos);
+  EXPECT_EQ(unpacked({{"triggerType", -1}}), "dataCorrupted @triggerType");
+  EXPECT_EQ(unpacked({{"isSOSTrigger", 1}}), "typeMismatch @isSOSTrigger");
+  EXPECT_EQ(unpacked({{"latitude", "48"}}), "typeMismatch @latitude");
+}
+
+TEST(Constructors, AnyOfThemCanRefuseAndItsErrorArrivesUnchanged) {
+  const Tree full = Dictionary{{"c", 1},
+                               {"mml", Array{Dictionary{{"c", 2}}}},
+                               {"h", Dictionary{}},
+                               {"Dc", Dictionary{}},
+                               {"qplr", Array{Dictionary{}, Dictionary{}}},
+                               {"qal", Array{Dictionary{}}},
+                               {"qsatv", Array{Dictionary{}}},
+                               {"qpla", Array{Dictionary{}}}};
+  for (const char* name :
+       {"PulseUserPayload", "PulseUserPayloadHttpHeaders", "PulseUserPayloadDeliveryContext",
+        "PulseHoplinePluginRequest", "PulseHoplineAllocationStatus", "PulseHoplineSelfAllocToken",
+        "PulseHoplinePluginAllocation"}) {
+    const Refusing refusing(name);
+    EXPECT_EQ(outcome(payload, full), std::string("breach test: refused ") + name);
+  }
+  const Refusing refusing("VespSampleMessage");
+  EXPECT_EQ(outcome(sample, sampleMessage), "breach test: refused VespSampleMessage");
+}
+
+TEST(Unpackers, AreUsedFromManyThreadsAtOnce) {
+  const auto message = PropertyList::writeBinary(sampleMessage);
+  const std::string expected = outcome(sample, Keelgate::Bytes(message));
+  std::vector<std::thread> threads;
+  std::atomic<int> wrong = 0;
+  for (int i = 0; i < 8; ++i) {
+    threads.emplace_back([&] {
+      for (int n = 0; n < 200; ++n) {
+        if (outcome(sample, Keelgate::Bytes(message)) != expected) ++wrong;
+      }
+    });
+  }
+  for (std::thread& thread : threads) thread.join();
+  EXPECT_EQ(wrong, 0);
+}
+
+}  // namespace
+
+}  // namespace VespKeelgateService::Testing
