@@ -9,26 +9,36 @@ import subprocess
 import sys
 
 compiler, root = sys.argv[1:]
-source = f"{root}/tests/compile_fail/cases.cpp"
-command = [compiler, "-std=c++20", "-Wall", "-Wextra", "-Werror", "-fsyntax-only",
-           f"-I{root}", f"-I{root}/include", source]
+
+expected = {
+    1: "two fields of a schema travel under one wire key",
+    2: "a member of the schema is not in its list of fields",
+    3: "the schema and the record have different numbers of fields",
+    4: "has another name than the schema's field",
+    5: "a field changes its type on the way and has no label",
+    6: "fieldByField consumes its schema",
+    8: "does not match declaration order|out of declaration order|specified in the order",
+}
+if "clang" not in compiler:  # clang does not see it
+    expected[7] = "missing initializer for member .*two"
 
 
 def compile(case):
-    return subprocess.run(command + [f"-DCASE={case}"], capture_output=True, text=True)
+    return subprocess.run(
+        [compiler, "-std=c++20", "-Wall", "-Wextra", "-Werror", "-fsyntax-only", f"-DCASE={case}",
+         f"-I{root}", f"-I{root}/include", f"{root}/tests/compile_fail/cases.cpp"],
+        capture_output=True, text=True)
 
 
 sound = compile(0)
 if sound.returncode != 0:
     sys.exit(f"the sound case does not compile:\n{sound.stderr}")
 
-cases = [(case, message)
-         for case, which, message in re.findall(r"CASE == (\d+)  // expect( g\+\+)?: (.*)",
-                                                open(source).read())
-         if not which or "clang" not in compiler]
-failed = [case for case, message in cases
-          if (result := compile(case)).returncode == 0 or not re.search(message, result.stderr)]
-for case in failed:
-    print(f"case {case} gives another answer:\n{compile(case).stderr[:2000] or 'it compiles'}")
-print(f"{len(cases) - len(failed)} passed, {len(failed)} failed")
-sys.exit(bool(failed) or not cases)
+failed = 0
+for case, message in expected.items():
+    result = compile(case)
+    if result.returncode == 0 or not re.search(message, result.stderr):
+        failed += 1
+        print(f"case {case} gives another answer:\n{result.stderr[:2000] or 'it compiles'}")
+print(f"{len(expected) - failed} passed, {failed} failed")
+sys.exit(bool(failed))
