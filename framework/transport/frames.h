@@ -119,7 +119,7 @@ constexpr std::size_t maximumLogFrames = 8;
 constexpr std::size_t maximumLogLength = 512;
 
 /// A topic identifier has some forty characters; this bounds what a caller can make us copy.
-constexpr std::size_t maximumServiceLength = 64 * 1024;
+constexpr std::size_t maximumServiceLength = std::size_t{64} * 1024;
 
 /// The exit status of a worker whose heap did not suffice.
 constexpr int resourceExitStatus = 75;

@@ -18,7 +18,7 @@ struct NamedLayer {
 };
 
 /// Strongest first. The first `firstWalls` of them are never missing in a service that is ready.
-constexpr std::array namedLayers{
+inline constexpr std::array namedLayers{
     NamedLayer{layerStrictFilter, "strict system call filter"},
     NamedLayer{layerOneDescriptor, "one descriptor"},
     NamedLayer{layerNoNewPrivileges, "no new privileges"},

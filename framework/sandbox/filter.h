@@ -1,0 +1,44 @@
+// SPDX-License-Identifier: Apache-2.0
+/// The system call filter: a table to be read aloud, and what makes the kernel's program of it.
+///
+/// What a table does not list kills the process, and so does every call of another architecture or
+/// calling convention. Everything here is single-threaded; a compiled filter may be shared.
+#pragma once
+
+#include "framework/transport/frames.h"
+
+#include <linux/filter.h>
+#include <span>
+#include <vector>
+
+namespace Keelgate::Sandbox {
+
+enum class Verdict {
+  /// The call is made.
+  allow,
+  /// The call is made when its first argument is `number`, which the kernel reads as 32 bits.
+  allowWithFirst,
+  /// The call is not made and reports `number` as its errno; 0 stands for a result of 0.
+  refuse,
+};
+
+struct Rule {
+  int call;
+  Verdict verdict;
+  unsigned number = 0;
+};
+
+/// All that a worker can do from before it reads the first byte of a message: C1.
+std::span<const Rule> workerRules() noexcept;
+
+/// All that the zygote can do, and a worker until its own filter stands.
+std::span<const Rule> zygoteRules() noexcept;
+
+/// The kernel's program for a table.
+std::vector<sock_filter> compile(std::span<const Rule> rules);
+
+/// Puts the calling thread under a program, in addition to those that it is under, for good;
+/// no_new_privs must be set. Throws Refusal.
+void enforce(std::span<const sock_filter> program);
+
+}  // namespace Keelgate::Sandbox

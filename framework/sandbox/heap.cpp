@@ -1,0 +1,35 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "framework/sandbox/heap.h"
+
+#include "framework/sandbox/limits.h"
+#include "framework/sandbox/refusal.h"
+
+#include <malloc.h>
+#include <cstdlib>
+
+namespace Keelgate::Sandbox {
+
+bool growHeap(std::size_t bytes) noexcept {
+  // Volatile, or the compiler sees that nobody uses it.
+  void* volatile area = std::malloc(bytes);
+  const bool grown = area != nullptr;
+  std::free(area);
+  return grown;
+}
+
+void prepareHeap() {
+#ifndef KEELGATE_UNSEALED
+  mallopt(M_MMAP_MAX, 0);
+  mallopt(M_ARENA_MAX, 1);
+  // -1 is "never": a freed area stays ours, so that a freed message leaves room for the next one.
+  mallopt(M_TRIM_THRESHOLD, -1);
+  if (!growHeap(heapBase)) throw Refusal(Transport::Obstacle::heap);
+#endif
+  try {
+    throw Refusal(Transport::Obstacle::heap, 0);
+  } catch (const Refusal&) {
+    return;
+  }
+}
+
+}  // namespace Keelgate::Sandbox

@@ -1,0 +1,43 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "framework/sandbox/limits.h"
+
+#include "framework/sandbox/refusal.h"
+
+#include <algorithm>
+
+namespace Keelgate::Sandbox {
+
+namespace {
+
+void limit(__rlimit_resource resource, rlim_t soft, rlim_t hard) {
+#ifndef KEELGATE_UNSEALED
+  // Never up: the one who started the service may have set a lower one.
+  rlimit now{};
+  if (getrlimit(resource, &now) != 0) throw Refusal(Transport::Obstacle::limits);
+  const rlimit lowered{.rlim_cur = std::min(soft, now.rlim_max),
+                       .rlim_max = std::min(hard, now.rlim_max)};
+  if (setrlimit(resource, &lowered) != 0) throw Refusal(Transport::Obstacle::limits);
+#else
+  static_cast<void>(resource), static_cast<void>(soft), static_cast<void>(hard);
+#endif
+}
+
+}  // namespace
+
+void limitZygote() {
+  limit(RLIMIT_CORE, 0, 0);
+  limit(RLIMIT_FSIZE, 0, 0);
+  limit(RLIMIT_MEMLOCK, 0, 0);
+  limit(RLIMIT_MSGQUEUE, 0, 0);
+  limit(RLIMIT_STACK, stackLimit, stackLimit);
+  limit(RLIMIT_NOFILE, zygoteDescriptors, zygoteDescriptors);
+}
+
+void limitWorker(std::uint64_t cpuSeconds) {
+  limit(RLIMIT_NPROC, 0, 0);
+  limit(RLIMIT_NOFILE, Transport::serviceDescriptor + 1, Transport::serviceDescriptor + 1);
+  // The kernel takes 0 for 1. The second more lets the readable signal come first.
+  limit(RLIMIT_CPU, cpuSeconds, cpuSeconds + 1);
+}
+
+}  // namespace Keelgate::Sandbox

@@ -1,0 +1,99 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "framework/sandbox/seal.h"
+
+#include "framework/sandbox/credentials.h"
+#include "framework/sandbox/descriptors.h"
+#include "framework/sandbox/empty_root.h"
+#include "framework/sandbox/filter.h"
+#include "framework/sandbox/heap.h"
+#include "framework/sandbox/landlock.h"
+#include "framework/sandbox/limits.h"
+#include "framework/sandbox/namespaces.h"
+#include "framework/sandbox/refusal.h"
+#include "framework/sandbox/self_check.h"
+#include "framework/sandbox/spawn.h"
+
+#include <unistd.h>
+#include <new>
+
+namespace Keelgate::Sandbox {
+
+#ifdef KEELGATE_UNSEALED
+
+ZygoteSeal sealZygote(std::uint32_t) {
+  dieWithParent();
+  return {.layers = 0, .landlockAbi = 0, .workerFilter = {}};
+}
+
+void sealWorker(const WorkerSeal& seal, const std::function<std::size_t()>& heapNeeded) {
+  keepOnly(seal.channel);
+  dieWithParent();
+  if (getppid() != seal.parent) _exit(0);
+  heapNeeded();
+}
+
+#else
+
+using namespace Transport;
+
+namespace {
+
+/// In a user namespace the launcher's map decides who nobody is outside; without one, becoming
+/// nobody is what it says.
+std::uint32_t becomeNobodyIn(std::uint32_t layers) {
+  const bool nobodyNow = becomeNobody();
+  if ((layers & layerUserNamespace) == 0) return nobodyNow ? layers | layerNotRoot : layers;
+  return nobodyNow ? layers : layers & ~static_cast<std::uint32_t>(layerNotRoot);
+}
+
+}  // namespace
+
+ZygoteSeal sealZygote(std::uint32_t given) {
+  std::uint32_t layers = given;
+
+  renounceNewPrivileges();
+  layers |= layerNoNewPrivileges;
+
+  layers |= unshareNamespaces();
+  if ((layers & layerMountNamespace) != 0 && enterEmptyRoot()) layers |= layerEmptyRoot;
+
+  const std::uint32_t landlockAbi = renounceByLandlock();
+  if (landlockAbi != 0) layers |= layerLandlock;
+
+  layers = becomeNobodyIn(layers);
+  dropCapabilities();
+  layers |= layerNoCapabilities;
+  dieWithParent();
+
+  // After the launcher has written the maps: those of an undumpable process it could not open.
+  becomeUndumpable();
+  layers |= layerNotDumpable;
+
+  limitZygote();
+  layers |= layerLimits;
+
+  prepareHeap();
+  ZygoteSeal seal{
+      .layers = layers, .landlockAbi = landlockAbi, .workerFilter = compile(workerRules())};
+
+  enforce(compile(zygoteRules()));
+  proveFilter(seal.workerFilter);
+  seal.layers |= layerStrictFilter | layerOneDescriptor;
+  return seal;
+}
+
+void sealWorker(const WorkerSeal& seal, const std::function<std::size_t()>& heapNeeded) {
+  keepOnly(seal.channel);
+  dieWithParent();
+  // It may have died before the line above.
+  if (getppid() != seal.parent) _exit(0);
+  limitWorker(seal.cpuSeconds);
+
+  const std::size_t bytes = heapNeeded();
+  if (!growHeap(bytes)) throw std::bad_alloc();
+  enforce(seal.filter);
+}
+
+#endif
+
+}  // namespace Keelgate::Sandbox

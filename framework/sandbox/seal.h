@@ -1,0 +1,46 @@
+// SPDX-License-Identifier: Apache-2.0
+/// The seal, in two functions: one for the process that forks workers, one for each worker.
+///
+/// What only the zygote can pay for is done once: namespaces, the empty root, Landlock,
+/// credentials. What must differ from worker to worker is done by each: its descriptor, its limits,
+/// its heap, its filter. A build for a sanitizer has no seal and reports no layers.
+///
+/// Both are for single-threaded processes and throw Refusal.
+#pragma once
+
+#include <linux/filter.h>
+#include <sys/types.h>
+#include <cstdint>
+#include <functional>
+#include <vector>
+
+namespace Keelgate::Sandbox {
+
+/// What sealZygote achieved, and what it prepared for the workers.
+struct ZygoteSeal {
+  /// Transport::Layer.
+  std::uint32_t layers;
+  std::uint32_t landlockAbi;
+  std::vector<sock_filter> workerFilter;
+};
+
+/// Seals the zygote, which can open nothing afterwards. `given` are the layers that the launcher
+/// gave it.
+ZygoteSeal sealZygote(std::uint32_t given);
+
+/// What a worker's seal is made of.
+struct WorkerSeal {
+  /// The channel to its client, whatever its number.
+  int channel;
+  /// The zygote as the worker sees it.
+  pid_t parent;
+  std::uint64_t cpuSeconds;
+  const std::vector<sock_filter>& filter;
+};
+
+/// Seals a worker. `heapNeeded` is called when everything is done that does not depend on the
+/// message; it reads the header, which the trusted client wrote, and returns how many bytes of heap
+/// the message is worth. Nothing that a stranger wrote has been read when this returns.
+void sealWorker(const WorkerSeal& seal, const std::function<std::size_t()>& heapNeeded);
+
+}  // namespace Keelgate::Sandbox

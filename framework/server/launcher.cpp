@@ -1,0 +1,127 @@
+// SPDX-License-Identifier: Apache-2.0
+/// Where the program hands over for good. The launcher makes the zygote and outlives it by nothing:
+/// it exists because somebody outside has to write the maps of a user namespace, and because the
+/// client needs a child of its own to watch and to kill.
+#include "framework/sandbox/credentials.h"
+#include "framework/sandbox/descriptors.h"
+#include "framework/sandbox/namespaces.h"
+#include "framework/sandbox/refusal.h"
+#include "framework/sandbox/spawn.h"
+#include "framework/server/channel.h"
+#include "framework/server/zygote.h"
+
+#include <sys/socket.h>
+#include <sys/wait.h>
+#include <unistd.h>
+#include <csignal>
+#include <cstdio>
+
+namespace Keelgate {
+
+namespace {
+
+using Sandbox::Refusal;
+using Transport::Obstacle;
+
+/// The one who starts us may ignore or block signals, and both are inherited: with SIGCHLD ignored
+/// no child could be waited for.
+void resetSignals() {
+  for (int number = 1; number < NSIG; ++number) std::signal(number, SIG_DFL);
+  sigset_t none;
+  sigemptyset(&none);
+  sigprocmask(SIG_SETMASK, &none, nullptr);
+}
+
+bool startedByClient() {
+  int type = 0;
+  socklen_t size = sizeof type;
+  return getsockopt(Transport::serviceDescriptor, SOL_SOCKET, SO_TYPE, &type, &size) == 0 &&
+         type == SOCK_SEQPACKET;
+}
+
+[[noreturn]] void refuse(const Refusal& why) {
+  sendControl({.magic = {},
+               .version = {},
+               .kind = Transport::ControlKind::refused,
+               .slot = 0,
+               .reserved = 0,
+               .numbers = {static_cast<std::uint64_t>(why.obstacle()),
+                           static_cast<std::uint64_t>(why.error()), 0, 0}});
+  _exit(Transport::refusedExitStatus);
+}
+
+/// A pipe of which the launcher holds the one end as long as it lives, and the zygote the other.
+struct Tether {
+  int zygoteEnd;
+  int launcherEnd;
+};
+
+Tether makeTether() {
+  int ends[2];
+  if (pipe(ends) != 0) throw Refusal(Obstacle::process);
+  return {.zygoteEnd = ends[0], .launcherEnd = ends[1]};
+}
+
+[[noreturn]] void beZygote(const KeelgateServer& server, const Tether& tether) try {
+  close(tether.launcherEnd);
+  Sandbox::dieWithParent();
+  std::uint32_t layers = 0;
+  // Nothing to read: the launcher died.
+  if (read(tether.zygoteEnd, &layers, sizeof layers) != sizeof layers) _exit(0);
+  Zygote(server, tether.zygoteEnd, layers).serve();
+  // Its workers go with it.
+  _exit(0);
+} catch (const Refusal& why) {
+  refuse(why);
+}
+
+/// What a child has without having done anything yet.
+std::uint32_t giveLayers(const Sandbox::Birth& birth, bool groupsLeft) {
+  std::uint32_t layers = birth.newUserNamespace ? Sandbox::mapIdentifiers(birth.child) : 0;
+  const bool root = geteuid() == 0 || getegid() == 0;
+  if ((layers & Transport::layerUserNamespace) == 0 && !root) layers |= Transport::layerNotRoot;
+  if (birth.newPidNamespace) layers |= Transport::layerPidNamespace;
+  if (groupsLeft) layers |= Transport::layerNoSupplementaryGroups;
+  return layers;
+}
+
+/// Ends as the zygote ended; 128 and the signal's number as a shell has it.
+[[noreturn]] void outlive(pid_t zygote) {
+  int status = 0;
+  while (waitpid(zygote, &status, 0) < 0 && errno == EINTR) continue;
+  _exit(WIFSIGNALED(status) ? 128 + WTERMSIG(status) : WEXITSTATUS(status));
+}
+
+[[noreturn]] void launch(const KeelgateServer& server) try {
+  resetSignals();
+  Sandbox::keepOnly(Transport::serviceDescriptor);
+  const bool groupsLeft = Sandbox::leaveGroups();
+  const Tether tether = makeTether();
+  const Sandbox::Birth birth = Sandbox::forkIntoNamespaces();
+  if (birth.child == 0) beZygote(server, tether);
+  close(tether.zygoteEnd);
+  const std::uint32_t layers = giveLayers(birth, groupsLeft);
+  const bool told = write(tether.launcherEnd, &layers, sizeof layers) == sizeof layers;
+  // The zygote's alone from now on, so that its end is the channel's end.
+  close(Transport::serviceDescriptor);
+  if (!told) _exit(Transport::refusedExitStatus);
+  outlive(birth.child);
+} catch (const Refusal& why) {
+  refuse(why);
+}
+
+}  // namespace
+
+void KeelgateServer::resume(Optional<SandboxID> sandboxID) {
+  if (!sandboxID) return;
+  if (!startedByClient()) {
+    std::fputs(
+        "VespKeelgateService is started by its client, with a channel as descriptor 3; "
+        "run keelgate instead.\n",
+        stderr);
+    _exit(Transport::refusedExitStatus);
+  }
+  launch(*this);
+}
+
+}  // namespace Keelgate

@@ -1,0 +1,28 @@
+// SPDX-License-Identifier: Apache-2.0
+/// The worker: the process that reads a stranger's message. It is thrown away afterwards.
+#pragma once
+
+#include "framework/server/keelgate_server.h"
+
+#include <linux/filter.h>
+#include <sys/types.h>
+#include <cstdint>
+#include <vector>
+
+namespace Keelgate {
+
+/// What every worker of a zygote is told: the client's hello, and the zygote's own part.
+struct WorkerOptions {
+  /// Bytes.
+  std::uint64_t largestMessage;
+  std::uint64_t messages;
+  std::uint64_t cpuSeconds;
+  pid_t parent;
+  std::vector<sock_filter> filter;
+};
+
+/// Seals the process, answers as many messages as it may on `channel`, and exits. Called in a fresh
+/// fork of the zygote.
+[[noreturn]] void work(const KeelgateServer& server, const WorkerOptions& options, int channel);
+
+}  // namespace Keelgate

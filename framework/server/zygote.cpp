@@ -1,0 +1,140 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "framework/server/zygote.h"
+
+#include "framework/sandbox/refusal.h"
+#include "framework/sandbox/seal.h"
+#include "framework/sandbox/spawn.h"
+#include "framework/server/channel.h"
+
+#include <poll.h>
+#include <sys/resource.h>
+#include <sys/signalfd.h>
+#include <sys/wait.h>
+#include <unistd.h>
+#include <algorithm>
+#include <csignal>
+
+namespace Keelgate {
+
+using Sandbox::Refusal;
+using Transport::ControlFrame;
+using Transport::ControlKind;
+using Transport::Obstacle;
+
+namespace {
+
+/// Child deaths as something to poll for. Level-triggered: one read takes any number of them.
+int openDeathSignals() {
+  sigset_t deaths;
+  sigemptyset(&deaths);
+  sigaddset(&deaths, SIGCHLD);
+  if (sigprocmask(SIG_BLOCK, &deaths, nullptr) != 0) throw Refusal(Obstacle::process);
+  const int signals = signalfd(-1, &deaths, SFD_CLOEXEC);
+  if (signals < 0) throw Refusal(Obstacle::process);
+  return signals;
+}
+
+ControlFrame exitFrame(std::uint32_t slot, int status, const rusage& used) {
+  const auto microseconds = [](const timeval& time) {
+    return static_cast<std::uint64_t>(time.tv_sec) * 1'000'000 +
+           static_cast<std::uint64_t>(time.tv_usec);
+  };
+  return {.magic = {},
+          .version = {},
+          .kind = ControlKind::exit,
+          .slot = slot,
+          .reserved = 0,
+          .numbers = {static_cast<std::uint64_t>(status),
+                      static_cast<std::uint64_t>(used.ru_maxrss) * 1024,
+                      microseconds(used.ru_utime) + microseconds(used.ru_stime), 0}};
+}
+
+}  // namespace
+
+void Zygote::serve() {
+  const int deaths = openDeathSignals();
+  options_.parent = getpid();
+  Sandbox::ZygoteSeal seal = Sandbox::sealZygote(given_);
+  options_.filter = std::move(seal.workerFilter);
+  greet(seal.layers, seal.landlockAbi);
+  pollfd channels[]{{.fd = Transport::serviceDescriptor, .events = POLLIN, .revents = 0},
+                    {.fd = deaths, .events = POLLIN, .revents = 0},
+                    {.fd = tether_, .events = 0, .revents = 0}};
+  for (;;) {
+    // ppoll and not poll: the kernel takes it up again after a stop without a call of its own.
+    if (ppoll(channels, std::size(channels), nullptr, nullptr) < 0) continue;
+    if (channels[2].revents != 0) return;
+    // First what a request waits for.
+    if (channels[0].revents != 0 && !takeFrame()) return;
+    if (channels[1].revents == 0) continue;
+    signalfd_siginfo death;
+    if (read(deaths, &death, sizeof death) > 0) reap();
+  }
+}
+
+void Zygote::greet(std::uint32_t layers, std::uint32_t landlockAbi) {
+  const Optional<ReceivedControl> hello = receiveControl();
+  if (!hello) _exit(0);
+  if (hello->frame.kind != ControlKind::hello) throw Refusal(Obstacle::badFrame, 0);
+  options_.largestMessage = hello->frame.numbers[0];
+  options_.messages = hello->frame.numbers[1];
+  options_.cpuSeconds = hello->frame.numbers[2];
+  sendControl({.magic = {},
+               .version = {},
+               .kind = ControlKind::ready,
+               .slot = 0,
+               .reserved = 0,
+               .numbers = {layers, landlockAbi, 0, 0}});
+}
+
+bool Zygote::takeFrame() {
+  const Optional<ReceivedControl> received = receiveControl();
+  if (!received) return false;
+  switch (received->frame.kind) {
+    case ControlKind::fork:
+      fork(received->frame.slot, received->descriptor);
+      return true;
+    case ControlKind::kill:
+      kill(received->frame.slot);
+      return true;
+    default:
+      throw Refusal(Obstacle::badFrame, 0);
+  }
+}
+
+void Zygote::fork(std::uint32_t slot, int channel) {
+  const bool taken = std::any_of(children_.begin(), children_.end(),
+                                 [slot](const Child& child) { return child.slot == slot; });
+  if (taken) throw Refusal(Obstacle::badFrame, 0);
+  const pid_t process = Sandbox::forkSelf(0);
+  if (process == 0) work(server_, options_, channel);
+  close(channel);
+  if (process > 0) {
+    children_.push_back({.slot = slot, .process = process});
+  } else {
+    sendControl(exitFrame(slot, W_EXITCODE(Transport::resourceExitStatus, 0), rusage{}));
+  }
+}
+
+void Zygote::kill(std::uint32_t slot) const {
+  for (const Child& child : children_) {
+    // Not reaped yet, so the number is still this child's.
+    if (child.slot == slot) ::kill(child.process, SIGKILL);
+  }
+}
+
+void Zygote::reap() {
+  int status = 0;
+  rusage used{};
+  for (;;) {
+    const pid_t process = wait4(-1, &status, WNOHANG, &used);
+    if (process <= 0) return;
+    const auto child = std::find_if(children_.begin(), children_.end(),
+                                    [process](const Child& c) { return c.process == process; });
+    if (child == children_.end()) continue;
+    sendControl(exitFrame(child->slot, status, used));
+    children_.erase(child);
+  }
+}
+
+}  // namespace Keelgate

@@ -1,0 +1,47 @@
+// SPDX-License-Identifier: Apache-2.0
+/// The zygote: sealed once, it forks a worker for each request of its client and never reads a
+/// message itself, so that it stays worth forking.
+#pragma once
+
+#include "framework/server/keelgate_server.h"
+#include "framework/server/worker.h"
+
+#include <sys/types.h>
+#include <cstdint>
+#include <vector>
+
+namespace Keelgate {
+
+class Zygote {
+ public:
+  /// `tether` hangs up when the launcher dies. `given` are the layers (Transport::Layer) that the
+  /// launcher gave this process.
+  Zygote(const KeelgateServer& server, int tether, std::uint32_t given)
+      : server_(server), tether_(tether), given_(given) {}
+
+  /// Seals this process, says that it is ready, and serves until the client or the launcher goes.
+  /// Throws Sandbox::Refusal when the seal is incomplete or the client breaks the protocol. Only
+  /// for a process with one thread.
+  void serve();
+
+ private:
+  struct Child {
+    std::uint32_t slot;
+    pid_t process;
+  };
+
+  void greet(std::uint32_t layers, std::uint32_t landlockAbi);
+  /// False when the client has gone.
+  bool takeFrame();
+  void fork(std::uint32_t slot, int channel);
+  void kill(std::uint32_t slot) const;
+  void reap();
+
+  const KeelgateServer& server_;
+  int tether_;
+  std::uint32_t given_;
+  WorkerOptions options_{};
+  std::vector<Child> children_;
+};
+
+}  // namespace Keelgate

@@ -1,0 +1,143 @@
+// SPDX-License-Identifier: Apache-2.0
+/// Stands for a service whose parser was taken over: the same resume(), and one unpacker that does
+/// what its message says. Never shipped; a link check watches over that.
+///
+/// A message is a line of words:
+///
+///     call N [A...]    system call N with up to six arguments; its result is the answer's
+///     messageId int80 N          the same by the old 32-bit gate vsyscall N       slot N of the
+///     vsyscall page say HEX          writes these bytes to the channel, and answers afterwards
+///     drip HEX         the same, one byte a second
+///     eat BYTES        takes and touches that much memory in pieces of 64 KiB, and keeps it
+///     fault | trap | abort | recurse | spin | throw | execute
+///     answer           behaves
+#include "framework/contracts/process.h"
+#include "framework/server/keelgate_server.h"
+
+#include <unistd.h>
+#include <x86intrin.h>
+#include <charconv>
+#include <cstdlib>
+#include <cstring>
+#include <memory>
+#include <sstream>
+#include <vector>
+
+namespace {
+
+using namespace Keelgate;
+
+long callByGate(long number) {
+  long result = number;
+  asm volatile("int $0x80"
+               : "+a"(result)
+               : "b"(3), "c"(0), "d"(0)
+               : "memory", "r8", "r9", "r10", "r11");
+  return result;
+}
+
+long callVsyscall(long slot) {
+  using Function = long (*)(long, long);
+  return reinterpret_cast<Function>(0xffff'ffff'ff60'0000 + static_cast<std::size_t>(slot) * 1024)(
+      0, 0);
+}
+
+long call(const std::vector<long>& numbers) {
+  long a[7]{};
+  std::copy(numbers.begin(), numbers.end(), std::begin(a));
+  long result = a[0];
+  register long r10 asm("r10") = a[4];
+  register long r8 asm("r8") = a[5];
+  register long r9 asm("r9") = a[6];
+  asm volatile("syscall"
+               : "+a"(result)
+               : "D"(a[1]), "S"(a[2]), "d"(a[3]), "r"(r10), "r"(r8), "r"(r9)
+               : "memory", "rcx", "r11");
+  return result;
+}
+
+/// A sealed process cannot sleep; a second is long enough if it is one on a slow machine.
+void passSecond() {
+  const std::uint64_t start = __rdtsc();
+  while (__rdtsc() - start < 3'000'000'000) _mm_pause();
+}
+
+void say(const std::string& hex, bool slowly) {
+  for (std::size_t at = 0; at + 1 < hex.size(); at += 2) {
+    unsigned char byte = 0;
+    std::from_chars(hex.data() + at, hex.data() + at + 2, byte, 16);
+    if (write(Transport::serviceDescriptor, &byte, 1) != 1) return;
+    if (slowly) passSecond();
+  }
+}
+
+void eat(std::size_t bytes) {
+  constexpr std::size_t piece = 65536;
+  // Never freed: it is held until the process ends.
+  for (std::size_t eaten = 0; eaten < bytes; eaten += piece) {
+    std::memset(new std::byte[piece], 1, piece);
+  }  // NOLINT(clang-analyzer-cplusplus.NewDeleteLeaks)
+}
+
+/// Calls itself until the stack ends; no message has this many levels.
+// NOLINTNEXTLINE(misc-no-recursion)
+long recurse(long levels) {
+  volatile char here[4096];
+  here[0] = static_cast<char>(levels);
+  return levels == 0 ? 0 : recurse(levels - 1) + here[0];
+}
+
+void misbehave(const std::string& how) {
+  if (how == "fault") *reinterpret_cast<volatile int*>(8) = 1;
+  if (how == "trap") __builtin_trap();
+  if (how == "abort") std::abort();
+  if (how == "recurse") recurse(1'000'000);
+  if (how == "throw") throw 1;
+  while (how == "spin") _mm_pause();
+  if (how == "execute") {
+    unsigned char code[] = {0xc3};
+    reinterpret_cast<void (*)()>(reinterpret_cast<std::size_t>(code))();
+  }
+}
+
+long obey(const std::string& order) {
+  std::istringstream words(order);
+  std::string verb;
+  words >> verb;
+  if (verb == "say" || verb == "drip") {
+    std::string hex;
+    words >> hex;
+    say(hex, verb == "drip");
+    return 0;
+  }
+  std::vector<long> numbers;
+  for (long number; numbers.size() < 7 && words >> number;) numbers.push_back(number);
+  if (verb == "call") return call(numbers);
+  if (verb == "int80") return callByGate(numbers.at(0));
+  if (verb == "vsyscall") return callVsyscall(numbers.at(0));
+  if (verb == "eat") eat(static_cast<std::size_t>(numbers.at(0)));
+  misbehave(verb);
+  return 0;
+}
+
+struct ObedientUnpacker {
+  using SchemaType = VespCommandResponse;
+  // NOLINTNEXTLINE(readability-convert-member-functions-to-static)
+  [[nodiscard]] VespCommandResponse unpack(Bytes from) const {
+    VespCommandResponse answer{};
+    answer.messageId = obey({reinterpret_cast<const char*>(from.data()), from.size()});
+    return answer;
+  }
+};
+
+}  // namespace
+
+int main() {
+  // The first stream makes a futex call, as the first exception does.
+  const std::istringstream first;
+  register_for_dlsym_callbacks();
+  KeelgateServer& server = KeelgateServer::service();
+  server.registerUnpacker<VespCommandResponse>(ObedientUnpacker());
+  server.resume(SandboxID::keelgate);
+  return 0;
+}

@@ -1,0 +1,87 @@
+// SPDX-License-Identifier: Apache-2.0
+/// Drives a service by hand, frame by frame, so that tests see what a client would hide.
+///
+/// For one thread.
+#pragma once
+
+#include "framework/transport/frames.h"
+
+#include <keelgate/values.h>
+#include <sys/types.h>
+#include <functional>
+#include <map>
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace Keelgate::Test {
+
+/// The end of a worker, as its exit frame has it.
+struct WorkerEnd {
+  int status;
+  std::uint64_t peakBytes;
+  std::uint64_t cpuMicroseconds;
+
+  [[nodiscard]] int signal() const;
+  /// -1 when a signal ended it.
+  [[nodiscard]] int exitStatus() const;
+};
+
+/// The frames of a reply, up to the end of the channel.
+struct RawReply {
+  std::vector<std::string> log;
+  Optional<Transport::ReplyKind> kind;
+  Data body;
+};
+
+struct RawOptions {
+  std::uint64_t largestMessage = 64 << 20;
+  std::uint64_t messages = 1;
+  std::uint64_t cpuSeconds = 5;
+  /// Runs in the service's process before it is executed, to take something from it.
+  std::function<void()> before;
+};
+
+class RawClient {
+ public:
+  /// Starts the service and greets it; ready() or obstacle() tells the outcome.
+  explicit RawClient(const std::string& path, const RawOptions& options = {});
+  ~RawClient();
+  RawClient(const RawClient&) = delete;
+  RawClient& operator=(const RawClient&) = delete;
+
+  [[nodiscard]] bool ready() const { return first_.kind == Transport::ControlKind::ready; }
+  [[nodiscard]] std::uint64_t layers() const { return first_.numbers[0]; }
+  [[nodiscard]] std::string refusal() const;
+  [[nodiscard]] pid_t launcher() const { return launcher_; }
+  [[nodiscard]] pid_t zygote() const;
+  /// The living workers, as this process sees them.
+  [[nodiscard]] std::vector<pid_t> workers() const;
+
+  /// Asks for a worker; returns the channel to it, which is the caller's to close.
+  int fork(std::uint32_t slot);
+  void kill(std::uint32_t slot);
+  /// Waits for the end of a slot's worker.
+  WorkerEnd end(std::uint32_t slot);
+  /// One order for a fresh worker: the reply, and how the worker ended.
+  std::pair<RawReply, WorkerEnd> obey(std::string_view order);
+
+ private:
+  void sendFrame(Transport::ControlKind kind, std::uint32_t slot,
+                 std::vector<std::uint64_t> numbers, int descriptor = -1);
+  Transport::ControlFrame receiveFrame();
+
+  pid_t launcher_ = -1;
+  int control_ = -1;
+  Transport::ControlFrame first_{};
+  std::map<std::uint32_t, WorkerEnd> ended_;
+};
+
+/// Sends an order as a request for the record that the obedient service answers.
+void sendOrder(int channel, std::string_view order, std::uint32_t sequence = 0);
+/// Reads frames until an answer or the end of the channel.
+RawReply receiveReply(int channel);
+/// The messageId of the answer, which is what a call gave back.
+Optional<Int64> resultOf(const RawReply& reply);
+
+}  // namespace Keelgate::Test
