@@ -78,23 +78,20 @@ class KeyedContainer {
   const CodingPath& path_;
 };
 
-using FoundValue = Keelgate::Optional<PropertyList::Value>;
-
 // Not inlined, so that a struct of 156 fields does not make a frame of 156 fields' temporaries:
 // payloads nest 256 deep, and a sealed worker's stack is small.
 template <class T>
-[[gnu::noinline]] void decodeField(Decoding& decoding, const FoundValue& found,
+[[gnu::noinline]] void decodeField(Decoding& decoding, const PropertyList::Value& value,
                                    const CodingPath& outer, std::string_view key, T& into) {
-  if (!found) throw Errors::keyNotFound(outer, key);
-  decodeValue(decoding, *found, CodingPath(outer, key), into);
+  decodeValue(decoding, value, CodingPath(outer, key), into);
 }
 
 template <class T>
-[[gnu::noinline]] void decodeField(Decoding& decoding, const FoundValue& found,
+[[gnu::noinline]] void decodeField(Decoding& decoding, const PropertyList::Value& value,
                                    const CodingPath& outer, std::string_view key,
                                    Keelgate::Optional<T>& into) {
-  if (!found || found->type() == PropertyList::Type::null) return;
-  decodeValue(decoding, *found, CodingPath(outer, key), into.emplace());
+  if (value.type() == PropertyList::Type::null) return;
+  decodeValue(decoding, value, CodingPath(outer, key), into.emplace());
 }
 
 /// The values of a dictionary, each at the position of its field. Kept as bare numbers: there is
@@ -110,8 +107,8 @@ class FieldValues {
     }
   }
 
-  [[nodiscard]] Keelgate::Optional<PropertyList::Value> at(std::size_t field) const {
-    if (numbers_[field] == absent) return std::nullopt;
+  [[nodiscard]] bool has(std::size_t field) const { return numbers_[field] != absent; }
+  [[nodiscard]] PropertyList::Value at(std::size_t field) const {
     return dictionary_.child(numbers_[field]);
   }
 
@@ -133,7 +130,12 @@ void decodeSchema(Decoding& decoding, const PropertyList::Value& value, const Co
     const FieldValues<S> values(value);
     std::size_t position = 0;
     S::CodingKeys::each([&](auto field) {
-      decodeField(decoding, values.at(position++), path, field.key, into.*field.member);
+      const std::size_t at = position++;
+      if (values.has(at)) {
+        decodeField(decoding, values.at(at), path, field.key, into.*field.member);
+      } else if constexpr (!Keelgate::isOptional<typename decltype(field)::Value>) {
+        throw Errors::keyNotFound(path, field.key);
+      }
     });
   }
 }
