@@ -93,6 +93,7 @@ void readCase(Reader& from, T& value, int depth, std::index_sequence<i...>) {
 
 template <class T>
 void readRecord(Reader& from, T& value, int depth) {
+  static_assert(T::Labels::isComplete(), "a member of the record is not in its list of fields");
   if (depth >= maximumDepth) throw MalformedReply();
   FieldsOf<T>::each([&](auto field) { read(from, value.*field.member, depth + 1); });
   // What the framework refuses in the service is refused here too.

@@ -61,8 +61,8 @@ concept HasField = requires {
   S::template keelgateField<S>(static_cast<Line<line>*>(nullptr));
 };
 
-// How far above its closing macro a struct may begin. A list that begins further up is caught by
-// the test that counts the initialisers which each struct takes.
+// How far above its closing macro a struct may begin. A list that begins further up is not complete,
+// which is asserted where structs are decoded.
 constexpr int span = 240;
 
 /// An object of its own for each type, so that types can be compared in a table.
@@ -73,6 +73,35 @@ template <class F>
 struct FieldCount : std::integral_constant<std::size_t, 1> {};
 template <class F, std::size_t n>
 struct FieldCount<std::array<F, n>> : std::integral_constant<std::size_t, n> {};
+
+template <class... V>
+struct Types {
+  template <class... W>
+  constexpr Types<V..., W...> operator+(Types<W...>) const {
+    return {};
+  }
+};
+
+template <class S, class V>
+constexpr Types<V> typesOf(const Field<S, V>&) {
+  return {};
+}
+template <class S, class V, std::size_t n>
+constexpr auto typesOf(const std::array<Field<S, V>, n>&) {
+  return []<std::size_t... i>(std::index_sequence<i...>) {
+    return Types<std::enable_if_t<i >= 0, V>...>();
+  }(std::make_index_sequence<n>());
+}
+
+// Whether an S can be made from values of exactly these types, and from one value more.
+template <class S, class... V>
+auto takes(Types<V...>, int) -> decltype(S{std::declval<V>()...}, std::true_type());
+template <class S>
+std::false_type takes(...);
+template <class S, class... V>
+auto takesMore(Types<V...>, int) -> decltype(S{std::declval<V>()..., {}}, std::true_type());
+template <class S>
+std::false_type takesMore(...);
 
 }  // namespace Detail
 
@@ -131,6 +160,11 @@ class FieldList {
 
   using Lines = std::make_index_sequence<lines.size()>;
 
+  template <std::size_t... i>
+  static constexpr auto types(std::index_sequence<i...>) {
+    return (Detail::Types<>() + ... + Detail::typesOf(onLine<i>()));
+  }
+
   template <class Other, class Visitor, std::size_t... i>
   static constexpr void eachPair(Visitor& visitor, std::index_sequence<i...>) {
     const int sequence[] = {
@@ -143,6 +177,13 @@ class FieldList {
 
  public:
   static constexpr std::size_t size = total(Lines());
+
+  /// False when a member of S was declared without FIELD, or too far above the closing macro.
+  static constexpr bool isComplete() {
+    using All = decltype(types(Lines()));
+    return decltype(Detail::takes<S>(All(), 0))::value &&
+           !decltype(Detail::takesMore<S>(All(), 0))::value;
+  }
 
   /// Calls `visitor(field)` for every field in declaration order.
   template <class Visitor>

@@ -59,6 +59,7 @@ class KeyTable {
     std::sort(sorted.begin(), sorted.end());
     return std::adjacent_find(sorted.begin(), sorted.end()) == sorted.end();
   }
+  static_assert(S::CodingKeys::isComplete(), "a member of the schema is not in its list of fields");
   static_assert(keysAreDistinct(), "two fields of a schema travel under one wire key");
 
  public:
