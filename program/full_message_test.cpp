@@ -189,7 +189,6 @@ void expectEveryFieldToArrive(const Kind& kind) {
   });
 }
 
-const std::string video = "com.tessen.private.braid.viso.video";
 const std::string context = ".context.context.dictionary.";
 
 TEST(FullMessage, EveryFieldArrivesUnderItsOwnLabel) {

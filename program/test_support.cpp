@@ -89,6 +89,25 @@ std::string outcome(const Target& target, const PropertyList::Tree& tree) {
   return fromBinary;
 }
 
+PropertyList::Tree data(std::string_view text) {
+  const auto bytes = std::as_bytes(std::span(text));
+  return PropertyList::Data(bytes.begin(), bytes.end());
+}
+
+PropertyList::Dictionary with(PropertyList::Dictionary changes, PropertyList::Dictionary base) {
+  for (auto& [key, value] : base) {
+    const auto same = [&](const auto& entry) {
+      return entry.first == key;
+    };
+    if (std::none_of(changes.begin(), changes.end(), same)) changes.emplace_back(key, value);
+  }
+  return changes;
+}
+
+void check(const std::vector<Row>& rows) {
+  for (const Row& row : rows) EXPECT_EQ(outcome(row.target, row.message), row.expected) << row.name;
+}
+
 Refusing::Refusing(std::string_view name) {
   refused = name;
 }

@@ -84,6 +84,31 @@ std::string outcome(const Target& target, const PropertyList::Tree& tree);
 /// What the body throws, in one line; "" when it returns.
 std::string errorOf(const std::function<void()>& body);
 
+inline const Target sample{"com.tessen.private.braid.rtcengine.rtctester", 1};
+inline const Target payload{"PulseUserPayload"};
+inline const Target response{"VespCommandResponse"};
+inline const Target tunnel{"VespCommandWebTunnelResponse"};
+inline const Target invitation{"VespInvitation"};
+inline const Target checkIn{"com.tessen.private.braid.waymark", 3};
+inline constexpr const char* video = "com.tessen.private.braid.viso.video";
+inline constexpr const char* audio = "com.tessen.private.braid.viso.audio";
+inline constexpr const char* livePhoto = "com.tessen.private.braid.viso.lp";
+
+PropertyList::Tree data(std::string_view text);
+
+/// Entries of the first over those of the second.
+PropertyList::Dictionary with(PropertyList::Dictionary changes, PropertyList::Dictionary base);
+
+/// A row of a table: this message is expected to give this outcome in both encodings.
+struct Row {
+  const char* name;
+  Target target;
+  PropertyList::Tree message;
+  std::string expected;
+};
+
+void check(const std::vector<Row>& rows);
+
 /// `name` as the only record whose constructor refuses, for as long as this lives.
 class Refusing {
  public:

@@ -1,0 +1,184 @@
+// SPDX-License-Identifier: Apache-2.0
+// What all messages share: the rules of keyed decoding, routing, and constructors that refuse.
+#include "framework/contracts/log.h"
+#include "program/test_support.h"
+
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <limits>
+#include <thread>
+
+namespace VespKeelgateService::Testing {
+
+namespace {
+
+using PropertyList::Array;
+using PropertyList::Dictionary;
+using PropertyList::Tree;
+
+const std::string sampleRecord = ".result.vespSampleMessage";
+const Dictionary sampleMessage{{"command", 7}, {"client", "a"}};
+
+TEST(Decoding, ReadsFieldsByTheirKeysAndStopsAtTheFirstFailureInDeclarationOrder) {
+  const std::string least = sampleRecord + ".command=7 " + sampleRecord + ".clientName=a";
+  check({
+      {"least", sample, sampleMessage, least},
+      {"unknown keys are ignored", sample, with({{"x", Dictionary{{"client", 1}}}}, sampleMessage),
+       least},
+      {"another order", sample, Dictionary{{"client", "a"}, {"command", 7}}, least},
+      {"the field's name is no key", sample, Dictionary{{"command", 7}, {"clientName", "a"}},
+       "keyNotFound client @"},
+      {"keys are case-sensitive", sample, Dictionary{{"Command", 7}, {"client", "a"}},
+       "keyNotFound command @"},
+      {"a mistyped optional is not dropped", sample, with({{"version", "3"}}, sampleMessage),
+       "typeMismatch @version"},
+      {"declaration order, not message order", sample,
+       Dictionary{{"version", "3"}, {"date", 1}, {"command", 7}}, "keyNotFound client @"},
+      {"the first of two mismatches", sample,
+       Dictionary{{"version", "3"}, {"date", 1}, {"command", 7}, {"client", "a"}},
+       "typeMismatch @date"},
+      {"no boolean for an integer", sample, with({{"command", true}}, sampleMessage),
+       "typeMismatch @command"},
+      {"no real for an integer", sample, with({{"command", 7.0}}, sampleMessage),
+       "typeMismatch @command"},
+      {"too large for a signed field", sample,
+       with({{"command", std::numeric_limits<std::uint64_t>::max()}}, sampleMessage),
+       "dataCorrupted @command"},
+      {"an array at the top", sample, Array{sampleMessage}, "typeMismatch @"},
+      {"a string at the top", sample, "a", "typeMismatch @"},
+      {"an empty dictionary", sample, Dictionary{}, "keyNotFound command @"},
+  });
+}
+
+TEST(Decoding, TellsNullFromAbsentAndFromValues) {
+  const auto binaryOnly = [](const Tree& tree) {
+    return outcome(sample, Keelgate::Bytes(PropertyList::writeBinary(tree)));
+  };
+  EXPECT_EQ(binaryOnly(with({{"version", nullptr}}, sampleMessage)),
+            sampleRecord + ".command=7 " + sampleRecord + ".clientName=a");
+  EXPECT_EQ(binaryOnly(with({{"client", nullptr}}, sampleMessage)), "valueNotFound @client");
+  EXPECT_EQ(binaryOnly(nullptr), "typeMismatch @");
+  EXPECT_EQ(binaryOnly(with({{"version", PropertyList::Uid{7}}}, sampleMessage)),
+            "typeMismatch @version");
+  EXPECT_EQ(outcome(payload, Keelgate::Bytes(PropertyList::writeBinary(
+                                 Dictionary{{"c", 1}, {"dul", Array{"a", nullptr}}}))),
+            "valueNotFound @dul.1");
+}
+
+TEST(Decoding, DamageIsFoundBeforeAnyFieldIsRead) {
+  for (const char* damaged :
+       {"", "bplist00", "<plist", "<plist><dict><key>command</key></dict></plist>",
+        "<plist><dict><key>x</key><integer>1e3</integer></dict></plist>"}) {
+    EXPECT_EQ(outcome(sample, std::as_bytes(std::span(std::string_view(damaged)))),
+              "dataCorrupted @")
+        << damaged;
+  }
+}
+
+TEST(Decoding, NumbersFillTheFieldsThatHoldThemExactly) {
+  const Dictionary base{{"kHearthdVersionKey", 1.5}, {"kHearthdSupportedFeaturesKey", Array{}}};
+  const auto version = [&](Tree number) {
+    const Dictionary capabilities = with({{"kHearthdVersionKey", std::move(number)}}, base);
+    return outcome(invitation,
+                   Dictionary{{"c", Dictionary{{"cS", "ht-invite-v1"},
+                                               {"cT", 1},
+                                               {"cD", Dictionary{{"kRequestedCapabilitiesKey",
+                                                                  capabilities}}}}},
+                              {"s", 1},
+                              {"uID", "u"}})
+        .starts_with(".context.schema=");
+  };
+  for (int bits = 0; bits < 64; ++bits) {
+    const std::uint64_t power = std::uint64_t{1} << bits;
+    EXPECT_TRUE(version(power)) << "2^" << bits;
+    EXPECT_EQ(version(power + 1), bits <= 53 - (bits == 53)) << "2^" << bits << " + 1";
+    EXPECT_EQ(version(power - 1), bits <= 53) << "2^" << bits << " - 1";
+  }
+  EXPECT_TRUE(version(std::numeric_limits<std::int64_t>::min()));
+  EXPECT_FALSE(version(std::numeric_limits<std::uint64_t>::max()));
+  EXPECT_FALSE(version(true));
+}
+
+TEST(Routing, FindsTheServiceAndChecksTheCommandFirst) {
+  const Tree damaged = "not a dictionary";
+  check({
+      {"letter case",
+       {"com.tessen.private.braid.viso.Video", 232},
+       damaged,
+       "unpacking 1: com.tessen.private.braid.viso.Video"},
+      {"trailing space",
+       {"com.tessen.private.braid.waymark ", 3},
+       damaged,
+       "unpacking 1: com.tessen.private.braid.waymark "},
+      {"empty", {"", 1}, damaged, "unpacking 1: "},
+      {"unknown service and command", {"x", 999}, damaged, "unpacking 1: x"},
+      {"below the calls", {video, 231}, damaged, "unpacking 0: 231"},
+      {"the gap", {video, 236}, damaged, "unpacking 0: 236"},
+      {"above the calls", {video, 239}, damaged, "unpacking 0: 239"},
+      {"a call for live photos", {livePhoto, 232}, damaged, "unpacking 0: 232"},
+      {"a live photo is never read",
+       {livePhoto, 245},
+       damaged,
+       ".result.messageTypeRestricted.messageType=1"},
+  });
+  EXPECT_EQ(outcome({livePhoto, 245}, Keelgate::Bytes()),
+            ".result.messageTypeRestricted.messageType=1");
+}
+
+TEST(Routing, AnUnknownCommandIsLoggedAndRefusedUnread) {
+  for (const char* service : {"com.tessen.private.braid.rtcengine.rtctester", video, audio,
+                              livePhoto, "com.tessen.private.braid.waymark"}) {
+    for (const std::uint64_t command :
+         {std::uint64_t{0}, std::uint64_t{999}, std::numeric_limits<std::uint64_t>::max()}) {
+      Keelgate::LogCapture log;
+      const std::string number = std::to_string(command);
+      EXPECT_EQ(outcome({service, command}, Keelgate::Bytes()),
+                "breach com.tessen.Keelgate.VespServiceUnpacker: Invalid command ID " + number);
+      EXPECT_EQ(log.lines, Keelgate::Array<String>{"Invalid command ID " + number});
+    }
+  }
+  Keelgate::LogCapture log;
+  EXPECT_EQ(outcome(sample, Keelgate::Bytes()), "dataCorrupted @");
+  EXPECT_EQ(log.lines.size(), 0u) << "a decoding error is not logged";
+}
+
+TEST(Constructors, AnyOfThemCanRefuseAndItsErrorArrivesUnchanged) {
+  const Tree full = Dictionary{{"c", 1},
+                               {"mml", Array{Dictionary{{"c", 2}}}},
+                               {"h", Dictionary{}},
+                               {"Dc", Dictionary{}},
+                               {"qplr", Array{Dictionary{}, Dictionary{}}},
+                               {"qal", Array{Dictionary{}}},
+                               {"qsatv", Array{Dictionary{}}},
+                               {"qpla", Array{Dictionary{}}}};
+  for (const char* name :
+       {"PulseUserPayload", "PulseUserPayloadHttpHeaders", "PulseUserPayloadDeliveryContext",
+        "PulseHoplinePluginRequest", "PulseHoplineAllocationStatus", "PulseHoplineSelfAllocToken",
+        "PulseHoplinePluginAllocation"}) {
+    const Refusing refusing(name);
+    EXPECT_EQ(outcome(payload, full), std::string("breach test: refused ") + name);
+  }
+  const Refusing refusing("VespSampleMessage");
+  EXPECT_EQ(outcome(sample, sampleMessage), "breach test: refused VespSampleMessage");
+}
+
+TEST(Unpackers, AreUsedFromManyThreadsAtOnce) {
+  const auto message = PropertyList::writeBinary(sampleMessage);
+  const std::string expected = outcome(sample, Keelgate::Bytes(message));
+  std::vector<std::thread> threads;
+  std::atomic<int> wrong = 0;
+  for (int i = 0; i < 8; ++i) {
+    threads.emplace_back([&] {
+      for (int n = 0; n < 200; ++n) {
+        if (outcome(sample, Keelgate::Bytes(message)) != expected) ++wrong;
+      }
+    });
+  }
+  for (std::thread& thread : threads) thread.join();
+  EXPECT_EQ(wrong, 0);
+}
+
+}  // namespace
+
+}  // namespace VespKeelgateService::Testing

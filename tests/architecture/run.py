@@ -1,0 +1,99 @@
+#!/usr/bin/env python3
+# SPDX-License-Identifier: Apache-2.0
+"""Who may know whom, checked on the sources and on the built programs.
+
+usage: run.py ROOT BUILD COMPILER
+"""
+import pathlib
+import re
+import subprocess
+import sys
+
+root, build, compiler = pathlib.Path(sys.argv[1]), pathlib.Path(sys.argv[2]), sys.argv[3]
+failures = []
+
+
+def check(sound, what):
+    if not sound:
+        failures.append(what)
+
+
+def sources(folder):
+    return [path for path in sorted((root / folder).rglob("*"))
+            if path.suffix in (".h", ".cpp") and "_test" not in path.name
+            and "test_" not in path.name]
+
+
+def includes(path):
+    return re.findall(r'^#include ["<]([^">]+)[">]', path.read_text(), re.M)
+
+
+# A folder, and what its files may include beside the standard library. The service's own folder is
+# the one place that knows the server; the framework knows no unpacker; only the two sides of the
+# seal that need the operating system see its headers.
+standard = re.compile(r"^[a-z_]+$")
+arrows = {
+    "plist": ["plist/"],
+    "include": ["keelgate/"],
+    "program/schema": ["plist/", "keelgate/", "program/schema/"],
+    **{f"program/{folder}": ["keelgate/", "framework/contracts/", "program/schema/",
+                             "program/service/vesp_service_unpacker.h", f"program/{folder}/"]
+       for folder in ("session", "payload", "invitation", "waymark")},
+    "program/service": ["keelgate/", "framework/contracts/", "framework/server/", "program/"],
+    "framework/contracts": ["keelgate/", "framework/contracts/"],
+    "framework/transport": ["keelgate/", "framework/contracts/", "framework/transport/"],
+}
+for folder, allowed in arrows.items():
+    for path in sources(folder):
+        for name in includes(path):
+            check(standard.match(name) or any(name.startswith(a) for a in allowed),
+                  f"{path.relative_to(root)} includes {name}")
+for folder, forbidden in {"framework": ["program/", "plist/", "cli/"],
+                          "framework/client": ["framework/server/", "framework/sandbox/"],
+                          "cli": ["plist/", "framework/server/", "framework/sandbox/"]}.items():
+    for path in sources(folder):
+        for name in includes(path):
+            check(not any(name.startswith(f) for f in forbidden),
+                  f"{path.relative_to(root)} includes {name}")
+
+# Schemas are data, so that what prints them links no decoder.
+for path in sources("program"):
+    if re.search(r"schemas?\.h$|protocol_payload\.h$", path.name):
+        for name in includes(path):
+            check(standard.match(name) or name.startswith("keelgate/")
+                  or re.search(r"schemas?\.h$|schema/values\.h$", name),
+                  f"{path.relative_to(root)} is no data alone: it includes {name}")
+
+# No process that holds privileges has a parser of the network's formats in it.
+for program in ("bin/keelgate", "lib/libkeelgate.so"):
+    symbols = subprocess.run(["nm", "-C", build / program], capture_output=True, text=True)
+    check(symbols.returncode == 0 and symbols.stdout, f"{program}: nm shows nothing")
+    check("PropertyList::" not in symbols.stdout, f"{program} has a property-list parser in it")
+
+# The writers serve tests and tools, never the service.
+symbols = subprocess.run(["nm", "-C", build / "bin/VespKeelgateService"],
+                         capture_output=True, text=True).stdout
+check("PropertyList::Document" in symbols, "VespKeelgateService has no parser in it")
+check("PropertyList::write" not in symbols, "VespKeelgateService has a writer in it")
+
+# The describing macros stay inside the public headers.
+macros = subprocess.run([compiler, "-std=c++20", "-dM", "-E", "-x", "c++", "-",
+                         f"-I{root}/include"],
+                        input="#include <keelgate/client.h>\n", capture_output=True, text=True)
+names = set(re.findall(r"^#define (\w+)", macros.stdout, re.M))
+leaked = names & {"FIELD", "FIELD_FAMILY", "CODING_KEYS", "LABELS", "CASES", "ENUMERATION",
+                  "NESTED_ENUMERATION", "DEFAULTING_ENUMERATION"}
+check(names and not leaked, f"client.h leaks {sorted(leaked)}")
+
+for folder in ("include", "plist", "program", "framework", "cli", "tests", "fuzz", "bench",
+               "examples"):
+    for path in (root / folder).rglob("*"):
+        if path.suffix in (".h", ".cpp"):
+            text = path.read_text()
+            check(text.startswith("// SPDX-License-Identifier: Apache-2.0"), f"{path}: no licence")
+            check(len(text.splitlines()) <= 400, f"{path} is too long to read")
+
+for failure in failures:
+    print(failure)
+print("0 failed" if not failures else f"{len(failures)} failed")
+sys.exit(bool(failures))
