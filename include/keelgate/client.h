@@ -11,6 +11,7 @@
 #pragma once
 
 #include <keelgate/errors.h>
+#include <keelgate/export.h>
 #include <keelgate/records.h>
 #include <keelgate/values.h>
 
@@ -39,10 +40,10 @@ struct ServiceReport {
 /// the service's processes, and waits for one while all are taken. The client makes no threads,
 /// installs no signal handlers and leaves the application's children alone. In a process that was
 /// forked from the application it starts a service of its own at its first use.
-class Client {
+class KEELGATE_API Client {
  public:
   struct Options {
-    /// Messages that can be in work at once; 0 stands for one for each processor.
+    /// Messages that can be in work at once, at most 128; 0 stands for one for each processor.
     unsigned processes = 0;
     /// From the call until the record; a message that takes longer is given up.
     std::chrono::milliseconds timeLimit{5000};
@@ -88,9 +89,9 @@ class Client {
   std::unique_ptr<Implementation> implementation_;
 };
 
-extern template PulseUserPayload Client::unpack(Bytes);
-extern template VespCommandResponse Client::unpack(Bytes);
-extern template VespCommandWebTunnelResponse Client::unpack(Bytes);
-extern template VespInvitation Client::unpack(Bytes);
+extern template KEELGATE_API PulseUserPayload Client::unpack(Bytes);
+extern template KEELGATE_API VespCommandResponse Client::unpack(Bytes);
+extern template KEELGATE_API VespCommandWebTunnelResponse Client::unpack(Bytes);
+extern template KEELGATE_API VespInvitation Client::unpack(Bytes);
 
 }  // namespace Keelgate

@@ -7,6 +7,7 @@
 #pragma once
 
 #include <keelgate/command_type.h>
+#include <keelgate/export.h>
 #include <keelgate/values.h>
 
 #include <cstddef>
@@ -18,7 +19,7 @@
 namespace Keelgate {
 
 /// What the errors share: what() gives one readable English sentence, valid as long as the error.
-class Error : public std::exception {
+class KEELGATE_API Error : public std::exception {
  public:
   [[nodiscard]] const char* what() const noexcept override { return sentence_.c_str(); }
 
@@ -33,7 +34,7 @@ class Error : public std::exception {
 using CodingKey = std::variant<String, std::size_t>;
 
 /// The message does not have the form that its schema demands.
-class DecodingError : public Error {
+class KEELGATE_API DecodingError : public Error {
  public:
   enum class Kind : std::uint8_t {
     /// A required key is missing: `key` names it, `codingPath` leads to the dictionary without it.
@@ -59,7 +60,7 @@ class DecodingError : public Error {
 };
 
 /// A rule of the framework or of the program was broken.
-class Breach : public Error {
+class KEELGATE_API Breach : public Error {
  public:
   Breach(String itsDomain, String itsErrorType, Optional<String> itsKeyPath = std::nullopt);
 
@@ -70,7 +71,7 @@ class Breach : public Error {
 };
 
 /// The host gave the message up; nothing is known of its content.
-class HostError : public Error {
+class KEELGATE_API HostError : public Error {
  public:
   enum class Reason : std::uint8_t {
     /// The process that held the message died.
@@ -98,7 +99,7 @@ class HostError : public Error {
 namespace VespKeelgateService {
 
 /// The program has no unpacker for the message.
-class VespClientMessageUnpackingError : public Keelgate::Error {
+class KEELGATE_API VespClientMessageUnpackingError : public Keelgate::Error {
  public:
   enum class Case : std::uint8_t {
     /// `command` is known to the framework, and the service has no schema for it.

@@ -1,0 +1,163 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "framework/client/data_channel.h"
+
+#include <poll.h>
+#include <sys/socket.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+
+namespace Keelgate {
+
+using Transport::ReplyHeader;
+using Transport::ReplyKind;
+using Transport::RequestHeader;
+
+namespace {
+
+/// Most replies fit; room grows twofold from here with the bytes that have arrived.
+constexpr std::size_t firstBuffer = 4096;
+
+bool wouldBlock() noexcept {
+  return errno == EAGAIN || errno == EINTR;
+}
+
+/// Takes `sent` bytes off the front. Gives whether any are left.
+bool advance(std::array<iovec, 3>& pieces, std::size_t sent) noexcept {
+  std::size_t left = 0;
+  for (iovec& piece : pieces) {
+    const std::size_t taken = std::min(sent, piece.iov_len);
+    piece.iov_base = static_cast<char*>(piece.iov_base) + taken;
+    piece.iov_len -= taken;
+    sent -= taken;
+    left += piece.iov_len;
+  }
+  return left > 0;
+}
+
+iovec pieceOf(const void* from, std::size_t size) noexcept {
+  // sendmsg only reads through this pointer.
+  return {.iov_base = const_cast<void*>(from), .iov_len = size};
+}
+
+}  // namespace
+
+DataChannel::Look DataChannel::look() const noexcept {
+  char byte;
+  const ssize_t n = recv(channel_.get(), &byte, 1, MSG_PEEK | MSG_DONTWAIT);
+  if (n > 0) return Look::talking;
+  return n < 0 && wouldBlock() ? Look::quiet : Look::gone;
+}
+
+Ending DataChannel::exchange(const ClientRequest& request, Deadline deadline,
+                             ReceivedReply& reply) {
+  if (const Ending sent = send(request, deadline); sent != Ending::answered) return sent;
+  const std::uint64_t allowance =
+      replyBase + request.service.size() + replyFactor * request.message.size();
+  const Ending received = receive(allowance, deadline, reply);
+  ++sequence_;
+  return received;
+}
+
+Ending DataChannel::send(const ClientRequest& request, Deadline deadline) const {
+  const RequestHeader header{.magic = Transport::magic,
+                             .version = Transport::protocolVersion,
+                             .record = request.record,
+                             .sequence = sequence_,
+                             .serviceLength = static_cast<std::uint32_t>(request.service.size()),
+                             .bodyLength = request.message.size(),
+                             .command = request.command};
+  Pieces pieces{pieceOf(&header, sizeof header),
+                pieceOf(request.service.data(), request.service.size()),
+                pieceOf(request.message.data(), request.message.size())};
+  msghdr packet{};
+  packet.msg_iov = pieces.data();
+  packet.msg_iovlen = pieces.size();
+  for (;;) {
+    const ssize_t n = sendmsg(channel_.get(), &packet, MSG_DONTWAIT | MSG_NOSIGNAL);
+    if (n >= 0) {
+      if (!advance(pieces, static_cast<std::size_t>(n))) return Ending::answered;
+    } else if (!wouldBlock()) {
+      return Ending::died;
+    } else if (const Ending ready = waitToSend(deadline); ready != Ending::answered) {
+      return ready;
+    }
+  }
+}
+
+// A worker that answers before it has the whole request, and then reads no more, would block a
+// writer that doesn't look: so both directions are watched.
+Ending DataChannel::waitToSend(Deadline deadline) const noexcept {
+  const short events = waitFor(channel_.get(), POLLIN | POLLOUT, deadline);
+  if (events == 0) return Ending::late;
+  if ((events & (POLLIN | POLLHUP | POLLERR)) == 0) return Ending::answered;
+  switch (look()) {
+    case Look::talking:
+      return Ending::violation;
+    case Look::gone:
+      return Ending::died;
+    case Look::quiet:
+      return Ending::answered;
+  }
+  return Ending::died;
+}
+
+Ending DataChannel::receive(std::uint64_t allowance, Deadline deadline, ReceivedReply& reply) {
+  filled_ = 0;
+  reply.buffer.resize(firstBuffer);
+  for (std::size_t at = 0;;) {
+    ReplyHeader header;
+    if (const Ending e = await(at + sizeof header, deadline, reply); e != Ending::answered) {
+      return e;
+    }
+    std::memcpy(&header, &reply.buffer[at], sizeof header);
+    if (!isHonest(header, reply.log.size(), allowance)) return Ending::violation;
+    at += sizeof header;
+    if (const Ending e = await(at + header.bodyLength, deadline, reply); e != Ending::answered) {
+      return e;
+    }
+    reply.kind = header.kind;
+    reply.offset = at;
+    reply.length = header.bodyLength;
+    at += header.bodyLength;
+    if (header.kind != ReplyKind::log) {
+      return filled_ == at ? Ending::answered : Ending::violation;
+    }
+    const Bytes line = reply.body();
+    reply.log.emplace_back(reinterpret_cast<const char*>(line.data()), line.size());
+  }
+}
+
+/// Until the buffer holds so many bytes. It grows when it is full of bytes that have arrived, and
+/// never because a length was announced.
+Ending DataChannel::await(std::size_t size, Deadline deadline, ReceivedReply& reply) {
+  while (filled_ < size) {
+    if (filled_ == reply.buffer.size()) reply.buffer.resize(2 * filled_);
+    if (waitFor(channel_.get(), POLLIN, deadline) == 0) return Ending::late;
+    const ssize_t n = recv(channel_.get(), reply.buffer.data() + filled_,
+                           reply.buffer.size() - filled_, MSG_DONTWAIT);
+    if (n == 0 || (n < 0 && !wouldBlock())) return Ending::died;
+    if (n > 0) filled_ += static_cast<std::size_t>(n);
+  }
+  return Ending::answered;
+}
+
+bool DataChannel::isHonest(const ReplyHeader& header, std::size_t logLines,
+                           std::uint64_t allowance) const noexcept {
+  if (header.magic != Transport::magic || header.version != Transport::protocolVersion ||
+      header.sequence != sequence_ || header.reserved != 0) {
+    return false;
+  }
+  switch (header.kind) {
+    case ReplyKind::log:
+      return logLines < Transport::maximumLogFrames &&
+             header.bodyLength <= Transport::maximumLogLength;
+    case ReplyKind::record:
+    case ReplyKind::error:
+      return header.bodyLength <= allowance;
+  }
+  return false;
+}
+
+}  // namespace Keelgate

@@ -1,0 +1,93 @@
+// SPDX-License-Identifier: Apache-2.0
+/// The client's end of the channel to one worker: one request, then one reply.
+///
+/// The worker may be taken over from the moment that it has read the first byte. So it is never
+/// trusted to read, to answer, to stop answering or to tell the truth about a length.
+#pragma once
+
+#include "framework/client/deadline.h"
+#include "framework/client/descriptor.h"
+#include "framework/transport/frames.h"
+
+#include <keelgate/values.h>
+
+#include <sys/uio.h>
+
+#include <array>
+#include <cstddef>
+#include <string_view>
+
+namespace Keelgate {
+
+/// A message on its way. Everything is borrowed for the time of the call.
+struct ClientRequest {
+  /// recordNumber<Record> of the record that is asked for.
+  std::uint16_t record;
+  UInt64 command;
+  std::string_view service;
+  Bytes message;
+};
+
+/// The bytes of a reply, not decoded.
+struct ReceivedReply {
+  Transport::ReplyKind kind{};
+  Data buffer;
+  std::size_t offset = 0;
+  std::size_t length = 0;
+  /// As the worker sent them: not to be shown before escapeLogLine.
+  Array<String> log;
+
+  [[nodiscard]] Bytes body() const { return Bytes(buffer).subspan(offset, length); }
+};
+
+/// How an exchange ended.
+enum class Ending {
+  answered,
+  /// The worker's end is closed.
+  died,
+  /// The deadline has passed.
+  late,
+  /// The worker sent what is no answer, or sent it at the wrong time.
+  violation,
+};
+
+/// The most bytes that the body of a reply may have: base + factor x the message's length.
+///
+/// The factor: the densest honest message is a list of empty dictionaries at 3 to 4 bytes each,
+/// and a record of 156 absent fields takes some 170 bytes; a value that is shared within a message
+/// may grow 64-fold. The base: short messages may share values up to a MiB in all, and an error
+/// repeats the service identifier and a path.
+constexpr std::uint64_t replyBase = std::uint64_t{2} << 20;
+constexpr std::uint64_t replyFactor = 128;
+
+/// One thread at a time.
+class DataChannel {
+ public:
+  explicit DataChannel(Descriptor own) noexcept : channel_(std::move(own)) {}
+
+  /// What can be seen of the worker while nothing is asked of it.
+  enum class Look { quiet, gone, talking };
+  [[nodiscard]] Look look() const noexcept;
+
+  /// `reply` is complete with Ending::answered; its log lines count in any case. Throws
+  /// std::bad_alloc.
+  Ending exchange(const ClientRequest& request, Deadline deadline, ReceivedReply& reply);
+
+ private:
+  using Pieces = std::array<iovec, 3>;
+
+  Ending send(const ClientRequest& request, Deadline deadline) const;
+  Ending waitToSend(Deadline deadline) const noexcept;
+  Ending receive(std::uint64_t allowance, Deadline deadline, ReceivedReply& reply);
+  Ending await(std::size_t size, Deadline deadline, ReceivedReply& reply);
+  [[nodiscard]] bool isHonest(const Transport::ReplyHeader& header, std::size_t logLines,
+                              std::uint64_t allowance) const noexcept;
+
+  Descriptor channel_;
+  /// Of the next request.
+  std::uint32_t sequence_ = 0;
+  /// How far the reply's buffer is filled.
+  std::size_t filled_ = 0;
+};
+
+}  // namespace Keelgate

@@ -1,0 +1,35 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "framework/client/deadline.h"
+
+#include <poll.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <ctime>
+
+namespace Keelgate {
+
+using std::chrono::milliseconds;
+using std::chrono::nanoseconds;
+
+Deadline deadlineAfter(milliseconds span) noexcept {
+  constexpr milliseconds year = std::chrono::hours(24 * 365);
+  return Clock::now() + std::clamp(span, milliseconds(0), year);
+}
+
+short waitFor(int descriptor, short events, Deadline deadline) noexcept {
+  pollfd entry{.fd = descriptor, .events = events, .revents = 0};
+  for (;;) {
+    const nanoseconds left = std::max(nanoseconds(0), nanoseconds(deadline - Clock::now()));
+    const timespec timeout{.tv_sec = left.count() / 1'000'000'000,
+                           .tv_nsec = left.count() % 1'000'000'000};
+    const int ready = ppoll(&entry, 1, &timeout, nullptr);
+    if (ready > 0) return entry.revents;
+    if (ready == 0) return 0;
+    // An error other than an interruption is as good as a dead peer to the caller, who finds out
+    // which with the next read or write.
+    if (errno != EINTR) return POLLERR;
+  }
+}
+
+}  // namespace Keelgate

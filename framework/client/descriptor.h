@@ -1,0 +1,58 @@
+// SPDX-License-Identifier: Apache-2.0
+/// Descriptors with an owner, all of them on record.
+///
+/// The record is for an application that forks: whatever its other threads were doing at that
+/// moment, the child can close what it inherited. A worker does not see the end of its channel as
+/// long as a forgotten copy is open in some child.
+#pragma once
+
+#include <atomic>
+#include <cstddef>
+#include <utility>
+#include <vector>
+
+namespace Keelgate {
+
+/// The open descriptors of one client. Entries are atomic and never move, and no lock is held on
+/// them, so that they can be read after a fork; all members may be called from any thread.
+class DescriptorBook {
+ public:
+  /// Room for so many; what is opened beyond it works, but stays open in a forked child.
+  explicit DescriptorBook(std::size_t capacity);
+
+  /// In a forked child: closes the child's copies. Their owners must never run again.
+  void closeAll() noexcept;
+
+ private:
+  friend class Descriptor;
+  std::atomic<int>* enter(int descriptor) noexcept;
+
+  std::vector<std::atomic<int>> entries_;
+};
+
+/// Owns a descriptor, or none. One thread at a time.
+class Descriptor {
+ public:
+  Descriptor() = default;
+  Descriptor(DescriptorBook& book, int descriptor) noexcept
+      : descriptor_(descriptor), entry_(descriptor < 0 ? nullptr : book.enter(descriptor)) {}
+  Descriptor(Descriptor&& other) noexcept
+      : descriptor_(std::exchange(other.descriptor_, -1)),
+        entry_(std::exchange(other.entry_, nullptr)) {}
+  Descriptor& operator=(Descriptor&& other) noexcept {
+    std::swap(descriptor_, other.descriptor_);
+    std::swap(entry_, other.entry_);
+    return *this;
+  }
+  ~Descriptor() { close(); }
+
+  void close() noexcept;
+  [[nodiscard]] int get() const noexcept { return descriptor_; }
+  explicit operator bool() const noexcept { return descriptor_ >= 0; }
+
+ private:
+  int descriptor_ = -1;
+  std::atomic<int>* entry_ = nullptr;
+};
+
+}  // namespace Keelgate

@@ -1,0 +1,149 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "framework/client/launch.h"
+
+#include "framework/transport/frames.h"
+
+#include <spawn.h>
+#include <sys/socket.h>
+#include <sys/syscall.h>
+#include <sys/un.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <array>
+#include <cerrno>
+#include <csignal>
+#include <cstring>
+#include <system_error>
+
+namespace Keelgate {
+
+namespace {
+
+constexpr const char* serviceName = "VespKeelgateService";
+constexpr const char* installedFolder = KEELGATE_SERVICE_FOLDER;
+
+String errorText(int error) {
+  return std::generic_category().message(error);
+}
+
+[[noreturn]] void fail(const String& what, int error) {
+  throw StartFailure(what + ": " + errorText(error), true);
+}
+
+String ownFolder() {
+  std::array<char, 4096> path;
+  const ssize_t n = readlink("/proc/self/exe", path.data(), path.size());
+  if (n <= 0) return {};
+  const String whole(path.data(), static_cast<std::size_t>(n));
+  return whole.substr(0, whole.rfind('/'));
+}
+
+String findService() {
+  const String beside = ownFolder() + '/' + serviceName;
+  if (access(beside.c_str(), X_OK) == 0) return beside;
+  const String installed = String(installedFolder) + '/' + serviceName;
+  if (access(installed.c_str(), X_OK) == 0) return installed;
+  throw StartFailure("There is no " + String(serviceName) + " at " + beside + " or " + installed +
+                         ": install it there, or say where it is (servicePath, --service-path)",
+                     false);
+}
+
+/// What a fresh process is given: descriptor 3, default signals, and no terminal. In a session of
+/// its own neither an interrupt at the terminal ends it, nor can it type there.
+class SpawnPlan {
+ public:
+  explicit SpawnPlan(int control) {
+    posix_spawn_file_actions_init(&actions_);
+    posix_spawn_file_actions_adddup2(&actions_, control, Transport::serviceDescriptor);
+    for (int fd = 0; fd < Transport::serviceDescriptor; ++fd) {
+      posix_spawn_file_actions_addclose(&actions_, fd);
+    }
+    posix_spawn_file_actions_addclosefrom_np(&actions_, Transport::serviceDescriptor + 1);
+    posix_spawnattr_init(&attributes_);
+    sigset_t signals;
+    sigemptyset(&signals);
+    posix_spawnattr_setsigmask(&attributes_, &signals);
+    // Ignored signals would be inherited, and a launcher that ignores SIGCHLD can't wait.
+    sigfillset(&signals);
+    posix_spawnattr_setsigdefault(&attributes_, &signals);
+    posix_spawnattr_setflags(&attributes_,
+                             POSIX_SPAWN_SETSID | POSIX_SPAWN_SETSIGMASK | POSIX_SPAWN_SETSIGDEF);
+  }
+  ~SpawnPlan() {
+    posix_spawn_file_actions_destroy(&actions_);
+    posix_spawnattr_destroy(&attributes_);
+  }
+  SpawnPlan(const SpawnPlan&) = delete;
+  SpawnPlan& operator=(const SpawnPlan&) = delete;
+
+  pid_t run(const String& path) const {
+    String name = path;
+    char* const arguments[] = {name.data(), nullptr};
+    char* const environment[] = {nullptr};
+    pid_t pid = -1;
+    const int error =
+        posix_spawn(&pid, path.c_str(), &actions_, &attributes_, arguments, environment);
+    if (error == EAGAIN || error == ENOMEM) fail("The service could not be started", error);
+    if (error != 0) {
+      throw StartFailure("The service " + path + " could not be started: " + errorText(error) +
+                             "; it must be an executable file for this machine",
+                         false);
+    }
+    return pid;
+  }
+
+ private:
+  posix_spawn_file_actions_t actions_;
+  posix_spawnattr_t attributes_;
+};
+
+}  // namespace
+
+ServiceHandles launchService(const String& path, DescriptorBook& book) {
+  const String program = path.empty() ? findService() : path;
+  int ends[2];
+  if (socketpair(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0, ends) != 0) {
+    fail("No channel for the service could be made", errno);
+  }
+  ServiceHandles handles{.control = Descriptor(book, ends[0]), .launcher = {}};
+  const Descriptor theirs(book, ends[1]);
+  const pid_t pid = SpawnPlan(theirs.get()).run(program);
+  // Where the application ignores SIGCHLD the process may be gone already: then the handshake
+  // finds the channel closed, and there is nothing to signal.
+  handles.launcher = Descriptor(book, static_cast<int>(syscall(SYS_pidfd_open, pid, 0)));
+  return handles;
+}
+
+void killLauncher(const Descriptor& launcher) noexcept {
+  syscall(SYS_pidfd_send_signal, launcher.get(), SIGKILL, nullptr, 0);
+}
+
+void reapLauncher(const Descriptor& launcher) noexcept {
+  siginfo_t ignored;
+  waitid(P_PIDFD, static_cast<id_t>(launcher.get()), &ignored, WEXITED | WNOHANG);
+}
+
+ServiceHandles connectService(const String& socket, DescriptorBook& book, Deadline deadline) {
+  sockaddr_un address{};
+  address.sun_family = AF_UNIX;
+  if (socket.size() >= sizeof address.sun_path) {
+    throw StartFailure("The socket's path is longer than the system allows: " + socket, false);
+  }
+  std::memcpy(address.sun_path, socket.data(), socket.size());
+  Descriptor control(book, ::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0));
+  if (!control) fail("No channel for the service could be made", errno);
+  // A listener whose queue is full would hold the call as long as it likes.
+  const auto left = std::chrono::ceil<std::chrono::microseconds>(deadline - Clock::now());
+  const timeval limit{.tv_sec = left.count() / 1'000'000, .tv_usec = left.count() % 1'000'000 + 1};
+  setsockopt(control.get(), SOL_SOCKET, SO_SNDTIMEO, &limit, sizeof limit);
+  if (connect(control.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0) {
+    const int error = errno;
+    throw StartFailure("No service answers on the socket " + socket + ": " + errorText(error) +
+                           "; start the unit that listens there",
+                       error == EAGAIN || error == ECONNREFUSED || error == EINTR);
+  }
+  return {.control = std::move(control), .launcher = {}};
+}
+
+}  // namespace Keelgate

@@ -1,0 +1,47 @@
+// SPDX-License-Identifier: Apache-2.0
+/// Where a service comes from: a process of our own, or the socket of an activated one.
+#pragma once
+
+#include "framework/client/deadline.h"
+#include "framework/client/descriptor.h"
+
+#include <keelgate/values.h>
+
+#include <exception>
+
+namespace Keelgate {
+
+/// Why there is no service, for people to read, with what to do about it.
+class StartFailure : public std::exception {
+ public:
+  /// `mayPass`: another try may go better, as after a death; a missing file stays missing.
+  StartFailure(String itsSentence, bool itMayPass)
+      : sentence(std::move(itsSentence)), mayPass(itMayPass) {}
+  [[nodiscard]] const char* what() const noexcept override { return sentence.c_str(); }
+
+  String sentence;
+  bool mayPass;
+};
+
+/// The client's ends of a service.
+struct ServiceHandles {
+  Descriptor control;
+  /// The pidfd of the launcher; none for an activated service.
+  Descriptor launcher;
+};
+
+/// Starts the program, or where `path` is empty the VespKeelgateService beside the running program
+/// or in the installed libexec folder. It gets an empty environment, its own session and nothing
+/// but descriptor 3. Throws StartFailure. Callable from any thread.
+ServiceHandles launchService(const String& path, DescriptorBook& book);
+
+/// By pidfd, so that no other process can be meant.
+void killLauncher(const Descriptor& launcher) noexcept;
+/// Takes note of a launcher that has ended. The application may have waited for it already, or have
+/// told the kernel that nobody will.
+void reapLauncher(const Descriptor& launcher) noexcept;
+
+/// Connects to an activated service. Throws StartFailure. Callable from any thread.
+ServiceHandles connectService(const String& socket, DescriptorBook& book, Deadline deadline);
+
+}  // namespace Keelgate

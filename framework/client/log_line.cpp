@@ -1,0 +1,64 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "framework/client/log_line.h"
+
+#include "framework/transport/wire.h"
+
+#include <unistd.h>
+
+namespace Keelgate {
+
+namespace {
+
+/// The length of the character at the front; 0 if there is none.
+std::size_t characterLength(std::string_view text) noexcept {
+  for (std::size_t n = 1; n <= 4 && n <= text.size(); ++n) {
+    if (Transport::isUtf8(text.substr(0, n))) return n;
+  }
+  return 0;
+}
+
+bool isControl(std::string_view character) noexcept {
+  const auto first = static_cast<unsigned char>(character[0]);
+  if (character.size() == 1) return first < 0x20 || first == 0x7f;
+  // U+0080 to U+009F: a terminal may take these for escape sequences of one character.
+  return first == 0xc2 && static_cast<unsigned char>(character[1]) < 0xa0;
+}
+
+void appendEscaped(String& to, std::string_view bytes) {
+  constexpr const char* digits = "0123456789abcdef";
+  for (const char c : bytes) {
+    const auto byte = static_cast<unsigned char>(c);
+    to += "\\x";
+    to += digits[byte >> 4];
+    to += digits[byte & 0xf];
+  }
+}
+
+}  // namespace
+
+String escapeLogLine(std::string_view line) {
+  String escaped;
+  while (!line.empty()) {
+    const std::size_t length = characterLength(line);
+    const std::string_view character = line.substr(0, length == 0 ? 1 : length);
+    if (length == 0 || isControl(character)) {
+      appendEscaped(escaped, character);
+    } else {
+      escaped += character;
+    }
+    line.remove_prefix(character.size());
+  }
+  return escaped;
+}
+
+void logLine(const LogSink& sink, std::string_view line) {
+  if (sink) {
+    sink(line);
+    return;
+  }
+  const String text = String(line) + '\n';
+  // There is nobody to tell that standard error is closed.
+  static_cast<void>(!write(STDERR_FILENO, text.data(), text.size()));
+}
+
+}  // namespace Keelgate

@@ -1,0 +1,240 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "framework/client/service_process.h"
+
+#include "framework/client/control_frames.h"
+#include "framework/transport/layers.h"
+
+#include <poll.h>
+#include <sys/socket.h>
+#include <sys/wait.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <csignal>
+#include <system_error>
+
+namespace Keelgate {
+
+using std::chrono::milliseconds;
+using Transport::ControlFrame;
+using Transport::ControlKind;
+
+namespace {
+
+#ifndef KEELGATE_UNSEALED
+constexpr std::uint64_t firstWalls = [] {
+  std::uint64_t walls = 0;
+  for (std::size_t i = 0; i < Transport::firstWalls; ++i) walls |= Transport::namedLayers[i].layer;
+  return walls;
+}();
+#endif
+
+}  // namespace
+
+ServiceProcess::ServiceProcess(const ServiceSettings& settings, DescriptorBook& book,
+                               Deadline deadline)
+    : book_(book),
+      handles_(settings.socket.empty() ? launchService(settings.path, book)
+                                       : connectService(settings.socket, book, deadline)),
+      slots_(settings.maximumWorkers) {
+  try {
+    shakeHands(settings, deadline);
+  } catch (...) {
+    end(milliseconds(0));
+    throw;
+  }
+}
+
+ServiceProcess::~ServiceProcess() {
+  end(milliseconds(0));
+}
+
+void ServiceProcess::shakeHands(const ServiceSettings& settings, Deadline deadline) {
+  ControlFrame hello = makeFrame(ControlKind::hello, 0);
+  hello.numbers[0] = settings.largestMessage;
+  hello.numbers[1] = settings.messagesPerWorker;
+  hello.numbers[2] = settings.cpuSecondsPerWorker;
+  ControlFrame answer;
+  const int control = handles_.control.get();
+  if (!sendFrame(control, hello, noDescriptor, deadline)) failToStart(false);
+  if (waitFor(control, POLLIN, deadline) == 0) failToStart(true);
+  if (receiveFrame(control, answer) != Received::frame) failToStart(false);
+  if (answer.kind == ControlKind::refused) {
+    throw StartFailure(Transport::sentence(Transport::Obstacle{answer.numbers[0]},
+                                           static_cast<int>(answer.numbers[1])),
+                       false);
+  }
+  if (answer.kind != ControlKind::ready) failToStart(false);
+  layers_ = answer.numbers[0];
+#ifndef KEELGATE_UNSEALED
+  // A service that was built for a sanitizer has no seal, and says so.
+  if ((layers_ & firstWalls) != firstWalls) {
+    throw StartFailure("The service was built without its seal: install a release build of it",
+                       false);
+  }
+#endif
+  const String missing = Transport::missingLayersLine(layers_);
+  if (settings.requireLayers && !missing.empty()) {
+    throw StartFailure(missing +
+                           ", and all layers are required: run it where the kernel and the "
+                           "container's profile allow them, or don't require them",
+                       false);
+  }
+}
+
+void ServiceProcess::failToStart(bool late) {
+  throw StartFailure(late ? "The service did not get ready in time: the machine may be overloaded"
+                          : "The service ended, or said something unknown, while it was starting: "
+                            "check that it is a VespKeelgateService of this build",
+                     true);
+}
+
+Optional<ServiceProcess::Forked> ServiceProcess::fork(Deadline deadline) {
+  int ends[2];
+  if (socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends) != 0) {
+    throw StartFailure(
+        "No channel for a worker could be made: " + std::generic_category().message(errno) +
+            "; raise the limit of open files (ulimit -n)",
+        true);
+  }
+  Descriptor ours(book_, ends[0]);
+  const Descriptor theirs(book_, ends[1]);
+  const Optional<std::uint32_t> slot = claimSlot();
+  if (!slot) return std::nullopt;
+  if (!sendFrame(handles_.control.get(), makeFrame(ControlKind::fork, *slot), theirs.get(),
+                 deadline)) {
+    lose();
+    return std::nullopt;
+  }
+  return Forked{.slot = *slot, .channel = std::move(ours)};
+}
+
+Optional<std::uint32_t> ServiceProcess::claimSlot() {
+  Lock lock(mutex_);
+  const auto free = [&] {
+    return std::find_if(slots_.begin(), slots_.end(),
+                        [](const Slot& slot) { return slot.phase == Slot::Phase::free; });
+  };
+  if (free() == slots_.end()) {
+    // Workers that have answered and stay: an honest one ends at once.
+    for (std::uint32_t i = 0; i < slots_.size(); ++i) {
+      if (slots_[i].phase == Slot::Phase::released) killSlot(i);
+    }
+    readUntil(lock, deadlineAfter(killPatience), [&] { return free() != slots_.end(); });
+  }
+  const auto slot = free();
+  if (slot == slots_.end()) destroy();
+  if (isLost()) return std::nullopt;
+  *slot = Slot{.phase = Slot::Phase::running};
+  return static_cast<std::uint32_t>(slot - slots_.begin());
+}
+
+void ServiceProcess::killSlot(std::uint32_t slot) noexcept {
+  if (slots_[slot].phase == Slot::Phase::ended || slots_[slot].killed) return;
+  slots_[slot].killed = true;
+  // Not waited for: if the zygote does not even read, its launcher is killed before long.
+  sendFrame(handles_.control.get(), makeFrame(ControlKind::kill, slot), noDescriptor, Clock::now());
+}
+
+void ServiceProcess::kill(std::uint32_t slot) noexcept {
+  const std::lock_guard lock(mutex_);
+  killSlot(slot);
+}
+
+Optional<int> ServiceProcess::awaitExit(std::uint32_t slot, Deadline deadline) {
+  Lock lock(mutex_);
+  const auto ended = [&] {
+    return slots_[slot].phase == Slot::Phase::ended;
+  };
+  readUntil(lock, deadline, ended);
+  if (!ended()) return std::nullopt;
+  return slots_[slot].status;
+}
+
+void ServiceProcess::release(std::uint32_t slot) noexcept {
+  const std::lock_guard lock(mutex_);
+  Slot& its = slots_[slot];
+  its.phase = its.phase == Slot::Phase::ended ? Slot::Phase::free : Slot::Phase::released;
+}
+
+void ServiceProcess::collect() noexcept {
+  const std::lock_guard lock(mutex_);
+  if (!reading_) readAll();
+}
+
+template <class Condition>
+void ServiceProcess::readUntil(Lock& lock, Deadline deadline, Condition condition) {
+  if (!reading_) readAll();
+  while (!condition() && !isLost() && Clock::now() < deadline) {
+    if (reading_) {
+      news_.wait_until(lock, deadline);
+      continue;
+    }
+    reading_ = true;
+    lock.unlock();
+    waitFor(handles_.control.get(), POLLIN, deadline);
+    lock.lock();
+    readAll();
+    reading_ = false;
+    news_.notify_all();
+  }
+}
+
+void ServiceProcess::readAll() noexcept {
+  for (ControlFrame frame; !isLost();) {
+    switch (receiveFrame(handles_.control.get(), frame)) {
+      case Received::nothing:
+        return;
+      case Received::frame:
+        noteExit(frame);
+        break;
+      case Received::end:
+        lose();
+        break;
+    }
+  }
+}
+
+void ServiceProcess::noteExit(const ControlFrame& frame) noexcept {
+  const bool known = frame.kind == ControlKind::exit && frame.slot < slots_.size();
+  Slot none;
+  Slot& slot = known ? slots_[frame.slot] : none;
+  if (slot.phase == Slot::Phase::free || slot.phase == Slot::Phase::ended) {
+    lose();
+    return;
+  }
+  slot.status = static_cast<int>(frame.numbers[0]);
+  slot.phase = slot.phase == Slot::Phase::released ? Slot::Phase::free : Slot::Phase::ended;
+  const int signal = WIFSIGNALED(slot.status) ? WTERMSIG(slot.status) : 0;
+  const bool expected = signal == 0 || signal == SIGXCPU || (signal == SIGKILL && slot.killed);
+  State running = State::running;
+  if (!expected) state_.compare_exchange_strong(running, State::retired);
+}
+
+void ServiceProcess::lose() noexcept {
+  state_ = State::lost;
+}
+
+void ServiceProcess::destroy() noexcept {
+  lose();
+  if (handles_.launcher) killLauncher(handles_.launcher);
+  // Ends the channel in every process that has a copy of it, and so whoever waits on it here.
+  shutdown(handles_.control.get(), SHUT_RDWR);
+}
+
+void ServiceProcess::end(milliseconds patience) noexcept {
+  if (!handles_.control) return;
+  lose();
+  shutdown(handles_.control.get(), SHUT_RDWR);
+  handles_.control.close();
+  if (!handles_.launcher) return;
+  if (patience.count() == 0 ||
+      waitFor(handles_.launcher.get(), POLLIN, deadlineAfter(patience)) == 0) {
+    killLauncher(handles_.launcher);
+    waitFor(handles_.launcher.get(), POLLIN, deadlineAfter(killPatience));
+  }
+  reapLauncher(handles_.launcher);
+  handles_.launcher.close();
+}
+
+}  // namespace Keelgate

@@ -1,0 +1,110 @@
+// SPDX-License-Identifier: Apache-2.0
+/// One running service, seen from its client: the launcher's pidfd and the control channel to the
+/// zygote, which forks workers, kills them and tells how they ended.
+///
+/// There is no thread that reads the channel. Whoever needs news reads it for all: one waiting
+/// thread at a time polls, the others sleep until it tells them.
+#pragma once
+
+#include "framework/client/launch.h"
+#include "framework/transport/frames.h"
+
+#include <keelgate/client.h>
+#include <keelgate/values.h>
+
+#include <atomic>
+#include <condition_variable>
+#include <mutex>
+
+namespace Keelgate {
+
+/// SIGKILL ends a process within this, unless the kernel itself is stuck.
+constexpr std::chrono::milliseconds killPatience{100};
+
+struct ServiceSettings {
+  /// Where `socket` is empty the program at `path` is started.
+  String path;
+  String socket;
+  bool requireLayers;
+  std::uint64_t largestMessage;
+  std::uint64_t messagesPerWorker;
+  std::uint64_t cpuSecondsPerWorker;
+  /// How many workers may be alive at a time, those included that have answered and not yet ended.
+  std::size_t maximumWorkers;
+};
+
+/// All members may be called from any thread.
+class ServiceProcess {
+ public:
+  /// Starts the service and shakes hands. Throws StartFailure.
+  ServiceProcess(const ServiceSettings& settings, DescriptorBook& book, Deadline deadline);
+  /// Ends it at once, if end() was not called.
+  ~ServiceProcess();
+  ServiceProcess(const ServiceProcess&) = delete;
+  ServiceProcess& operator=(const ServiceProcess&) = delete;
+
+  /// A worker as its slot, with the client's end of its channel.
+  struct Forked {
+    std::uint32_t slot;
+    Descriptor channel;
+  };
+  /// Asks for a worker, without waiting for it; nothing when the service is lost. Throws
+  /// StartFailure when no channel can be made.
+  Optional<Forked> fork(Deadline deadline);
+  /// SIGKILL for the worker, if it still runs.
+  void kill(std::uint32_t slot) noexcept;
+  /// How the worker ended, as wait status; nothing when the service is lost or it takes too long.
+  Optional<int> awaitExit(std::uint32_t slot, Deadline deadline);
+  /// Nobody will ask for this slot again.
+  void release(std::uint32_t slot) noexcept;
+  /// Takes note of the workers that have ended, without waiting.
+  void collect() noexcept;
+
+  /// Whether it should still be given messages: it is neither lost, nor did a worker of it die of a
+  /// signal. Workers are copies of one zygote and share its address layout: an attacker who could
+  /// crash one after the other could search for it.
+  [[nodiscard]] bool isUsable() const noexcept { return state_ == State::running; }
+  [[nodiscard]] bool isLost() const noexcept { return state_ == State::lost; }
+
+  /// SIGKILL for all of it.
+  void destroy() noexcept;
+  /// Closes the channel, waits for the end so long, and then uses SIGKILL.
+  void end(std::chrono::milliseconds patience) noexcept;
+
+  /// The walls that it has, as bits of Transport::Layer.
+  [[nodiscard]] std::uint64_t layers() const noexcept { return layers_; }
+
+ private:
+  enum class State { running, retired, lost };
+  struct Slot {
+    enum class Phase { free, running, released, ended };
+    Phase phase = Phase::free;
+    bool killed = false;
+    int status = 0;
+  };
+  using Lock = std::unique_lock<std::mutex>;
+
+  void shakeHands(const ServiceSettings& settings, Deadline deadline);
+  [[noreturn]] static void failToStart(bool late);
+  Optional<std::uint32_t> claimSlot();
+  void killSlot(std::uint32_t slot) noexcept;
+  template <class Condition>
+  void readUntil(Lock& lock, Deadline deadline, Condition condition);
+  void readAll() noexcept;
+  void noteExit(const Transport::ControlFrame& frame) noexcept;
+  void lose() noexcept;
+
+  DescriptorBook& book_;
+  ServiceHandles handles_;
+  std::uint64_t layers_ = 0;
+  std::atomic<State> state_ = State::running;
+
+  std::mutex mutex_;
+  std::condition_variable news_;
+  /// Whether a thread polls the channel for all.
+  bool reading_ = false;
+  /// Its size never changes.
+  std::vector<Slot> slots_;
+};
+
+}  // namespace Keelgate

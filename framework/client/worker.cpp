@@ -1,0 +1,72 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "framework/client/worker.h"
+
+#include <sys/wait.h>
+
+#include <csignal>
+#include <cstring>
+
+namespace Keelgate {
+
+using Reason = HostError::Reason;
+using std::chrono::milliseconds;
+
+namespace {
+
+/// The zygote tells of a death at once; on a machine that swaps, somewhat later.
+constexpr milliseconds exitPatience{500};
+
+HostError explain(int status) {
+  if (WIFEXITED(status) && WEXITSTATUS(status) == Transport::resourceExitStatus) {
+    return {Reason::resourcesExhausted, ""};
+  }
+  if (WIFEXITED(status)) {
+    return {Reason::crashed,
+            "it ended with status " + std::to_string(WEXITSTATUS(status)) + " and no answer"};
+  }
+  const int signal = WTERMSIG(status);
+  if (signal == SIGXCPU) return {Reason::timedOut, "it used up its processor time"};
+  return {Reason::crashed, "signal " + std::to_string(signal) + " (" + strsignal(signal) + ")"};
+}
+
+}  // namespace
+
+HostError lie() {
+  return {Reason::protocolViolation, ""};
+}
+
+Worker::~Worker() {
+  // Moved from.
+  if (!service_) return;
+  if (!finished_) service_->kill(slot_);
+  service_->release(slot_);
+}
+
+Optional<HostError> Worker::exchange(const ClientRequest& request, Deadline deadline,
+                                     ReceivedReply& reply) {
+  ++served_;
+  switch (channel_.exchange(request, deadline, reply)) {
+    case Ending::answered:
+      return std::nullopt;
+    case Ending::died:
+      return explainDeath();
+    case Ending::violation:
+      return lie();
+    case Ending::late:
+      break;
+  }
+  service_->kill(slot_);
+  // A zygote that does not even kill takes its whole service with it.
+  if (!service_->awaitExit(slot_, deadlineAfter(killPatience))) service_->destroy();
+  return HostError(Reason::timedOut, "");
+}
+
+HostError Worker::explainDeath() {
+  if (const Optional<int> status = service_->awaitExit(slot_, deadlineAfter(exitPatience))) {
+    return explain(*status);
+  }
+  service_->destroy();
+  return {Reason::crashed, "the service ended with it"};
+}
+
+}  // namespace Keelgate

@@ -1,0 +1,87 @@
+// SPDX-License-Identifier: Apache-2.0
+/// What the tests of the host share: clients of the fake service, and outcomes as short texts.
+#pragma once
+
+#include "framework/transport/record_coding.h"
+#include "tests/host/script.h"
+
+#include <keelgate/client.h>
+
+#include <filesystem>
+#include <fstream>
+#include <set>
+
+namespace Keelgate::Host {
+
+/// The fake service under a name that tells it how to start.
+inline String fakeService(const String& manner = "honest") {
+  const auto link = std::filesystem::temp_directory_path() /
+                    ("keelgate-" + std::to_string(getpid()) + "-fake_service." + manner);
+  if (!std::filesystem::is_symlink(link)) {
+    std::filesystem::create_symlink(KEELGATE_FAKE_SERVICE, link);
+  }
+  return link.string();
+}
+
+inline Client::Options fakeOptions(const String& manner = "honest") {
+  Client::Options options;
+  options.processes = 2;
+  options.timeLimit = std::chrono::milliseconds(20'000);
+  options.servicePath = fakeService(manner);
+  options.log = [](std::string_view) {
+  };
+  return options;
+}
+
+/// A record that can be told from others.
+inline Data recordNumbered(Int number) {
+  VespCommandResponse record{};
+  record.command = number;
+  record.applicationId = "application " + std::to_string(number);
+  return Transport::encodeRecord(record);
+}
+
+inline const char* nameOf(HostError::Reason reason) {
+  constexpr const char* names[] = {"crashed",           "timedOut",
+                                   "messageTooLarge",   "resourcesExhausted",
+                                   "protocolViolation", "startFailed"};
+  return names[static_cast<std::size_t>(reason)];
+}
+
+/// "record N", "decoding", "breach", or the reason of the host.
+template <class Call>
+String outcomeOf(Call call) {
+  try {
+    return "record " + std::to_string(call());
+  } catch (const HostError& error) {
+    return nameOf(error.reason);
+  } catch (const DecodingError&) {
+    return "decoding";
+  } catch (const Breach&) {
+    return "breach";
+  }
+}
+
+inline String outcomeOf(Client& client, Bytes message) {
+  return outcomeOf([&] { return client.unpack<VespCommandResponse>(message).command; });
+}
+
+inline std::size_t openDescriptors() {
+  std::size_t n = 0;
+  for ([[maybe_unused]] const auto& entry : std::filesystem::directory_iterator("/proc/self/fd")) {
+    ++n;
+  }
+  return n;
+}
+
+/// Zombies too.
+inline std::set<int> children() {
+  std::set<int> all;
+  for (const auto& task : std::filesystem::directory_iterator("/proc/self/task")) {
+    std::ifstream list(task.path() / "children");
+    for (int pid; list >> pid;) all.insert(pid);
+  }
+  return all;
+}
+
+}  // namespace Keelgate::Host

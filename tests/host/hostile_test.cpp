@@ -1,0 +1,232 @@
+// SPDX-License-Identifier: Apache-2.0
+// Workers that were taken over: whatever they do, a message has one outcome and the next one is
+// served.
+#include "framework/transport/error_coding.h"
+#include "tests/host/host_testing.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <csignal>
+
+namespace Keelgate::Host {
+namespace {
+
+using Transport::MalformedReply;
+using Transport::ReplyHeader;
+using Transport::ReplyKind;
+using Transport::Writer;
+
+ReplyHeader headerFor(Bytes body, ReplyKind kind = ReplyKind::record) {
+  return {Transport::magic, Transport::protocolVersion, kind, 0, 0, body.size()};
+}
+
+/// An answer with one thing wrong in its header.
+template <class Change>
+Script withHeader(Change change) {
+  const Data body = recordNumbered(7);
+  ReplyHeader header = headerFor(body);
+  change(header);
+  return Script().frame(header, body);
+}
+
+Script withBody(const Data& body) {
+  return Script().frame(headerFor(body), body);
+}
+
+Data changed(Data body, std::size_t at, std::uint8_t to) {
+  body.at(at) = std::byte{to};
+  return body;
+}
+
+Script chatter(std::size_t frames, std::size_t length) {
+  Script script;
+  for (std::size_t i = 0; i < frames; ++i) script.log(String(length, 'x'));
+  return script.answer(recordNumbered(7));
+}
+
+struct Attack {
+  const char* name;
+  Script script;
+  const char* outcome;
+};
+
+std::vector<Attack> attacks() {
+  const Data good = recordNumbered(7);
+  Data longer = good;
+  longer.push_back(std::byte{0});
+  Data twice;
+  for (int i = 0; i < 2; ++i) {
+    const ReplyHeader header = headerFor(good);
+    const Bytes head = std::as_bytes(std::span(&header, 1));
+    twice.insert(twice.end(), head.begin(), head.end());
+    twice.insert(twice.end(), good.begin(), good.end());
+  }
+  const Data unknownError{std::byte{9}};
+  // command, then a flag for each of messageId, messageUUID, responseStatus, failReason, token, two
+  // booleans, and the text.
+  constexpr std::size_t firstFlag = 8, textLength = 16, text = 24;
+  return {
+      {"honest", Script().answer(good), "record 7"},
+      {"honest with all the log lines", chatter(8, 512), "record 7"},
+      {"nothing", Script(), "crashed"},
+      {"half a header", Script().write(Bytes(twice).first(10)), "crashed"},
+      {"half a body", Script().write(Bytes(twice).first(40)), "crashed"},
+      {"no magic", withHeader([](auto& h) { h.magic = 0; }), "protocolViolation"},
+      {"other version", withHeader([](auto& h) { h.version = 2; }), "protocolViolation"},
+      {"no kind", withHeader([](auto& h) { h.kind = ReplyKind{}; }), "protocolViolation"},
+      {"other sequence", withHeader([](auto& h) { h.sequence = 1; }), "protocolViolation"},
+      {"reserved", withHeader([](auto& h) { h.reserved = 1; }), "protocolViolation"},
+      {"huge", withHeader([](auto& h) { h.bodyLength = ~0ull; }), "protocolViolation"},
+      {"long", withHeader([](auto& h) { h.bodyLength = 4u << 20; }), "protocolViolation"},
+      {"longer than sent", withHeader([](auto& h) { h.bodyLength += 1; }), "crashed"},
+      {"shorter than sent", withHeader([](auto& h) { h.bodyLength -= 1; }), "protocolViolation"},
+      {"an error as a record", withHeader([](auto& h) { h.kind = ReplyKind::error; }),
+       "protocolViolation"},
+      {"error of no kind", Script().frame(headerFor(unknownError, ReplyKind::error), unknownError),
+       "protocolViolation"},
+      {"too many log lines", chatter(9, 1), "protocolViolation"},
+      {"too long a log line", chatter(1, 513), "protocolViolation"},
+      {"two answers", Script().write(twice), "protocolViolation"},
+      {"endless", Script().then(Op::endless), "protocolViolation"},
+      {"flag that is none", withBody(changed(good, firstFlag, 2)), "protocolViolation"},
+      {"text beyond the end", withBody(changed(good, textLength, 0xff)), "protocolViolation"},
+      {"no UTF-8", withBody(changed(good, text, 0xff)), "protocolViolation"},
+      {"bytes left over", withBody(longer), "protocolViolation"},
+      {"out of memory", Script().then(Op::exit, Transport::resourceExitStatus),
+       "resourcesExhausted"},
+      {"leaves", Script().then(Op::exit, 0), "crashed"},
+      {"SIGSEGV", Script().then(Op::raise, SIGSEGV), "crashed"},
+      {"SIGSYS after half an answer",
+       Script().write(Bytes(twice).first(30)).then(Op::raise, SIGSYS), "crashed"},
+      {"killed by somebody", Script().then(Op::raise, SIGKILL), "crashed"},
+  };
+}
+
+TEST(Hostile, EachAttackHasItsOutcomeAndTheNextMessageIsServed) {
+  Client client(fakeOptions());
+  for (const Attack& attack : attacks()) {
+    EXPECT_EQ(outcomeOf(client, attack.script), attack.outcome) << attack.name;
+    EXPECT_EQ(outcomeOf(client, Script().answer(recordNumbered(1))), "record 1") << attack.name;
+  }
+}
+
+TEST(Hostile, OneThatKeepsTheClientWaitingIsGivenUp) {
+  Client::Options options = fakeOptions();
+  options.timeLimit = std::chrono::milliseconds(150);
+  Client client(options);
+  const Data good = recordNumbered(7);
+  Script dribble;
+  for (int i = 0; i < 3; ++i) dribble.write(Bytes(good).first(1)).then(Op::pause, 100);
+  const Script waits[] = {
+      Script().then(Op::pause, 60'000), dribble, Script().then(Op::raise, SIGSTOP),
+      withHeader([](auto& h) { h.bodyLength = 1u << 20; }).then(Op::pause, 60'000)};
+  for (const Script& script : waits) EXPECT_EQ(outcomeOf(client, script), "timedOut");
+  // The same when the message does not even fit into the channel.
+  const Data large(8u << 20);
+  const auto outcome = [&](UInt64 command) {
+    return outcomeOf([&] {
+      client.unpackClientMessage(large, {.command = command, .service = "s"});
+      return 0;
+    });
+  };
+  EXPECT_EQ(outcome(ignoreBody), "timedOut");
+  EXPECT_EQ(outcome(answerBeforeBody), "protocolViolation");
+  EXPECT_EQ(outcome(dieAfterHeader), "crashed");
+}
+
+TEST(Hostile, WorkersThatSpeakBeforeTheyAreAskedAreNotBelieved) {
+  Client client(fakeOptions("early"));
+  usleep(100'000);
+  EXPECT_EQ(outcomeOf(client, Script().answer(recordNumbered(7))), "protocolViolation");
+}
+
+/// So many payloads, each the only element of the list before it.
+Data nestedPayloads(std::size_t depth) {
+  PulseUserPayload payload{};
+  const Data flat = Transport::encodeRecord(payload);
+  payload.ostrelMessageList.emplace_back(PulseUserPayload{});
+  const Data one = Transport::encodeRecord(payload);
+  const auto count = std::mismatch(flat.begin(), flat.end(), one.begin()).first - flat.begin();
+  Data all;
+  for (std::size_t i = 1; i < depth; ++i) {
+    all.insert(all.end(), one.begin(), one.begin() + count + 8);
+  }
+  all.insert(all.end(), flat.begin(), flat.end());
+  for (std::size_t i = 1; i < depth; ++i)
+    all.insert(all.end(), flat.begin() + count + 8, flat.end());
+  return all;
+}
+
+TEST(Hostile, NestingEndsBeforeTheStackOfTheClientDoes) {
+  constexpr std::size_t most = Transport::maximumDepth;
+  EXPECT_NO_THROW(Transport::decodeRecord<PulseUserPayload>(nestedPayloads(most)));
+  EXPECT_THROW(Transport::decodeRecord<PulseUserPayload>(nestedPayloads(most + 1)), MalformedReply);
+  EXPECT_THROW(Transport::decodeRecord<PulseUserPayload>(nestedPayloads(50'000)), MalformedReply);
+}
+
+/// Every reply with any one byte changed is a record, an error, or known to be a lie.
+TEST(Hostile, NoChangedByteOfAReplyDoesMore) {
+  VespInvitation invitation{};
+  invitation.context.schema = "1";
+  const Data replies[] = {
+      recordNumbered(7), Transport::encodeRecord(invitation),
+      Transport::encodeError(DecodingError(DecodingError::Kind::keyNotFound, "k",
+                                           {String("a"), std::size_t{1}}, "missing")),
+      Transport::encodeError(Breach("domain", "type", "path"))};
+  const auto read = [](std::size_t which, Bytes body) {
+    try {
+      if (which == 0) Transport::decodeRecord<VespCommandResponse>(body);
+      if (which == 1) Transport::decodeRecord<VespInvitation>(body);
+      if (which > 1) Transport::throwError(body);
+    } catch (const MalformedReply&) {
+    } catch (const Error&) {
+    }
+  };
+  for (std::size_t which = 0; which < std::size(replies); ++which) {
+    for (std::size_t i = 0; i < replies[which].size(); ++i) {
+      for (int value = 0; value < 256; ++value) {
+        EXPECT_NO_THROW(read(which, changed(replies[which], i, static_cast<std::uint8_t>(value))));
+      }
+    }
+  }
+}
+
+TEST(Hostile, NoChangedByteOfAFrameDoesMore) {
+  Client client(fakeOptions());
+  const Data body = recordNumbered(7);
+  const ReplyHeader header = headerFor(body);
+  const Bytes head = std::as_bytes(std::span(&header, 1));
+  Data frame(head.begin(), head.end());
+  frame.insert(frame.end(), body.begin(), body.end());
+  for (std::size_t i = 0; i < frame.size(); ++i) {
+    Data other = frame;
+    other[i] ^= std::byte{0x41};
+    const String outcome = outcomeOf(client, Script().write(other));
+    EXPECT_TRUE(outcome == "crashed" || outcome == "protocolViolation" ||
+                (i >= head.size() && outcome.starts_with("record")))
+        << i << ": " << outcome;
+  }
+}
+
+TEST(Hostile, LogLinesCannotSteerATerminal) {
+  String seen;
+  Client::Options options = fakeOptions();
+  options.log = [&](std::string_view line) {
+    seen += String(line) + '|';
+  };
+  Client client(options);
+  const Data good = recordNumbered(7);
+  outcomeOf(client, Script()
+                        .log("plain, Zürich €")
+                        .log("\x1b[2J\r\n\t\x7f")
+                        .log("\xc2\x9b"
+                             "1A \xff\xc0\x80 \xed\xa0\x80")
+                        .answer(good));
+  EXPECT_EQ(seen,
+            "plain, Zürich €|\\x1b[2J\\x0d\\x0a\\x09\\x7f|"
+            "\\xc2\\x9b1A \\xff\\xc0\\x80 \\xed\\xa0\\x80|");
+}
+
+}  // namespace
+}  // namespace Keelgate::Host

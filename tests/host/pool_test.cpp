@@ -1,0 +1,272 @@
+// SPDX-License-Identifier: Apache-2.0
+// The life of a client: starting, sharing, retrying, forking, ending.
+#include "tests/host/host_testing.h"
+
+#include <gtest/gtest.h>
+
+#include <sys/socket.h>
+#include <sys/un.h>
+#include <sys/wait.h>
+
+#include <atomic>
+#include <csignal>
+#include <thread>
+
+namespace Keelgate::Host {
+namespace {
+
+using std::chrono::milliseconds;
+
+Script good(Int number = 7) {
+  return Script().answer(recordNumbered(number));
+}
+
+String startOf(const Client::Options& options) {
+  try {
+    const Client client(options);
+    return "started";
+  } catch (const HostError& error) {
+    return String(nameOf(error.reason)) + ": " + error.description;
+  }
+}
+
+TEST(Start, AFailureSaysWhatIsWrong) {
+  Client::Options missing = fakeOptions();
+  missing.servicePath = "/nowhere/service";
+  Client::Options noProgram = fakeOptions();
+  noProgram.servicePath = "/etc/passwd";
+  Client::Options noSocket = fakeOptions();
+  noSocket.socket = "/nowhere/socket";
+  Client::Options layers = fakeOptions("bare");
+  layers.requireLayers = true;
+  const std::pair<Client::Options, const char*> rows[] = {
+      {missing, "/nowhere/service could not be started: No such file"},
+      {noProgram, "/etc/passwd could not be started: Permission denied"},
+      {noSocket, "No service answers on the socket /nowhere/socket: No such file"},
+      {layers, "Running without: user namespace, mount namespace"},
+      {fakeOptions("refuses"), "The kernel refused the system call filter: use a kernel with"},
+      {fakeOptions("dies"), "ended, or said something unknown, while it was starting"},
+      {fakeOptions("babbles"), "ended, or said something unknown, while it was starting"}};
+  for (const auto& [options, sentence] : rows) {
+    const String outcome = startOf(options);
+    EXPECT_TRUE(outcome.starts_with("startFailed")) << outcome;
+    EXPECT_NE(outcome.find(sentence), String::npos) << outcome;
+  }
+  EXPECT_TRUE(children().empty());
+}
+
+TEST(Start, MissingSecondWallsAreToldOnceAndReported) {
+  std::vector<String> lines;
+  Client::Options options = fakeOptions("bare");
+  options.log = [&](std::string_view line) {
+    lines.emplace_back(line);
+  };
+  Client client(options);
+  EXPECT_EQ(outcomeOf(client, Script().then(Op::raise, SIGSEGV)), "crashed");
+  EXPECT_EQ(outcomeOf(client, good()), "record 7");
+  ASSERT_EQ(lines.size(), 1u);
+  EXPECT_TRUE(lines[0].starts_with("Running without: user namespace")) << lines[0];
+  std::size_t present = 0;
+  for (const SandboxLayer& layer : client.report().layers) present += layer.present ? 1 : 0;
+  EXPECT_EQ(present, 6u);
+}
+
+TEST(Pool, AZygoteThatDoesNotServeIsReplacedInTime) {
+  Client::Options options = fakeOptions("stuck");
+  options.timeLimit = milliseconds(100);
+  Client client(options);
+  const std::set<int> before = children();
+  EXPECT_EQ(outcomeOf(client, good()), "timedOut");
+  EXPECT_EQ(outcomeOf(client, good()), "timedOut");
+  EXPECT_NE(children(), before);
+}
+
+TEST(Pool, ASignalDeathGetsANewZygoteAndOthersKeepTheirMessage) {
+  Client client(fakeOptions());
+  const std::set<int> before = children();
+  std::atomic<bool> started = false;
+  std::thread other([&] {
+    started = true;
+    EXPECT_EQ(outcomeOf(client, Script().then(Op::pause, 300).answer(recordNumbered(9))),
+              "record 9");
+  });
+  while (!started) usleep(1000);
+  usleep(50'000);
+  EXPECT_EQ(outcomeOf(client, Script().then(Op::raise, SIGSEGV)), "crashed");
+  EXPECT_EQ(outcomeOf(client, good()), "record 7");
+  other.join();
+  EXPECT_EQ(outcomeOf(client, good()), "record 7");
+  const std::set<int> after = children();
+  EXPECT_EQ(after.size(), 1u);
+  EXPECT_NE(after, before);
+}
+
+TEST(Pool, OnlyAMessageThatFollowedOthersIsTriedAgain) {
+  std::size_t tries = 0;
+  Client::Options options = fakeOptions();
+  options.processes = 1;
+  options.messagesPerProcess = 3;
+  options.log = [&](std::string_view) {
+    ++tries;
+  };
+  Client client(options);
+  const auto triesOf = [&](const Script& script, const char* outcome) {
+    tries = 0;
+    EXPECT_EQ(outcomeOf(client, script), outcome);
+    return tries;
+  };
+  const Script dies = Script().log("try").then(Op::raise, SIGSEGV);
+  EXPECT_EQ(triesOf(dies, "crashed"), 1u);
+  EXPECT_EQ(triesOf(good(), "record 7"), 0u);
+  EXPECT_EQ(triesOf(dies, "crashed"), 2u);
+  EXPECT_EQ(triesOf(good(), "record 7"), 0u);
+  EXPECT_EQ(triesOf(Script().log("try").then(Op::raiseIfUsed, SIGSEGV).answer(recordNumbered(5)),
+                    "record 5"),
+            2u);
+}
+
+TEST(Pool, AWorkerSeesSoManyMessagesAndNoMore) {
+  Client::Options options = fakeOptions();
+  options.processes = 1;
+  options.messagesPerProcess = 3;
+  Client client(options);
+  // A reply that spells out its sequence is right only in the worker that counts the same.
+  const auto inPosition = [](std::uint32_t sequence) {
+    const Data body = recordNumbered(static_cast<Int>(sequence));
+    return Script().frame({Transport::magic, Transport::protocolVersion,
+                           Transport::ReplyKind::record, sequence, 0, body.size()},
+                          body);
+  };
+  for (std::uint32_t i = 0; i < 9; ++i) {
+    EXPECT_EQ(outcomeOf(client, inPosition(i % 3)), "record " + std::to_string(i % 3));
+  }
+}
+
+TEST(Pool, ManyThreadsShareFewProcesses) {
+  Client client(fakeOptions());
+  std::atomic<int> right = 0;
+  std::vector<std::thread> threads;
+  for (Int t = 0; t < 6; ++t) {
+    threads.emplace_back([&, t] {
+      for (Int i = 0; i < 40; ++i) {
+        const Int number = t * 1000 + i;
+        if (outcomeOf(client, good(number)) == "record " + std::to_string(number)) ++right;
+      }
+    });
+  }
+  for (std::thread& thread : threads) thread.join();
+  EXPECT_EQ(right, 240);
+}
+
+TEST(Pool, TooLargeAMessageIsNotSent) {
+  Client::Options options = fakeOptions();
+  options.largestMessage = 1000;
+  Client client(options);
+  EXPECT_EQ(outcomeOf(client, Data(1001)), "messageTooLarge");
+  EXPECT_EQ(outcomeOf(client, Data(1000)), "crashed");
+  EXPECT_EQ(outcomeOf([&] {
+              client.unpackClientMessage({}, {.command = 1, .service = String(65'537, 's')});
+              return 0;
+            }),
+            "messageTooLarge");
+}
+
+TEST(Application, MayIgnoreOrReapChildren) {
+  for (const bool ignores : {true, false}) {
+    if (ignores) signal(SIGCHLD, SIG_IGN);
+    {
+      Client client(fakeOptions());
+      EXPECT_EQ(outcomeOf(client, Script().then(Op::raise, SIGSEGV)), "crashed");
+      EXPECT_EQ(outcomeOf(client, good()), "record 7");
+      kill(*children().begin(), SIGKILL);
+      if (!ignores) waitpid(-1, nullptr, 0);
+      // The workers follow their zygote, perhaps not before one has been given this message.
+      if (const String outcome = outcomeOf(client, good()); outcome != "record 7") {
+        EXPECT_EQ(outcome, "crashed");
+        EXPECT_EQ(outcomeOf(client, good()), "record 7");
+      }
+    }
+    signal(SIGCHLD, SIG_DFL);
+    EXPECT_TRUE(children().empty());
+  }
+}
+
+TEST(Application, ItsForkHasAServiceOfItsOwn) {
+  Client client(fakeOptions());
+  EXPECT_EQ(outcomeOf(client, good(1)), "record 1");
+  const std::set<int> before = children();
+  const pid_t child = fork();
+  if (child == 0) {
+    const std::size_t inherited = openDescriptors();
+    const bool right = outcomeOf(client, good(2)) == "record 2" && children().size() == 1 &&
+                       openDescriptors() == inherited;
+    _exit(right ? 0 : 1);
+  }
+  EXPECT_EQ(outcomeOf(client, good(3)), "record 3");
+  int status = -1;
+  waitpid(child, &status, 0);
+  EXPECT_EQ(status, 0);
+  EXPECT_EQ(outcomeOf(client, good(4)), "record 4");
+  EXPECT_EQ(children(), before);
+}
+
+TEST(Application, GetsBackWhatItHadWhenTheClientEnds) {
+  const std::size_t descriptors = openDescriptors();
+  for (const char* manner : {"honest", "stuck"}) {
+    { const Client client(fakeOptions(manner)); }
+    EXPECT_TRUE(children().empty());
+    EXPECT_EQ(openDescriptors(), descriptors);
+  }
+}
+
+/// Serves connections of a socket as a service manager does: each gets a service on descriptor 3.
+class Activator {
+ public:
+  explicit Activator(const String& path) : path_(path) {
+    sockaddr_un address{};
+    address.sun_family = AF_UNIX;
+    path.copy(address.sun_path, sizeof address.sun_path - 1);
+    listener_ = socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0);
+    if (bind(listener_, reinterpret_cast<sockaddr*>(&address), sizeof address) != 0) abort();
+    listen(listener_, 8);
+    pid_ = fork();
+    while (pid_ == 0) {
+      const int connection = accept(listener_, nullptr, nullptr);
+      signal(SIGCHLD, SIG_IGN);
+      if (fork() == 0) {
+        signal(SIGCHLD, SIG_DFL);
+        dup2(connection, 3);
+        closefrom(4);
+        execl(KEELGATE_FAKE_SERVICE, "fake_service", nullptr);
+        _exit(1);
+      }
+      close(connection);
+    }
+  }
+  ~Activator() {
+    kill(pid_, SIGKILL);
+    waitpid(pid_, nullptr, 0);
+    close(listener_);
+    std::filesystem::remove(path_);
+  }
+
+ private:
+  String path_;
+  int listener_;
+  pid_t pid_;
+};
+
+TEST(Application, MayUseAnActivatedService) {
+  Client::Options options = fakeOptions();
+  options.socket =
+      std::filesystem::temp_directory_path() / ("keelgate-" + std::to_string(getpid()) + "-socket");
+  const Activator activator(options.socket);
+  Client client(options);
+  for (const Int number : {1, 2}) {
+    EXPECT_EQ(outcomeOf(client, Script().then(Op::raise, SIGSEGV)), "crashed");
+    EXPECT_EQ(outcomeOf(client, good(number)), "record " + std::to_string(number));
+  }
+}
+
+}  // namespace
+}  // namespace Keelgate::Host
