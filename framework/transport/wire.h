@@ -22,6 +22,8 @@ class MalformedReply : public std::exception {
 
 class Writer {
  public:
+  /// Room for most replies, in place of growing there byte by byte.
+  Writer() { out_.reserve(512); }
   void byte(std::uint8_t value) { out_.push_back(std::byte{value}); }
   void word(std::uint64_t value) { append(&value, sizeof value); }
   void octets(Bytes value) {

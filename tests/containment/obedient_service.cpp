@@ -88,15 +88,19 @@ long recurse(long levels) {
 }
 
 void misbehave(const std::string& how) {
-  if (how == "fault") *reinterpret_cast<volatile int*>(8) = 1;
+  // Volatile, so that no compiler sees through it.
+  volatile std::size_t address = 8;
+  if (how == "fault") *reinterpret_cast<volatile int*>(address) = 1;
   if (how == "trap") __builtin_trap();
   if (how == "abort") std::abort();
   if (how == "recurse") recurse(1'000'000);
   if (how == "throw") throw 1;
   while (how == "spin") _mm_pause();
   if (how == "execute") {
-    unsigned char code[] = {0xc3};
-    reinterpret_cast<void (*)()>(reinterpret_cast<std::size_t>(code))();
+    // A return instruction, in memory that can be written.
+    volatile unsigned char code[] = {0xc3};
+    address = reinterpret_cast<std::size_t>(code);
+    reinterpret_cast<void (*)()>(address)();
   }
 }
 
