@@ -76,6 +76,33 @@ TEST(Decoding, DamageIsFoundBeforeAnyFieldIsRead) {
   }
 }
 
+TEST(Decoding, EveryTruncationIsDamageAndEveryChangedByteHasOneAnswer) {
+  const std::pair<Target, Tree> messages[] = {
+      {sample, with({{"date", PropertyList::Date{5}}, {"version", -3}}, sampleMessage)},
+      {{video, 234}, Dictionary{{"v", 1}, {"s", "S"}, {"p", "\u00e9\U0001f600"}, {"c", data("x")}}},
+      {payload, Dictionary{{"c", 1}, {"mml", Array{Dictionary{{"c", 2}, {"h", Dictionary{}}}}}}},
+  };
+  const auto checkAll = [](const Target& target, std::vector<std::byte> bytes) {
+    for (std::size_t length = 0; length < bytes.size(); ++length) {
+      EXPECT_EQ(outcome(target, Keelgate::Bytes(bytes).first(length)), "dataCorrupted @") << length;
+    }
+    for (std::byte& byte : bytes) {
+      for (int change = 1; change < 256; ++change) {
+        byte ^= static_cast<std::byte>(change);
+        EXPECT_NE(outcome(target, Keelgate::Bytes(bytes)), "");
+        byte ^= static_cast<std::byte>(change);
+      }
+    }
+  };
+  for (const auto& [target, tree] : messages) {
+    checkAll(target, PropertyList::writeBinary(tree));
+    std::string xml = PropertyList::writeXml(tree);
+    while (xml.ends_with('\n')) xml.pop_back();
+    const auto bytes = std::as_bytes(std::span(xml));
+    checkAll(target, {bytes.begin(), bytes.end()});
+  }
+}
+
 TEST(Decoding, NumbersFillTheFieldsThatHoldThemExactly) {
   const Dictionary base{{"kHearthdVersionKey", 1.5}, {"kHearthdSupportedFeaturesKey", Array{}}};
   const auto version = [&](Tree number) {

@@ -1,0 +1,36 @@
+#!/usr/bin/env python3
+# SPDX-License-Identifier: Apache-2.0
+"""Unpacks every example with the built command, in the sandbox, and compares the reply with the one
+that stands beside it. With --write the replies are written instead.
+
+usage: run.py ROOT KEELGATE [--write]
+"""
+import pathlib
+import shlex
+import subprocess
+import sys
+
+folder = pathlib.Path(sys.argv[1]) / "examples/messages"
+keelgate, write = sys.argv[2], "--write" in sys.argv
+passed = failed = 0
+
+for line in (folder / "index.txt").read_text().splitlines():
+    if not line or line.startswith("#"):
+        continue
+    name, *arguments = shlex.split(line)
+    files = [name] if "." in name else [f"{name}.xml", f"{name}.bplist"]
+    expected = folder / f"{name.split('.')[0]}.json"
+    for file in files:
+        done = subprocess.run([keelgate, "unpack", "--pretty", *arguments, folder / file],
+                              capture_output=True, text=True, timeout=60)
+        if write:
+            expected.write_text(done.stdout)
+        rejected = '"error"' in done.stdout.split("\n")[1]
+        if done.stdout == expected.read_text() and done.returncode == rejected:
+            passed += 1
+        else:
+            failed += 1
+            print(f"{file}: status {done.returncode}\n{done.stdout}{done.stderr}")
+
+print(f"{passed} passed, {failed} failed")
+sys.exit(failed > 0 or passed == 0)
