@@ -3,6 +3,8 @@
 // fuzz harnesses and the tests of plist/.
 #pragma once
 
+#include <cmath>
+#include <limits>
 #include <string>
 
 #include "plist/document.h"
@@ -25,10 +27,11 @@ inline Tree treeOf(const Value& value, ExpansionBudget& budget) {
       if (integer.bits >> 63 != 0 && !integer.negative) return integer.bits;
       return static_cast<std::int64_t>(integer.bits);
     }
+    // One NaN stands for all, and one zero date for both: XML does not tell them apart.
     case Type::real:
-      return value.real();
+      return std::isnan(value.real()) ? std::numeric_limits<double>::quiet_NaN() : value.real();
     case Type::date:
-      return Date{value.date()};
+      return Date{value.date() + 0.0};
     case Type::string:
       budget.spend(value, value.string().size());
       return value.string();

@@ -1,7 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
 #include <array>
+#include <bit>
 #include <cstdint>
+#include <cstring>
 
+#include "plist/cursor.h"
 #include "plist/xml_scalars.h"
 
 namespace PropertyList {
@@ -29,10 +32,6 @@ constexpr std::uint32_t lookUp(std::size_t place, char c) noexcept {
   return tables[place][static_cast<unsigned char>(c)];
 }
 
-constexpr bool isSpace(char c) noexcept {
-  return c == ' ' || c == '\n' || c == '\t' || c == '\r';
-}
-
 void write(std::uint32_t group, std::size_t length, char* out) noexcept {
   for (std::size_t i = 0; i < length; ++i) out[i] = static_cast<char>(group >> (16 - 8 * i));
 }
@@ -56,16 +55,22 @@ struct Group {
   }
 };
 
-// Decodes whole groups without white space; moves `at` to the first group that is none.
-std::size_t decodeRun(std::string_view text, std::size_t& at, char* out) noexcept {
-  std::size_t written = 0;
-  for (; text.size() - at >= 4; at += 4, written += 3) {
-    const std::uint32_t group = lookUp(0, text[at]) | lookUp(1, text[at + 1]) |
-                                lookUp(2, text[at + 2]) | lookUp(3, text[at + 3]);
-    if (group >= notInAlphabet) break;
-    write(group, 3, out + written);
+// Decodes groups without white space or padding and returns how many; the caller decodes on from
+// there. Each is written as 4 bytes, the last of which the next group replaces, so the run ends
+// while another group is left.
+std::size_t decodeRun(std::string_view text, char* out) noexcept {
+  const char* const in = text.data();
+  std::size_t groups = 0;
+  for (; 4 * groups + 8 <= text.size(); ++groups) {
+    std::array<char, 4> c;
+    std::memcpy(c.data(), in + 4 * groups, c.size());
+    std::uint32_t bits = lookUp(0, c[0]) | lookUp(1, c[1]) | lookUp(2, c[2]) | lookUp(3, c[3]);
+    if (bits >= notInAlphabet) break;
+    bits <<= 8;
+    if constexpr (std::endian::native == std::endian::little) bits = __builtin_bswap32(bits);
+    std::memcpy(out + 3 * groups, &bits, sizeof bits);
   }
-  return written;
+  return groups;
 }
 
 }  // namespace
@@ -75,7 +80,12 @@ std::optional<std::size_t> decodeBase64(std::string_view text, char* out) noexce
   std::size_t written = 0;
   bool ended = false;
   for (;;) {
-    if (!ended) written += decodeRun(text, at, out + written);
+    while (at < text.size() && isSpace(text[at])) ++at;
+    if (!ended) {
+      const std::size_t groups = decodeRun(text.substr(at), out + written);
+      at += 4 * groups;
+      written += 3 * groups;
+    }
     Group group;
     while (at < text.size() && group.characters < 4) {
       if (!group.add(text[at++])) return std::nullopt;

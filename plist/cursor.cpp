@@ -6,11 +6,6 @@
 namespace PropertyList {
 namespace {
 
-constexpr bool isSpace(std::byte c) noexcept {
-  return c == std::byte{' '} || c == std::byte{'\n'} || c == std::byte{'\t'} ||
-         c == std::byte{'\r'};
-}
-
 constexpr bool isPlain(unsigned c) noexcept {
   return (c >= 0x20 || c == '\t' || c == '\n') && c < 0x80 && c != '<' && c != '&' && c != ']';
 }
@@ -21,31 +16,35 @@ constexpr auto plainBytes = [] {
   return table;
 }();
 
-constexpr std::size_t blockLength = 32;
+// The compilers' portable vectors: one register where the machine has such, words elsewhere.
+constexpr std::size_t blockLength = 16;
+using Block [[gnu::vector_size(blockLength)]] = signed char;
 
-// No early exit and no table, so that the compiler turns the loop into vector comparisons.
-bool isPlainBlock(const std::byte* block) noexcept {
-  unsigned char special = 0;
-  for (std::size_t i = 0; i < blockLength; ++i) {
-    const auto c = static_cast<unsigned char>(block[i]);
-    special |= static_cast<unsigned char>(c >= 0x80) |
-               static_cast<unsigned char>((c < 0x20) & (c != '\n') & (c != '\t')) |
-               static_cast<unsigned char>(c == '<') | static_cast<unsigned char>(c == '&') |
-               static_cast<unsigned char>(c == ']');
-  }
-  return special == 0;
+// How many bytes of a block come before the first that is not plain.
+std::size_t plainPrefix(const std::byte* bytes) noexcept {
+  Block block;
+  std::memcpy(&block, bytes, sizeof block);
+  // As signed numbers, the bytes above 0x7F are below a space too.
+  const auto special = ((block < ' ') & (block != '\n') & (block != '\t')) | (block == '<') |
+                       (block == '&') | (block == ']');
+  std::array<std::uint64_t, 2> words;
+  static_assert(sizeof words == sizeof special);
+  std::memcpy(words.data(), &special, sizeof words);
+  constexpr bool isLittle = std::endian::native == std::endian::little;
+  const auto before = [](std::uint64_t word) {
+    return static_cast<std::size_t>(isLittle ? std::countr_zero(word) : std::countl_zero(word)) / 8;
+  };
+  return words[0] != 0 ? before(words[0]) : 8 + before(words[1]);
 }
 
 }  // namespace
 
-bool Cursor::skipSpace() noexcept {
-  const std::byte* const start = here_;
-  while (here_ != end_ && isSpace(*here_)) ++here_;
-  return here_ != start;
-}
-
 void Cursor::skipPlain() noexcept {
-  while (remaining() >= blockLength && isPlainBlock(here_)) here_ += blockLength;
+  while (remaining() >= blockLength) {
+    const std::size_t length = plainPrefix(here_);
+    here_ += length;
+    if (length < blockLength) return;
+  }
   while (here_ != end_ && plainBytes[std::to_integer<std::size_t>(*here_)]) ++here_;
 }
 

@@ -20,6 +20,11 @@
 
 namespace PropertyList {
 
+// White space as XML and base64 know it.
+constexpr bool isSpace(char c) noexcept {
+  return c == ' ' || c == '\n' || c == '\t' || c == '\r';
+}
+
 class Cursor {
  public:
   explicit Cursor(Bytes message) noexcept : Cursor(message, 0, message.size()) {}
@@ -89,7 +94,11 @@ class Cursor {
     return true;
   }
   // Moves past white space as XML knows it; says whether there was any.
-  bool skipSpace() noexcept;
+  bool skipSpace() noexcept {
+    const std::byte* const start = here_;
+    while (here_ != end_ && isSpace(std::to_integer<char>(*here_))) ++here_;
+    return here_ != start;
+  }
   // Moves to the next byte that text gives a meaning to or forbids: '<', '&', ']', a carriage
   // return, another control character, or any byte above 0x7F. Or to the end.
   void skipPlain() noexcept;

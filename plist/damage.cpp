@@ -1,93 +1,68 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "plist/damage.h"
 
-namespace PropertyList {
+#include <array>
 
-// Two functions, because one switch over all reasons would be longer than a screen.
-static std::string_view sentenceOfMarkup(Problem problem) noexcept {
-  switch (problem) {
-    case Problem::badUtf8:
-      return "The text is not valid UTF-8.";
-    case Problem::forbiddenCharacter:
-      return "The text holds a character that XML forbids.";
-    case Problem::badReference:
-      return "An entity or character reference is not allowed.";
-    case Problem::badDeclaration:
-      return "The XML declaration is malformed or not for UTF-8.";
-    case Problem::badDocumentType:
-      return "The document type is malformed or has a subset.";
-    case Problem::badComment:
-      return "A comment is malformed.";
-    case Problem::badInstruction:
-      return "A processing instruction is malformed or misplaced.";
-    case Problem::badTag:
-      return "A tag is malformed.";
-    case Problem::duplicateAttribute:
-      return "A tag has the same attribute twice.";
-    case Problem::unknownElement:
-      return "An element is unknown.";
-    case Problem::misplacedElement:
-      return "An element stands where it may not.";
-    case Problem::mismatchedEnd:
-      return "An end tag does not match its element.";
-    case Problem::strayText:
-      return "Text stands where only elements may.";
-    case Problem::missingValue:
-      return "A value is missing.";
-    case Problem::badInteger:
-      return "An integer is misspelt.";
-    case Problem::badReal:
-      return "A real is misspelt or out of range.";
-    case Problem::badDate:
-      return "A date is misspelt or not in the calendar.";
-    case Problem::badBase64:
-      return "Data is not base64 with full padding.";
-    default:
-      return "The property list is damaged.";
+namespace PropertyList {
+namespace {
+
+struct Reason {
+  Problem problem;
+  std::string_view sentence;
+};
+
+// In the order of the enumerators.
+constexpr auto reasons = std::to_array<Reason>({
+    {Problem::messageTooLarge, "The message is larger than 4 GiB."},
+    {Problem::notPropertyList, "The message is neither a binary nor an XML property list."},
+    {Problem::truncated, "The message ends too early."},
+    {Problem::trailer, "The trailer does not fit the message."},
+    {Problem::objectOutside, "An object lies outside the object area."},
+    {Problem::unknownMarker, "An object has an unknown marker."},
+    {Problem::badCount, "An object's count is not an integer."},
+    {Problem::integerTooLarge, "An integer does not fit 64 bits."},
+    {Problem::dateNotFinite, "A date is not finite."},
+    {Problem::notAscii, "An ASCII string holds another character."},
+    {Problem::straySurrogate, "A UTF-16 string holds a stray surrogate."},
+    {Problem::referenceOutOfRange, "A reference names no object."},
+    {Problem::keyNotString, "A dictionary's key is not a string."},
+    {Problem::duplicateKey, "A dictionary has the same key twice."},
+    {Problem::selfContaining, "A container contains itself."},
+    {Problem::tooDeep, "Containers are nested too deeply."},
+    {Problem::overlappingObjects, "Objects overlap beyond what the message can justify."},
+    {Problem::excessiveExpansion, "Shared objects expand beyond what the message can justify."},
+    {Problem::badUtf8, "The text is not valid UTF-8."},
+    {Problem::forbiddenCharacter, "The text holds a character that XML forbids."},
+    {Problem::badReference, "An entity or character reference is not allowed."},
+    {Problem::badDeclaration, "The XML declaration is malformed or not for UTF-8."},
+    {Problem::badDocumentType, "The document type is malformed or has a subset."},
+    {Problem::badComment, "A comment is malformed."},
+    {Problem::badInstruction, "A processing instruction is malformed or misplaced."},
+    {Problem::badTag, "A tag is malformed."},
+    {Problem::duplicateAttribute, "A tag has the same attribute twice."},
+    {Problem::unknownElement, "An element is unknown."},
+    {Problem::misplacedElement, "An element stands where it may not."},
+    {Problem::mismatchedEnd, "An end tag does not match its element."},
+    {Problem::strayText, "Text stands where only elements may."},
+    {Problem::missingValue, "A value is missing."},
+    {Problem::badInteger, "An integer is misspelt."},
+    {Problem::badReal, "A real is misspelt or out of range."},
+    {Problem::badDate, "A date is misspelt or not in the calendar."},
+    {Problem::badBase64, "Data is not base64 with full padding."},
+});
+
+constexpr bool isInOrder() noexcept {
+  for (std::size_t i = 0; i < reasons.size(); ++i) {
+    if (static_cast<std::size_t>(reasons[i].problem) != i) return false;
   }
+  return reasons.back().problem == Problem::badBase64;
 }
+static_assert(isInOrder(), "a reason without its sentence, or out of order");
+
+}  // namespace
 
 std::string_view sentence(Problem problem) noexcept {
-  switch (problem) {
-    case Problem::messageTooLarge:
-      return "The message is larger than 4 GiB.";
-    case Problem::notPropertyList:
-      return "The message is neither a binary nor an XML property list.";
-    case Problem::truncated:
-      return "The message ends too early.";
-    case Problem::trailer:
-      return "The trailer does not fit the message.";
-    case Problem::objectOutside:
-      return "An object lies outside the object area.";
-    case Problem::unknownMarker:
-      return "An object has an unknown marker.";
-    case Problem::badCount:
-      return "An object's count is not an integer.";
-    case Problem::integerTooLarge:
-      return "An integer does not fit 64 bits.";
-    case Problem::dateNotFinite:
-      return "A date is not finite.";
-    case Problem::notAscii:
-      return "An ASCII string holds another character.";
-    case Problem::straySurrogate:
-      return "A UTF-16 string holds a stray surrogate.";
-    case Problem::referenceOutOfRange:
-      return "A reference names no object.";
-    case Problem::keyNotString:
-      return "A dictionary's key is not a string.";
-    case Problem::duplicateKey:
-      return "A dictionary has the same key twice.";
-    case Problem::selfContaining:
-      return "A container contains itself.";
-    case Problem::tooDeep:
-      return "Containers are nested too deeply.";
-    case Problem::overlappingObjects:
-      return "Objects overlap beyond what the message can justify.";
-    case Problem::excessiveExpansion:
-      return "Shared objects expand beyond what the message can justify.";
-    default:
-      return sentenceOfMarkup(problem);
-  }
+  return reasons[static_cast<std::size_t>(problem)].sentence;
 }
 
 }  // namespace PropertyList

@@ -109,15 +109,30 @@ void XmlReader::readElement() {
 }
 
 Element XmlReader::elementHere() {
-  std::size_t length = 0;
-  while (cursor_.peek(length) >= 'a' && cursor_.peek(length) <= 'z') ++length;
-  const std::string_view name = cursor_.rest().substr(0, length);
-  for (std::size_t i = 0; i < names.size(); ++i) {
-    if (name != names[i]) continue;
-    cursor_.skip(length);
-    return static_cast<Element>(i);
+  const auto is = [this](Element element, std::string_view name) {
+    if (!cursor_.skipIf(name)) scanner_.fail(Problem::unknownElement);
+    return element;
+  };
+  // The first letter, or the fourth, tells which one it can be.
+  switch (cursor_.peek()) {
+    case 'k':
+      return is(Element::key, "key");
+    case 's':
+      return is(Element::string, "string");
+    case 'i':
+      return is(Element::integer, "integer");
+    case 'r':
+      return is(Element::real, "real");
+    case 't':
+      return is(Element::yes, "true");
+    case 'f':
+      return is(Element::no, "false");
+    case 'a':
+      return is(Element::array, "array");
+    default:
+      if (cursor_.peek(3) == 't') return is(Element::dictionary, "dict");
+      return cursor_.peek(3) == 'a' ? is(Element::data, "data") : is(Element::date, "date");
   }
-  scanner_.fail(Problem::unknownElement);
 }
 
 // In a dictionary keys and values take turns; elsewhere there are no keys.

@@ -1,0 +1,38 @@
+// SPDX-License-Identifier: Apache-2.0
+// What both property-list harnesses ask of a message: it is refused with Damage, or everything in
+// it can be walked, and its value, rewritten in either format, reads back as the same value.
+#pragma once
+
+#include <cstdlib>
+#include <stdexcept>
+
+#include "fuzz/plist_walk.h"
+#include "plist/writer.h"
+
+namespace PropertyList {
+
+inline void require(bool holds) {
+  if (!holds) std::abort();
+}
+
+inline void checkTwins(Bytes message) {
+  Tree tree = nullptr;
+  try {
+    tree = treeOf(message);
+  } catch (const Damage& damage) {
+    require(damage.offset() <= message.size());
+    return;
+  }
+  // Compared as bytes, in which a NaN equals itself.
+  const std::vector<std::byte> binary = writeBinary(tree);
+  require(writeBinary(treeOf(binary)) == binary);
+  std::string xml;
+  try {
+    xml = writeXml(tree);
+  } catch (const std::invalid_argument&) {
+    return;  // a null, a UID, a control character: binary has more than XML
+  }
+  require(writeBinary(treeOf(std::as_bytes(std::span(xml)))) == binary);
+}
+
+}  // namespace PropertyList
