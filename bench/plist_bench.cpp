@@ -45,7 +45,7 @@ void measure(const std::string& name, std::string message, Work work) {
   benchmark::RegisterBenchmark(
       name.c_str(), [message = std::move(message), work](benchmark::State& state) {
         for (auto _ : state) work(message);
-        state.SetBytesProcessed(static_cast<std::int64_t>(state.iterations() * message.size()));
+        state.SetBytesProcessed(state.iterations() * static_cast<std::int64_t>(message.size()));
       });
 }
 

@@ -13,6 +13,23 @@
 
 namespace PropertyList {
 
+Tree treeOf(const Value& value, ExpansionBudget& budget);
+
+inline Array elementsOf(const Value& value, ExpansionBudget& budget) {
+  Array elements;
+  for (const Value element : value.elements()) elements.push_back(treeOf(element, budget));
+  return elements;
+}
+
+inline Dictionary entriesOf(const Value& value, ExpansionBudget& budget) {
+  Dictionary entries;
+  for (const Entry entry : value.entries()) {
+    budget.spend(value, entry.key.size() + 1);
+    entries.emplace_back(std::string(entry.key), treeOf(entry.value, budget));
+  }
+  return entries;
+}
+
 // Throws Damage when sharing makes the tree too large. Depth is at most 512, as Document checks.
 // UIDs become 0: they have no accessor, because no field takes one.
 inline Tree treeOf(const Value& value, ExpansionBudget& budget) {
@@ -41,20 +58,11 @@ inline Tree treeOf(const Value& value, ExpansionBudget& budget) {
     case Type::uid:
       return Uid{0};
     case Type::array:
-    case Type::set: {
-      Array elements;
-      for (const Value element : value.elements()) elements.push_back(treeOf(element, budget));
-      if (value.type() == Type::set) return Set{std::move(elements)};
-      return elements;
-    }
-    case Type::dictionary: {
-      Dictionary entries;
-      for (const Entry entry : value.entries()) {
-        budget.spend(value, entry.key.size() + 1);
-        entries.emplace_back(std::string(entry.key), treeOf(entry.value, budget));
-      }
-      return entries;
-    }
+      return elementsOf(value, budget);
+    case Type::set:
+      return Set{elementsOf(value, budget)};
+    case Type::dictionary:
+      return entriesOf(value, budget);
   }
   __builtin_unreachable();
 }

@@ -72,12 +72,7 @@ TEST(Damage, BinaryObjects) {
        {"itself", binary({bytes("\xA1\x00")}), Problem::selfContaining},
        {"itself by a set", binary({"\xA1\x01", bytes("\xC1\x00")}), Problem::selfContaining},
        {"damage under an unread key",
-        binary({"\xD2\x01\x02\x03\x04",
-                "\x51"
-                "a",
-                "\x51"
-                "b",
-                "\x09", "\x51\x80"}),
+        binary({"\xD2\x01\x02\x03\x04", "\x51\x61", "\x51\x62", "\x09", "\x51\x80"}),
         Problem::notAscii},
        {"damage in an object nobody references", binary({"\xA0", "\x51\x80"})}});
 }
@@ -118,6 +113,12 @@ TEST(Damage, XmlMarkup) {
       {"document type inside", "<plist>" + type + "<true/></plist>", Problem::unknownElement},
       {"other root", "<list><true/></list>", Problem::unknownElement},
       {"no text at all", "plist", Problem::notPropertyList},
+  });
+}
+
+TEST(Damage, XmlElements) {
+  const std::string sound = "<plist><true/></plist>";
+  check({
       {"nothing in it", xml(""), Problem::missingValue},
       {"empty root", "<plist/>", Problem::missingValue},
       {"two values", xml("<true/><true/>"), Problem::mismatchedEnd},
@@ -134,6 +135,11 @@ TEST(Damage, XmlMarkup) {
       {"crossed ends", xml("<array><dict></array></dict>"), Problem::mismatchedEnd},
       {"space in the end tag", xml("<string>a</string\n>")},
       {"space before the end's name", xml("<string>a</ string>"), Problem::mismatchedEnd},
+  });
+}
+
+TEST(Damage, XmlTags) {
+  check({
       {"open quote", "<plist a='><true/></plist>", Problem::badTag},
       {"no quote", xml("<true a=b/>"), Problem::badTag},
       {"'<' in an attribute", xml("<true a='<'/>"), Problem::badTag},

@@ -12,19 +12,28 @@
 namespace PropertyList {
 namespace {
 
-std::uint64_t load(std::string_view bytes) noexcept {
-  std::uint64_t word = 0;
-  std::memcpy(&word, bytes.data(), std::min(bytes.size(), sizeof word));
+template <typename Word>
+std::uint64_t wordAt(std::string_view s, std::size_t offset) noexcept {
+  Word word;
+  std::memcpy(&word, s.data() + offset, sizeof word);
   return word;
 }
 
-// Looks at no more than 24 bytes: it has to be cheap, not good.
+// Looks at the beginning, the middle and the end: it has to be cheap, not good.
 std::uint64_t fingerprint(std::string_view s) noexcept {
   constexpr std::uint64_t mix = 0x9E37'79B9'7F4A'7C15;
-  std::uint64_t hash = (s.size() ^ load(s.substr(0, 8))) * mix;
-  if (s.size() > 8) {
-    hash = (std::rotl(hash, 29) ^ load(s.substr(s.size() - 8))) * mix;
-    hash = (std::rotl(hash, 29) ^ load(s.substr(s.size() / 2 - 4, 8))) * mix;
+  const std::size_t size = s.size();
+  std::uint64_t hash = size * mix;
+  if (size >= 8) {
+    hash = (hash ^ wordAt<std::uint64_t>(s, 0)) * mix;
+    hash = (std::rotl(hash, 29) ^ wordAt<std::uint64_t>(s, size / 2 - 4)) * mix;
+    hash = (std::rotl(hash, 29) ^ wordAt<std::uint64_t>(s, size - 8)) * mix;
+  } else if (size >= 2) {
+    const std::uint64_t ends =
+        wordAt<std::uint16_t>(s, 0) << 16 | wordAt<std::uint16_t>(s, size - 2);
+    hash = (hash ^ ends << 16 ^ wordAt<std::uint16_t>(s, size / 2 - 1)) * mix;
+  } else if (size == 1) {
+    hash = (hash ^ wordAt<std::uint8_t>(s, 0)) * mix;
   }
   return hash ^ (hash >> 32);
 }

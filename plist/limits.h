@@ -18,13 +18,13 @@ inline constexpr std::size_t nestedContainers = 512;
 // Bytes that the objects of a binary message may claim altogether, as base + factor x length.
 // Objects that do not overlap claim less than the message's length. A message whose objects all
 // claim one long string would otherwise have it scanned, and converted, once per object.
-inline constexpr std::uint64_t claimedBase = 64 * 1024;
+inline constexpr std::uint64_t claimedBase = std::uint64_t{64} << 10;
 inline constexpr std::uint64_t claimedFactor = 4;
 
 // Bytes that a reader may produce from shared objects, as base + factor x length. Writers share
 // equal scalars, so honest messages repeat short strings and numbers; a 64-fold growth is far
 // above what they reach, and keeps the worst message's cost linear in its size.
-inline constexpr std::uint64_t expansionBase = 1024 * 1024;
+inline constexpr std::uint64_t expansionBase = std::uint64_t{1} << 20;
 inline constexpr std::uint64_t expansionFactor = 64;
 
 // Keys of at most so many bytes are compared directly wherever they occur. Longer ones, which a

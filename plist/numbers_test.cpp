@@ -23,7 +23,7 @@ std::string date(std::string_view text) {
 
 Tree readBack(const Tree& tree) {
   const std::string text = writeXml(tree);
-  const Tree back = treeOf(writeBinary(tree));
+  Tree back = treeOf(writeBinary(tree));
   EXPECT_EQ(back, read(text));
   return back;
 }

@@ -82,14 +82,8 @@ TEST(Sharing, IsCheckedInLinearTimeAndPaidForWhenRead) {
 
 TEST(Sharing, IsInheritedDownwards) {
   //  top: {"a": list, "b": list, "c": own}, list: ["x"], own: ["x"]
-  const std::string message = binary({"\xD3\x01\x02\x03\x04\x04\x05",
-                                      "\x51"
-                                      "a",
-                                      "\x51"
-                                      "b",
-                                      "\x51"
-                                      "c",
-                                      "\xA1\x06", "\xA1\x07", "\x51x", "\x51y"});
+  const std::string message = binary({"\xD3\x01\x02\x03\x04\x04\x05", "\x51\x61", "\x51\x62",
+                                      "\x51\x63", "\xA1\x06", "\xA1\x07", "\x51x", "\x51y"});
   const Document document(bytesOf(message));
   EXPECT_FALSE(document.top().isShared());
   for (const Entry entry : document.top().entries()) {
@@ -134,7 +128,9 @@ TEST(Keys, RepetitionIsFoundInDictionariesOfEverySize) {
       Dictionary entries;
       for (std::size_t i = 0; i < count; ++i) {
         const std::string number = std::to_string(i * 7919 % 10'007);
-        entries.emplace_back(number + std::string(keyLength, 'k') + number, true);
+        std::string key = number;
+        key.append(keyLength, 'k').append(number);
+        entries.emplace_back(std::move(key), true);
       }
       EXPECT_EQ(problemIn(writeBinary(entries)), std::nullopt) << count;
       EXPECT_EQ(problemIn(writeXml(entries)), std::nullopt) << count;
@@ -146,16 +142,10 @@ TEST(Keys, RepetitionIsFoundInDictionariesOfEverySize) {
 }
 
 TEST(Keys, AreComparedByMeaning) {
-  EXPECT_EQ(problemIn(binary({"\xD2\x01\x02\x03\x03",
-                              "\x52"
-                              "ab",
-                              bytes("\x62\0a\0b"), "\x09"})),
-            Problem::duplicateKey);
-  EXPECT_EQ(problemIn(binary({"\xD2\x01\x01\x02\x02",
-                              "\x51"
-                              "a",
-                              "\x09"})),
-            Problem::duplicateKey);
+  EXPECT_EQ(
+      problemIn(binary({"\xD2\x01\x02\x03\x03", "\x52\x61\x62", bytes("\x62\0a\0b"), "\x09"})),
+      Problem::duplicateKey);
+  EXPECT_EQ(problemIn(binary({"\xD2\x01\x01\x02\x02", "\x51\x61", "\x09"})), Problem::duplicateKey);
   EXPECT_EQ(problemIn(xml("<dict><key>a&lt;</key><true/><key><![CDATA[a<]]></key><true/></dict>")),
             Problem::duplicateKey);
   EXPECT_EQ(problemIn(xml("<dict><key>a</key><dict><key>a</key><true/></dict></dict>")),

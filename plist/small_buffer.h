@@ -52,6 +52,7 @@ class SmallBuffer {
     size_ = size;
   }
   void reserve(std::size_t capacity) {
+    if (capacity <= capacity_) return;
     if (capacity > static_cast<std::size_t>(-1) / sizeof(T)) throw std::bad_alloc();
     void* const grown = std::realloc(heap_, capacity * sizeof(T));
     if (grown == nullptr) throw std::bad_alloc();

@@ -100,7 +100,7 @@ void XmlReader::readElement() {
   if (!cursor_.skipIf("<")) scanner_.fail(Problem::strayText);
   const Element element = elementHere();
   place(element);
-  if (cursor_.peek() != '>') scanner_.attributes();
+  if (cursor_.peek() != '>' && cursor_.peek() != '/') scanner_.attributes();
   const bool isEmpty = cursor_.skipIf("/");
   if (!cursor_.skipIf(">")) scanner_.fail(Problem::badTag);
   if (element == Element::array) return openContainer(Type::array, isEmpty);

@@ -10,9 +10,8 @@
 
 namespace PropertyList {
 
-void XmlScanner::miscellany() {
+void XmlScanner::markup() {
   for (;;) {
-    cursor_.skipSpace();
     if (cursor_.skipIf("<!--")) {
       comment();
     } else if (cursor_.skipIf("<?")) {
@@ -20,6 +19,7 @@ void XmlScanner::miscellany() {
     } else {
       return;
     }
+    cursor_.skipSpace();
   }
 }
 

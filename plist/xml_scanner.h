@@ -29,7 +29,11 @@ class XmlScanner {
   // Byte order mark, XML declaration and document type, with what may stand around them.
   void prolog();
   // White space, comments and instructions, in any number.
-  void miscellany();
+  void miscellany() {
+    cursor_.skipSpace();
+    const char second = cursor_.peek(1);
+    if (second == '!' || second == '?') markup();
+  }
   // The attributes of a start tag and white space, up to its '>' or "/>". They mean nothing here.
   void attributes();
   // A closing "</name>" with white space where XML allows it.
@@ -50,6 +54,7 @@ class XmlScanner {
   bool pseudoAttribute(std::string_view name, std::string_view& value);
   void documentType();
   void quoted(bool isPublic);
+  void markup();
   void comment();
   void instruction();
   std::string_view name(Problem problem);
