@@ -1,0 +1,35 @@
+// SPDX-License-Identifier: Apache-2.0
+/// What the subcommands do, once the command line is understood. Each says what it has to say on
+/// the console and notes the exit status there; HostError (startFailed) is thrown through.
+#pragma once
+
+#include "cli/console.h"
+#include "cli/json.h"
+#include "cli/reply.h"
+
+#include <keelgate/client.h>
+
+namespace Keelgate::CLI {
+
+struct UnpackOptions {
+  Subject subject;
+  /// Paths; "-" is standard input, and so is no path at all.
+  Array<String> files;
+  Layout layout = Layout::compact;
+};
+
+/// Unpacks every file, several at a time, and prints the replies in the order of the files. A file
+/// that cannot be read has no reply and does not keep the others from theirs.
+void unpack(Client::Options options, const UnpackOptions& what, Console& console);
+
+/// Answers the requests on standard input until it ends.
+void stream(Client::Options options, Console& console);
+
+/// Prints what this build knows, or what has the given name. An unknown name is said on the console
+/// together with the nearest ones.
+void describe(const Optional<String>& name, Bool json, Console& console);
+
+/// Prints the versions of the command and of its service, and the service's sandbox layers.
+void reportVersions(std::string_view version, Console& console);
+
+}  // namespace Keelgate::CLI

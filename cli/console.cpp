@@ -1,0 +1,124 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "cli/console.h"
+
+#include "cli/files.h"
+#include "cli/json_text.h"
+
+#include <fcntl.h>
+#include <fmt/format.h>
+#include <sys/ioctl.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <charconv>
+#include <csignal>
+#include <cstdlib>
+#include <system_error>
+
+namespace Keelgate::CLI {
+
+namespace {
+
+constexpr std::size_t narrowest = 40;
+constexpr std::size_t usual = 80;
+
+/// As in JSON but without the outer quotes, and with inner ones as they are.
+String escaped(std::string_view text) {
+  String all;
+  for (;;) {
+    const std::size_t plain = text.find_first_of("\"\\");
+    const String json = jsonString(text.substr(0, plain));
+    all.append(json, 1, json.size() - 2);
+    if (plain == std::string_view::npos) return all;
+    all += text[plain];
+    text.remove_prefix(plain + 1);
+  }
+}
+
+std::string_view variable(const char* name) {
+  const char* value = std::getenv(name);
+  return value == nullptr ? std::string_view() : std::string_view(value);
+}
+
+}  // namespace
+
+Console::Console() {
+  for (int standard : {STDIN_FILENO, STDOUT_FILENO, STDERR_FILENO}) {
+    if (fcntl(standard, F_GETFD) >= 0) continue;
+    // Opened the wrong way round, so that using it fails as it would have.
+    open("/dev/null", standard == STDIN_FILENO ? O_WRONLY : O_RDONLY);
+  }
+  std::signal(SIGPIPE, SIG_IGN);
+}
+
+Bool Console::print(std::string_view text) {
+  clearProgress();
+  try {
+    return writeAll(STDOUT_FILENO, text);
+  } catch (const std::system_error& error) {
+    complain(fmt::format("standard output: {}", error.code().message()));
+    note(Status::unusable);
+    return false;
+  }
+}
+
+void Console::complain(std::string_view sentence) {
+  sayLine(fmt::format("keelgate: {}", escaped(sentence)));
+}
+
+void Console::log(std::string_view line) {
+  sayLine(escaped(line));
+}
+
+void Console::sayLine(std::string_view line) {
+  clearProgress();
+  const std::lock_guard lock(mutex_);
+  try {
+    writeAll(STDERR_FILENO, fmt::format("{}\n", line));
+  } catch (const std::system_error&) {
+    // There is nowhere left to say it; the exit status still tells.
+  }
+}
+
+void Console::progress(std::size_t done, std::size_t total) {
+  if (!isTerminal(STDERR_FILENO)) return;
+  const std::lock_guard lock(mutex_);
+  const String line = fmt::format("\r{} of {} messages", done, total);
+  progressShown_ = write(STDERR_FILENO, line.data(), line.size()) > 0;
+}
+
+void Console::clearProgress() {
+  const std::lock_guard lock(mutex_);
+  if (!progressShown_) return;
+  constexpr std::string_view clear = "\r\033[K";
+  progressShown_ = write(STDERR_FILENO, clear.data(), clear.size()) < 0;
+}
+
+void Console::note(Status status) {
+  const std::lock_guard lock(mutex_);
+  status_ = std::max(status_, status);
+}
+
+Status Console::status() const {
+  const std::lock_guard lock(mutex_);
+  return status_;
+}
+
+Bool isTerminal(int descriptor) {
+  return isatty(descriptor) == 1;
+}
+
+std::size_t outputWidth() {
+  std::size_t width = 0;
+  const std::string_view columns = variable("COLUMNS");
+  std::from_chars(columns.data(), columns.data() + columns.size(), width);
+  winsize window{};
+  if (width == 0 && ioctl(STDOUT_FILENO, TIOCGWINSZ, &window) == 0) width = window.ws_col;
+  return std::max(width == 0 ? usual : width, narrowest);
+}
+
+Bool outputHasColour() {
+  return isTerminal(STDOUT_FILENO) && variable("NO_COLOR").empty() && variable("TERM") != "dumb";
+}
+
+}  // namespace Keelgate::CLI

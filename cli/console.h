@@ -1,0 +1,64 @@
+// SPDX-License-Identifier: Apache-2.0
+/// Where the command's words go: results to standard output, everything else to standard error.
+#pragma once
+
+#include <keelgate/values.h>
+
+#include <cstddef>
+#include <mutex>
+#include <string_view>
+
+namespace Keelgate::CLI {
+
+/// Exit statuses. The larger of two is the one that counts.
+enum class Status : std::uint8_t {
+  done = 0,
+  rejected = 1,
+  /// Wrong usage, an unreadable file, an invalid request, output that could not be written.
+  unusable = 2,
+  serviceLost = 3,
+};
+
+/// All members may be called from many threads at once.
+class Console {
+ public:
+  /// Makes sure that the three standard descriptors are taken, so that no file of ours becomes one,
+  /// and that a reader that goes away is an error and no signal.
+  Console();
+
+  /// Writes a result. False when nobody reads it any more, which is no fault, or when it could not
+  /// be written, which is said and remembered.
+  Bool print(std::string_view text);
+
+  /// One sentence about what went wrong. Untrusted parts may stand in it: characters that drive a
+  /// terminal are escaped.
+  void complain(std::string_view sentence);
+
+  /// A line of the service's log.
+  void log(std::string_view line);
+
+  /// Says how far the work is, at a terminal alone, over what it said before.
+  void progress(std::size_t done, std::size_t total);
+
+  /// Notes an exit status, and gives the worst that was noted.
+  void note(Status status);
+  [[nodiscard]] Status status() const;
+
+ private:
+  void sayLine(std::string_view line);
+  void clearProgress();
+
+  mutable std::mutex mutex_;
+  Status status_ = Status::done;
+  Bool progressShown_ = false;
+};
+
+Bool isTerminal(int descriptor);
+
+/// In columns: what COLUMNS says, else the terminal at standard output, else 80. At least 40.
+std::size_t outputWidth();
+
+/// Whether headings may stand out: at a terminal that can, unless NO_COLOR is set.
+Bool outputHasColour();
+
+}  // namespace Keelgate::CLI

@@ -1,0 +1,234 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "cli/commands.h"
+#include "cli/description.h"
+#include "cli/table.h"
+
+#include <fmt/format.h>
+
+namespace Keelgate::CLI {
+
+namespace {
+
+// ------------------------------------------------------------------------------------- JSON
+
+template <class Out>
+void writeText(Out& out, std::string_view key, std::string_view value) {
+  writeKey(out, key);
+  writeString(out, value);
+}
+
+template <class Out, class Rows, class WriteMembers>
+void writeRows(Out& out, std::string_view key, const Rows& rows, WriteMembers writeMembers) {
+  writeKey(out, key);
+  out.StartArray();
+  for (const auto& row : rows) {
+    out.StartObject();
+    writeMembers(row);
+    out.EndObject();
+  }
+  out.EndArray();
+}
+
+template <class Out>
+void writeServices(Out& out, const Description& what) {
+  writeRows(out, "services", what.services, [&](const ServiceRow& service) {
+    writeText(out, "service", service.service);
+    writeText(out, "unpacker", service.unpacker);
+    writeRows(out, "commands", service.commands, [&](const CommandRow& row) {
+      writeField(out, "command", row.command);
+      if (row.schema) writeText(out, "schema", *row.schema);
+      writeText(out, "case", row.caseName);
+    });
+  });
+}
+
+template <class Out>
+void writeCases(Out& out, std::string_view key, const Array<EnumerationCase>& cases) {
+  writeRows(out, key, cases, [&](const EnumerationCase& entry) {
+    writeField(out, "rawValue", entry.rawValue);
+    writeText(out, "name", entry.name);
+  });
+}
+
+template <class Out>
+void writeTables(Out& out, std::string_view key, const Array<StructTable>& tables, Bool schemas) {
+  writeKey(out, key);
+  out.StartObject();
+  for (const StructTable& table : tables) {
+    writeRows(out, table.name, table.fields, [&](const FieldRow& field) {
+      writeText(out, "field", field.name);
+      if (schemas) writeText(out, "key", field.key);
+      writeText(out, "type", field.type);
+      writeField(out, schemas ? "required" : "optional", field.required == schemas);
+    });
+  }
+  out.EndObject();
+}
+
+template <class Out>
+void writeEnumerations(Out& out, const Description& what) {
+  writeKey(out, "enumerations");
+  out.StartObject();
+  for (const EnumerationTable& table : what.enumerations) {
+    writeKey(out, table.name);
+    out.StartObject();
+    writeCases(out, "cases", table.cases);
+    if (table.fallback) writeText(out, "default", *table.fallback);
+    out.EndObject();
+  }
+  out.EndObject();
+}
+
+String jsonText(const Description& what) {
+  return jsonObject(Layout::pretty, [&](auto& out) {
+    writeRows(out, "messageUnpackers", what.messageUnpackers, [&](const MessageUnpackerRow& row) {
+      writeText(out, "record", row.record);
+      writeText(out, "unpacker", row.unpacker);
+      writeText(out, "schema", row.schema);
+    });
+    writeServices(out, what);
+    writeCases(out, "commands", what.commands);
+    writeTables(out, "schemas", what.schemas, true);
+    writeTables(out, "records", what.records, false);
+    writeEnumerations(out, what);
+  });
+}
+
+// ----------------------------------------------------------------------------------- tables
+
+/// Lays a description out for people.
+class Page {
+ public:
+  [[nodiscard]] String take() && { return std::move(text_); }
+
+  void heading(std::string_view title) {
+    if (!text_.empty()) text_ += '\n';
+    text_ += emphasised(String(title), colour_) + '\n';
+  }
+
+  void table(Array<String> headings, Array<Array<String>> rows) {
+    Table table(std::move(headings), outputWidth(), colour_);
+    for (Array<String>& row : rows) table.add(std::move(row));
+    text_ += table.text();
+  }
+
+  void line(std::string_view text) { text_ += fmt::format("\n{}\n", text); }
+
+ private:
+  String text_;
+  Bool colour_ = outputHasColour();
+};
+
+/// A table with a row for each element.
+template <class Rows, class Cells>
+void addTable(Page& page, Array<String> headings, const Rows& rows, Cells cells) {
+  Array<Array<String>> all;
+  for (const auto& row : rows) all.push_back(cells(row));
+  page.table(std::move(headings), std::move(all));
+}
+
+void addUnpackers(Page& page, const Description& what) {
+  if (what.messageUnpackers.empty()) return;
+  page.heading("Record types");
+  addTable(page, {"RECORD", "UNPACKER", "SCHEMA"}, what.messageUnpackers,
+           [](const MessageUnpackerRow& row) -> Array<String> {
+             return {String(row.record), String(row.unpacker), String(row.schema)};
+           });
+}
+
+void addServices(Page& page, const Description& what) {
+  for (const ServiceRow& service : what.services) {
+    page.heading(fmt::format("Service {}, by {}", service.service, service.unpacker));
+    addTable(page, {"COMMAND", "SCHEMA", "CASE"}, service.commands,
+             [](const CommandRow& row) -> Array<String> {
+               return {row.command ? fmt::format("{}", *row.command) : "any known",
+                       String(row.schema.value_or("(not decoded)")), String(row.caseName)};
+             });
+  }
+}
+
+void addCommands(Page& page, const Description& what) {
+  if (what.commands.empty()) return;
+  page.heading("Commands");
+  addTable(page, {"NUMBER", "NAME"}, what.commands,
+           [](const EnumerationCase& row) -> Array<String> {
+             return {fmt::format("{}", row.rawValue), String(row.name)};
+           });
+}
+
+void addNames(Page& page, std::string_view title, const Array<StructTable>& tables) {
+  page.heading(title);
+  addTable(page, {"NAME", "FIELDS"}, tables, [](const StructTable& table) -> Array<String> {
+    return {String(table.name), fmt::format("{}", table.fields.size())};
+  });
+}
+
+void addFields(Page& page, const Description& what) {
+  for (const StructTable& table : what.schemas) {
+    page.heading(fmt::format("Schema {}", table.name));
+    addTable(page, {"FIELD", "KEY", "TYPE", ""}, table.fields,
+             [](const FieldRow& field) -> Array<String> {
+               return {String(field.name), String(field.key), field.type,
+                       field.required ? "required" : ""};
+             });
+  }
+  for (const StructTable& table : what.records) {
+    page.heading(fmt::format("Record {}", table.name));
+    addTable(page, {"FIELD", "TYPE", ""}, table.fields, [](const FieldRow& field) -> Array<String> {
+      return {String(field.name), field.type, field.required ? "" : "optional"};
+    });
+  }
+}
+
+String casesText(const EnumerationTable& table) {
+  String text;
+  for (const EnumerationCase& entry : table.cases) {
+    text += fmt::format("{}{} = {}", text.empty() ? "" : ", ", entry.name, entry.rawValue);
+  }
+  if (table.fallback) text += fmt::format("; any other number: {}", *table.fallback);
+  return text;
+}
+
+void addEnumerations(Page& page, const Description& what) {
+  if (what.enumerations.empty()) return;
+  page.heading("Enumerations");
+  addTable(page, {"NAME", "CASES"}, what.enumerations,
+           [](const EnumerationTable& table) -> Array<String> {
+             return {String(table.name), casesText(table)};
+           });
+}
+
+String pageText(const Description& what, Bool overview) {
+  Page page;
+  addUnpackers(page, what);
+  addServices(page, what);
+  addCommands(page, what);
+  if (overview) {
+    addNames(page, "Schemas", what.schemas);
+    addNames(page, "Records", what.records);
+  } else {
+    addFields(page, what);
+  }
+  addEnumerations(page, what);
+  if (overview) page.line("`keelgate describe NAME` shows the fields of one.");
+  return std::move(page).take();
+}
+
+}  // namespace
+
+void describe(const Optional<String>& name, Bool json, Console& console) {
+  const Description all = describeAll();
+  const Description what = name ? describeNamed(all, *name) : all;
+  if (isEmpty(what)) {
+    const Array<std::string_view> nearest = nearestNames(all, *name);
+    const String hint = nearest.empty()
+                            ? "`keelgate describe` lists all names"
+                            : fmt::format("did you mean {}?", fmt::join(nearest, " or "));
+    console.complain(fmt::format("nothing is called \"{}\"; {}", *name, hint));
+    console.note(Status::unusable);
+    return;
+  }
+  console.print(json ? jsonText(what) : pageText(what, !name));
+}
+
+}  // namespace Keelgate::CLI

@@ -1,0 +1,220 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "cli/description.h"
+
+#include "program/service/tables.h"
+
+#include <keelgate/describe.h>
+#include <keelgate/type_name.h>
+
+#include <algorithm>
+#include <concepts>
+#include <numeric>
+#include <type_traits>
+#include <variant>
+
+namespace Keelgate::CLI {
+
+namespace {
+
+/// Enters what it is shown, and what that refers to, each once and in the order of meeting.
+class Walk {
+ public:
+  explicit Walk(Description& to) : to_(to) {}
+
+  template <Schema T>
+  void enter() {
+    enterStruct<T>(to_.schemas);
+  }
+  template <Record T>
+  void enter() {
+    enterStruct<T>(to_.records);
+  }
+
+ private:
+  template <class T>
+  void enterStruct(Array<StructTable>& section) {
+    if (std::ranges::count(section, typeName<T>(), &StructTable::name) > 0) return;
+    // Before its fields: a payload holds payloads.
+    const std::size_t position = section.size();
+    section.push_back({.name = typeName<T>(), .fields = {}});
+    Array<FieldRow> fields = fieldsOf<T>(section);
+    section[position].fields = std::move(fields);
+  }
+
+  template <class T>
+  Array<FieldRow> fieldsOf(Array<StructTable>& section) {
+    Array<FieldRow> rows;
+    if constexpr (CaseKeyed<T>) {
+      enterCases(rows, section, static_cast<const typename T::variant*>(nullptr), T::caseNames);
+    } else {
+      FieldsOf<T>::each([&]<class S, class V>(Field<S, V> field) {
+        rows.push_back({.name = field.name,
+                        .key = field.key,
+                        .type = typeText<V>(section),
+                        .required = !isOptional<V>});
+      });
+    }
+    return rows;
+  }
+
+  template <class... Cases, class Names>
+  void enterCases(Array<FieldRow>& rows, Array<StructTable>& section, const std::variant<Cases...>*,
+                  const Names& names) {
+    std::size_t i = 0;
+    ((rows.push_back(
+          {.name = names[i], .key = names[i], .type = typeText<Cases>(section), .required = false}),
+      ++i),
+     ...);
+  }
+
+  /// What a value's type is called in a table. `section` takes a case-keyed enumeration, which is
+  /// neither schema nor record itself.
+  template <class V>
+  String typeText(Array<StructTable>& section) {
+    if constexpr (isOptional<V>) {
+      return typeText<typename V::value_type>(section);
+    } else if constexpr (isArray<V>) {
+      return "[" + typeText<typename V::value_type>(section) + "]";
+    } else if constexpr (Enumeration<V>) {
+      enterEnumeration<V>();
+      return String(typeName<V>());
+    } else if constexpr (Described<V> || CaseKeyed<V>) {
+      enterStruct<V>(section);
+      return String(typeName<V>());
+    } else {
+      return scalarText(std::type_identity<V>());
+    }
+  }
+
+  static const char* scalarText(std::type_identity<String>) { return "string"; }
+  static const char* scalarText(std::type_identity<Int>) { return "int"; }
+  static const char* scalarText(std::type_identity<UInt>) { return "uint"; }
+  static const char* scalarText(std::type_identity<Int64>) { return "int64"; }
+  static const char* scalarText(std::type_identity<UInt64>) { return "uint64"; }
+  static const char* scalarText(std::type_identity<Double>) { return "double"; }
+  static const char* scalarText(std::type_identity<Bool>) { return "bool"; }
+  static const char* scalarText(std::type_identity<Data>) { return "data"; }
+  static const char* scalarText(std::type_identity<Date>) { return "date"; }
+  static const char* scalarText(std::type_identity<UUID>) { return "uuid"; }
+
+  template <class E>
+  void enterEnumeration() {
+    if (std::ranges::count(to_.enumerations, typeName<E>(), &EnumerationTable::name) > 0) return;
+    EnumerationTable table{
+        .name = typeName<E>(), .cases = {casesOf<E>.begin(), casesOf<E>.end()}, .fallback = {}};
+    if constexpr (Defaulting<E>) table.fallback = nameOf(keelgateDefault(E{}));
+    to_.enumerations.push_back(std::move(table));
+  }
+
+  Description& to_;
+};
+
+/// The name of the case that carries R in a client message's result.
+template <class R, class... Cases>
+std::string_view caseNameOf(const std::variant<Cases...>*) {
+  constexpr bool is[] = {std::same_as<R, Cases>...};
+  const auto position = std::ranges::find(is, true) - std::begin(is);
+  return VespClientMessageType::caseNames[static_cast<std::size_t>(position)];
+}
+
+template <class U>
+Array<CommandRow> commandsOf(Walk& walk) {
+  Array<CommandRow> rows;
+  U::Commands::each([&]<class Row>(std::type_identity<Row>) {
+    CommandRow row{.command = Row::command,
+                   .schema = {},
+                   .caseName = caseNameOf<typename Row::Record>(
+                       static_cast<const VespClientMessageType::variant*>(nullptr))};
+    if constexpr (Schema<typename Row::Schema>) {
+      row.schema = typeName<typename Row::Schema>();
+      walk.enter<typename Row::Schema>();
+    }
+    rows.push_back(row);
+  });
+  return rows;
+}
+
+/// How many characters must change between two names.
+std::size_t distance(std::string_view one, std::string_view other) {
+  Array<std::size_t> row(other.size() + 1);
+  std::iota(row.begin(), row.end(), std::size_t{0});
+  for (std::size_t i = 0; i < one.size(); ++i) {
+    std::size_t diagonal = std::exchange(row[0], i + 1);
+    for (std::size_t j = 0; j < other.size(); ++j) {
+      const std::size_t changed = diagonal + (one[i] == other[j] ? 0 : 1);
+      diagonal = row[j + 1];
+      row[j + 1] = std::min({changed, row[j] + 1, row[j + 1] + 1});
+    }
+  }
+  return row.back();
+}
+
+Array<std::string_view> namesOf(const Description& all) {
+  Array<std::string_view> names;
+  for (const auto& row : all.messageUnpackers)
+    names.insert(names.end(), {row.record, row.unpacker});
+  for (const auto& row : all.services) names.insert(names.end(), {row.service, row.unpacker});
+  for (const auto& row : all.commands) names.push_back(row.name);
+  for (const auto& table : all.schemas) names.push_back(table.name);
+  for (const auto& table : all.records) names.push_back(table.name);
+  for (const auto& table : all.enumerations) names.push_back(table.name);
+  std::ranges::sort(names);
+  names.erase(std::unique(names.begin(), names.end()), names.end());
+  return names;
+}
+
+}  // namespace
+
+Description describeAll() {
+  Description all;
+  Walk walk(all);
+  VespKeelgateService::MessageUnpackers::each([&]<class U>(std::type_identity<U>) {
+    all.messageUnpackers.push_back({.record = typeName<typename U::SchemaType>(),
+                                    .unpacker = typeName<U>(),
+                                    .schema = typeName<typename U::Schema>()});
+    walk.enter<typename U::Schema>();
+  });
+  VespKeelgateService::Services::each([&]<class S>(std::type_identity<S>) {
+    all.services.push_back({.service = S::identifier,
+                            .unpacker = typeName<typename S::Unpacker>(),
+                            .commands = commandsOf<typename S::Unpacker>(walk)});
+  });
+  all.commands.assign(casesOf<CommandType::Case>.begin(), casesOf<CommandType::Case>.end());
+  OutputRecords::each([&]<class R>(std::type_identity<R>) { walk.enter<R>(); });
+  return all;
+}
+
+Description describeNamed(const Description& all, std::string_view name) {
+  const auto named = [&](const auto& rows, auto... labels) {
+    auto chosen = rows;
+    std::erase_if(chosen, [&](const auto& row) { return (... && (row.*labels != name)); });
+    return chosen;
+  };
+  return {.messageUnpackers = named(all.messageUnpackers, &MessageUnpackerRow::record,
+                                    &MessageUnpackerRow::unpacker),
+          .services = named(all.services, &ServiceRow::service, &ServiceRow::unpacker),
+          .commands = named(all.commands, &EnumerationCase::name),
+          .schemas = named(all.schemas, &StructTable::name),
+          .records = named(all.records, &StructTable::name),
+          .enumerations = named(all.enumerations, &EnumerationTable::name)};
+}
+
+Bool isEmpty(const Description& description) {
+  return namesOf(description).empty();
+}
+
+Array<std::string_view> nearestNames(const Description& all, std::string_view name) {
+  constexpr std::size_t most = 3;
+  // A third of the name may be mistyped; a part of a name is like it too.
+  const auto unlike = [&](std::string_view candidate) {
+    const Bool part = name.size() > 2 && candidate.find(name) != std::string_view::npos;
+    return part ? 0 : distance(name, candidate);
+  };
+  Array<std::string_view> names = namesOf(all);
+  std::erase_if(names, [&](std::string_view n) { return unlike(n) > name.size() / 3; });
+  std::ranges::stable_sort(names, {}, unlike);
+  if (names.size() > most) names.resize(most);
+  return names;
+}
+
+}  // namespace Keelgate::CLI

@@ -1,0 +1,75 @@
+// SPDX-License-Identifier: Apache-2.0
+/// What this build knows, as plain data: walked from the very tables that the service decodes with,
+/// so that a new kind of message shows up by itself. Nothing here decodes.
+#pragma once
+
+#include <keelgate/enumeration.h>
+#include <keelgate/values.h>
+
+#include <string_view>
+
+namespace Keelgate::CLI {
+
+struct MessageUnpackerRow {
+  std::string_view record;
+  std::string_view unpacker;
+  std::string_view schema;
+};
+
+struct CommandRow {
+  /// Absent: any command that the framework knows.
+  Optional<UInt64> command;
+  /// Absent: the message is answered without being decoded.
+  Optional<std::string_view> schema;
+  std::string_view caseName;
+};
+
+struct ServiceRow {
+  std::string_view service;
+  std::string_view unpacker;
+  Array<CommandRow> commands;
+};
+
+/// A field of a schema or a record. Of a case-keyed enumeration the cases are listed, as fields
+/// none of which is required.
+struct FieldRow {
+  std::string_view name;
+  std::string_view key;
+  /// "string", "uint64", a schema's name, "[data]" and so on.
+  String type;
+  Bool required;
+};
+
+struct StructTable {
+  std::string_view name;
+  Array<FieldRow> fields;
+};
+
+struct EnumerationTable {
+  std::string_view name;
+  Array<EnumerationCase> cases;
+  Optional<std::string_view> fallback;
+};
+
+struct Description {
+  Array<MessageUnpackerRow> messageUnpackers;
+  Array<ServiceRow> services;
+  /// Every command that the framework knows.
+  Array<EnumerationCase> commands;
+  Array<StructTable> schemas;
+  Array<StructTable> records;
+  Array<EnumerationTable> enumerations;
+};
+
+/// Everything.
+Description describeAll();
+
+/// What is called `name`: a record type, unpacker, service, command, schema, record or enumeration.
+/// One name can stand for several of them. Empty when there is none.
+Description describeNamed(const Description& all, std::string_view name);
+Bool isEmpty(const Description& description);
+
+/// The names that are most like `name`, nearest first; empty when none is like it.
+Array<std::string_view> nearestNames(const Description& all, std::string_view name);
+
+}  // namespace Keelgate::CLI

@@ -1,0 +1,41 @@
+// SPDX-License-Identifier: Apache-2.0
+/// The lines of `keelgate stream`.
+///
+///     {"record": TYPE, "message": BASE64, "id": ANY}
+///     {"service": ID, "command": N, "message": BASE64, "id": ANY}
+///
+/// Read strictly, because a request that is understood otherwise than it was meant unpacks a
+/// message as what it is not: a key that is unknown or stands twice, a number with a fraction,
+/// base64 without its padding, invalid UTF-8 are all refused.
+#pragma once
+
+#include "cli/reply.h"
+
+#include <keelgate/values.h>
+
+#include <string_view>
+#include <variant>
+
+namespace Keelgate::CLI {
+
+struct Request {
+  Subject subject;
+  Data message;
+};
+
+struct RequestLine {
+  /// The request's id as compact JSON, with its numbers as they were written. Present with an
+  /// invalid request too, as long as the line is JSON and has one id.
+  Optional<String> id;
+  /// The request, or why the line is none.
+  std::variant<Request, String> content;
+};
+
+/// Reads one line, without its newline. Callable from any thread. A nesting of any depth in the id
+/// takes heap and no stack. Throws nothing but std::bad_alloc.
+RequestLine readRequestLine(std::string_view line);
+
+/// A decimal number without a sign; nothing when it is none or does not fit.
+Optional<UInt64> decimal(std::string_view text);
+
+}  // namespace Keelgate::CLI
