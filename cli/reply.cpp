@@ -178,11 +178,15 @@ Reply answer(Client& client, const Subject& subject, Bytes message, const Prefac
   } catch (const VespClientMessageUnpackingError& error) {
     return rejection(error, preface, layout);
   } catch (const HostError& error) {
-    Reply reply = rejection(error, preface, layout);
-    reply.problem += advice(error.reason);
-    if (error.reason == HostError::Reason::startFailed) reply.verdict = Verdict::serviceLost;
-    return reply;
+    return givenUp(error, preface, layout);
   }
+}
+
+Reply givenUp(const HostError& error, const Preface& preface, Layout layout) {
+  Reply reply = rejection(error, preface, layout);
+  reply.problem += advice(error.reason);
+  if (error.reason == HostError::Reason::startFailed) reply.verdict = Verdict::serviceLost;
+  return reply;
 }
 
 Reply requestError(std::string_view description, const Preface& preface) {

@@ -44,6 +44,9 @@ struct Preface {
 Reply answer(Client& client, const Subject& subject, Bytes message, const Preface& preface,
              Layout layout);
 
+/// The reply to a message that was given up before it came to a client.
+Reply givenUp(const HostError& error, const Preface& preface, Layout layout);
+
 /// The reply to a line that is no valid request.
 Reply requestError(std::string_view description, const Preface& preface);
 

@@ -24,9 +24,7 @@ class Batch {
   [[nodiscard]] Reply unpackFile(const String& path) const {
     Reply reply;
     try {
-      // One byte above the limit is enough for the client to see that a message is too large.
-      const Data message = readFile(path, largestMessage_ + 1);
-      reply = answer(client_, what_.subject, message, prefaceOf(path), what_.layout);
+      reply = replyTo(path);
     } catch (const std::system_error& error) {
       reply = {.json = {}, .verdict = Verdict::unusable, .problem = error.code().message()};
     }
@@ -38,6 +36,17 @@ class Batch {
   }
 
  private:
+  [[nodiscard]] Reply replyTo(const String& path) const {
+    // A file without end is read no further than it takes to see that it is too large.
+    const Data message = readFile(path, largestMessage_ + 1);
+    if (message.size() <= largestMessage_) {
+      return answer(client_, what_.subject, message, prefaceOf(path), what_.layout);
+    }
+    const HostError tooLarge(HostError::Reason::messageTooLarge,
+                             fmt::format("more than {} bytes", largestMessage_));
+    return givenUp(tooLarge, prefaceOf(path), what_.layout);
+  }
+
   [[nodiscard]] Preface prefaceOf(const String& path) const {
     if (what_.files.size() < 2) return {};
     return {.key = "file", .value = jsonString(path)};
