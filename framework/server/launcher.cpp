@@ -101,10 +101,13 @@ std::uint32_t giveLayers(const Sandbox::Birth& birth, bool groupsLeft) {
   if (birth.child == 0) beZygote(server, tether);
   close(tether.zygoteEnd);
   const std::uint32_t layers = giveLayers(birth, groupsLeft);
-  const bool told = write(tether.launcherEnd, &layers, sizeof layers) == sizeof layers;
   // The zygote's alone from now on, so that its end is the channel's end.
   close(Transport::serviceDescriptor);
-  if (!told) _exit(Transport::refusedExitStatus);
+  // One that has already refused does not listen, and its own status says why.
+  std::signal(SIGPIPE, SIG_IGN);
+  if (write(tether.launcherEnd, &layers, sizeof layers) < 0 && errno != EPIPE) {
+    _exit(Transport::refusedExitStatus);
+  }
   outlive(birth.child);
 } catch (const Refusal& why) {
   refuse(why);

@@ -4,6 +4,7 @@
 #include "framework/transport/layers.h"
 #include "framework/transport/record_coding.h"
 
+#include <fcntl.h>
 #include <keelgate/records.h>
 #include <sys/socket.h>
 #include <sys/wait.h>
@@ -51,15 +52,19 @@ int WorkerEnd::exitStatus() const {
 
 RawClient::RawClient(const std::string& path, const RawOptions& options) {
   const auto ends = makePair(SOCK_SEQPACKET);
+  // Opened first: what is taken away may be the right or the way to open it.
+  const int program = open(path.c_str(), O_PATH | O_CLOEXEC);
   launcher_ = ::fork();
   if (launcher_ == 0) {
     if (options.before) options.before();
     dup2(ends[1], serviceDescriptor);
     const char* const arguments[] = {path.c_str(), nullptr};
     const char* const environment[] = {nullptr};
-    execve(path.c_str(), const_cast<char**>(arguments), const_cast<char**>(environment));
+    execveat(program, "", const_cast<char**>(arguments), const_cast<char**>(environment),
+             AT_EMPTY_PATH);
     _exit(127);
   }
+  close(program);
   close(ends[1]);
   control_ = ends[0];
   sendFrame(ControlKind::hello, 0, {options.largestMessage, options.messages, options.cpuSeconds});
@@ -67,8 +72,19 @@ RawClient::RawClient(const std::string& path, const RawOptions& options) {
 }
 
 RawClient::~RawClient() {
+  if (launcher_ > 0) stop();
+}
+
+int RawClient::stop() {
   close(control_);
-  waitpid(launcher_, nullptr, 0);
+  return waitForLauncher();
+}
+
+int RawClient::waitForLauncher() {
+  int status = 0;
+  waitpid(launcher_, &status, 0);
+  launcher_ = -1;
+  return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
 }
 
 std::string RawClient::refusal() const {
@@ -84,7 +100,7 @@ std::vector<pid_t> RawClient::workers() const {
 }
 
 void RawClient::sendFrame(ControlKind kind, std::uint32_t slot, std::vector<std::uint64_t> numbers,
-                          int descriptor) {
+                          int descriptor, std::uint32_t magic) {
   ControlFrame frame{.magic = magic,
                      .version = protocolVersion,
                      .kind = kind,

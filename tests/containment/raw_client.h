@@ -58,6 +58,18 @@ class RawClient {
   /// The living workers, as this process sees them.
   [[nodiscard]] std::vector<pid_t> workers() const;
 
+  /// Hangs up and waits for the service's end; returns the launcher's exit status as a shell has
+  /// it.
+  int stop();
+  int waitForLauncher();
+
+  /// Sends any control frame, with or without a descriptor, which stays the caller's.
+  void sendFrame(Transport::ControlKind kind, std::uint32_t slot,
+                 std::vector<std::uint64_t> numbers, int descriptor = -1,
+                 std::uint32_t magic = Transport::magic);
+  /// The next control frame; a frame of zeros when the service has gone.
+  Transport::ControlFrame receiveFrame();
+
   /// Asks for a worker; returns the channel to it, which is the caller's to close.
   int fork(std::uint32_t slot);
   void kill(std::uint32_t slot);
@@ -67,10 +79,6 @@ class RawClient {
   std::pair<RawReply, WorkerEnd> obey(std::string_view order);
 
  private:
-  void sendFrame(Transport::ControlKind kind, std::uint32_t slot,
-                 std::vector<std::uint64_t> numbers, int descriptor = -1);
-  Transport::ControlFrame receiveFrame();
-
   pid_t launcher_ = -1;
   int control_ = -1;
   Transport::ControlFrame first_{};

@@ -1,0 +1,111 @@
+// SPDX-License-Identifier: Apache-2.0
+/// The compiled filters, run by an interpreter of our own over every number and the edges of the
+/// argument, against what is said of them in words.
+#include "framework/sandbox/filter.h"
+
+#include <gtest/gtest.h>
+#include <linux/audit.h>
+#include <linux/seccomp.h>
+#include <sys/prctl.h>
+#include <sys/syscall.h>
+#include <algorithm>
+#include <csignal>
+#include <cstring>
+
+namespace Keelgate::Sandbox {
+namespace {
+
+/// Runs a program as the kernel does. A jump or load that the kernel would not accept ends in a
+/// failure, and so does an end without an answer.
+unsigned run(const std::vector<sock_filter>& program, const seccomp_data& data) {
+  unsigned accumulator = 0;
+  for (std::size_t at = 0; at < program.size(); ++at) {
+    const sock_filter& step = program[at];
+    switch (step.code) {
+      case BPF_LD | BPF_W | BPF_ABS:
+        if (step.k + sizeof accumulator > sizeof data || step.k % 4 != 0) break;
+        std::memcpy(&accumulator, reinterpret_cast<const char*>(&data) + step.k,
+                    sizeof accumulator);
+        continue;
+      case BPF_JMP | BPF_JEQ | BPF_K:
+        at += accumulator == step.k ? step.jt : step.jf;
+        continue;
+      case BPF_JMP | BPF_JGE | BPF_K:
+        at += accumulator >= step.k ? step.jt : step.jf;
+        continue;
+      case BPF_RET | BPF_K:
+        return step.k;
+      default:
+        break;
+    }
+    break;
+  }
+  ADD_FAILURE() << "the program runs off its end or does what no filter here should";
+  return SECCOMP_RET_ALLOW;
+}
+
+constexpr std::uint64_t arguments[] = {
+    0, 1, 2, 3, 4, 17, 0xffff'ffff, 0x1'0000'0003, 0x3'0000'0000, ~std::uint64_t{0}};
+
+/// Every number that has ever been one, around every power of two, and the x32 convention's.
+std::vector<int> numbers() {
+  std::vector<int> all;
+  for (int number = 0; number < 4096; ++number) {
+    all.push_back(number);
+    all.push_back(number | 0x4000'0000);
+  }
+  for (unsigned bit = 12; bit < 32; ++bit) {
+    for (const unsigned near : {-1U, 0U, 1U}) {
+      all.push_back(static_cast<int>((1U << bit) + near));
+    }
+  }
+  return all;
+}
+
+template <class Expected>
+void expectEverywhere(std::span<const Rule> rules, Expected&& expected) {
+  const std::vector<sock_filter> program = compile(rules);
+  for (const unsigned arch : {unsigned{AUDIT_ARCH_X86_64}, unsigned{AUDIT_ARCH_I386}, 0U, ~0U}) {
+    for (const int number : numbers()) {
+      for (const std::uint64_t argument : arguments) {
+        const seccomp_data data{.nr = number,
+                                .arch = arch,
+                                .instruction_pointer = 0,
+                                .args = {argument, ~argument, 3, 3, 3, 3}};
+        const unsigned wanted = arch == AUDIT_ARCH_X86_64
+                                    ? expected(number, static_cast<unsigned>(argument))
+                                    : SECCOMP_RET_KILL_PROCESS;
+        ASSERT_EQ(run(program, data), wanted) << arch << ' ' << number << ' ' << argument;
+      }
+    }
+  }
+}
+
+TEST(Filter, WorkerReadsWritesAndExits) {
+  expectEverywhere(workerRules(), [](int number, unsigned first) -> unsigned {
+    if ((number == 0 || number == 1) && first == 3) return SECCOMP_RET_ALLOW;
+    if (number == 231) return SECCOMP_RET_ALLOW;
+    if (number == 12) return SECCOMP_RET_ERRNO;
+    if (number == 9) return SECCOMP_RET_ERRNO | 12;
+    return SECCOMP_RET_KILL_PROCESS;
+  });
+}
+
+TEST(Filter, ZygoteHasNoCallThatOpensOrExecutes) {
+  const std::vector<int> free{SYS_ppoll, SYS_wait4, SYS_kill,        SYS_dup2,
+                              SYS_close, SYS_brk,   SYS_close_range, SYS_getppid,
+                              SYS_read,  SYS_write, SYS_exit_group};
+  expectEverywhere(zygoteRules(), [&](int number, unsigned first) -> unsigned {
+    const bool allowed = std::find(free.begin(), free.end(), number) != free.end() ||
+                         ((number == SYS_recvmsg || number == SYS_sendto) && first == 3) ||
+                         (number == SYS_clone && first == SIGCHLD) ||
+                         (number == SYS_prctl && first == PR_SET_PDEATHSIG) ||
+                         (number == SYS_prlimit64 && first == 0) ||
+                         (number == SYS_seccomp && first == SECCOMP_SET_MODE_FILTER);
+    if (number == SYS_mmap) return SECCOMP_RET_ERRNO | 12;
+    return allowed ? SECCOMP_RET_ALLOW : SECCOMP_RET_KILL_PROCESS;
+  });
+}
+
+}  // namespace
+}  // namespace Keelgate::Sandbox

@@ -1,0 +1,252 @@
+// SPDX-License-Identifier: Apache-2.0
+/// C11: the service under machines and profiles that lack something, each imitated by a filter that
+/// refuses a call, or by taking a right away, before the service is executed.
+#include "framework/transport/layers.h"
+#include "tests/containment/raw_client.h"
+
+#include <grp.h>
+#include <gtest/gtest.h>
+#include <linux/filter.h>
+#include <linux/sched.h>
+#include <linux/seccomp.h>
+#include <sys/prctl.h>
+#include <sys/resource.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+#include <cerrno>
+#include <csignal>
+#include <cstddef>
+
+namespace Keelgate::Test {
+namespace {
+
+using namespace Transport;
+
+/// `call` fails with `error` when its first argument has one of the bits, or always.
+struct Refused {
+  int call;
+  unsigned error;
+  unsigned bits = 0;
+};
+
+void append(std::vector<sock_filter>& program, const Refused& row) {
+  program.push_back(BPF_STMT(BPF_LD | BPF_W | BPF_ABS, offsetof(seccomp_data, nr)));
+  const unsigned char skipped = row.bits == 0 ? 1 : 3;
+  program.push_back(
+      BPF_JUMP(BPF_JMP | BPF_JEQ | BPF_K, static_cast<unsigned>(row.call), 0, skipped));
+  if (row.bits != 0) {
+    program.push_back(BPF_STMT(BPF_LD | BPF_W | BPF_ABS, offsetof(seccomp_data, args)));
+    program.push_back(BPF_JUMP(BPF_JMP | BPF_JSET | BPF_K, row.bits, 0, 1));
+  }
+  program.push_back(BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_ERRNO | row.error));
+}
+
+void refuseCalls(const std::vector<Refused>& rows) {
+  std::vector<sock_filter> program;
+  for (const Refused& row : rows) append(program, row);
+  program.push_back(BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_ALLOW));
+  const sock_fprog handed{.len = static_cast<unsigned short>(program.size()),
+                          .filter = program.data()};
+  // Without no_new_privs where it can be, so that the service has to set it itself.
+  if (syscall(SYS_seccomp, SECCOMP_SET_MODE_FILTER, 0, &handed) == 0) return;
+  prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0);
+  if (syscall(SYS_seccomp, SECCOMP_SET_MODE_FILTER, 0, &handed) != 0) _exit(126);
+}
+
+void becomeUser(std::vector<gid_t> groups) {
+  if (setgroups(groups.size(), groups.data()) != 0 || setresgid(1000, 1000, 1000) != 0 ||
+      setresuid(1000, 1000, 1000) != 0) {
+    _exit(126);
+  }
+}
+
+constexpr unsigned inner = layerMountNamespace | layerNetworkNamespace | layerIpcNamespace |
+                           layerUtsNamespace | layerCgroupNamespace | layerEmptyRoot;
+constexpr unsigned namespaces = inner | layerUserNamespace | layerPidNamespace;
+constexpr unsigned allNamespaceFlags = CLONE_NEWUSER | CLONE_NEWPID | CLONE_NEWNS | CLONE_NEWNET |
+                                       CLONE_NEWIPC | CLONE_NEWUTS | CLONE_NEWCGROUP;
+
+struct Environment {
+  std::string name;
+  std::function<void()> before;
+  /// Second walls that are missing then.
+  unsigned missing = 0;
+  /// Or part of the sentence of a service that refuses.
+  std::string refusal = {};
+};
+
+const std::vector<Environment> environments{
+    {.name = "nothing taken away",
+     .before =
+         [] {
+         }},
+    {.name = "a container's profile, as root",
+     .before =
+         [] {
+           refuseCalls({{SYS_clone, EPERM, allNamespaceFlags},
+                        {SYS_unshare, EPERM},
+                        {SYS_mount, EPERM},
+                        {SYS_pivot_root, EPERM}});
+         },
+     .missing = namespaces},
+    {.name = "a container's profile, as a user with groups",
+     .before =
+         [] {
+           refuseCalls({{SYS_clone, EPERM, allNamespaceFlags}, {SYS_unshare, EPERM}});
+           becomeUser({1000, 27});
+         },
+     .missing = namespaces | layerNoSupplementaryGroups},
+    {.name = "a user",
+     .before =
+         [] {
+           becomeUser({});
+         }},
+    {.name = "a user with his groups",
+     .before =
+         [] {
+           becomeUser({1000, 27});
+         },
+     .missing = layerNoSupplementaryGroups},
+    {.name = "user namespaces switched off, as root",
+     .before =
+         [] {
+           refuseCalls({{SYS_clone, ENOSPC, CLONE_NEWUSER}});
+         },
+     .missing = layerUserNamespace},
+    {.name = "user namespaces switched off, as a user",
+     .before =
+         [] {
+           refuseCalls({{SYS_clone, EPERM, CLONE_NEWUSER}});
+           becomeUser({});
+         },
+     .missing = namespaces},
+    {.name = "no process namespace",
+     .before =
+         [] {
+           refuseCalls({{SYS_clone, EINVAL, CLONE_NEWPID}});
+         },
+     .missing = layerPidNamespace},
+    {.name = "namespaces given, mounting refused by a security module",
+     .before =
+         [] {
+           refuseCalls({{SYS_mount, EACCES}});
+         },
+     .missing = layerEmptyRoot},
+    {.name = "one namespace unknown to the kernel",
+     .before =
+         [] {
+           refuseCalls({{SYS_unshare, EINVAL, CLONE_NEWCGROUP}});
+         },
+     .missing = layerCgroupNamespace},
+    {.name = "root that may not change its identifiers, and no namespaces",
+     .before =
+         [] {
+           refuseCalls({{SYS_clone, EPERM, allNamespaceFlags},
+                        {SYS_unshare, EPERM},
+                        {SYS_setresuid, EPERM},
+                        {SYS_setresgid, EPERM}});
+         },
+     .missing = namespaces | layerNotRoot},
+    {.name = "a kernel without Landlock",
+     .before =
+         [] {
+           refuseCalls({{SYS_landlock_create_ruleset, ENOSYS}});
+         },
+     .missing = layerLandlock},
+    {.name = "Landlock switched off",
+     .before =
+         [] {
+           refuseCalls({{SYS_landlock_create_ruleset, EOPNOTSUPP}});
+         },
+     .missing = layerLandlock},
+    {.name = "a kernel without close_range",
+     .before =
+         [] {
+           refuseCalls({{SYS_close_range, ENOSYS}});
+         }},
+    {.name = "chroot",
+     .before =
+         [] {
+           if (chroot("/var") != 0 || chdir("/") != 0) _exit(126);
+         },
+     // A user namespace is refused in there; the process still becomes nobody.
+     .missing = layerUserNamespace | layerEmptyRoot},
+    {.name = "signals ignored by the one who starts it",
+     .before =
+         [] {
+           for (int number = 1; number < NSIG; ++number) std::signal(number, SIG_IGN);
+         }},
+    {.name = "seccomp refused",
+     .before =
+         [] {
+           refuseCalls({{SYS_seccomp, EPERM}});
+         },
+     .refusal = "allow seccomp"},
+    {.name = "limits refused",
+     .before =
+         [] {
+           refuseCalls({{SYS_prlimit64, EPERM}});
+         },
+     .refusal = "resource limits"},
+    {.name = "prctl refused",
+     .before =
+         [] {
+           refuseCalls({{SYS_prctl, EPERM}});
+         },
+     .refusal = "The service could not"},
+    {.name = "capabilities kept",
+     .before =
+         [] {
+           refuseCalls({{SYS_capset, EPERM}});
+         },
+     .refusal = "capset"},
+    {.name = "no process to be had",
+     .before =
+         [] {
+           refuseCalls({{SYS_clone, EAGAIN}});
+         },
+     .refusal = "ulimit -u"},
+    {.name = "an address space that is too small",
+     .before =
+         [] {
+           const rlimit small{.rlim_cur = 64 << 20, .rlim_max = 64 << 20};
+           setrlimit(RLIMIT_AS, &small);
+         },
+     .refusal = "ulimit -v"},
+};
+
+class EnvironmentTest : public testing::TestWithParam<Environment> {};
+
+TEST_P(EnvironmentTest, RunsAndReportsOrRefusesWithReason) {
+#ifdef KEELGATE_UNSEALED
+  GTEST_SKIP() << "this build has no seal";
+#endif
+  if (geteuid() != 0) GTEST_SKIP() << "only root can imitate every environment";
+  static const std::uint64_t whole = RawClient(OBEDIENT_SERVICE).layers();
+  const Environment& environment = GetParam();
+  RawOptions options;
+  options.before = environment.before;
+  RawClient service(OBEDIENT_SERVICE, options);
+  if (!environment.refusal.empty()) {
+    EXPECT_NE(service.refusal().find(environment.refusal), std::string::npos) << service.refusal();
+    EXPECT_EQ(service.stop(), refusedExitStatus);
+    return;
+  }
+  ASSERT_TRUE(service.ready()) << service.refusal();
+  EXPECT_EQ(missingLayersLine(service.layers()),
+            missingLayersLine(whole & ~std::uint64_t{environment.missing}));
+  EXPECT_EQ(resultOf(service.obey("answer").first), 0);
+  EXPECT_EQ(service.obey("call 39").second.signal(), SIGSYS);
+  EXPECT_EQ(service.stop(), 0);
+}
+
+INSTANTIATE_TEST_SUITE_P(C11, EnvironmentTest, testing::ValuesIn(environments),
+                         [](const auto& row) {
+                           std::string name;
+                           for (const char c : row.param.name)
+                             name += std::isalnum(c) != 0 ? c : '_';
+                           return name;
+                         });
+
+}  // namespace
+}  // namespace Keelgate::Test

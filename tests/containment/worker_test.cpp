@@ -1,0 +1,275 @@
+// SPDX-License-Identifier: Apache-2.0
+/// What one worker can do to the others, to the machine and to the protocol.
+#include "framework/sandbox/limits.h"
+#include "tests/containment/raw_client.h"
+
+#include <dirent.h>
+#include <gtest/gtest.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <unistd.h>
+#include <algorithm>
+#include <csignal>
+#include <filesystem>
+#include <fstream>
+#include <set>
+#include <sstream>
+
+namespace Keelgate::Test {
+namespace {
+
+#ifdef KEELGATE_UNSEALED
+#define NEEDS_SEAL() GTEST_SKIP() << "this build has no seal"
+#else
+#define NEEDS_SEAL() static_cast<void>(0)
+#endif
+
+/// A service that is ready; workers that must go on answering afterwards.
+class Worker : public testing::Test {
+ protected:
+  void SetUp() override { ASSERT_TRUE(service_.ready()) << service_.refusal(); }
+  void TearDown() override {
+    if (!HasFatalFailure() && !IsSkipped()) {
+      EXPECT_EQ(resultOf(service_.obey("answer").first), 0);
+    }
+  }
+
+  RawClient service_{OBEDIENT_SERVICE};
+};
+
+std::string readAll(const std::string& path) {
+  std::ostringstream text;
+  text << std::ifstream(path).rdbuf();
+  return text.str();
+}
+
+std::set<std::string> namesIn(const std::string& path) {
+  std::set<std::string> names;
+  for (const auto& entry : std::filesystem::directory_iterator(path)) {
+    names.insert(entry.path().filename());
+  }
+  return names;
+}
+
+void expectStatusLine(pid_t process, const std::string& line) {
+  const std::string text = readAll("/proc/" + std::to_string(process) + "/status");
+  EXPECT_NE(text.find(line), std::string::npos) << line << " is not in\n" << text;
+}
+
+/// What is the same for the zygote and for a worker.
+void expectSealed(pid_t process) {
+  const std::string here = "/proc/" + std::to_string(process) + "/";
+  for (const char* line :
+       {"NoNewPrivs:\t1\n", "Seccomp:\t2\n", "CapInh:\t0000000000000000\n",
+        "CapPrm:\t0000000000000000\n", "CapEff:\t0000000000000000\n", "CapBnd:\t0000000000000000\n",
+        "CapAmb:\t0000000000000000\n", "Groups:\t \n", "Uid:\t65534\t65534\t65534\t65534\n",
+        "Gid:\t65534\t65534\t65534\t65534\n", "Threads:\t1\n"}) {
+    expectStatusLine(process, line);
+  }
+  for (const char* name : {"user", "mnt", "net", "pid", "ipc", "uts", "cgroup"}) {
+    EXPECT_NE(std::filesystem::read_symlink(here + "ns/" + name),
+              std::filesystem::read_symlink(std::string("/proc/self/ns/") + name))
+        << name;
+  }
+  EXPECT_EQ(namesIn(here + "root"), std::set<std::string>());
+  std::istringstream maps(readAll(here + "maps"));
+  for (std::string line; std::getline(maps, line);) {
+    EXPECT_EQ(line.find("wx"), std::string::npos) << line;
+  }
+  // What is not dumpable belongs to root in /proc, whoever it runs as.
+  struct stat status {};
+  ASSERT_EQ(stat((here + "mem").c_str(), &status), 0);
+  EXPECT_EQ(status.st_uid, 0U);
+}
+
+TEST_F(Worker, C3SeenFromOutside) {
+  NEEDS_SEAL();
+  if (geteuid() != 0) GTEST_SKIP() << "only root may look into an undumpable process";
+  if ((service_.layers() & Transport::layerUserNamespace) == 0) {
+    GTEST_SKIP() << "this machine gives no user namespace";
+  }
+  const int waiting = service_.fork(1);
+  const int spinning = service_.fork(2);
+  sendOrder(spinning, "spin");
+  // A reply shows that the two before it have come as far.
+  EXPECT_EQ(resultOf(service_.obey("answer").first), 0);
+  const std::vector<pid_t> workers = service_.workers();
+  ASSERT_EQ(workers.size(), 2U);
+  expectSealed(service_.zygote());
+  for (const pid_t worker : workers) {
+    expectSealed(worker);
+    EXPECT_EQ(namesIn("/proc/" + std::to_string(worker) + "/fd"), std::set<std::string>{"3"});
+    const std::string limits = readAll("/proc/" + std::to_string(worker) + "/limits");
+    for (const char* line : {"Max core file size        0                    0 ",
+                             "Max file size             0                    0 ",
+                             "Max processes             0                    0 ",
+                             "Max open files            4                    4 ",
+                             "Max locked memory         0                    0 ",
+                             "Max msgqueue size         0                    0 ",
+                             "Max stack size            1048576              1048576 ",
+                             "Max cpu time              5                    6 "}) {
+      EXPECT_NE(limits.find(line), std::string::npos) << line << " is not in\n" << limits;
+    }
+  }
+  // The one that reads a message has the strict filter on top.
+  expectStatusLine(*std::max_element(workers.begin(), workers.end()), "Seccomp_filters:\t2\n");
+  close(waiting);
+  EXPECT_EQ(service_.end(1).exitStatus(), 0);
+  service_.kill(2);
+  EXPECT_EQ(service_.end(2).signal(), SIGKILL);
+  close(spinning);
+}
+
+TEST_F(Worker, C4MemoryIsFixedBeforeTheMessageIsRead) {
+  NEEDS_SEAL();
+  constexpr std::size_t base = Sandbox::heapBase;
+  constexpr std::size_t length = 1 << 20;
+  const auto eat = [&](std::size_t bytes, std::size_t messageLength) {
+    std::string order = "eat " + std::to_string(bytes);
+    order.resize(std::max(order.size(), messageLength), ' ');
+    return service_.obey(order);
+  };
+  constexpr std::size_t worth = base + Sandbox::heapPerByte * length;
+  constexpr std::size_t slack = 8 << 20;
+  EXPECT_EQ(resultOf(eat(base - slack, 0).first), 0);
+  EXPECT_EQ(resultOf(eat(worth - slack, length).first), 0);
+  for (const auto& [bytes, messageLength] : {std::pair(base + slack, std::size_t{0}),
+                                             {worth + slack, length},
+                                             {std::size_t{1} << 40, length}}) {
+    const auto [reply, end] = eat(bytes, messageLength);
+    EXPECT_FALSE(reply.kind);
+    EXPECT_EQ(end.exitStatus(), Transport::resourceExitStatus);
+    EXPECT_LT(end.peakBytes, worth + slack);
+  }
+}
+
+TEST_F(Worker, C5ProcessorTimeIsLimitedWithoutTheClient) {
+  NEEDS_SEAL();
+  RawOptions options;
+  options.cpuSeconds = 1;
+  RawClient service(OBEDIENT_SERVICE, options);
+  EXPECT_EQ(service.obey("spin").second.signal(), SIGXCPU);
+}
+
+TEST_F(Worker, EveryFaultEndsOneWorkerAlone) {
+  NEEDS_SEAL();
+  for (const auto& [order, signal] : {std::pair("fault", SIGSEGV),
+                                      {"trap", SIGILL},
+                                      {"recurse", SIGSEGV},
+                                      {"execute", SIGSEGV},
+                                      // Raising a signal is a system call.
+                                      {"abort", SIGSYS},
+                                      // Nobody catches it: the process ends on the spot.
+                                      {"throw", SIGILL}}) {
+    const int other = service_.fork(7);
+    const auto [reply, end] = service_.obey(order);
+    EXPECT_EQ(end.signal(), signal) << order;
+    EXPECT_FALSE(reply.kind) << order;
+    sendOrder(other, "answer");
+    EXPECT_EQ(resultOf(receiveReply(other)), 0) << order;
+    close(other);
+    EXPECT_EQ(service_.end(7).exitStatus(), 0);
+  }
+}
+
+TEST_F(Worker, LogIsCutInNumberAndLength) {
+  EXPECT_EQ(service_.obey("log 2 5").first.log, std::vector<std::string>(2, "xxxxx"));
+  EXPECT_EQ(service_.obey("log 9 513").first.log,
+            std::vector<std::string>(Transport::maximumLogFrames,
+                                     std::string(Transport::maximumLogLength, 'x')));
+}
+
+TEST_F(Worker, ServesAsManyMessagesAsItMay) {
+  RawOptions options;
+  options.messages = 3;
+  RawClient service(OBEDIENT_SERVICE, options);
+  const int channel = service.fork(0);
+  for (std::uint32_t sequence = 0; sequence < 3; ++sequence) {
+    sendOrder(channel, "answer", sequence);
+    EXPECT_EQ(resultOf(receiveReply(channel)), 0);
+  }
+  EXPECT_EQ(service.end(0).exitStatus(), 0);
+  close(channel);
+}
+
+TEST_F(Worker, WrongHeadersEndIt) {
+  using Transport::RequestHeader;
+  const RequestHeader right{.magic = Transport::magic,
+                            .version = Transport::protocolVersion,
+                            .record = 0,
+                            .sequence = 0,
+                            .serviceLength = 0,
+                            .bodyLength = 0,
+                            .command = 0};
+  std::vector<RequestHeader> wrong(5, right);
+  wrong[0].magic ^= 1;
+  wrong[1].version += 1;
+  wrong[2].sequence = 1;
+  wrong[3].serviceLength = Transport::maximumServiceLength + 1;
+  wrong[4].bodyLength = RawOptions().largestMessage + 1;
+  const auto exitStatusAfter = [&](const void* bytes, std::size_t size) {
+    const int channel = service_.fork(0);
+    send(channel, bytes, size, MSG_NOSIGNAL);
+    shutdown(channel, SHUT_WR);
+    const RawReply reply = receiveReply(channel);
+    EXPECT_TRUE(!reply.kind || *reply.kind == Transport::ReplyKind::error);
+    close(channel);
+    return service_.end(0).exitStatus();
+  };
+  for (const RequestHeader& header : wrong) {
+    EXPECT_EQ(exitStatusAfter(&header, sizeof header), Transport::protocolExitStatus);
+  }
+  for (std::size_t size = 0; size <= sizeof right; ++size) {
+    EXPECT_EQ(exitStatusAfter(&right, size), 0) << size;
+  }
+}
+
+TEST(Zygote, RefusesEveryFrameThatIsNotExactlyRight) {
+  using Transport::ControlKind;
+  const std::vector<std::function<void(RawClient&)>> wrongs{
+      [](RawClient& service) { service.sendFrame(ControlKind::hello, 0, {}); },
+      [](RawClient& service) { service.sendFrame(ControlKind::exit, 0, {}); },
+      [](RawClient& service) { service.sendFrame(ControlKind{99}, 0, {}); },
+      [](RawClient& service) { service.sendFrame(ControlKind::fork, 0, {}); },
+      [](RawClient& service) { service.sendFrame(ControlKind::kill, 0, {}, STDIN_FILENO); },
+      [](RawClient& service) { service.sendFrame(ControlKind::kill, 0, {}, -1, 1); },
+      [](RawClient& service) {
+        close(service.fork(3)), close(service.fork(3));
+      }};
+  for (std::size_t i = 0; i < wrongs.size(); ++i) {
+    RawClient service(OBEDIENT_SERVICE);
+    // The worker of another slot holds the last case's slot taken.
+    const int held = service.fork(3);
+    service.kill(12345);
+    wrongs[i](service);
+    Transport::ControlFrame frame = service.receiveFrame();
+    while (frame.kind == ControlKind::exit) frame = service.receiveFrame();
+    EXPECT_EQ(frame.kind, ControlKind::refused) << i;
+    EXPECT_EQ(frame.numbers[0], static_cast<std::uint64_t>(Transport::Obstacle::badFrame)) << i;
+    EXPECT_EQ(service.stop(), Transport::refusedExitStatus) << i;
+    close(held);
+  }
+}
+
+TEST(Zygote, NobodyOutlivesTheOther) {
+  for (const bool killLauncher : {false, true}) {
+    RawClient service(OBEDIENT_SERVICE);
+    ASSERT_TRUE(service.ready()) << service.refusal();
+    const int channel = service.fork(0);
+    sendOrder(channel, "spin");
+    if (killLauncher) {
+      ::kill(service.launcher(), SIGKILL);
+      EXPECT_EQ(service.receiveFrame().magic, 0U) << "the control channel ends with the zygote";
+      EXPECT_EQ(service.waitForLauncher(), 128 + SIGKILL);
+    } else {
+      EXPECT_EQ(service.stop(), 0);
+    }
+    // The end of its channel is the end of the worker.
+    char byte = 0;
+    EXPECT_LE(recv(channel, &byte, 1, 0), 0);
+    close(channel);
+  }
+}
+
+}  // namespace
+}  // namespace Keelgate::Test
