@@ -38,6 +38,7 @@ constexpr Rule zygote[] = {
     {SYS_ppoll, Verdict::allow},
     {SYS_recvmsg, Verdict::allowWithFirst, channel},
     {SYS_sendto, Verdict::allowWithFirst, channel},
+    {SYS_shutdown, Verdict::allowWithFirst, channel},
     {SYS_clone, Verdict::allowWithFirst, SIGCHLD},
     {SYS_wait4, Verdict::allow},
     {SYS_kill, Verdict::allow},

@@ -96,12 +96,13 @@ TEST(Filter, ZygoteHasNoCallThatOpensOrExecutes) {
                               SYS_close, SYS_brk,   SYS_close_range, SYS_getppid,
                               SYS_read,  SYS_write, SYS_exit_group};
   expectEverywhere(zygoteRules(), [&](int number, unsigned first) -> unsigned {
-    const bool allowed = std::find(free.begin(), free.end(), number) != free.end() ||
-                         ((number == SYS_recvmsg || number == SYS_sendto) && first == 3) ||
-                         (number == SYS_clone && first == SIGCHLD) ||
-                         (number == SYS_prctl && first == PR_SET_PDEATHSIG) ||
-                         (number == SYS_prlimit64 && first == 0) ||
-                         (number == SYS_seccomp && first == SECCOMP_SET_MODE_FILTER);
+    const bool allowed =
+        std::find(free.begin(), free.end(), number) != free.end() ||
+        ((number == SYS_recvmsg || number == SYS_sendto || number == SYS_shutdown) && first == 3) ||
+        (number == SYS_clone && first == SIGCHLD) ||
+        (number == SYS_prctl && first == PR_SET_PDEATHSIG) ||
+        (number == SYS_prlimit64 && first == 0) ||
+        (number == SYS_seccomp && first == SECCOMP_SET_MODE_FILTER);
     if (number == SYS_mmap) return SECCOMP_RET_ERRNO | 12;
     return allowed ? SECCOMP_RET_ALLOW : SECCOMP_RET_KILL_PROCESS;
   });

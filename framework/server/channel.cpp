@@ -70,6 +70,17 @@ void sendControl(ControlFrame frame) {
   send(serviceDescriptor, &frame, sizeof frame, MSG_NOSIGNAL);
 }
 
+void endControl(const ControlFrame& last) {
+  sendControl(last);
+  // Whoever closes a channel with unread packets in it resets it, and the client would see the
+  // reset in place of the last frame. So none may come any more, and those that came are read.
+  shutdown(serviceDescriptor, SHUT_RD);
+  msghdr discarded{};
+  while (recvmsg(serviceDescriptor, &discarded, 0) > 0 || (discarded.msg_flags & MSG_TRUNC) != 0) {
+    discarded = {};
+  }
+}
+
 bool receiveAll(std::span<std::byte> bytes) {
   while (!bytes.empty()) {
     const ssize_t got = read(serviceDescriptor, bytes.data(), bytes.size());

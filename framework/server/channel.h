@@ -26,6 +26,9 @@ Optional<ReceivedControl> receiveControl();
 /// the next receive tells.
 void sendControl(Transport::ControlFrame frame);
 
+/// Sends a last frame. The caller exits then.
+void endControl(const Transport::ControlFrame& last);
+
 /// Fills `bytes` from the data channel. False at its end.
 bool receiveAll(std::span<std::byte> bytes);
 

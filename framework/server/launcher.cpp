@@ -40,13 +40,13 @@ bool startedByClient() {
 }
 
 [[noreturn]] void refuse(const Refusal& why) {
-  sendControl({.magic = {},
-               .version = {},
-               .kind = Transport::ControlKind::refused,
-               .slot = 0,
-               .reserved = 0,
-               .numbers = {static_cast<std::uint64_t>(why.obstacle()),
-                           static_cast<std::uint64_t>(why.error()), 0, 0}});
+  endControl({.magic = {},
+              .version = {},
+              .kind = Transport::ControlKind::refused,
+              .slot = 0,
+              .reserved = 0,
+              .numbers = {static_cast<std::uint64_t>(why.obstacle()),
+                          static_cast<std::uint64_t>(why.error()), 0, 0}});
   _exit(Transport::refusedExitStatus);
 }
 
