@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+// Base64: a quick loop for the long middle, a careful one for line ends and padding.
 #include <array>
 #include <bit>
 #include <cstdint>
@@ -12,6 +13,7 @@ namespace {
 
 constexpr std::string_view alphabet =
     "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";
+// Above the 24 bits of a group, so that one comparison of the combined group finds it.
 constexpr std::uint32_t notInAlphabet = 0x0100'0000;
 
 using Table = std::array<std::uint32_t, 256>;
@@ -32,6 +34,7 @@ constexpr std::uint32_t lookUp(std::size_t place, char c) noexcept {
   return tables[place][static_cast<unsigned char>(c)];
 }
 
+// The first bytes of a group, most significant first.
 void write(std::uint32_t group, std::size_t length, char* out) noexcept {
   for (std::size_t i = 0; i < length; ++i) out[i] = static_cast<char>(group >> (16 - 8 * i));
 }
@@ -59,11 +62,9 @@ struct Group {
 // there. Each is written as 4 bytes, the last of which the next group replaces, so the run ends
 // while another group is left.
 std::size_t decodeRun(std::string_view text, char* out) noexcept {
-  const char* const in = text.data();
   std::size_t groups = 0;
   for (; 4 * groups + 8 <= text.size(); ++groups) {
-    std::array<char, 4> c;
-    std::memcpy(c.data(), in + 4 * groups, c.size());
+    const auto c = Cursor::wordAt<std::array<char, 4>>(text, 4 * groups);
     std::uint32_t bits = lookUp(0, c[0]) | lookUp(1, c[1]) | lookUp(2, c[2]) | lookUp(3, c[3]);
     if (bits >= notInAlphabet) break;
     bits <<= 8;
@@ -75,6 +76,8 @@ std::size_t decodeRun(std::string_view text, char* out) noexcept {
 
 }  // namespace
 
+// Deliberate: spare bits before the padding may be set, as in "QR==". Nothing here signs or
+// compares encoded text, and writers that leave them set exist.
 std::optional<std::size_t> decodeBase64(std::string_view text, char* out) noexcept {
   std::size_t at = 0;
   std::size_t written = 0;

@@ -1,6 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
 // Reads binary property lists: every object that the top one reaches, each once, depth first over
 // an explicit stack.
+//
+// Every number in a message is hostile. A count is compared with what remains of the object area
+// before it is multiplied or reserved for, so that no claim can overflow or make memory be set
+// aside.
 #include <algorithm>
 #include <array>
 #include <bit>
@@ -74,6 +78,8 @@ void BinaryReader::read() {
   keys_.checkDeferred();
 }
 
+// Deliberate: the unused bytes are not looked at, nor is what may lie between the offset table and
+// the trailer: nothing reaches it.
 void BinaryReader::readTrailer() {
   const Bytes message = store_.message;
   if (!Cursor(message).skipIf(magic)) throw Damage(Problem::notPropertyList, 0);
@@ -94,8 +100,10 @@ void BinaryReader::readTrailer() {
       objects > (tableEnd - table) / offsetSize_) {
     throw Damage(Problem::trailer, tableEnd);
   }
+  // An object takes at least a byte of offset table, so the nodes are at most 16 times the message.
   tableStart_ = static_cast<std::size_t>(table);
   store_.top = static_cast<std::uint32_t>(top);
+  // Zero bytes are a node that was not visited.
   store_.nodes.zero(static_cast<std::size_t>(objects));
   claimable_ = Limits::claimedBase + Limits::claimedFactor * message.size();
 }
@@ -122,6 +130,7 @@ void BinaryReader::follow(Frame& frame) {
   }
 }
 
+// All children are checked: the container is, too.
 void BinaryReader::leave(const Frame& frame) {
   Node& node = store_.nodes[frame.number];
   node.height = static_cast<std::uint16_t>(frame.highest + 1);
@@ -131,6 +140,7 @@ void BinaryReader::leave(const Frame& frame) {
   if (depth_ > 0) frames_[depth_ - 1].highest = std::max(frames_[depth_ - 1].highest, node.height);
 }
 
+// Reads the object of this number, for the first time. A container becomes the innermost frame.
 void BinaryReader::enter(std::uint32_t number) {
   const std::uint64_t offset =
       Cursor::bigEndianAt(store_.message, tableStart_ + number * offsetSize_, offsetSize_);
@@ -208,6 +218,7 @@ void BinaryReader::readInteger(Node& node, Cursor& object, std::uint8_t width) {
   }
 }
 
+// A real keeps any value, NaN included: what may be stored where is for the reader of the field.
 void BinaryReader::readReal(Node& node, Cursor& object, std::uint8_t width, std::size_t offset) {
   node.type = Type::real;
   if (width == 2) {
@@ -243,6 +254,7 @@ void BinaryReader::readUtf16(Node& node, Cursor& object, std::uint64_t units) {
   const std::size_t start = object.position();
   if (units > object.remaining() / 2) throw Damage(Problem::objectOutside, start);
   const Bytes bytes = claim(object, 2 * units);
+  // The most that UTF-8 can need, then cut to what it did need.
   const std::size_t side = store_.side.size();
   store_.side.resize(side + 3 * static_cast<std::size_t>(units));
   const std::size_t length = utf8FromUtf16(bytes, store_.side.data() + side);
@@ -255,6 +267,7 @@ void BinaryReader::readUtf16(Node& node, Cursor& object, std::uint64_t units) {
   node.count = static_cast<std::uint32_t>(length);
 }
 
+// Children are walked later, from the frame; here only their references are known to be there.
 void BinaryReader::openContainer(Node& node, Type type, Cursor& object, std::uint32_t number,
                                  std::uint64_t count) {
   const std::size_t start = object.position();
@@ -276,6 +289,8 @@ void BinaryReader::openContainer(Node& node, Type type, Cursor& object, std::uin
                        .end = end};
 }
 
+// Deliberate: a count is read as unsigned at all widths. A negative one is then vast, and fails
+// where it is compared with what remains.
 std::uint64_t BinaryReader::readCount(Cursor& object, std::uint8_t low) {
   if (low != 0x0F) return low;
   const std::size_t position = object.position();

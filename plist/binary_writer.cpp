@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+// The trees here are our own, so this is plain code with ordinary containers.
 #include <bit>
 #include <cmath>
 #include <limits>
@@ -117,6 +118,7 @@ class BinaryWriter {
   std::unordered_map<std::string, std::size_t> scalars_;
 };
 
+// Equal bytes are one object, whatever types they came from.
 std::size_t BinaryWriter::numberOfScalar(std::string encoded) {
   const auto [place, isNew] = scalars_.emplace(encoded, objects_.size());
   if (isNew) objects_.push_back({nullptr, std::move(encoded), {}});
@@ -130,6 +132,8 @@ std::size_t BinaryWriter::number(const Tree& tree) {
   return objects_.size() - 1;
 }
 
+// Numbers a container's children. The list of objects may move meanwhile, so the container is
+// looked up again afterwards.
 void BinaryWriter::refer(std::size_t container) {
   const Tree::Variant& value = objects_[container].container->value;
   std::vector<std::size_t> references;

@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+// Scanning plain text, where XML messages spend most of their bytes.
 #include "plist/cursor.h"
 
 #include <array>
@@ -45,6 +46,7 @@ void Cursor::skipPlain() noexcept {
     here_ += length;
     if (length < blockLength) return;
   }
+  // The last few bytes of a message, too few for a block.
   while (here_ != end_ && plainBytes[std::to_integer<std::size_t>(*here_)]) ++here_;
 }
 

@@ -70,6 +70,15 @@ class Cursor {
     return {reinterpret_cast<const char*>(message.data() + offset), length};
   }
 
+  // The word that stands at `offset`, in the machine's byte order. Requires that it ends in the
+  // text.
+  template <typename Word>
+  static Word wordAt(std::string_view text, std::size_t offset) noexcept {
+    Word word;
+    std::memcpy(&word, text.data() + offset, sizeof word);
+    return word;
+  }
+
   // --- text: nothing throws ---
 
   bool atEnd() const noexcept { return here_ == end_; }

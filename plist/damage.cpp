@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
+// The sentences say what is wrong with a message, never what was in it: they go into replies and
+// logs.
 #include "plist/damage.h"
 
 #include <array>

@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+// The accessors: each checks the type, then looks at the node. Everything else was checked before.
 #include "plist/document.h"
 
 #include <bit>
@@ -50,6 +51,7 @@ EntryRange Value::entries() const {
   return {*store_, key, key + apart, count, shared_};
 }
 
+// The first bytes decide; a binary one of another version is refused there, never tried as XML.
 Document::Document(Bytes message) {
   if (message.size() > Limits::messageLength) throw Damage(Problem::messageTooLarge, 0);
   store_.message = message;

@@ -39,6 +39,8 @@ class EntryRange;
 class Value {
  public:
   Type type() const noexcept { return node().type; }
+  // Each throws std::logic_error for a value of another type, and nothing else. They cost a
+  // look-up; none allocates or converts.
   bool boolean() const { return expect(Type::boolean).bits != 0; }
   Integer integer() const;
   double real() const;
@@ -111,6 +113,7 @@ class ArrayRange {
     bool shared_;
   };
 
+  // Single pass would do for every reader; a copy of an iterator may be walked again all the same.
   Iterator begin() const noexcept { return first_; }
   std::default_sentinel_t end() const noexcept { return {}; }
 
@@ -177,6 +180,7 @@ class EntryRange {
 class Document {
  public:
   // Throws Damage for anything that is no property list, and std::bad_alloc.
+  // A small message costs no allocation, a larger one a few: never one per object.
   explicit Document(Bytes message);
 
   // Values point at the document, so it stays where it is.

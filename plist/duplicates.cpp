@@ -1,23 +1,17 @@
 // SPDX-License-Identifier: Apache-2.0
+// Grouping strings by a fingerprint, so that most are never compared with any other.
 #include "plist/duplicates.h"
 
 #include <algorithm>
 #include <bit>
 #include <cstdint>
-#include <cstring>
 
+#include "plist/cursor.h"
 #include "plist/limits.h"
 #include "plist/small_buffer.h"
 
 namespace PropertyList {
 namespace {
-
-template <typename Word>
-std::uint64_t wordAt(std::string_view s, std::size_t offset) noexcept {
-  Word word;
-  std::memcpy(&word, s.data() + offset, sizeof word);
-  return word;
-}
 
 // Looks at the beginning, the middle and the end: it has to be cheap, not good.
 std::uint64_t fingerprint(std::string_view s) noexcept {
@@ -25,15 +19,15 @@ std::uint64_t fingerprint(std::string_view s) noexcept {
   const std::size_t size = s.size();
   std::uint64_t hash = size * mix;
   if (size >= 8) {
-    hash = (hash ^ wordAt<std::uint64_t>(s, 0)) * mix;
-    hash = (std::rotl(hash, 29) ^ wordAt<std::uint64_t>(s, size / 2 - 4)) * mix;
-    hash = (std::rotl(hash, 29) ^ wordAt<std::uint64_t>(s, size - 8)) * mix;
+    hash = (hash ^ Cursor::wordAt<std::uint64_t>(s, 0)) * mix;
+    hash = (std::rotl(hash, 29) ^ Cursor::wordAt<std::uint64_t>(s, size / 2 - 4)) * mix;
+    hash = (std::rotl(hash, 29) ^ Cursor::wordAt<std::uint64_t>(s, size - 8)) * mix;
   } else if (size >= 2) {
-    const std::uint64_t ends =
-        wordAt<std::uint16_t>(s, 0) << 16 | wordAt<std::uint16_t>(s, size - 2);
-    hash = (hash ^ ends << 16 ^ wordAt<std::uint16_t>(s, size / 2 - 1)) * mix;
+    const std::uint64_t ends = std::uint64_t{Cursor::wordAt<std::uint16_t>(s, 0)} << 16 |
+                               Cursor::wordAt<std::uint16_t>(s, size - 2);
+    hash = (hash ^ ends << 16 ^ Cursor::wordAt<std::uint16_t>(s, size / 2 - 1)) * mix;
   } else if (size == 1) {
-    hash = (hash ^ wordAt<std::uint8_t>(s, 0)) * mix;
+    hash = (hash ^ Cursor::wordAt<std::uint8_t>(s, 0)) * mix;
   }
   return hash ^ (hash >> 32);
 }
@@ -47,6 +41,7 @@ bool pairwise(std::span<const std::string_view> strings) noexcept {
   return false;
 }
 
+// A group is small unless someone arranged otherwise; then it is sorted.
 bool inGroup(std::span<std::string_view> group) {
   if (group.size() <= Limits::fewStrings) return pairwise(group);
   std::sort(group.begin(), group.end(), isBefore);

@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+// Ranks: equal strings get equal numbers, so that numbers can be compared in their place.
 #include "plist/long_keys.h"
 
 #include <algorithm>
@@ -16,6 +17,7 @@ std::uint32_t LongKeys::keyAt(const Node& dictionary, std::uint32_t index) const
   return store_.child(static_cast<std::size_t>(dictionary.bits) + index * store_.referenceSize);
 }
 
+// Bounded per key: the fingerprint looks at 24 bytes, a comparison at no more than a short key has.
 void LongKeys::check(std::uint32_t number) {
   const Node& dictionary = store_.nodes[number];
   keys_.clear();
@@ -49,6 +51,7 @@ void LongKeys::checkDeferred() {
   }
 }
 
+// Each string once, however many dictionaries name it.
 void LongKeys::collectStrings() {
   ranks_.zero(store_.nodes.size());
   for (const std::uint32_t number : deferred_.all()) {
@@ -67,6 +70,8 @@ void LongKeys::rankStrings() {
     return store_.text(store_.nodes[number]);
   };
   const auto strings = strings_.all();
+  // Strings of one length alone are compared by bytes; together they are no longer than what
+  // objects may claim, so the sort costs that times a logarithm.
   std::sort(strings.begin(), strings.end(), [&](std::uint32_t left, std::uint32_t right) {
     return isBefore(text(left), text(right));
   });

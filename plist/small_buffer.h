@@ -54,6 +54,7 @@ class SmallBuffer {
   void reserve(std::size_t capacity) {
     if (capacity <= capacity_) return;
     if (capacity > static_cast<std::size_t>(-1) / sizeof(T)) throw std::bad_alloc();
+    // Null at first, so that the first growth is an allocation and the inline elements are copied.
     void* const grown = std::realloc(heap_, capacity * sizeof(T));
     if (grown == nullptr) throw std::bad_alloc();
     if (heap_ == nullptr) std::memcpy(grown, inline_, size_ * sizeof(T));
@@ -71,6 +72,7 @@ class SmallBuffer {
   void clear() noexcept { size_ = 0; }
 
  private:
+  // Unset until used: clearing 2 KiB would cost more than reading a small message.
   alignas(T) std::byte inline_[N * sizeof(T)];
   void* heap_ = nullptr;
   T* data_ = reinterpret_cast<T*>(inline_);

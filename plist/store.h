@@ -72,6 +72,7 @@ struct Store {
   }
 
   // A position among children is an offset into the message in binary, a node number in XML.
+  // Where a container's children begin.
   std::size_t firstChild(std::uint32_t container) const noexcept {
     return referenceSize == 0 ? container + std::size_t{1}
                               : static_cast<std::size_t>(nodes[container].bits);
@@ -81,6 +82,7 @@ struct Store {
         referenceSize == 0 ? position : Cursor::bigEndianAt(message, position, referenceSize);
     return static_cast<std::uint32_t>(number);
   }
+  // The next sibling. In XML that is past all descendants.
   std::size_t after(std::size_t position) const noexcept {
     if (referenceSize != 0) return position + referenceSize;
     const Node& node = nodes[position];

@@ -31,6 +31,7 @@ struct Uid {
   bool operator==(const Uid&) const = default;
 };
 
+// Dictionaries keep their order, since readers may depend on it and the mirror encoding does.
 using Data = std::vector<std::byte>;
 using Array = std::vector<Tree>;
 using Dictionary = std::vector<std::pair<std::string, Tree>>;
@@ -44,6 +45,7 @@ struct Tree {
   using Variant = std::variant<std::nullptr_t, bool, std::int64_t, std::uint64_t, double, Date,
                                std::string, Data, Array, Dictionary, Uid, Set>;
 
+  // Implicit, so that a message can be written down as nested braces.
   Tree(std::nullptr_t) noexcept : value(nullptr) {}
   Tree(bool boolean) noexcept : value(boolean) {}
   template <std::signed_integral Number>

@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+// Character by character where it must be, in blocks where a message is plain.
 #include "plist/unicode.h"
 
 #include <algorithm>
@@ -41,6 +42,7 @@ Character firstCharacter(std::string_view text) noexcept {
   const auto lead = static_cast<unsigned char>(text[0]);
   if (lead < 0x80) return {lead, 1};
   if (lead < 0xC2 || lead > 0xF4) return malformed;
+  // 0xC0 and 0xC1 could begin overlong forms only, 0xF5 and above what lies beyond U+10FFFF.
   const std::size_t length = lead < 0xE0 ? 2 : lead < 0xF0 ? 3 : 4;
   if (text.size() < length) return malformed;
   char32_t codePoint = lead & (0x7Fu >> length);
@@ -56,6 +58,7 @@ Character firstCharacter(std::string_view text) noexcept {
   return {codePoint, length};
 }
 
+// Never asked for a surrogate: both callers have checked.
 std::size_t encodeUtf8(char32_t c, char* out) noexcept {
   const auto tail = [c](unsigned shift) {
     return static_cast<char>(0x80 | ((c >> shift) & 0x3F));
@@ -85,6 +88,7 @@ std::size_t encodeUtf8(char32_t c, char* out) noexcept {
 bool isAscii(Bytes bytes) noexcept {
   constexpr std::size_t block = 64;
   while (bytes.size() >= block) {
+    // Blocks without an exit inside become vector code.
     std::byte seen{};
     for (const std::byte c : bytes.first<block>()) seen |= c;
     if ((seen & std::byte{0x80}) != std::byte{}) return false;

@@ -23,6 +23,7 @@ constexpr bool isPublicCharacter(char c) noexcept {
   return isLetterOrDigit(c) || isOneOf(c, " \r\n-'()+,./:=?;!*#@$_%");
 }
 
+// The only encoding that is read, so a name for any other is a lie or a mistake.
 bool isUtf8(std::string_view encoding) noexcept {
   constexpr std::string_view utf8 = "utf-8";
   return std::ranges::equal(encoding, utf8, [](char c, char lower) {
@@ -30,6 +31,7 @@ bool isUtf8(std::string_view encoding) noexcept {
   });
 }
 
+// Any 1.x is read as 1.0, as XML has it.
 bool isVersion(std::string_view version) noexcept {
   return version.size() > 2 && version.starts_with("1.") &&
          std::ranges::all_of(version.substr(2), [](char c) { return c >= '0' && c <= '9'; });
@@ -39,6 +41,7 @@ bool isVersion(std::string_view version) noexcept {
 
 void XmlScanner::prolog() {
   cursor_.skipIf(byteOrderMark);
+  // "<?xml-stylesheet" begins like the declaration and is an instruction.
   if (cursor_.rest().starts_with("<?xml") && isOneOf(cursor_.peek(5), " \t\r\n")) declaration();
   miscellany();
   if (cursor_.skipIf("<!DOCTYPE")) {
@@ -47,6 +50,7 @@ void XmlScanner::prolog() {
   }
 }
 
+// The three come in this order or not at all; the first is required.
 void XmlScanner::declaration() {
   cursor_.skip(5);
   std::string_view value;

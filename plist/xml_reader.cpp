@@ -1,5 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 // Reads XML property lists: the elements, their order and their values.
+//
+// The stack of open containers is explicit and of fixed size. Nodes are made in document order, so
+// a container is closed by noting where the table has come to.
 #include <algorithm>
 #include <array>
 #include <bit>
@@ -66,6 +69,7 @@ class XmlReader {
   std::array<Frame, Limits::nestedContainers> frames_;
 };
 
+// One root, one value in it, and nothing but comments, instructions and space around.
 void XmlReader::read() {
   scanner_.prolog();
   if (!cursor_.skipIf("<plist")) {
@@ -153,6 +157,7 @@ void XmlReader::openContainer(Type type, bool isEmpty) {
   if (!isEmpty) frames_[depth_++] = {.number = number, .children = 0};
 }
 
+// The end tag is checked against what is open here, so elements cannot cross.
 void XmlReader::closeContainer() {
   const Frame frame = frames_[--depth_];
   Node& node = store_.nodes[frame.number];
@@ -165,6 +170,7 @@ void XmlReader::closeContainer() {
   checkKeys(frame.number);
 }
 
+// XML shares nothing: all keys together are no longer than the message, whatever their number.
 void XmlReader::checkKeys(std::uint32_t dictionary) {
   keys_.clear();
   std::size_t key = dictionary + std::size_t{1};
@@ -204,6 +210,7 @@ void XmlReader::addText(const XmlScanner::Text& text) {
 
 void XmlReader::addData(const XmlScanner::Text& text) {
   const std::size_t start = text.inSide ? text.offset : store_.side.size();
+  // Assembled text is decoded where it stands: what comes out is shorter than what went in.
   if (!text.inSide) store_.side.resize(start + text.length / 4 * 3 + 3);
   const auto length = decodeBase64(view(text), store_.side.data() + start);
   if (!length) scanner_.fail(Problem::badBase64);
@@ -219,6 +226,7 @@ void XmlReader::addNumber(Element element, const XmlScanner::Text& text) {
     if (integer->negative) node.set(Node::negative);
     return;
   }
+  // Two elements, one node each: both are a double.
   const bool isDate = element == Element::date;
   const auto number = isDate ? parseDate(view(text)) : parseReal(view(text));
   if (!number) scanner_.fail(isDate ? Problem::badDate : Problem::badReal);

@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+// Spellings are checked here in full; from_chars only converts what has been found sound.
 #include "plist/xml_scalars.h"
 
 #include <algorithm>
@@ -81,6 +82,7 @@ constexpr int daysInMonth(int year, int month) noexcept {
 
 std::optional<Integer> parseInteger(std::string_view text) noexcept {
   text = trimmed(text);
+  // Deliberate: no sign before 0x, and no more than 16 digits, leading zeros included.
   if (text.starts_with("0x") || text.starts_with("0X")) {
     if (text.size() > 18) return std::nullopt;
     const auto bits = parseDigits(text.substr(2), 16);
@@ -89,6 +91,7 @@ std::optional<Integer> parseInteger(std::string_view text) noexcept {
   }
   const auto magnitude = parseDigits(unsignedPart(text), 10);
   if (!magnitude) return std::nullopt;
+  // Minus zero is zero: an integer has no sign then.
   if (!text.starts_with('-') || *magnitude == 0) return Integer{*magnitude, false};
   if (*magnitude > std::uint64_t{1} << 63) return std::nullopt;
   return Integer{~*magnitude + 1, true};
@@ -105,6 +108,8 @@ std::optional<double> parseReal(std::string_view text) noexcept {
     number = std::numeric_limits<double>::infinity();
   } else {
     if (!isDecimal(text)) return std::nullopt;
+    // Deliberate: a number too small for a double is refused as one too large is. Read as zero, it
+    // would pass a test for zero that its writer never meant.
     const auto result = std::from_chars(text.data(), text.data() + text.size(), number);
     if (result.ec != std::errc{}) return std::nullopt;
   }
@@ -128,6 +133,7 @@ std::optional<double> parseDate(std::string_view text) noexcept {
   const int hour = number(11, 2);
   const int minute = number(14, 2);
   const int second = number(17, 2);
+  // Deliberate: no second 60. A leap second has no place in seconds counted without them.
   if (year < 1 || month < 1 || month > 12 || day < 1 || day > daysInMonth(year, month) ||
       hour > 23 || minute > 59 || second > 59) {
     return std::nullopt;

@@ -23,11 +23,13 @@ void XmlScanner::markup() {
   }
 }
 
+// Past the "<!--". "--" may only stand in its end.
 void XmlScanner::comment() {
   while (!cursor_.skipIf("--")) character();
   if (!cursor_.skipIf(">")) fail(Problem::badComment);
 }
 
+// Past the "<?". The target "xml" in any case is kept for the declaration.
 void XmlScanner::instruction() {
   const std::string_view target = name(Problem::badInstruction);
   const auto isLetter = [&](std::size_t at, char lower) {
@@ -51,6 +53,7 @@ char32_t XmlScanner::character() {
   return next.codePoint;
 }
 
+// A Name as XML has it; its colons mean nothing here.
 std::string_view XmlScanner::name(Problem problem) {
   const std::size_t start = cursor_.position();
   while (!cursor_.atEnd()) {
@@ -65,6 +68,7 @@ std::string_view XmlScanner::name(Problem problem) {
 }
 
 void XmlScanner::attributes() {
+  // Gathered and compared once: a tag with a million attributes must not cost their square.
   SmallBuffer<std::string_view, 8> names;
   for (;;) {
     const bool separated = cursor_.skipSpace();
@@ -80,6 +84,7 @@ void XmlScanner::attributes() {
   if (hasDuplicates(names.all())) fail(Problem::duplicateAttribute);
 }
 
+// Checked as if it mattered: an unclosed quote would swallow the tags after it.
 void XmlScanner::attributeValue() {
   const char quote = cursor_.peek();
   if (quote != '"' && quote != '\'') fail(Problem::badTag);
@@ -132,8 +137,11 @@ char32_t XmlScanner::characterReference() {
     } else {
       fail(Problem::badReference);
     }
+    // At every digit, so that no number of digits can overflow.
     if (codePoint > 0x10FFFF) fail(Problem::badReference);
   }
+  // Deliberate: a reference may name only what could also stand there plainly, so it smuggles in no
+  // zero.
   if (cursor_.position() == start || !isXmlCharacter(codePoint)) fail(Problem::badReference);
   cursor_.skip(1);
   return codePoint;
@@ -152,6 +160,7 @@ void XmlScanner::plainText() {
   }
 }
 
+// Most text stands in the message as it is meant, and stays there.
 XmlScanner::Text XmlScanner::text(std::string_view element) {
   const std::size_t start = cursor_.position();
   plainText();
@@ -189,6 +198,7 @@ void XmlScanner::assemble(std::size_t start) {
   }
 }
 
+// Past the "<![CDATA[": markup and references mean nothing, line ends still do.
 void XmlScanner::section() {
   std::size_t piece = cursor_.position();
   while (!cursor_.rest().starts_with("]]>")) {

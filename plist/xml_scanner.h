@@ -50,6 +50,7 @@ class XmlScanner {
   [[noreturn]] void fail(Problem problem) const { throw Damage(problem, cursor_.position()); }
 
  private:
+  // Each passes one construct whole, and fails with the problem of its name.
   void declaration();
   bool pseudoAttribute(std::string_view name, std::string_view& value);
   void documentType();
@@ -62,6 +63,7 @@ class XmlScanner {
   char32_t character();
   char32_t reference();
   char32_t characterReference();
+  // Text as it is meant is gathered by these at the end of the side buffer.
   void plainText();
   void assemble(std::size_t start);
   void section();

@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+// Containers wait on a stack of their own, as in the readers.
 #include <array>
 #include <charconv>
 #include <cmath>
@@ -57,6 +58,7 @@ std::string base64(const Data& data) {
   return out;
 }
 
+// The shortest spelling that reads back as the same double.
 std::string spelt(double number) {
   if (std::isnan(number)) return "nan";
   std::array<char, 32> text{};
@@ -140,6 +142,7 @@ void XmlWriter::open(Frame frame) {
   frames_.push_back(frame);
 }
 
+// Writes the next child of the innermost container, or its end tag.
 void XmlWriter::step() {
   Frame& frame = frames_.back();
   const bool isArray = frame.array != nullptr;
