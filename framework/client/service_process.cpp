@@ -56,7 +56,8 @@ void ServiceProcess::shakeHands(const ServiceSettings& settings, Deadline deadli
   hello.numbers[2] = settings.cpuSecondsPerWorker;
   ControlFrame answer;
   const int control = handles_.control.get();
-  if (!sendFrame(control, hello, noDescriptor, deadline)) failToStart(false);
+  // A service that has already refused takes no hello, and its reason is waiting to be read.
+  static_cast<void>(sendFrame(control, hello, noDescriptor, deadline));
   if (waitFor(control, POLLIN, deadline) == 0) failToStart(true);
   if (receiveFrame(control, answer) != Received::frame) failToStart(false);
   if (answer.kind == ControlKind::refused) {

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "framework/transport/layers.h"
 
+#include <span>
 #include <system_error>
 
 namespace Keelgate::Transport {
@@ -46,7 +47,7 @@ std::string_view explain(Obstacle obstacle) {
 
 std::string missingLayersLine(std::uint64_t layers) {
   std::string line;
-  for (const NamedLayer& row : namedLayers) {
+  for (const NamedLayer& row : std::span(namedLayers).subspan(firstWalls, secondWalls)) {
     if ((layers & row.layer) != 0) continue;
     line += line.empty() ? "Running without: " : ", ";
     line += row.name;

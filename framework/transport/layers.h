@@ -17,7 +17,10 @@ struct NamedLayer {
   std::string_view name;
 };
 
-/// Strongest first. The first `firstWalls` of them are never missing in a service that is ready.
+/// Strongest first. The first walls are never missing in a service that is ready; the second ones
+/// are what a machine may lack and a client may insist on. The last rows are neither: an
+/// unprivileged caller brings groups that it cannot leave, and behind the other walls they open
+/// nothing.
 inline constexpr std::array namedLayers{
     NamedLayer{layerStrictFilter, "strict system call filter"},
     NamedLayer{layerOneDescriptor, "one descriptor"},
@@ -38,8 +41,10 @@ inline constexpr std::array namedLayers{
     NamedLayer{layerNoSupplementaryGroups, "no supplementary groups"},
 };
 constexpr std::size_t firstWalls = 6;
+constexpr std::size_t secondWalls = 9;
 
-/// One line for the log that names the second walls which `layers` lacks; empty when none is.
+/// One line for the log that names the second walls which `layers` lacks; empty when none is
+/// missing.
 std::string missingLayersLine(std::uint64_t layers);
 
 /// A sentence that says what a service could not have and how to get it. `error` is the errno that

@@ -59,6 +59,10 @@ const std::map<std::string, std::string> survivedOrders{
 };
 
 TEST(C2, EveryCallButThreeKillsTheWorker) {
+#ifdef KEELGATE_UNSEALED
+  // Nor may it run: the calls would be made.
+  GTEST_SKIP() << "this build has no seal";
+#endif
   std::vector<std::string> orders;
   for (long call = 0; call <= 600; ++call) {
     orders.push_back("call " + std::to_string(call) + " 0 0 0");
