@@ -1,0 +1,208 @@
+// SPDX-License-Identifier: Apache-2.0
+// What containment costs. Each figure is a median, and stands beside what the same machine needs in
+// the same run for the least that could be done: a fork that exits and is waited for, and a round
+// trip of the same bytes over a socket to a process that is already there.
+#include "framework/client/worker.h"
+#include "framework/transport/frames.h"
+
+#include <keelgate/client.h>
+
+#include <benchmark/benchmark.h>
+#include <sys/socket.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <filesystem>
+#include <fstream>
+#include <iterator>
+#include <optional>
+#include <vector>
+
+namespace Keelgate {
+namespace {
+
+using Micros = std::chrono::duration<double, std::micro>;
+
+Data message() {
+  std::ifstream file(KEELGATE_EXAMPLES "/command-response.bplist", std::ios::binary);
+  const std::vector<char> bytes{std::istreambuf_iterator<char>(file), {}};
+  const Bytes view = std::as_bytes(std::span(bytes));
+  return {view.begin(), view.end()};
+}
+
+template <class Call>
+double timed(Call call) {
+  const auto start = Clock::now();
+  call();
+  return Micros(Clock::now() - start).count();
+}
+
+double median(std::vector<double> samples) {
+  const auto middle = samples.begin() + static_cast<std::ptrdiff_t>(samples.size() / 2);
+  std::nth_element(samples.begin(), middle, samples.end());
+  return *middle;
+}
+
+template <class Call>
+double medianOf(int n, Call call) {
+  std::vector<double> samples;
+  for (int i = 0; i < n; ++i) samples.push_back(timed(call));
+  return median(std::move(samples));
+}
+
+double bareFork() {
+  static const double result = medianOf(500, [] {
+    const pid_t pid = fork();
+    if (pid == 0) _exit(0);
+    waitpid(pid, nullptr, 0);
+  });
+  return result;
+}
+
+/// A child answers what it gets with as many bytes as a service would.
+double bareRoundTrip() {
+  static const double result = [] {
+    const Data request(sizeof(Transport::RequestHeader) + message().size());
+    const Data reply(sizeof(Transport::ReplyHeader) + 64);
+    int ends[2];
+    if (socketpair(AF_UNIX, SOCK_STREAM, 0, ends) != 0) std::abort();
+    const pid_t pid = fork();
+    Data buffer(4096);
+    while (pid == 0) {
+      if (read(ends[1], buffer.data(), buffer.size()) <= 0) _exit(0);
+      if (write(ends[1], reply.data(), reply.size()) <= 0) _exit(0);
+      close(ends[0]);
+    }
+    close(ends[1]);
+    const double trip = medianOf(2000, [&] {
+      if (write(ends[0], request.data(), request.size()) <= 0) std::abort();
+      if (read(ends[0], buffer.data(), buffer.size()) <= 0) std::abort();
+    });
+    close(ends[0]);
+    waitpid(pid, nullptr, 0);
+    return trip;
+  }();
+  return result;
+}
+
+/// Runs the call with a pause behind each, in which the service can get ready for the next one.
+template <class Call>
+void measure(benchmark::State& state, std::chrono::microseconds pause, Call call) {
+  std::vector<double> samples;
+  for (auto _ : state) {
+    samples.push_back(timed(call));
+    state.SetIterationTime(samples.back() / 1e6);
+    if (pause.count() > 0) usleep(static_cast<useconds_t>(pause.count()));
+  }
+  const double middle = median(std::move(samples));
+  state.counters["median_us"] = middle;
+  state.counters["x_fork"] = middle / bareFork();
+  state.counters["x_trip"] = middle / bareRoundTrip();
+}
+
+Client::Options options(std::size_t messagesPerProcess) {
+  Client::Options options;
+  options.processes = 1;
+  options.messagesPerProcess = messagesPerProcess;
+  options.servicePath = KEELGATE_SERVICE;
+  return options;
+}
+
+void bareForkExitWait(benchmark::State& state) {
+  measure(state, {}, [] {
+    const pid_t pid = fork();
+    if (pid == 0) _exit(0);
+    waitpid(pid, nullptr, 0);
+  });
+}
+
+void freshWorkerWithoutSpare(benchmark::State& state) {
+  DescriptorBook book(16);
+  const auto service =
+      std::make_shared<ServiceProcess>(ServiceSettings{.path = KEELGATE_SERVICE,
+                                                       .socket = {},
+                                                       .requireLayers = false,
+                                                       .largestMessage = 1u << 20,
+                                                       .messagesPerWorker = 1,
+                                                       .cpuSecondsPerWorker = 5,
+                                                       .maximumWorkers = 8},
+                                       book, deadlineAfter(std::chrono::seconds(5)));
+  const Data bytes = message();
+  measure(state, std::chrono::milliseconds(2), [&] {
+    const Deadline deadline = deadlineAfter(std::chrono::seconds(5));
+    Worker worker(service, *service->fork(deadline));
+    ReceivedReply reply;
+    if (worker.exchange({.record = recordNumber<VespCommandResponse>,
+                         .command = 0,
+                         .service = {},
+                         .message = bytes},
+                        deadline, reply)) {
+      state.SkipWithError("no reply");
+    }
+    worker.finish();
+  });
+}
+
+void clientCall(benchmark::State& state, std::size_t messagesPerProcess,
+                std::chrono::microseconds pause) {
+  Client client(options(messagesPerProcess));
+  const Data bytes = message();
+  client.unpack<VespCommandResponse>(bytes);
+  measure(state, pause,
+          [&] { benchmark::DoNotOptimize(client.unpack<VespCommandResponse>(bytes)); });
+}
+
+void coldStart(benchmark::State& state) {
+  const Data bytes = message();
+  std::optional<Client> client;
+  measure(state, {}, [&] {
+    client.reset();
+    client.emplace(options(1));
+    benchmark::DoNotOptimize(client->unpack<VespCommandResponse>(bytes));
+  });
+}
+
+/// Kilobytes that all processes below this one have resident, shared pages counted in each.
+std::size_t residentBelow(const std::filesystem::path& process) {
+  std::size_t sum = 0;
+  for (const auto& task : std::filesystem::directory_iterator(process / "task")) {
+    std::ifstream list(task.path() / "children");
+    for (int pid; list >> pid;) {
+      const auto child = std::filesystem::path("/proc") / std::to_string(pid);
+      std::ifstream sizes(child / "statm");
+      std::size_t all = 0;
+      std::size_t resident = 0;
+      sizes >> all >> resident;
+      sum += resident * 4 + residentBelow(child);
+    }
+  }
+  return sum;
+}
+
+void idleService(benchmark::State& state) {
+  Client client(options(1));
+  client.unpack<VespCommandResponse>(message());
+  usleep(50'000);
+  for (auto _ : state) state.SetIterationTime(1e-9);
+  state.counters["resident_KiB"] = static_cast<double>(residentBelow("/proc/self"));
+}
+
+BENCHMARK(bareForkExitWait)->UseManualTime()->Iterations(500);
+BENCHMARK(freshWorkerWithoutSpare)->UseManualTime()->Iterations(500);
+BENCHMARK_CAPTURE(clientCall, spareForkedAhead, 1, std::chrono::milliseconds(2))
+    ->UseManualTime()
+    ->Iterations(500);
+BENCHMARK_CAPTURE(clientCall, oneAfterTheOther, 1, std::chrono::milliseconds(0))
+    ->UseManualTime()
+    ->Iterations(2000);
+BENCHMARK_CAPTURE(clientCall, warm, 1'000'000'000, std::chrono::milliseconds(0))
+    ->UseManualTime()
+    ->Iterations(5000);
+BENCHMARK(coldStart)->UseManualTime()->Iterations(50);
+BENCHMARK(idleService)->UseManualTime()->Iterations(1);
+
+}  // namespace
+}  // namespace Keelgate
+
+BENCHMARK_MAIN();
