@@ -1,0 +1,86 @@
+// SPDX-License-Identifier: Apache-2.0
+// One crashing message after the other. Afterwards the application has the descriptors, children,
+// threads and, nearly, the memory that it had before.
+//
+//     soak SERVICE MESSAGES THREADS [MESSAGE]
+//
+// The message is what makes a worker of that service crash; by default, one of the fake service.
+#include "tests/host/host_testing.h"
+
+#include <atomic>
+#include <csignal>
+#include <iostream>
+#include <thread>
+
+namespace Keelgate::Host {
+namespace {
+
+struct Holdings {
+  std::size_t descriptors = openDescriptors();
+  std::size_t children = Host::children().size();
+  std::ptrdiff_t threads =
+      std::distance(std::filesystem::directory_iterator("/proc/self/task"), {});
+  std::size_t residentPages = [] {
+    std::size_t all = 0;
+    std::size_t resident = 0;
+    std::ifstream("/proc/self/statm") >> all >> resident;
+    return resident;
+  }();
+
+  void print(const char* when) const {
+    std::cout << when << ": " << descriptors << " descriptors, " << children << " children, "
+              << threads << " threads, " << residentPages << " pages\n";
+  }
+};
+
+/// How many of the messages had another outcome than a crash.
+std::size_t crash(Client& client, Bytes message, long messages, unsigned threads) {
+  std::atomic<long> next = 0;
+  std::atomic<std::size_t> others = 0;
+  std::vector<std::thread> senders;
+  for (unsigned i = 0; i < threads; ++i) {
+    senders.emplace_back([&] {
+      while (next++ < messages) {
+        if (outcomeOf(client, message) != "crashed") ++others;
+      }
+    });
+  }
+  for (std::thread& sender : senders) sender.join();
+  return others;
+}
+
+bool soak(const String& service, long messages, unsigned threads, Bytes message) {
+  Client::Options options = fakeOptions();
+  options.servicePath = service;
+  options.processes = threads;
+  std::size_t others = 0;
+  { Client warmUp(options); crash(warmUp, message, 50, threads); }
+  const Holdings before;
+  {
+    Client client(options);
+    others = crash(client, message, messages, threads);
+  }
+  const Holdings after;
+  before.print("before");
+  after.print("after");
+  std::cout << "other outcomes: " << others << '\n';
+  constexpr std::size_t slack = 256;
+  return others == 0 && after.descriptors == before.descriptors &&
+         after.children == before.children && after.threads == before.threads &&
+         after.residentPages <= before.residentPages + slack;
+}
+
+}  // namespace
+}  // namespace Keelgate::Host
+
+int main(int count, char** arguments) {
+  using namespace Keelgate::Host;
+  if (count < 4) return 2;
+  const Script script = Script().then(Op::raise, SIGSEGV);
+  const std::string_view text(count == 5 ? arguments[4] : "");
+  return soak(arguments[1], std::stol(arguments[2]),
+              static_cast<unsigned>(std::stoul(arguments[3])),
+              text.empty() ? Keelgate::Bytes(script) : std::as_bytes(std::span(text)))
+             ? 0
+             : 1;
+}
