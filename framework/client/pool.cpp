@@ -147,6 +147,7 @@ Optional<HostError> Pool::attempt(Worker worker, const ClientRequest& request, D
 void Pool::keep(Worker worker, bool spent) {
   const std::lock_guard lock(mutex_);
   backOff_.noteGoodReply();
+  proved_ = true;
   if (spent) {
     worker.finish();
   } else if (worker.service() == service_.get() && service_->isUsable()) {
@@ -194,10 +195,11 @@ Pool::Service Pool::running(Lock& lock, Deadline deadline) {
       started_.wait_until(lock, deadline);
       continue;
     }
-    if (service_ && service_->isLost() && !deathNoted_) {
+    if (service_ && service_->isLost() && !proved_) {
       backOff_.noteDeath();
-      deathNoted_ = true;
-      lastFailure_ = "The service has ended";
+      // Once for each service.
+      proved_ = true;
+      lastFailure_ = "The service ended before it had answered any message";
     }
     if (Clock::now() < backOff_.notBefore()) {
       awaitBackOff(lock, deadline);
@@ -237,7 +239,7 @@ void Pool::start(Lock& lock, Deadline deadline) {
   }
   lock.lock();
   starting_ = false;
-  deathNoted_ = false;
+  proved_ = false;
   service_ = std::move(fresh);
   started_.notify_all();
   if (!failure) return;

@@ -94,7 +94,9 @@ class Pool {
 
   BackOff backOff_;
   String lastFailure_;
-  bool deathNoted_ = false;
+  /// Whether a good reply has come since the last start: a service that dies before any counts as
+  /// one that died while it was starting.
+  bool proved_ = false;
   bool layersTold_ = false;
   /// One call starts the service, the others wait.
   bool starting_ = false;
