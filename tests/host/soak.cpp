@@ -54,7 +54,10 @@ bool soak(const String& service, long messages, unsigned threads, Bytes message)
   options.servicePath = service;
   options.processes = threads;
   std::size_t others = 0;
-  { Client warmUp(options); crash(warmUp, message, 50, threads); }
+  {
+    Client warmUp(options);
+    crash(warmUp, message, 50, threads);
+  }
   const Holdings before;
   {
     Client client(options);
