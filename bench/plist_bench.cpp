@@ -42,7 +42,6 @@ Tree withData() {
 // Consumes bytes as often as the benchmark asks.
 template <typename Work>
 void measure(const std::string& name, std::string message, Work work) {
-  // NOLINTNEXTLINE(clang-analyzer-cplusplus.NewDeleteLeaks): the library keeps and frees it.
   benchmark::RegisterBenchmark(
       name.c_str(), [message = std::move(message), work](benchmark::State& state) {
         for (auto _ : state) work(message);
