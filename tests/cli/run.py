@@ -43,21 +43,6 @@ def host_error(reply):
     return reply.get("error", {}).get("reason")
 
 
-def examples():
-    for line in (messages / "index.txt").read_text().splitlines():
-        if line.startswith("#"):
-            continue
-        name, *words = line.split()
-        expected = json.loads((messages / name).with_suffix(".json").read_text())
-        files = [messages / name] if "." in name else [messages / (name + end)
-                                                       for end in (".xml", ".bplist")]
-        for file in files:
-            status, out, err = run("unpack", *words, file)
-            check(objects(out) == [expected], f"{file.name}: {out}")
-            check(status == ("error" in expected), f"{file.name}: status {status}")
-            check(("error" in expected) == (str(file) in err), f"{file.name}: says {err!r}")
-
-
 def wrong_usage():
     record = ["--record", "VespInvitation"]
     for words in ([], ["nothing"], ["unpack"], ["unpack", "--record", "Nothing"],
@@ -262,7 +247,7 @@ def terminal():
     check(b"\033" not in on_terminal("describe", NO_COLOR="1"), "NO_COLOR")
 
 
-for group in (examples, wrong_usage, many_files, without_service, stream, long_stream, described,
+for group in (wrong_usage, many_files, without_service, stream, long_stream, described,
               terminal):
     group()
 print(f"{count - len(failures)} passed, {len(failures)} failed")
