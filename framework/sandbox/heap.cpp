@@ -10,11 +10,14 @@
 namespace Keelgate::Sandbox {
 
 bool growHeap(std::size_t bytes) noexcept {
-  // Volatile, or the compiler sees that nobody uses it.
-  void* volatile area = std::malloc(bytes);
-  const bool grown = area != nullptr;
-  std::free(area);
-  return grown;
+  for (; bytes >= heapBase; bytes /= 2) {
+    // Volatile, or the compiler sees that nobody uses it.
+    void* volatile area = std::malloc(bytes);
+    if (area == nullptr) continue;
+    std::free(area);
+    return true;
+  }
+  return false;
 }
 
 void prepareHeap() {

@@ -11,7 +11,9 @@ namespace Keelgate::Sandbox {
 /// Throws Refusal. Single-threaded callers only.
 void prepareHeap();
 
-/// Grows the free part of the heap to `bytes` at least. False when the machine has not that much.
+/// Grows the free part of the heap to `bytes`, or to the half, a quarter and so on where the
+/// machine has not that much: most messages need little of what they may have. False when even the
+/// base is not to be had.
 bool growHeap(std::size_t bytes) noexcept;
 
 }  // namespace Keelgate::Sandbox

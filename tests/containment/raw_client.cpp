@@ -160,15 +160,20 @@ std::pair<RawReply, WorkerEnd> RawClient::obey(std::string_view order) {
 }
 
 void sendOrder(int channel, std::string_view order, std::uint32_t sequence) {
+  sendMessage(channel, recordNumber<VespCommandResponse>, order, sequence);
+}
+
+void sendMessage(int channel, std::size_t record, std::string_view message,
+                 std::uint32_t sequence) {
   const RequestHeader header{.magic = magic,
                              .version = protocolVersion,
-                             .record = recordNumber<VespCommandResponse>,
+                             .record = static_cast<std::uint16_t>(record),
                              .sequence = sequence,
                              .serviceLength = 0,
-                             .bodyLength = order.size(),
+                             .bodyLength = message.size(),
                              .command = 0};
   send(channel, &header, sizeof header, MSG_NOSIGNAL);
-  send(channel, order.data(), order.size(), MSG_NOSIGNAL);
+  send(channel, message.data(), message.size(), MSG_NOSIGNAL);
 }
 
 RawReply receiveReply(int channel) {

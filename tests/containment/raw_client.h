@@ -85,6 +85,9 @@ class RawClient {
   std::map<std::uint32_t, WorkerEnd> ended_;
 };
 
+/// Sends a message as a request for a record.
+void sendMessage(int channel, std::size_t record, std::string_view message,
+                 std::uint32_t sequence = 0);
 /// Sends an order as a request for the record that the obedient service answers.
 void sendOrder(int channel, std::string_view order, std::uint32_t sequence = 0);
 /// Reads frames until an answer or the end of the channel.

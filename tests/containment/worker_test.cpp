@@ -5,6 +5,8 @@
 
 #include <dirent.h>
 #include <gtest/gtest.h>
+#include <keelgate/records.h>
+#include <sys/resource.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -115,7 +117,7 @@ TEST_F(Worker, C3SeenFromOutside) {
                              "Max open files            4                    4 ",
                              "Max locked memory         0                    0 ",
                              "Max msgqueue size         0                    0 ",
-                             "Max stack size            1048576              1048576 ",
+                             "Max stack size            8388608              8388608 ",
                              "Max cpu time              5                    6 "}) {
       EXPECT_NE(limits.find(line), std::string::npos) << line << " is not in\n" << limits;
     }
@@ -148,6 +150,37 @@ TEST_F(Worker, C4MemoryIsFixedBeforeTheMessageIsRead) {
     EXPECT_EQ(end.exitStatus(), Transport::resourceExitStatus);
     EXPECT_LT(end.peakBytes, worth + slack);
   }
+}
+
+TEST_F(Worker, C4AMachineThatHasLessStillAnswers) {
+  NEEDS_SEAL();
+  RawOptions options;
+  options.before = [] {
+    const rlimit little{.rlim_cur = 512 << 20, .rlim_max = 512 << 20};
+    setrlimit(RLIMIT_AS, &little);
+  };
+  RawClient service(OBEDIENT_SERVICE, options);
+  std::string order = "answer";
+  order.resize(8 << 20, ' ');
+  const int channel = service.fork(0);
+  sendOrder(channel, order);
+  EXPECT_EQ(resultOf(receiveReply(channel)), 0);
+  close(channel);
+}
+
+TEST(Stack, TheDeepestMessageFits) {
+  RawClient service(VESP_KEELGATE_SERVICE);
+  ASSERT_TRUE(service.ready()) << service.refusal();
+  std::string message = "<dict><key>c</key><integer>1</integer></dict>";
+  for (int level = 0; level < 255; ++level) {
+    message =
+        "<dict><key>c</key><integer>1</integer><key>mml</key><array>" + message + "</array></dict>";
+  }
+  const int channel = service.fork(0);
+  sendMessage(channel, recordNumber<PulseUserPayload>, "<plist>" + message + "</plist>");
+  EXPECT_EQ(receiveReply(channel).kind, Transport::ReplyKind::record);
+  close(channel);
+  EXPECT_EQ(service.end(0).exitStatus(), 0);
 }
 
 TEST_F(Worker, C5ProcessorTimeIsLimitedWithoutTheClient) {
