@@ -247,8 +247,28 @@ def terminal():
     check(b"\033" not in on_terminal("describe", NO_COLOR="1"), "NO_COLOR")
 
 
+def completed(*words):
+    script = ('source "$0"; COMP_WORDS=("$@"); COMP_CWORD=$(($# - 1)); _keelgate "$1"; '
+              'printf "%s\\n" "${COMPREPLY[@]}"')
+    done = subprocess.run(["bash", "-c", script, root / "cli/keelgate.bash", keelgate, *words],
+                          capture_output=True, text=True)
+    return done.stdout.split() if not done.stderr else done.stderr
+
+
+def completion():
+    for words, expected in (
+            ([""], ["unpack", "stream", "describe"]), (["d"], ["describe"]),
+            (["unpack", "--t"], ["--time-limit"]), (["describe", "--j"], ["--json"]),
+            (["unpack", "--record", "P"], ["PulseUserPayload"]),
+            (["unpack", "--service", "com.tessen.private.braid.w"],
+             ["com.tessen.private.braid.waymark"]),
+            (["unpack", "--service", "x", "--command", "24"], ["245"]),
+            (["describe", "WMM"], ["WMMessageType"])):
+        check(completed(*words) == expected, f"completion of {words}: {completed(*words)}")
+
+
 for group in (wrong_usage, many_files, without_service, stream, long_stream, described,
-              terminal):
+              terminal, completion):
     group()
 print(f"{count - len(failures)} passed, {len(failures)} failed")
 sys.exit(bool(failures))
