@@ -22,8 +22,19 @@ write_basic_package_version_file(${CMAKE_BINARY_DIR}/KeelgateConfigVersion.cmake
   COMPATIBILITY SameMinorVersion)
 install(FILES ${CMAKE_BINARY_DIR}/KeelgateConfig.cmake
   ${CMAKE_BINARY_DIR}/KeelgateConfigVersion.cmake DESTINATION ${keelgate_package_dir})
-configure_file(${PROJECT_SOURCE_DIR}/packaging/keelgate.pc.in ${CMAKE_BINARY_DIR}/keelgate.pc @ONLY)
-install(FILES ${CMAKE_BINARY_DIR}/keelgate.pc DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig)
+# These name the prefix, which is known for sure only when it is installed: a package has another.
+function(install_naming_prefix template destination)
+  string(REGEX REPLACE "^.*/(.*)\\.in$" "\\1" name ${template})
+  install(CODE "
+    set(libdir \"${CMAKE_INSTALL_LIBDIR}\")
+    set(libexecdir \"${CMAKE_INSTALL_LIBEXECDIR}\")
+    set(PROJECT_VERSION \"${PROJECT_VERSION}\")
+    set(PROJECT_DESCRIPTION \"${PROJECT_DESCRIPTION}\")
+    configure_file(\"${PROJECT_SOURCE_DIR}/packaging/${template}\" \"${CMAKE_BINARY_DIR}/${name}\" @ONLY)
+    file(INSTALL \"${CMAKE_BINARY_DIR}/${name}\" DESTINATION \"\${CMAKE_INSTALL_PREFIX}/${destination}\")")
+endfunction()
+install_naming_prefix(keelgate.pc.in ${CMAKE_INSTALL_LIBDIR}/pkgconfig)
+install_naming_prefix(systemd/keelgate@.service.in lib/systemd/system)
 
 # For people and for init.
 install(FILES ${PROJECT_SOURCE_DIR}/docs/man/keelgate.1 DESTINATION ${CMAKE_INSTALL_MANDIR}/man1)
@@ -34,11 +45,8 @@ install(FILES ${PROJECT_SOURCE_DIR}/cli/keelgate.bash
 install(FILES ${PROJECT_SOURCE_DIR}/README.md ${PROJECT_SOURCE_DIR}/CHANGELOG.md
   DESTINATION ${CMAKE_INSTALL_DOCDIR})
 install(FILES ${PROJECT_SOURCE_DIR}/packaging/copyright DESTINATION ${CMAKE_INSTALL_DOCDIR})
-configure_file(${PROJECT_SOURCE_DIR}/packaging/systemd/keelgate@.service.in
-  ${CMAKE_BINARY_DIR}/keelgate@.service @ONLY)
-install(FILES ${CMAKE_BINARY_DIR}/keelgate@.service
-  ${PROJECT_SOURCE_DIR}/packaging/systemd/keelgate.socket
-  DESTINATION ${CMAKE_INSTALL_PREFIX}/lib/systemd/system)
+install(FILES ${PROJECT_SOURCE_DIR}/packaging/systemd/keelgate.socket
+  DESTINATION lib/systemd/system)
 
 set(CPACK_PACKAGE_NAME keelgate)
 set(CPACK_PACKAGE_CONTACT "The Keelgate authors <keelgate@example.org>")

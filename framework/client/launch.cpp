@@ -39,12 +39,18 @@ String ownFolder() {
   return whole.substr(0, whole.rfind('/'));
 }
 
+/// Beside the program, as a build has it; where an install has it, wherever that was moved to;
+/// where this build was configured to be installed, and where its package is.
 String findService() {
-  const String beside = ownFolder() + '/' + serviceName;
-  if (access(beside.c_str(), X_OK) == 0) return beside;
-  const String installed = String(installedFolder) + '/' + serviceName;
-  if (access(installed.c_str(), X_OK) == 0) return installed;
-  throw StartFailure("There is no " + String(serviceName) + " at " + beside + " or " + installed +
+  const String folders[] = {ownFolder(), ownFolder() + "/../libexec/keelgate", installedFolder,
+                            "/usr/libexec/keelgate"};
+  String looked;
+  for (const String& folder : folders) {
+    const String path = folder + '/' + serviceName;
+    if (access(path.c_str(), X_OK) == 0) return path;
+    looked += (looked.empty() ? "" : ", ") + path;
+  }
+  throw StartFailure("There is no " + String(serviceName) + " at " + looked +
                          ": install it there, or say where it is (servicePath, --service-path)",
                      false);
 }

@@ -56,6 +56,10 @@ expect "the packaged command" \
     "$root/examples/messages/command-response.xml" | cut -c 1-32)" \
   '{"record":"VespCommandResponse",'
 
+expect "the unit starts what is packaged" \
+  "$(sed -n 's/^ExecStart=//p' "$work/deb/usr/lib/systemd/system/keelgate@.service")" \
+  /usr/libexec/keelgate/VespKeelgateService
+
 exposure=$(systemd-analyze security --offline=yes --threshold=3 \
   "$work/deb/usr/lib/systemd/system/keelgate@.service" | sed -n 's/.*exposure level.*: \([0-9.]*\).*/\1/p')
 expect "exposure of the unit, at most 0.3" \
