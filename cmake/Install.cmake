@@ -24,7 +24,7 @@ install(FILES ${CMAKE_BINARY_DIR}/KeelgateConfig.cmake
   ${CMAKE_BINARY_DIR}/KeelgateConfigVersion.cmake DESTINATION ${keelgate_package_dir})
 # These name the prefix, which is known for sure only when it is installed: a package has another.
 function(install_naming_prefix template destination)
-  string(REGEX REPLACE "^.*/(.*)\\.in$" "\\1" name ${template})
+  get_filename_component(name ${template} NAME_WLE)
   install(CODE "
     set(libdir \"${CMAKE_INSTALL_LIBDIR}\")
     set(libexecdir \"${CMAKE_INSTALL_LIBEXECDIR}\")
