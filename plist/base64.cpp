@@ -5,6 +5,7 @@
 #include <cstdint>
 #include <cstring>
 
+#include "plist/block.h"
 #include "plist/cursor.h"
 #include "plist/xml_scalars.h"
 
@@ -58,12 +59,11 @@ struct Group {
   }
 };
 
-// Decodes groups without white space or padding and returns how many; the caller decodes on from
-// there. Each is written as 4 bytes, the last of which the next group replaces, so the run ends
-// while another group is left.
-std::size_t decodeRun(std::string_view text, char* out) noexcept {
+// Decodes as many groups without white space or padding as it can, and returns how many. Each is
+// written as 4 bytes, the last of which the next group replaces.
+std::size_t decodeGroups(std::string_view text, char* out) noexcept {
   std::size_t groups = 0;
-  for (; 4 * groups + 8 <= text.size(); ++groups) {
+  for (; 4 * groups + 4 <= text.size(); ++groups) {
     const auto c = Cursor::wordAt<std::array<char, 4>>(text, 4 * groups);
     std::uint32_t bits = lookUp(0, c[0]) | lookUp(1, c[1]) | lookUp(2, c[2]) | lookUp(3, c[3]);
     if (bits >= notInAlphabet) break;
@@ -74,24 +74,68 @@ std::size_t decodeRun(std::string_view text, char* out) noexcept {
   return groups;
 }
 
+using Groups [[gnu::vector_size(blockLength)]] = std::uint32_t;
+
+// The same for four groups at a time, on a machine whose words begin with the least byte. Each two
+// are written as 8 bytes, the last two of which what follows replaces.
+std::size_t decodeBlocks(std::string_view text, char* out) noexcept {
+  if constexpr (std::endian::native != std::endian::little) return 0;
+  std::size_t groups = 0;
+  for (; 4 * groups + blockLength <= text.size(); groups += 4) {
+    const auto c = Cursor::wordAt<Block>(text, 4 * groups);
+    const Block folded = c | ' ';
+    const Block isLetter = (folded > '`') & (folded < '{');
+    const Block isSmall = c > '`';
+    const Block isDigit = (c > '/') & (c < ':');
+    const Block isPlus = c == '+';
+    const Block isSlash = c == '/';
+    if (unmarkedPrefix(~(isLetter | isDigit | isPlus | isSlash)) < blockLength) break;
+    const Block bits = c - (isLetter & 'A') - (isSmall & ('a' - 'Z' - 1)) + (isDigit & (52 - '0')) +
+                       (isPlus & (62 - '+')) + (isSlash & (63 - '/'));
+    const auto six = std::bit_cast<Groups>(bits);
+    const Groups twelve = (six & 0x00FF'00FF) << 6 | (six >> 8 & 0x00FF'00FF);
+    const Groups all = (twelve << 12 | twelve >> 16) & 0x00FF'FFFF;
+    const auto pairs = std::bit_cast<std::array<std::uint64_t, 2>>(all);
+    for (std::size_t i = 0; i < pairs.size(); ++i) {
+      const std::uint64_t bytes = __builtin_bswap64(pairs[i] << 40 | pairs[i] >> 16);
+      std::memcpy(out + 3 * groups + 6 * i, &bytes, sizeof bytes);
+    }
+  }
+  return groups;
+}
+
 }  // namespace
+
+Base64Run decodeBase64Run(std::string_view text, char* out) noexcept {
+  Base64Run run{0, 0};
+  const auto count = [&run](std::size_t groups) {
+    run.read += 4 * groups;
+    run.written += 3 * groups;
+  };
+  // Once per line.
+  do {
+    while (run.read < text.size() && isSpace(text[run.read])) ++run.read;
+    count(decodeBlocks(text.substr(run.read), out + run.written));
+    count(decodeGroups(text.substr(run.read), out + run.written));
+  } while (run.read < text.size() && isSpace(text[run.read]));
+  return run;
+}
 
 // Deliberate: spare bits before the padding may be set, as in "QR==". Nothing here signs or
 // compares encoded text, and writers that leave them set exist.
 std::optional<std::size_t> decodeBase64(std::string_view text, char* out) noexcept {
-  std::size_t at = 0;
   std::size_t written = 0;
   bool ended = false;
   for (;;) {
-    while (at < text.size() && isSpace(text[at])) ++at;
     if (!ended) {
-      const std::size_t groups = decodeRun(text.substr(at), out + written);
-      at += 4 * groups;
-      written += 3 * groups;
+      const Base64Run run = decodeBase64Run(text, out + written);
+      text.remove_prefix(run.read);
+      written += run.written;
     }
     Group group;
-    while (at < text.size() && group.characters < 4) {
-      if (!group.add(text[at++])) return std::nullopt;
+    while (!text.empty() && group.characters < 4) {
+      if (!group.add(text.front())) return std::nullopt;
+      text.remove_prefix(1);
     }
     if (group.characters == 0) return written;
     if (group.characters < 4 || ended) return std::nullopt;

@@ -15,6 +15,7 @@
 #include <cstring>
 #include <string_view>
 
+#include "plist/block.h"
 #include "plist/bytes.h"
 #include "plist/damage.h"
 
@@ -86,6 +87,13 @@ class Cursor {
   char peek(std::size_t ahead = 0) const noexcept {
     return ahead < remaining() ? static_cast<char>(here_[ahead]) : '\0';
   }
+  // The eight bytes so many places ahead, in the machine's order, or zero when they are not all
+  // inside the window.
+  std::uint64_t word(std::size_t ahead) const noexcept {
+    std::uint64_t bytes = 0;
+    if (remaining() >= ahead + sizeof bytes) std::memcpy(&bytes, here_ + ahead, sizeof bytes);
+    return bytes;
+  }
   // All that is left of the window.
   std::string_view rest() const noexcept {
     return {reinterpret_cast<const char*>(here_), remaining()};
@@ -110,9 +118,24 @@ class Cursor {
   }
   // Moves to the next byte that text gives a meaning to or forbids: '<', '&', ']', a carriage
   // return, another control character, or any byte above 0x7F. Or to the end.
-  void skipPlain() noexcept;
+  void skipPlain() noexcept {
+    // Most texts are short: the first block is looked at where it is asked for.
+    const std::size_t length = remaining() >= blockLength ? plainPrefix() : 0;
+    here_ += length;
+    if (length == 0 || length == blockLength) skipLongPlain();
+  }
 
  private:
+  // How many bytes come before the first that is not plain. Requires a block inside the window.
+  std::size_t plainPrefix() const noexcept {
+    Block block;
+    std::memcpy(&block, here_, sizeof block);
+    // Bytes above 0x7F are below a space too.
+    return unmarkedPrefix(((block < ' ') & (block != '\n') & (block != '\t')) | (block == '<') |
+                          (block == '&') | (block == ']'));
+  }
+  void skipLongPlain() noexcept;
+
   const std::byte* begin_;
   const std::byte* here_;
   const std::byte* end_;

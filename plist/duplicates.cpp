@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Grouping strings by a fingerprint, so that most are never compared with any other.
+// Sorting out strings by a fingerprint, so that most are never compared with any other.
 #include "plist/duplicates.h"
 
 #include <algorithm>
@@ -29,7 +29,7 @@ std::uint64_t fingerprint(std::string_view s) noexcept {
   } else if (size == 1) {
     hash = (hash ^ Cursor::wordAt<std::uint8_t>(s, 0)) * mix;
   }
-  return hash ^ (hash >> 32);
+  return hash;
 }
 
 bool pairwise(std::span<const std::string_view> strings) noexcept {
@@ -41,12 +41,15 @@ bool pairwise(std::span<const std::string_view> strings) noexcept {
   return false;
 }
 
-// A group is small unless someone arranged otherwise; then it is sorted.
-bool inGroup(std::span<std::string_view> group) {
-  if (group.size() <= Limits::fewStrings) return pairwise(group);
-  std::sort(group.begin(), group.end(), isBefore);
-  return std::adjacent_find(group.begin(), group.end()) != group.end();
+// Few strings are suspect unless someone arranged otherwise; then they are sorted.
+bool amongSuspects(std::span<std::string_view> suspects) {
+  if (suspects.size() <= Limits::fewStrings) return pairwise(suspects);
+  std::sort(suspects.begin(), suspects.end(), isBefore);
+  return std::adjacent_find(suspects.begin(), suspects.end()) != suspects.end();
 }
+
+// One bit per slot.
+using Slots = SmallBuffer<std::uint64_t, 64>;
 
 }  // namespace
 
@@ -57,29 +60,29 @@ bool isBefore(std::string_view left, std::string_view right) noexcept {
 bool hasDuplicates(std::span<const std::string_view> strings) {
   if (strings.size() <= Limits::fewStrings) return pairwise(strings);
 
-  // A counting sort by the fingerprint's low bits, into about as many groups as strings.
-  const std::size_t groups = std::bit_ceil(strings.size());
-  SmallBuffer<std::uint32_t, 64> groupOf;
-  SmallBuffer<std::uint32_t, 65> ends;
-  SmallBuffer<std::string_view, 64> sorted;
-  groupOf.resize(strings.size());
-  ends.zero(groups + 1);
-  sorted.resize(strings.size());
+  // So many slots that two different strings seldom meet in one; equal ones always do.
+  const std::size_t slots = 16 * std::bit_ceil(strings.size());
+  // All of a string has a say in the fingerprint's highest bits alone.
+  const int shift = 64 - std::countr_zero(slots);
+  SmallBuffer<std::uint32_t, 64> slotOf;
+  Slots seen;
+  Slots seenAgain;
+  slotOf.resize(strings.size());
+  seen.zero(slots / 64);
+  seenAgain.zero(slots / 64);
   for (std::size_t i = 0; i < strings.size(); ++i) {
-    groupOf[i] = static_cast<std::uint32_t>(fingerprint(strings[i]) & (groups - 1));
-    ++ends[groupOf[i] + 1];
+    const auto slot = static_cast<std::uint32_t>(fingerprint(strings[i]) >> shift);
+    const std::uint64_t bit = std::uint64_t{1} << slot % 64;
+    seenAgain[slot / 64] |= seen[slot / 64] & bit;
+    seen[slot / 64] |= bit;
+    slotOf[i] = slot;
   }
-  for (std::size_t group = 1; group <= groups; ++group) ends[group] += ends[group - 1];
-  for (std::size_t i = 0; i < strings.size(); ++i) sorted[ends[groupOf[i]]++] = strings[i];
 
-  // Placing the strings has moved each group's entry from its beginning to its end.
-  std::size_t begin = 0;
-  for (std::size_t group = 0; group < groups; ++group) {
-    const std::size_t end = ends[group];
-    if (end - begin > 1 && inGroup(sorted.all().subspan(begin, end - begin))) return true;
-    begin = end;
+  SmallBuffer<std::string_view, 64> suspects;
+  for (std::size_t i = 0; i < strings.size(); ++i) {
+    if ((seenAgain[slotOf[i] / 64] >> slotOf[i] % 64 & 1) != 0) suspects.push(strings[i]);
   }
-  return false;
+  return amongSuspects(suspects.all());
 }
 
 }  // namespace PropertyList

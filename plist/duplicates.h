@@ -2,7 +2,7 @@
 // Whether a string occurs twice, at a cost that no choice of strings can raise.
 //
 // A hash table over the message's own strings would invite messages made of collisions. Here a
-// fingerprint only splits the strings into groups; whoever makes all fingerprints collide gets an
+// fingerprint only clears strings of suspicion; whoever makes all fingerprints collide gets an
 // ordinary sort: n strings of t bytes altogether cost at most about (n + t) log n.
 //
 // Pure functions; may be used from any thread.

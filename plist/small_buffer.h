@@ -52,15 +52,7 @@ class SmallBuffer {
     size_ = size;
   }
   void reserve(std::size_t capacity) {
-    if (capacity <= capacity_) return;
-    if (capacity > static_cast<std::size_t>(-1) / sizeof(T)) throw std::bad_alloc();
-    // Null at first, so that the first growth is an allocation and the inline elements are copied.
-    void* const grown = std::realloc(heap_, capacity * sizeof(T));
-    if (grown == nullptr) throw std::bad_alloc();
-    if (heap_ == nullptr) std::memcpy(grown, inline_, size_ * sizeof(T));
-    heap_ = grown;
-    data_ = static_cast<T*>(grown);
-    capacity_ = capacity;
+    if (capacity > capacity_) grow(capacity);
   }
   // `size` elements of zero bytes, in place of what was there.
   void zero(std::size_t size) {
@@ -72,6 +64,18 @@ class SmallBuffer {
   void clear() noexcept { size_ = 0; }
 
  private:
+  // Apart, so that what appends stays small enough to be inlined.
+  [[gnu::noinline]] void grow(std::size_t capacity) {
+    if (capacity > static_cast<std::size_t>(-1) / sizeof(T)) throw std::bad_alloc();
+    // Null at first, so that the first growth is an allocation and the inline elements are copied.
+    void* const grown = std::realloc(heap_, capacity * sizeof(T));
+    if (grown == nullptr) throw std::bad_alloc();
+    if (heap_ == nullptr) std::memcpy(grown, inline_, size_ * sizeof(T));
+    heap_ = grown;
+    data_ = static_cast<T*>(grown);
+    capacity_ = capacity;
+  }
+
   // Unset until used: clearing 2 KiB would cost more than reading a small message.
   alignas(T) std::byte inline_[N * sizeof(T)];
   void* heap_ = nullptr;

@@ -28,7 +28,7 @@ class Trees {
       case 5:
         return text();
       case 6:
-        return Data(below(200), static_cast<std::byte>(below(256)));
+        return Data(below(2000), static_cast<std::byte>(below(256)));
       case 7: {
         Array elements;
         for (std::size_t i = below(20); i > 0; --i) elements.push_back(next(depth - 1));

@@ -41,8 +41,11 @@ bool isVersion(std::string_view version) noexcept {
 
 void XmlScanner::prolog() {
   cursor_.skipIf(byteOrderMark);
+  // As most writers spell it, at a stroke.
+  const bool isUsual = cursor_.skipIf("<?xml version=\"1.0\" encoding=\"UTF-8\"?>");
   // "<?xml-stylesheet" begins like the declaration and is an instruction.
-  if (cursor_.rest().starts_with("<?xml") && isOneOf(cursor_.peek(5), " \t\r\n")) declaration();
+  if (!isUsual && cursor_.rest().starts_with("<?xml") && isOneOf(cursor_.peek(5), " \t\r\n"))
+    declaration();
   miscellany();
   if (cursor_.skipIf("<!DOCTYPE")) {
     documentType();

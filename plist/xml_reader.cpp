@@ -11,33 +11,22 @@
 #include "plist/duplicates.h"
 #include "plist/limits.h"
 #include "plist/store.h"
+#include "plist/xml_elements.h"
 #include "plist/xml_scalars.h"
 #include "plist/xml_scanner.h"
 
 namespace PropertyList {
 namespace {
 
-enum class Element : std::uint8_t {
-  string,
-  key,
-  integer,
-  real,
-  date,
-  data,
-  yes,
-  no,
-  array,
-  dictionary
-};
+constexpr Spelling root = {"plist", ShortText("plist>"), ShortText("plist>")};
 
-// In the order of the enumerators.
-constexpr std::array<std::string_view, 10> names = {"string", "key",  "integer", "real",  "date",
-                                                    "data",   "true", "false",   "array", "dict"};
+constexpr bool isBoolean(Element element) noexcept {
+  return element == Element::yes || element == Element::no;
+}
 
 class XmlReader {
  public:
-  explicit XmlReader(Store& store) noexcept
-      : store_(store), scanner_(store.message, store.side), cursor_(scanner_.cursor()) {}
+  explicit XmlReader(Store& store) noexcept : store_(store), scanner_(store.message, store.side) {}
 
   void read();
 
@@ -45,25 +34,33 @@ class XmlReader {
   struct Frame {
     std::uint32_t number;
     std::uint32_t children;  // of a dictionary: keys and values
+    bool isDictionary;
+
+    bool isKeyDue() const noexcept { return isDictionary && children % 2 == 0; }
   };
 
+  Cursor& cursor() noexcept { return scanner_.cursor(); }
   void readValue();
+  bool readUsual();
   void readElement();
+  void readBody(Element element, bool isEmpty);
   Element elementHere();
   void place(Element element);
   void openContainer(Type type, bool isEmpty);
   void closeContainer();
   void checkKeys(std::uint32_t dictionary);
-  void readContent(Element element, bool isEmpty);
+  XmlScanner::Text content(Element element, bool isEmpty);
   void addText(const XmlScanner::Text& text);
-  void addData(const XmlScanner::Text& text);
-  void addNumber(Element element, const XmlScanner::Text& text);
+  void addData(bool isEmpty);
+  void decodeAhead();
+  void decodeRest(const XmlScanner::Text& text);
+  void addNumber(Element element, bool isEmpty);
   std::string_view view(const XmlScanner::Text& text) const;
   Node& add(Type type, std::uint64_t bits, std::uint32_t count = 0);
+  [[gnu::noinline]] void growNodes();
 
   Store& store_;
   XmlScanner scanner_;
-  Cursor& cursor_;
   SmallBuffer<std::string_view, 64> keys_;
   std::size_t depth_ = 0;
   std::array<Frame, Limits::nestedContainers> frames_;
@@ -72,26 +69,31 @@ class XmlReader {
 // One root, one value in it, and nothing but comments, instructions and space around.
 void XmlReader::read() {
   scanner_.prolog();
-  if (!cursor_.skipIf("<plist")) {
-    scanner_.fail(cursor_.peek() == '<' ? Problem::unknownElement : Problem::notPropertyList);
+  // As most writers spell it, at a stroke.
+  if (!cursor().skipIf("<plist version=\"1.0\">")) {
+    if (!cursor().skipIf("<plist")) {
+      scanner_.fail(cursor().peek() == '<' ? Problem::unknownElement : Problem::notPropertyList);
+    }
+    scanner_.attributes();
+    if (cursor().skipIf("/>")) scanner_.fail(Problem::missingValue);
+    if (!cursor().skipIf(">")) scanner_.fail(Problem::badTag);
   }
-  scanner_.attributes();
-  if (cursor_.skipIf("/>")) scanner_.fail(Problem::missingValue);
-  if (!cursor_.skipIf(">")) scanner_.fail(Problem::badTag);
   scanner_.miscellany();
-  if (cursor_.rest().starts_with("</")) scanner_.fail(Problem::missingValue);
+  if (cursor().rest().starts_with("</")) scanner_.fail(Problem::missingValue);
   readValue();
   scanner_.miscellany();
-  scanner_.endTag("plist");
+  scanner_.endTag(root);
   scanner_.miscellany();
-  if (!cursor_.atEnd()) scanner_.fail(Problem::strayText);
+  if (!cursor().atEnd()) scanner_.fail(Problem::strayText);
 }
 
 void XmlReader::readValue() {
   readElement();
   while (depth_ > 0) {
+    cursor().skipSpace();
+    if (readUsual()) continue;
     scanner_.miscellany();
-    if (cursor_.peek() == '<' && cursor_.peek(1) == '/') {
+    if (cursor().peek() == '<' && cursor().peek(1) == '/') {
       closeContainer();
     } else {
       readElement();
@@ -99,26 +101,61 @@ void XmlReader::readValue() {
   }
 }
 
+// Reads an element whose start tag is spelt as most writers do and stands where it may. Whatever
+// else is here stays untouched, so that one place alone finds what is wrong with it.
+bool XmlReader::readUsual() {
+  if (cursor().peek() != '<') return false;
+  const std::uint64_t word = cursor().word(1);
+  const Element element = elementTable.candidate(word);
+  const ShortText& start = spellingOf(element).start;
+  Frame& frame = frames_[depth_ - 1];
+  if (!start.begins(word) || frame.isKeyDue() != (element == Element::key)) return false;
+  ++frame.children;
+  cursor().skip(1 + start.length);
+  readBody(element, isBoolean(element));
+  return true;
+}
+
 void XmlReader::readElement() {
-  if (cursor_.atEnd()) scanner_.fail(Problem::truncated);
-  if (!cursor_.skipIf("<")) scanner_.fail(Problem::strayText);
+  if (cursor().atEnd()) scanner_.fail(Problem::truncated);
+  if (!cursor().skipIf("<")) scanner_.fail(Problem::strayText);
   const Element element = elementHere();
   place(element);
-  if (cursor_.peek() != '>' && cursor_.peek() != '/') scanner_.attributes();
-  const bool isEmpty = cursor_.skipIf("/");
-  if (!cursor_.skipIf(">")) scanner_.fail(Problem::badTag);
-  if (element == Element::array) return openContainer(Type::array, isEmpty);
-  if (element == Element::dictionary) return openContainer(Type::dictionary, isEmpty);
-  readContent(element, isEmpty);
+  if (cursor().peek() != '>' && cursor().peek() != '/') scanner_.attributes();
+  const bool isEmpty = cursor().skipIf("/");
+  if (!cursor().skipIf(">")) scanner_.fail(Problem::badTag);
+  readBody(element, isEmpty);
+}
+
+// What follows a start tag.
+void XmlReader::readBody(Element element, bool isEmpty) {
+  switch (element) {
+    case Element::string:
+    case Element::key:
+      return addText(content(element, isEmpty));
+    case Element::data:
+      return addData(isEmpty);
+    case Element::yes:
+    case Element::no:
+      if (content(element, isEmpty).length > 0) scanner_.fail(Problem::strayText);
+      add(Type::boolean, element == Element::yes ? 1 : 0);
+      return;
+    case Element::array:
+      return openContainer(Type::array, isEmpty);
+    case Element::dictionary:
+      return openContainer(Type::dictionary, isEmpty);
+    default:
+      addNumber(element, isEmpty);
+  }
 }
 
 Element XmlReader::elementHere() {
   const auto is = [this](Element element, std::string_view name) {
-    if (!cursor_.skipIf(name)) scanner_.fail(Problem::unknownElement);
+    if (!cursor().skipIf(name)) scanner_.fail(Problem::unknownElement);
     return element;
   };
   // The first letter, or the fourth, tells which one it can be.
-  switch (cursor_.peek()) {
+  switch (cursor().peek()) {
     case 'k':
       return is(Element::key, "key");
     case 's':
@@ -134,8 +171,8 @@ Element XmlReader::elementHere() {
     case 'a':
       return is(Element::array, "array");
     default:
-      if (cursor_.peek(3) == 't') return is(Element::dictionary, "dict");
-      return cursor_.peek(3) == 'a' ? is(Element::data, "data") : is(Element::date, "date");
+      if (cursor().peek(3) == 't') return is(Element::dictionary, "dict");
+      return cursor().peek(3) == 'a' ? is(Element::data, "data") : is(Element::date, "date");
   }
 }
 
@@ -144,7 +181,7 @@ void XmlReader::place(Element element) {
   bool isKeyDue = false;
   if (depth_ > 0) {
     Frame& frame = frames_[depth_ - 1];
-    isKeyDue = store_.nodes[frame.number].type == Type::dictionary && frame.children % 2 == 0;
+    isKeyDue = frame.isKeyDue();
     ++frame.children;
   }
   if (isKeyDue != (element == Element::key)) scanner_.fail(Problem::misplacedElement);
@@ -154,15 +191,16 @@ void XmlReader::openContainer(Type type, bool isEmpty) {
   if (depth_ == Limits::nestedContainers) scanner_.fail(Problem::tooDeep);
   const auto number = static_cast<std::uint32_t>(store_.nodes.size());
   add(type, number + std::uint64_t{1});
-  if (!isEmpty) frames_[depth_++] = {.number = number, .children = 0};
+  if (isEmpty) return;
+  frames_[depth_++] = {.number = number, .children = 0, .isDictionary = type == Type::dictionary};
 }
 
 // The end tag is checked against what is open here, so elements cannot cross.
 void XmlReader::closeContainer() {
   const Frame frame = frames_[--depth_];
   Node& node = store_.nodes[frame.number];
-  const bool isDictionary = node.type == Type::dictionary;
-  scanner_.endTag(isDictionary ? "dict" : "array");
+  const bool isDictionary = frame.isDictionary;
+  scanner_.endTag(spellingOf(isDictionary ? Element::dictionary : Element::array));
   node.bits = store_.nodes.size();
   node.count = isDictionary ? frame.children / 2 : frame.children;
   if (!isDictionary) return;
@@ -173,6 +211,7 @@ void XmlReader::closeContainer() {
 // XML shares nothing: all keys together are no longer than the message, whatever their number.
 void XmlReader::checkKeys(std::uint32_t dictionary) {
   keys_.clear();
+  keys_.reserve(store_.nodes[dictionary].count);
   std::size_t key = dictionary + std::size_t{1};
   for (std::uint32_t i = 0; i < store_.nodes[dictionary].count; ++i) {
     keys_.push(store_.text(store_.nodes[key]));
@@ -181,26 +220,10 @@ void XmlReader::checkKeys(std::uint32_t dictionary) {
   if (hasDuplicates(keys_.all())) scanner_.fail(Problem::duplicateKey);
 }
 
-void XmlReader::readContent(Element element, bool isEmpty) {
-  XmlScanner::Text text{cursor_.position(), 0, false};
-  const std::size_t side = store_.side.size();
-  if (!isEmpty) text = scanner_.text(names[static_cast<std::size_t>(element)]);
-  switch (element) {
-    case Element::string:
-    case Element::key:
-      return addText(text);
-    case Element::data:
-      return addData(text);
-    case Element::yes:
-    case Element::no:
-      if (text.length > 0) scanner_.fail(Problem::strayText);
-      add(Type::boolean, element == Element::yes ? 1 : 0);
-      return;
-    default:
-      addNumber(element, text);
-  }
-  // What was assembled for a number is of no more use.
-  store_.side.resize(side);
+// The text of an element and its end tag; nothing where the start tag was all.
+XmlScanner::Text XmlReader::content(Element element, bool isEmpty) {
+  if (isEmpty) return {cursor().position(), 0, false};
+  return scanner_.text(spellingOf(element));
 }
 
 void XmlReader::addText(const XmlScanner::Text& text) {
@@ -208,29 +231,59 @@ void XmlReader::addText(const XmlScanner::Text& text) {
   if (text.inSide) node.set(Node::inSide);
 }
 
-void XmlReader::addData(const XmlScanner::Text& text) {
+// Decodes where the text stands, piece by piece because its length is not known yet. Base64 has no
+// character that means anything to XML, so what decodes has been checked as text too.
+void XmlReader::decodeAhead() {
+  // As much as the side buffer takes without growing.
+  constexpr std::size_t pieceLength = 512;
+  bool isCut = false;
+  do {
+    const std::string_view piece = cursor().rest().substr(0, pieceLength);
+    const std::size_t start = store_.side.size();
+    store_.side.resize(start + piece.size() / 4 * 3 + 3);
+    const Base64Run run = decodeBase64Run(piece, store_.side.data() + start);
+    store_.side.resize(start + run.written);
+    cursor().skip(run.read);
+    // Less than a group is left only where the piece's end cut it in two.
+    isCut = run.read > 0 && piece.size() - run.read < 4;
+  } while (isCut);
+}
+
+void XmlReader::addData(bool isEmpty) {
+  const std::size_t start = store_.side.size();
+  if (!isEmpty) decodeAhead();
+  const XmlScanner::Text rest = content(Element::data, isEmpty);
+  if (rest.length > 0) decodeRest(rest);
+  const auto count = static_cast<std::uint32_t>(store_.side.size() - start);
+  add(Type::data, start, count).set(Node::inSide);
+}
+
+// Assembled text is decoded where it stands: what comes out is shorter than what went in.
+void XmlReader::decodeRest(const XmlScanner::Text& text) {
   const std::size_t start = text.inSide ? text.offset : store_.side.size();
-  // Assembled text is decoded where it stands: what comes out is shorter than what went in.
   if (!text.inSide) store_.side.resize(start + text.length / 4 * 3 + 3);
   const auto length = decodeBase64(view(text), store_.side.data() + start);
   if (!length) scanner_.fail(Problem::badBase64);
   store_.side.resize(start + *length);
-  add(Type::data, start, static_cast<std::uint32_t>(*length)).set(Node::inSide);
 }
 
-void XmlReader::addNumber(Element element, const XmlScanner::Text& text) {
+void XmlReader::addNumber(Element element, bool isEmpty) {
+  const std::size_t side = store_.side.size();
+  const XmlScanner::Text text = content(element, isEmpty);
   if (element == Element::integer) {
     const auto integer = parseInteger(view(text));
     if (!integer) scanner_.fail(Problem::badInteger);
     Node& node = add(Type::integer, integer->bits);
     if (integer->negative) node.set(Node::negative);
-    return;
+  } else {
+    // Two elements, one node each: both are a double.
+    const bool isDate = element == Element::date;
+    const auto number = isDate ? parseDate(view(text)) : parseReal(view(text));
+    if (!number) scanner_.fail(isDate ? Problem::badDate : Problem::badReal);
+    add(isDate ? Type::date : Type::real, std::bit_cast<std::uint64_t>(*number));
   }
-  // Two elements, one node each: both are a double.
-  const bool isDate = element == Element::date;
-  const auto number = isDate ? parseDate(view(text)) : parseReal(view(text));
-  if (!number) scanner_.fail(isDate ? Problem::badDate : Problem::badReal);
-  add(isDate ? Type::date : Type::real, std::bit_cast<std::uint64_t>(*number));
+  // What was assembled for a number is of no more use.
+  store_.side.resize(side);
 }
 
 std::string_view XmlReader::view(const XmlScanner::Text& text) const {
@@ -238,16 +291,19 @@ std::string_view XmlReader::view(const XmlScanner::Text& text) const {
   return Cursor::textAt(store_.message, text.offset, text.length);
 }
 
-// The table grows to what the message's part so far lets expect, with some room: few copies, and
-// no memory out of proportion to the message.
 Node& XmlReader::add(Type type, std::uint64_t bits, std::uint32_t count) {
   SmallBuffer<Node, 128>& nodes = store_.nodes;
-  if (nodes.size() == nodes.capacity()) {
-    const std::size_t expected = nodes.size() * store_.message.size() / (cursor_.position() + 1);
-    nodes.reserve(std::max(expected, nodes.size()) + nodes.size() / 2);
-  }
+  if (nodes.size() == nodes.capacity()) growNodes();
   nodes.push({.bits = bits, .count = count, .height = 0, .type = type, .flags = 0});
   return nodes[nodes.size() - 1];
+}
+
+// The table grows to what the message's part so far lets expect, with some room: few copies, and
+// no memory out of proportion to the message.
+void XmlReader::growNodes() {
+  SmallBuffer<Node, 128>& nodes = store_.nodes;
+  const std::size_t expected = nodes.size() * store_.message.size() / (cursor().position() + 1);
+  nodes.reserve(std::max(expected, nodes.size()) + nodes.size() / 2);
 }
 
 }  // namespace

@@ -6,6 +6,8 @@
 #include <charconv>
 #include <limits>
 
+#include "plist/cursor.h"
+
 namespace PropertyList {
 namespace {
 
@@ -22,16 +24,29 @@ bool isWord(std::string_view text, std::string_view word) noexcept {
 }
 
 std::string_view trimmed(std::string_view text) noexcept {
-  constexpr std::string_view space = " \t\n\r";
-  const std::size_t first = text.find_first_not_of(space);
-  if (first == std::string_view::npos) return {};
-  return text.substr(first, text.find_last_not_of(space) - first + 1);
+  while (!text.empty() && isSpace(text.front())) text.remove_prefix(1);
+  while (!text.empty() && isSpace(text.back())) text.remove_suffix(1);
+  return text;
 }
 
 // The text without its sign, if it has one.
 std::string_view unsignedPart(std::string_view text) noexcept {
   const bool isSigned = text.starts_with('+') || text.starts_with('-');
   return isSigned ? text.substr(1) : text;
+}
+
+// All of the text as decimal digits, so few that they cannot overflow; or nothing, and another may
+// make sense of it.
+std::optional<std::uint64_t> parseFewDigits(std::string_view text) noexcept {
+  if (text.empty() || text.size() > std::numeric_limits<std::uint64_t>::digits10) {
+    return std::nullopt;
+  }
+  std::uint64_t number = 0;
+  for (const char c : text) {
+    if (!isDigit(c)) return std::nullopt;
+    number = 10 * number + static_cast<std::uint64_t>(c - '0');
+  }
+  return number;
 }
 
 // All of the text as digits to a base; from_chars has a sign of its own, so that is ruled out.
@@ -81,6 +96,7 @@ constexpr int daysInMonth(int year, int month) noexcept {
 }  // namespace
 
 std::optional<Integer> parseInteger(std::string_view text) noexcept {
+  if (const auto number = parseFewDigits(text)) return Integer{*number, false};
   text = trimmed(text);
   // Deliberate: no sign before 0x, and no more than 16 digits, leading zeros included.
   if (text.starts_with("0x") || text.starts_with("0X")) {

@@ -45,6 +45,11 @@ void XmlScanner::instruction() {
 
 // Passes one character of any kind and checks that XML admits it.
 char32_t XmlScanner::character() {
+  const char first = cursor_.peek();
+  if (first >= ' ') {
+    cursor_.skip(1);
+    return static_cast<char32_t>(first);
+  }
   if (cursor_.atEnd()) fail(Problem::truncated);
   const Character next = firstCharacter(cursor_.rest());
   if (next.length == 0) fail(Problem::badUtf8);
@@ -100,7 +105,7 @@ void XmlScanner::attributeValue() {
   cursor_.skip(1);
 }
 
-void XmlScanner::endTag(std::string_view name) {
+void XmlScanner::unusualEndTag(std::string_view name) {
   if (!cursor_.skipIf("</") || !cursor_.skipIf(name)) fail(Problem::mismatchedEnd);
   cursor_.skipSpace();
   if (!cursor_.skipIf(">")) fail(Problem::mismatchedEnd);
@@ -161,8 +166,7 @@ void XmlScanner::plainText() {
 }
 
 // Most text stands in the message as it is meant, and stays there.
-XmlScanner::Text XmlScanner::text(std::string_view element) {
-  const std::size_t start = cursor_.position();
+XmlScanner::Text XmlScanner::unusualText(const Spelling& element, std::size_t start) {
   plainText();
   if (cursor_.peek() == '<' && cursor_.peek(1) == '/') {
     const std::size_t length = cursor_.position() - start;

@@ -14,6 +14,7 @@
 #include "plist/cursor.h"
 #include "plist/damage.h"
 #include "plist/small_buffer.h"
+#include "plist/xml_elements.h"
 
 namespace PropertyList {
 
@@ -37,7 +38,9 @@ class XmlScanner {
   // The attributes of a start tag and white space, up to its '>' or "/>". They mean nothing here.
   void attributes();
   // A closing "</name>" with white space where XML allows it.
-  void endTag(std::string_view name);
+  void endTag(const Spelling& element) {
+    if (!usualEndTag(element)) unusualEndTag(element.name);
+  }
 
   // The text that stands here, up to the end tag of `element`, which is passed.
   struct Text {
@@ -45,11 +48,25 @@ class XmlScanner {
     std::size_t length;
     bool inSide;
   };
-  Text text(std::string_view element);
+  Text text(const Spelling& element) {
+    const std::size_t start = cursor_.position();
+    cursor_.skipPlain();
+    const std::size_t end = cursor_.position();
+    if (!usualEndTag(element)) return unusualText(element, start);
+    return {start, end - start, false};
+  }
 
   [[noreturn]] void fail(Problem problem) const { throw Damage(problem, cursor_.position()); }
 
  private:
+  bool usualEndTag(const Spelling& element) noexcept {
+    constexpr ShortText beginning("</");
+    if (!beginning.begins(cursor_.word(0)) || !element.end.begins(cursor_.word(2))) return false;
+    cursor_.skip(2 + element.end.length);
+    return true;
+  }
+  void unusualEndTag(std::string_view name);
+  Text unusualText(const Spelling& element, std::size_t start);
   // Each passes one construct whole, and fails with the problem of its name.
   void declaration();
   bool pseudoAttribute(std::string_view name, std::string_view& value);
