@@ -30,6 +30,6 @@ void stream(Client::Options options, Console& console);
 void describe(const Optional<String>& name, Bool json, Console& console);
 
 /// Prints the versions of the command and of its service, and the service's sandbox layers.
-void reportVersions(std::string_view version, Console& console);
+void reportVersions(std::string_view version, const Client::Options& options, Console& console);
 
 }  // namespace Keelgate::CLI

@@ -37,8 +37,8 @@ Status statusOf(Verdict verdict) {
   return Status::serviceLost;
 }
 
-void reportVersions(std::string_view version, Console& console) {
-  Client client(loggingTo(console, {}));
+void reportVersions(std::string_view version, const Client::Options& options, Console& console) {
+  Client client(loggingTo(console, options));
   const ServiceReport report = client.report();
   String text =
       fmt::format("keelgate {}\nservice  {}\n\nSandbox layers:\n", version, report.version);

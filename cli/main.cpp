@@ -71,6 +71,14 @@ void addSeconds(::CLI::App& app, const std::string& names, std::chrono::millisec
   app.add_option_function<std::string>(names, read, help)->type_name("SECONDS");
 }
 
+void addServiceOptions(::CLI::App& app, Client::Options& options) {
+  auto* path = app.add_option("--service-path", options.servicePath, "The service to start")
+                   ->type_name("FILE");
+  app.add_option("--connect", options.socket, "The activated service to use instead")
+      ->type_name("SOCKET")
+      ->excludes(path);
+}
+
 void addHostOptions(::CLI::App& app, Client::Options& options) {
   constexpr UInt64 mostProcesses = 1024;
   constexpr UInt64 largestMessage = std::numeric_limits<std::uint32_t>::max();
@@ -85,11 +93,7 @@ void addHostOptions(::CLI::App& app, Client::Options& options) {
       ->type_name("BYTES");
   app.add_flag("--require-layers", options.requireLayers,
                "Refuse to run without namespaces, Landlock");
-  auto* path = app.add_option("--service-path", options.servicePath, "The service to start")
-                   ->type_name("FILE");
-  app.add_option("--connect", options.socket, "The activated service to use instead")
-      ->type_name("SOCKET")
-      ->excludes(path);
+  addServiceOptions(app, options);
 }
 
 void addUnpack(::CLI::App& app, Arguments& arguments) {
@@ -193,7 +197,7 @@ void run(const ::CLI::App& app, Arguments& arguments, Console& console) {
     const Bool named = app.get_subcommand("describe")->count("NAME") > 0;
     describe(named ? Optional<String>(arguments.name) : std::nullopt, arguments.json, console);
   } else if (arguments.verbose) {
-    reportVersions(version, console);
+    reportVersions(version, arguments.host, console);
   } else {
     console.print(fmt::format("keelgate {}\n", version));
   }
@@ -204,6 +208,7 @@ void build(::CLI::App& app, Arguments& arguments) {
   app.add_flag("--version", arguments.version, "Show the version");
   app.add_flag("--verbose", arguments.verbose, "The service's version and sandbox layers too")
       ->needs("--version");
+  addServiceOptions(app, arguments.host);
   addUnpack(app, arguments);
   addStream(app, arguments);
   addDescribe(app, arguments);
