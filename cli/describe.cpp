@@ -43,14 +43,6 @@ void writeServices(Out& out, const Description& what) {
 }
 
 template <class Out>
-void writeCases(Out& out, std::string_view key, const Array<EnumerationCase>& cases) {
-  writeRows(out, key, cases, [&](const EnumerationCase& entry) {
-    writeField(out, "rawValue", entry.rawValue);
-    writeText(out, "name", entry.name);
-  });
-}
-
-template <class Out>
 void writeTables(Out& out, std::string_view key, const Array<StructTable>& tables, Bool schemas) {
   writeKey(out, key);
   out.StartObject();
@@ -72,7 +64,10 @@ void writeEnumerations(Out& out, const Description& what) {
   for (const EnumerationTable& table : what.enumerations) {
     writeKey(out, table.name);
     out.StartObject();
-    writeCases(out, "cases", table.cases);
+    writeRows(out, "cases", table.cases, [&](const EnumerationCase& entry) {
+      writeText(out, "name", entry.name);
+      writeField(out, "rawValue", entry.rawValue);
+    });
     if (table.fallback) writeText(out, "default", *table.fallback);
     out.EndObject();
   }
@@ -87,7 +82,10 @@ String jsonText(const Description& what) {
       writeText(out, "schema", row.schema);
     });
     writeServices(out, what);
-    writeCases(out, "commands", what.commands);
+    writeRows(out, "commands", what.commands, [&](const EnumerationCase& command) {
+      writeField(out, "rawValue", command.rawValue);
+      writeText(out, "name", command.name);
+    });
     writeTables(out, "schemas", what.schemas, true);
     writeTables(out, "records", what.records, false);
     writeEnumerations(out, what);

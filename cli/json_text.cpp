@@ -49,7 +49,8 @@ void appendQuoted(String& to, unsigned codePoint, std::string_view bytes) {
       break;
   }
   const Bool control = codePoint < 0x20 || (codePoint >= 0x7f && codePoint < 0xa0);
-  if (control) {
+  const Bool lineEnd = codePoint == 0x2028 || codePoint == 0x2029;
+  if (control || lineEnd) {
     fmt::format_to(std::back_inserter(to), "\\u{:04x}", codePoint);
   } else {
     to += bytes;

@@ -13,8 +13,9 @@
 namespace Keelgate::CLI {
 
 /// A JSON string with its quotes. Control characters are escaped up to U+009F and not only up to
-/// U+001F: a message must not be able to drive the terminal that its record is printed on. What is
-/// no UTF-8 (only a path can hold such bytes) becomes U+FFFD.
+/// U+001F: a message must not be able to drive the terminal that its record is printed on. So are
+/// U+2028 and U+2029: many languages split lines there, and a reply is one line. What is no UTF-8
+/// (only a path can hold such bytes) becomes U+FFFD.
 String jsonString(std::string_view text);
 
 /// Whether `text` is well-formed UTF-8.

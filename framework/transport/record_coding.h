@@ -62,9 +62,10 @@ void write(Writer& to, const T& value) {
 
 // ---------------------------------------------------------------------------------- reading
 
-/// Property lists nest 512 containers, and a payload inside a payload takes two of them. No honest
-/// record is deeper; a lying one must not reach the end of the client's stack.
-constexpr int maximumDepth = 512;
+/// Property lists nest 512 containers, and a payload inside a payload takes two of them: 256
+/// payloads, and one record more inside the last. A lying service must not get any deeper into the
+/// client's stack than an honest one.
+constexpr int maximumDepth = 257;
 
 template <class T>
 void read(Reader& from, T& value, int depth);
@@ -77,9 +78,10 @@ void read(Reader& from, Optional<T>& value, int depth) {
 template <class T>
 requires(isArray<Array<T>>) void read(Reader& from, Array<T>& values, int depth) {
   // Grown with the elements that arrive and not by the count: a record may be hundreds of times as
-  // large as the shortest bytes that claim to be one.
+  // large as the shortest bytes that claim to be one. Made in place: a temporary payload takes 5 KB
+  // of stack at every level of nesting, and the application may call from a thread with little.
   for (std::size_t rest = from.count(); rest > 0; --rest) {
-    read(from, values.emplace_back(T{}), depth);
+    read(from, values.emplace_back(), depth);
   }
 }
 

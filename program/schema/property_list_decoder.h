@@ -149,7 +149,7 @@ void decodeArray(Decoding& decoding, const PropertyList::Value& value, const Cod
   into.reserve(value.count());
   std::size_t index = 0;
   for (const PropertyList::Value element : value.elements()) {
-    decodeValue(decoding, element, CodingPath(path, index++), into.emplace_back(T{}));
+    decodeValue(decoding, element, CodingPath(path, index++), into.emplace_back());
   }
 }
 

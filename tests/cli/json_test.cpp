@@ -88,6 +88,8 @@ TEST(Json, strings) {
       {std::string_view("\0\x1f\n\r\t", 5), R"("\u0000\u001f\n\r\t")"},
       // What a terminal obeys in eight bits too.
       {"\x1b[2J\x7f\u0085\u009b", R"("\u001b[2J\u007f\u0085\u009b")"},
+      // What ends a line for readers that know Unicode.
+      {"a\u2028b\u2029", R"("a\u2028b\u2029")"},
       {"\u00a0\u00e9\u20ac\U0001f600", "\"\u00a0\u00e9\u20ac\U0001f600\""},
       // Bytes of a path that are no UTF-8: alone, cut off, overlong, half a surrogate pair.
       {"a\xff\xe2\x82"

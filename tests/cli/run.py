@@ -187,17 +187,19 @@ def described():
     everything = json.loads(run("describe", "--json")[1])
     check(list(everything) == ["messageUnpackers", "services", "commands", "schemas", "records",
                                "enumerations"], "sections")
-    keys = lambda rows: {frozenset(row) for row in rows}
+    keys = lambda rows: {tuple(row) for row in rows}
     tables = lambda section: [row for table in everything[section].values() for row in table]
-    check(keys(everything["messageUnpackers"]) == {frozenset(("record", "unpacker", "schema"))},
+    check(keys(everything["messageUnpackers"]) == {("record", "unpacker", "schema")},
           "messageUnpackers")
-    check(keys(everything["services"]) == {frozenset(("service", "unpacker", "commands"))}, "services")
+    check(keys(everything["services"]) == {("service", "unpacker", "commands")}, "services")
     check(keys(row for service in everything["services"] for row in service["commands"])
-          == {frozenset(("schema", "case")), frozenset(("command", "case")),
-              frozenset(("command", "schema", "case"))}, "commands of services")
-    check(keys(everything["commands"]) == {frozenset(("rawValue", "name"))}, "commands")
-    check(keys(tables("schemas")) == {frozenset(("field", "key", "type", "required"))}, "schemas")
-    check(keys(tables("records")) == {frozenset(("field", "type", "optional"))}, "records")
+          == {("schema", "case"), ("command", "case"),
+              ("command", "schema", "case")}, "commands of services")
+    check(keys(everything["commands"]) == {("rawValue", "name")}, "commands")
+    check(keys(case for table in everything["enumerations"].values() for case in table["cases"])
+          == {("name", "rawValue")}, "cases")
+    check(keys(tables("schemas")) == {("field", "key", "type", "required")}, "schemas")
+    check(keys(tables("records")) == {("field", "type", "optional")}, "records")
     scalars = {"string", "int", "uint", "int64", "uint64", "double", "bool", "data", "date", "uuid"}
     for section in ("schemas", "records"):
         known = scalars | set(everything[section]) | set(everything["enumerations"])
