@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // What each kind of message gives, and which error, in tables. Every row runs in both encodings.
+#include "plist/test_messages.h"
 #include "program/schema/mirror_encoding.h"
 #include "program/schema/property_list_decoder.h"
 #include "program/service/tables.h"
@@ -104,43 +105,59 @@ TEST(Payloads, NestAsDeepAsPropertyListsDo) {
   EXPECT_EQ(nested(257), "dataCorrupted @");
 }
 
+std::string outcomeOfRaw(const PropertyList::Raw& raw) {
+  const std::string message = raw.message();
+  return outcome(payload, PropertyList::bytesOf(message));
+}
+
 TEST(Payloads, SharedOnesAreRefusedBeforeMemoryGrows) {
   // A list of two references to the next list, thirty levels deep, would be 2^30 payloads. Nobody
   // reads it under an unknown key, and there it is an ordinary message.
-  const auto doubling = [](const char* key) {
-    std::string objects = "bplist00";
-    std::vector<std::size_t> offsets;
-    const auto add = [&](std::string object) {
-      offsets.push_back(objects.size());
-      objects += object;
-    };
-    constexpr int levels = 30;
-    add(std::string("\x51") + "c");
-    add(std::string("\x10") + '\1');
-    add(std::string(1, static_cast<char>(0x50 + std::string_view(key).size())) + key);
-    for (int level = 0; level < levels; ++level) {
-      const auto next = static_cast<char>(offsets.size() + 1);
-      const auto after = static_cast<char>(offsets.size() + 2);
-      add(std::string("\xd2") + '\0' + '\2' + '\1' + next);
-      add(std::string("\xa2") + after + after);
+  const auto doubling = [](const std::string& key) {
+    PropertyList::Raw raw;
+    constexpr char levels = 30;
+    constexpr char command = 2 * levels + 1;
+    constexpr char one = command + 1;
+    constexpr char list = one + 1;
+    for (char next = 1; next < command; next = static_cast<char>(next + 2)) {
+      const auto after = static_cast<char>(next + 1);
+      raw.objects.push_back({'\xd2', command, list, one, next});
+      raw.objects.push_back({'\xa2', after, after});
     }
-    add(std::string("\xd1") + '\0' + '\1');
-    const std::size_t table = objects.size();
-    for (const std::size_t offset : offsets) {
-      objects += {static_cast<char>(offset >> 8), static_cast<char>(offset & 0xff)};
-    }
-    std::string trailer(32, '\0');
-    trailer[6] = 2;
-    trailer[7] = 1;
-    trailer[15] = static_cast<char>(offsets.size());
-    trailer[23] = 3;
-    trailer[30] = static_cast<char>(table >> 8);
-    trailer[31] = static_cast<char>(table & 0xff);
-    objects += trailer;
-    return outcome(payload, std::as_bytes(std::span(objects)));
+    raw.objects.push_back({'\xd1', command, one});
+    raw.objects.insert(raw.objects.end(), {{'\x51', 'c'}, {'\x10', '\1'}, '\x53' + key});
+    return outcomeOfRaw(raw);
   };
   EXPECT_EQ(doubling("mml"), "dataCorrupted @");
   EXPECT_EQ(doubling("zzz"), ".command=1");
+}
+
+TEST(Payloads, SharedOnesAreRefusedBeforeTheirUnknownKeysTakeTime) {
+  // A hundred references to one payload are cheap to make, but not to look through when it has a
+  // thousand keys that no field takes: the square of the message's length.
+  const auto wide = [](const std::string& key, std::uint64_t width) {
+    const auto two = [](std::uint64_t number) {
+      return PropertyList::bigEndian(number, 2);
+    };
+    PropertyList::Raw raw{{"\xd2" + two(1) + two(2) + two(3) + two(4),
+                           "\x51"
+                           "c",
+                           '\x53' + key, "\x10\x01", "\xaf\x10\x64", "\xdf\x11" + two(width + 1)},
+                          2};
+    for (int i = 0; i < 100; ++i) raw.objects[4] += two(5);
+    std::string values = two(3);
+    raw.objects[5] += two(1);
+    for (std::uint64_t i = 0; i < width; ++i) {
+      raw.objects[5] += two(raw.objects.size());
+      raw.objects.push_back("\x54" + std::to_string(1000 + i));
+      values += two(3);
+    }
+    raw.objects[5] += values;
+    return outcomeOfRaw(raw);
+  };
+  EXPECT_EQ(wide("mml", 1000), "dataCorrupted @");
+  EXPECT_EQ(wide("zzz", 1000), ".command=1");
+  EXPECT_TRUE(wide("mml", 20).ends_with("[99].command=1")) << wide("mml", 20);
 }
 
 TEST(Payloads, LargeOnesAreOrdinary) {

@@ -123,7 +123,9 @@ template <Keelgate::Schema S>
 void decodeSchema(Decoding& decoding, const PropertyList::Value& value, const CodingPath& path,
                   S& into) {
   const KeyedContainer container(decoding, value, path, Keelgate::typeName<S>());
-  decoding.budget.spend(value, sizeof(S));
+  // The attack: one dictionary with a million keys that no field takes, named by a thousand array
+  // elements. Nothing is made from its entries, but all are looked at each time.
+  decoding.budget.spend(value, sizeof(S) + value.count() * sizeof(PropertyList::Entry));
   if constexpr (DecodesItself<S>) {
     into = S::decode(container);
   } else {
