@@ -23,6 +23,7 @@ constexpr std::size_t narrowest = 40;
 constexpr std::size_t usual = 80;
 
 /// As in JSON but without the outer quotes, and with inner ones as they are.
+/// An error's sentence can quote a path or a service that a stranger chose.
 String escaped(std::string_view text) {
   String all;
   for (;;) {
@@ -83,6 +84,7 @@ void Console::sayLine(std::string_view line) {
 void Console::progress(std::size_t done, std::size_t total) {
   if (!isTerminal(STDERR_FILENO)) return;
   const std::lock_guard lock(mutex_);
+  // Without a newline: the next thing that is said takes its place.
   const String line = fmt::format("\r{} of {} messages", done, total);
   progressShown_ = write(STDERR_FILENO, line.data(), line.size()) > 0;
 }

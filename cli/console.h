@@ -48,6 +48,7 @@ class Console {
   void sayLine(std::string_view line);
   void clearProgress();
 
+  /// Guards the two below, and keeps lines on standard error whole.
   mutable std::mutex mutex_;
   Status status_ = Status::done;
   Bool progressShown_ = false;

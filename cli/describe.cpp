@@ -17,6 +17,7 @@ void writeText(Out& out, std::string_view key, std::string_view value) {
   writeString(out, value);
 }
 
+/// A member that is an array with an object for each row.
 template <class Out, class Rows, class WriteMembers>
 void writeRows(Out& out, std::string_view key, const Rows& rows, WriteMembers writeMembers) {
   writeKey(out, key);
@@ -154,6 +155,7 @@ void addCommands(Page& page, const Description& what) {
            });
 }
 
+/// In the overview: sixty tables of fields would bury the rest.
 void addNames(Page& page, std::string_view title, const Array<StructTable>& tables) {
   page.heading(title);
   addTable(page, {"NAME", "FIELDS"}, tables, [](const StructTable& table) -> Array<String> {
@@ -178,6 +180,7 @@ void addFields(Page& page, const Description& what) {
   }
 }
 
+/// "unknown = 0, timer = 1; any other number: unknown"
 String casesText(const EnumerationTable& table) {
   String text;
   for (const EnumerationCase& entry : table.cases) {

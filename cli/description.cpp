@@ -86,6 +86,7 @@ class Walk {
     }
   }
 
+  // A type that is none of these does not compile: it needs a name before it can travel.
   static const char* scalarText(std::type_identity<String>) { return "string"; }
   static const char* scalarText(std::type_identity<Int>) { return "int"; }
   static const char* scalarText(std::type_identity<UInt>) { return "uint"; }
@@ -117,6 +118,8 @@ std::string_view caseNameOf(const std::variant<Cases...>*) {
   return VespClientMessageType::caseNames[static_cast<std::size_t>(position)];
 }
 
+/// The command table of U. Its schemas are entered on the way; its records are reached from the
+/// result that carries them.
 template <class U>
 Array<CommandRow> commandsOf(Walk& walk) {
   Array<CommandRow> rows;
@@ -149,6 +152,7 @@ std::size_t distance(std::string_view one, std::string_view other) {
   return row.back();
 }
 
+/// Sorted, each once.
 Array<std::string_view> namesOf(const Description& all) {
   Array<std::string_view> names;
   for (const auto& row : all.messageUnpackers)
@@ -185,6 +189,7 @@ Description describeAll() {
 }
 
 Description describeNamed(const Description& all, std::string_view name) {
+  // The rows of which one of the labels is the name.
   const auto named = [&](const auto& rows, auto... labels) {
     auto chosen = rows;
     std::erase_if(chosen, [&](const auto& row) { return (... && (row.*labels != name)); });

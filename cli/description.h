@@ -1,6 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
 /// What this build knows, as plain data: walked from the very tables that the service decodes with,
 /// so that a new kind of message shows up by itself. Nothing here decodes.
+///
+/// The names are those of the types in the source. Texts point into constants of the program and
+/// stay valid; what is owned is copied. Callable from any thread; throws nothing but
+/// std::bad_alloc.
 #pragma once
 
 #include <keelgate/enumeration.h>
@@ -10,21 +14,26 @@
 
 namespace Keelgate::CLI {
 
+/// An unpacker that is chosen by the record that is asked for.
 struct MessageUnpackerRow {
   std::string_view record;
   std::string_view unpacker;
   std::string_view schema;
 };
 
+/// A command that a service answers.
 struct CommandRow {
   /// Absent: any command that the framework knows.
   Optional<UInt64> command;
   /// Absent: the message is answered without being decoded.
   Optional<std::string_view> schema;
+  /// Under which name the result carries its record.
   std::string_view caseName;
 };
 
+/// An unpacker that is chosen by the service that a client message arrived under.
 struct ServiceRow {
+  /// As it is compared: exactly.
   std::string_view service;
   std::string_view unpacker;
   Array<CommandRow> commands;
@@ -34,20 +43,24 @@ struct ServiceRow {
 /// none of which is required.
 struct FieldRow {
   std::string_view name;
+  /// On the wire; of a record's field, which does not travel, its name.
   std::string_view key;
   /// "string", "uint64", a schema's name, "[data]" and so on.
   String type;
   Bool required;
 };
 
+/// A schema or a record with its fields in their order.
 struct StructTable {
   std::string_view name;
   Array<FieldRow> fields;
 };
 
+/// An enumeration whose cases travel as numbers.
 struct EnumerationTable {
   std::string_view name;
   Array<EnumerationCase> cases;
+  /// The case that any other number stands for; absent where others are refused.
   Optional<std::string_view> fallback;
 };
 
@@ -61,7 +74,7 @@ struct Description {
   Array<EnumerationTable> enumerations;
 };
 
-/// Everything.
+/// Everything, in the order in which a walk from the tables first meets it.
 Description describeAll();
 
 /// What is called `name`: a record type, unpacker, service, command, schema, record or enumeration.

@@ -99,6 +99,7 @@ Data readFile(const String& path, std::size_t limit) {
 
 Optional<String> LineReader::next() {
   for (;;) {
+    // Only what is new is searched, or a long line in small pieces would take quadratic time.
     const std::size_t end = buffer_.find('\n', searched_);
     if (end != String::npos) {
       String line = buffer_.substr(begin_, end - begin_);
@@ -120,6 +121,7 @@ Bool LineReader::fill() {
   begin_ = 0;
   // A line that was much longer than others shall not stay in memory.
   if (buffer_.empty() && buffer_.capacity() > 16 * chunk) buffer_.shrink_to_fit();
+  // Half a line that nobody wants an answer to is no line.
   if (!wait()) {
     buffer_.clear();
     searched_ = 0;

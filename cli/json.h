@@ -4,6 +4,15 @@
 /// The output is a RapidJSON Writer or PrettyWriter. A record is an object with the fields under
 /// their labels, in their order; an absent value is left out; an enumeration whose case carries a
 /// record is an object with that one key.
+///
+///     const String line = jsonObject(Layout::compact, [&](auto& out) {
+///       writeField(out, "record", String("VespSampleMessage"));
+///       writeField(out, "value", message);
+///     });
+///
+/// Nothing here looks at more than its arguments: callable from any thread. Nothing throws but
+/// std::bad_alloc. Text and numbers are formatted by json_text.h and handed over as raw JSON; the
+/// writer keeps the commas and the indentation.
 #pragma once
 
 #include "cli/json_text.h"
@@ -25,23 +34,26 @@ namespace Keelgate::CLI {
 /// How an object is laid out: indented for people, or on one line for programs.
 enum class Layout { pretty, compact };
 
+/// A member's key. Keys are names from tables and need no escaping beyond the writer's own.
 template <class Out>
 void writeKey(Out& out, std::string_view key) {
   out.Key(key.data(), static_cast<rapidjson::SizeType>(key.size()));
 }
 
+/// A string of unknown origin.
 template <class Out>
 void writeString(Out& out, std::string_view text) {
   const String json = jsonString(text);
   out.RawValue(json.data(), json.size(), rapidjson::kStringType);
 }
 
-/// JSON text as it is.
+/// A value whose JSON text is ready.
 template <class Out>
 void writeRaw(Out& out, std::string_view json) {
   out.RawValue(json.data(), json.size(), rapidjson::kNumberType);
 }
 
+/// Any value that a record can hold, records included.
 template <class Out, class T>
 void writeJson(Out& out, const T& value);
 
@@ -52,6 +64,7 @@ requires(isArray<Array<T>>) void writeJson(Out& out, const Array<T>& values) {
   out.EndArray();
 }
 
+/// A member with its value; none where the value is absent.
 template <class Out, class T>
 void writeField(Out& out, std::string_view name, const T& value) {
   writeKey(out, name);

@@ -29,6 +29,7 @@ Optional<unsigned> nextCharacter(rapidjson::MemoryStream& stream) {
   return codePoint;
 }
 
+/// The short escapes are those that people expect to see; all others are numbers.
 void appendQuoted(String& to, unsigned codePoint, std::string_view bytes) {
   switch (codePoint) {
     case '"':
@@ -119,6 +120,7 @@ String dateText(Date date) {
   const auto midnight = chrono::floor<chrono::days>(time);
   const chrono::year_month_day day(midnight);
   const chrono::hh_mm_ss clock(time - midnight);
+  // Left with the point and the digits that are needed.
   fraction.erase(0, 1);
   fraction.erase(fraction.find_last_not_of('0') + 1);
   if (fraction == ".") fraction.clear();
@@ -138,10 +140,10 @@ String uuidText(const UUID& uuid) {
 }
 
 String base64Text(Bytes bytes) {
+  // The length counts a terminating null, which becomes the closing quote.
   String text(sodium_base64_encoded_len(bytes.size(), base64) + 1, '"');
   sodium_bin2base64(text.data() + 1, text.size() - 1,
                     reinterpret_cast<const unsigned char*>(bytes.data()), bytes.size(), base64);
-  // Over the terminating null.
   text.back() = '"';
   return text;
 }

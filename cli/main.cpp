@@ -55,6 +55,7 @@ template <class N>
   return app.add_option_function<std::string>(names, read, help)->type_name("N");
 }
 
+/// Rounded up to milliseconds, so that a limit is never none.
 void addSeconds(::CLI::App& app, const std::string& names, std::chrono::milliseconds& to,
                 const std::string& help) {
   const auto read = [&to](const std::string& text) {
@@ -160,6 +161,7 @@ void addDescribe(::CLI::App& app, Arguments& arguments) {
       "  keelgate describe --json | jq '.services[].service'");
 }
 
+/// What the parser cannot be told.
 void checkUsage(const ::CLI::App& app, const Arguments& arguments) {
   if (app.got_subcommand("unpack")) {
     const ::CLI::App& unpack = *app.get_subcommand("unpack");
@@ -174,6 +176,7 @@ void checkUsage(const ::CLI::App& app, const Arguments& arguments) {
   }
 }
 
+/// Deliberate: the layout follows standard output alone, wherever the input comes from.
 UnpackOptions unpackOptions(const ::CLI::App& unpack, const Arguments& arguments) {
   UnpackOptions options{.subject = arguments.record,
                         .files = arguments.files,

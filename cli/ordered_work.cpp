@@ -37,6 +37,7 @@ OrderedWork::~OrderedWork() {
 
 Bool OrderedWork::add(Job job, std::size_t weight) {
   std::unique_lock lock(mutex_);
+  // A job larger than the window goes alone; it would wait for ever otherwise.
   room_.wait(lock, [&] {
     return stopped_ || slots_.empty() ||
            (slots_.size() < capacity_ && weight_ + weight <= largestWindow);
@@ -85,6 +86,7 @@ void OrderedWork::deliver(std::unique_lock<std::mutex>& lock) {
     lock.unlock();
     const Bool goOn = sink_(reply);
     lock.lock();
+    // Not before: a reply that cannot be written yet is memory too.
     weight_ -= weight;
     room_.notify_one();
     if (!goOn) end();

@@ -42,22 +42,28 @@ class OrderedWork {
   [[nodiscard]] int endedDescriptor() const { return ended_; }
 
  private:
+  /// A message on its way: waiting, in work, or answered and waiting for its turn.
   struct Slot {
     Job job;
     std::size_t weight;
     Optional<Reply> reply;
   };
 
+  /// What each of the threads does.
   void run();
+  /// Hands out what is due. The lock is given up while the sink works.
   void deliver(std::unique_lock<std::mutex>& lock);
   void end();
   void join();
 
+  /// How many slots there may be.
   const std::size_t capacity_;
   const Sink sink_;
   int ended_;
 
+  /// Guards everything below.
   std::mutex mutex_;
+  /// For the workers: there is a job, or there will be none. For the adder: there is room.
   std::condition_variable work_;
   std::condition_variable room_;
   /// From the oldest reply that is not out yet. References to slots survive additions and removals
@@ -66,8 +72,10 @@ class OrderedWork {
   /// The first slot that no thread has taken.
   std::size_t next_ = 0;
   std::size_t weight_ = 0;
+  /// No more jobs come; or no more replies are wanted.
   Bool closed_ = false;
   Bool stopped_ = false;
+  /// A thread is with the sink. It looks for more when it is back.
   Bool delivering_ = false;
   std::vector<std::thread> threads_;
 };

@@ -56,6 +56,7 @@ std::string_view nameOf(VespClientMessageUnpackingError::Case which) {
   return {};
 }
 
+/// What the user can do about it, where there is something.
 std::string_view advice(HostError::Reason reason) {
   switch (reason) {
     case HostError::Reason::timedOut:
@@ -140,6 +141,7 @@ String unpack(Client& client, const Subject& subject, Bytes message, const Prefa
   if (const auto* context = std::get_if<VespClientMessageContext>(&subject)) {
     return recordObject(client.unpackClientMessage(message, *context), preface, layout);
   }
+  // The record that is asked for by name, which the caller has checked.
   String json;
   MessageUnpackers::each([&]<class U>(std::type_identity<U>) {
     using R = typename U::SchemaType;

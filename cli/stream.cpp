@@ -15,6 +15,7 @@ namespace Keelgate::CLI {
 
 namespace {
 
+/// The whole way of a line: runs on any of the threads.
 Reply answerLine(Client& client, std::string_view line) {
   const RequestLine request = readRequestLine(line);
   Preface preface;
@@ -39,6 +40,7 @@ void stream(Client::Options options, Console& console) {
     if (lost) console.complain(reply.problem);
     return console.print(reply.json) && !lost;
   });
+  // This thread only cuts lines; they are parsed where they are answered, several at a time.
   LineReader lines(STDIN_FILENO, STDOUT_FILENO, work.endedDescriptor());
   try {
     while (Optional<String> line = lines.next()) {

@@ -56,6 +56,7 @@ Array<std::size_t> Table::columnWidths() const {
   const auto total = [&] {
     return std::accumulate(widths.begin(), widths.end(), widths.size() * gap);
   };
+  // From the widest, so that short columns keep their words whole.
   while (total() > width_) {
     const auto widest = std::ranges::max_element(widths);
     if (*widest <= narrowestColumn) break;

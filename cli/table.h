@@ -1,5 +1,12 @@
 // SPDX-License-Identifier: Apache-2.0
 /// Text tables that fit a width.
+///
+///     Table table({"NAME", "TYPE"}, outputWidth(), outputHasColour());
+///     table.add({"command", "int"});
+///     console.print(table.text());
+///
+/// For ASCII, where a byte is a column, which all names here are. Values; nothing throws but
+/// std::bad_alloc.
 #pragma once
 
 #include <keelgate/values.h>

@@ -72,6 +72,7 @@ void unpack(Client::Options options, const UnpackOptions& what, Console& console
   OrderedWork work(threads, [&](const Reply& reply) {
     ++done;
     console.note(statusOf(reply.verdict));
+    // The object before the sentence: at a terminal the sentence comments on it.
     if (!console.print(reply.json)) return false;
     if (!reply.problem.empty()) console.complain(reply.problem);
     if (done < total) console.progress(done, total);

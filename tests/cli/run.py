@@ -9,6 +9,7 @@ import json
 import os
 import pathlib
 import pty
+import shutil
 import struct
 import subprocess
 import sys
@@ -118,6 +119,24 @@ def without_service():
                            stdin=script(pause, 60_000))
     check((status, host_error(objects(out)[0])) == (1, "timedOut"), f"timed out: {out}")
     check("--time-limit" in err, f"what helps: {err}")
+
+    # A service that cannot be had again: its file is gone when its process has crashed.
+    with tempfile.TemporaryDirectory() as folder:
+        service = shutil.copy(fake, folder)
+        process = subprocess.Popen([keelgate, "stream", "--service-path", service],
+                                   stdin=subprocess.PIPE, stdout=subprocess.PIPE,
+                                   stderr=subprocess.PIPE)
+        process.stdin.write(b"started?\n")
+        process.stdin.flush()
+        process.stdout.readline()
+        os.unlink(service)
+        crash = base64.b64encode(script(raise_signal, 11)).decode()
+        out, err = process.communicate((request(1, crash) + "\n").encode() * 50, timeout=60)
+        reasons = {host_error(reply) for reply in objects(out)}
+        check(process.returncode == 3, f"not kept: {process.returncode}")
+        check(reasons <= {"crashed", "startFailed"} and "startFailed" in reasons,
+              f"not kept: {reasons}")
+        check(b"could not be started" in err, f"not kept: {err}")
 
 
 good_message = base64.b64encode((messages / "command-response.bplist").read_bytes()).decode()
