@@ -127,7 +127,7 @@ void Pool::exchange(const ClientRequest& request, Deadline deadline, const Accep
 Optional<HostError> Pool::attempt(Worker worker, const ClientRequest& request, Deadline deadline,
                                   const Accept& accept, std::uint64_t mayServe) {
   ReceivedReply reply;
-  const Optional<HostError> failure = worker.exchange(request, deadline, reply);
+  Optional<HostError> failure = worker.exchange(request, deadline, reply);
   const bool spent = failure || worker.served() >= mayServe;
   if (spent) forkAhead();
   for (const String& line : reply.log) logLine(log_, escapeLogLine(line));

@@ -48,6 +48,12 @@ void writeFrame(std::uint32_t sequence, Bytes body, ReplyKind kind = ReplyKind::
   writeAll(body);
 }
 
+/// A sanitizer's runtime would make an ordinary exit of it.
+void die(int signal) {
+  ::signal(signal, SIG_DFL);
+  raise(signal);
+}
+
 void obey(Bytes script, std::uint32_t sequence) {
   while (script.size() >= sizeof(Step)) {
     Step step;
@@ -60,8 +66,8 @@ void obey(Bytes script, std::uint32_t sequence) {
     if (step.op == Op::answer) writeFrame(sequence, bytes);
     if (step.op == Op::log) writeFrame(sequence, bytes, ReplyKind::log);
     if (step.op == Op::pause) usleep(step.amount * 1000);
-    if (step.op == Op::raise) raise(static_cast<int>(step.amount));
-    if (step.op == Op::raiseIfUsed && sequence > 0) raise(static_cast<int>(step.amount));
+    if (step.op == Op::raise) die(static_cast<int>(step.amount));
+    if (step.op == Op::raiseIfUsed && sequence > 0) die(static_cast<int>(step.amount));
     if (step.op == Op::exit) _exit(static_cast<int>(step.amount));
     while (step.op == Op::endless) writeAll(std::array<std::byte, 4096>());
   }
@@ -72,7 +78,7 @@ void obey(Bytes script, std::uint32_t sequence) {
   for (std::uint64_t i = 0; i < messages; ++i) {
     RequestHeader header;
     readAll(&header, sizeof header);
-    if (header.command == dieAfterHeader) raise(SIGSEGV);
+    if (header.command == dieAfterHeader) die(SIGSEGV);
     if (header.command == answerBeforeBody) writeFrame(header.sequence, {});
     while (header.command == ignoreBody || header.command == answerBeforeBody) pause();
     String service(header.serviceLength, ' ');

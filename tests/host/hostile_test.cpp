@@ -12,6 +12,7 @@
 namespace Keelgate::Host {
 namespace {
 
+using std::chrono::milliseconds;
 using Transport::MalformedReply;
 using Transport::ReplyHeader;
 using Transport::ReplyKind;
@@ -113,7 +114,7 @@ TEST(Hostile, EachAttackHasItsOutcomeAndTheNextMessageIsServed) {
 
 TEST(Hostile, OneThatKeepsTheClientWaitingIsGivenUp) {
   Client::Options options = fakeOptions();
-  options.timeLimit = std::chrono::milliseconds(150);
+  options.timeLimit = milliseconds(150);
   Client client(options);
   const Data good = recordNumbered(7);
   Script dribble;
@@ -133,6 +134,36 @@ TEST(Hostile, OneThatKeepsTheClientWaitingIsGivenUp) {
   EXPECT_EQ(outcome(ignoreBody), "timedOut");
   EXPECT_EQ(outcome(answerBeforeBody), "protocolViolation");
   EXPECT_EQ(outcome(dieAfterHeader), "crashed");
+}
+
+/// The same through every wall of a real service, whose unpacker obeys the message.
+TEST(Hostile, ASealedWorkerHasTheSameOutcomes) {
+  Client::Options options = fakeOptions();
+  options.servicePath = KEELGATE_OBEDIENT_SERVICE;
+  options.timeLimit = milliseconds(1000);
+  const std::pair<std::string_view, const char*> orders[] = {
+      {"fault", "crashed"},
+      {"abort", "crashed"},
+      {"recurse", "crashed"},
+      {"spin", "timedOut"},
+      {"drip 5441474b01000200", "timedOut"},
+      {"say 00", "protocolViolation"},
+#ifndef KEELGATE_UNSEALED
+      {"call 39", "crashed"},
+      {"eat 1000000000", "resourcesExhausted"},
+#endif
+  };
+  for (const std::size_t reuse : {1u, 100u}) {
+    options.messagesPerProcess = reuse;
+    Client client(options);
+    for (const auto& [order, outcome] : orders) {
+      const auto bytes = [](std::string_view text) {
+        return std::as_bytes(std::span(text));
+      };
+      EXPECT_EQ(outcomeOf(client, bytes(order)), outcome) << order;
+      EXPECT_TRUE(outcomeOf(client, bytes("answer")).starts_with("record")) << order;
+    }
+  }
 }
 
 TEST(Hostile, WorkersThatSpeakBeforeTheyAreAskedAreNotBelieved) {
