@@ -46,7 +46,7 @@ String findService() {
                             "/usr/libexec/keelgate"};
   String looked;
   for (const String& folder : folders) {
-    const String path = folder + '/' + serviceName;
+    String path = folder + '/' + serviceName;
     if (access(path.c_str(), X_OK) == 0) return path;
     looked += (looked.empty() ? "" : ", ") + path;
   }
