@@ -61,8 +61,8 @@ concept HasField = requires {
   S::template keelgateField<S>(static_cast<Line<line>*>(nullptr));
 };
 
-// How far above its closing macro a struct may begin. A list that begins further up is not complete,
-// which is asserted where structs are decoded.
+// How far above its closing macro a struct may begin. A list that begins further up is not
+// complete, which is asserted where structs are decoded.
 constexpr int span = 240;
 
 /// An object of its own for each type, so that types can be compared in a table.
@@ -90,7 +90,8 @@ template <class S, class V, std::size_t n>
 constexpr auto typesOf(const std::array<Field<S, V>, n>&) {
   return []<std::size_t... i>(std::index_sequence<i...>) {
     return Types<std::enable_if_t<i >= 0, V>...>();
-  }(std::make_index_sequence<n>());
+  }
+  (std::make_index_sequence<n>());
 }
 
 // Whether an S can be made from values of exactly these types, and from one value more.
