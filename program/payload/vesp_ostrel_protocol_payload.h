@@ -14,9 +14,11 @@
 namespace VespKeelgateService {
 
 struct VespOstrelProtocolPayload {
+  // What the payload is: the one field that is always there.
   FIELD(Int, command, "c");
   FIELD(Optional<Int>, commandContext, "cc");
   FIELD(Optional<Int>, version, "v");
+  // The content, encrypted by its sender, in one of several wrappings.
   FIELD(Optional<Data>, payload, "P");
   FIELD(Optional<Data>, bulkedPayload, "N");
   FIELD(Optional<Data>, fanoutPayload, "fP");
@@ -26,16 +28,20 @@ struct VespOstrelProtocolPayload {
   FIELD(Optional<String>, messageId, "i");
   FIELD(Optional<Data>, messageUUID, "U");
   FIELD(Optional<String>, queueId, "qI");
+  // Receipts: what the sender wants to hear of the delivery.
   FIELD(Optional<Bool>, deliveryStatus, "D");
   FIELD(Optional<VespOstrelProtocolDeliveryContext>, deliveryContext, "Dc");
   FIELD(Optional<Int>, certifiedDeliveryVersion, "cdv");
   FIELD(Optional<Data>, certifiedDeliveryRts, "cdr");
   FIELD(Optional<Bool>, noResponseNeeded, "nr");
   FIELD(Optional<Bool>, generateDeliveryReceipt, "gd");
+  // Who it is from and for. Tokens are opaque octets.
   FIELD(Optional<Data>, sessionToken, "sT");
   FIELD(Optional<Data>, hearthSessionToken, "hT");
   FIELD(Optional<String>, destinationId, "tP");
   FIELD(Optional<String>, userAgent, "ua");
+  // An attachment in the chunk store: owner, signature, length in octets, and where to fetch or
+  // put it. Its expiry is in nanoseconds, as the sender counts.
   FIELD(Optional<String>, BCSOwnerId, "mO");
   FIELD(Optional<Data>, BCSFileSignature, "mS");
   FIELD(Optional<Int64>, BCSFileLength, "mL");
@@ -47,18 +53,22 @@ struct VespOstrelProtocolPayload {
   FIELD(Optional<String>, BCSDownloadUrl, "dR");
   FIELD(Optional<String>, BCSUploadUrl, "uR");
   FIELD(Optional<Int64>, BCSExpiryNanos, "mX");
+  // What surrounds the attachment.
   FIELD(Optional<Int>, contentVersion, "cV");
   FIELD(Optional<String>, contentHeaders, "cH");
   FIELD(Optional<Data>, contentBody, "cB");
   FIELD(Optional<Data>, contentReferenceSignature, "cR");
   FIELD(Optional<Int>, attachmentSize, "mT");
+  // Addresses of the exchange.
   FIELD(Optional<Data>, token, "t");
   FIELD(Optional<String>, senderId, "sP");
   FIELD(Optional<String>, senderOpaqueId, "sI");
   FIELD(Optional<String>, mspId, "mP");
+  // How an exchange went. Times are in nanoseconds, as the sender counts them.
   FIELD(Optional<Int>, responseStatus, "s");
   FIELD(Optional<Int64>, epochTimeNanos, "e");
   FIELD(Optional<Int64>, originalEpochTimeNanos, "oe");
+  // What failed, if something did.
   FIELD(Optional<Int>, failReason, "fR");
   FIELD(Optional<Data>, failMessageId, "fU");
   FIELD(Optional<String>, failMessageIdString, "fM");
@@ -66,13 +76,16 @@ struct VespOstrelProtocolPayload {
   FIELD(Optional<Int>, failUploadAttachmentSize, "fS");
   FIELD(Optional<String>, failReasonMessage, "fRM");
   FIELD(Optional<Int64>, failTimeElapsed, "fTE");
+  // How to keep and treat the message.
   FIELD(Optional<String>, encryptionType, "E");
   FIELD(Optional<Int>, storageFlags, "H");
   FIELD(Optional<Int>, priority, "pri");
   // Deliberate: an integer and no boolean, like allowGDR.
   FIELD(Optional<Int>, senderExpectsAck, "ack");
+  // Payloads inside this one: a copy for each destination, and a bulk of messages.
   FIELD(Optional<Array<VespOstrelProtocolPayload>>, dstIdTokenList, "dtl");
   FIELD(Optional<Array<VespOstrelProtocolPayload>>, ostrelMessageList, "mml");
+  // Limits and switches of the delivery.
   FIELD(Optional<Int>, storageCheckVersion, "scv");
   FIELD(Optional<Int64>, dateExpirationSeconds, "eX");
   FIELD(Optional<Int>, ostrelProtocol, "xp");
@@ -89,6 +102,7 @@ struct VespOstrelProtocolPayload {
   FIELD(Optional<String>, traceId, "x-b3-traceid");
   FIELD(Optional<String>, splunkHint, "sh");
   FIELD(Optional<String>, asHttpHeader, "as");
+  // Reports, retries and the parts of a fan-out.
   FIELD(Optional<Int>, hearthDeliveryStatus, "hD");
   FIELD(Optional<String>, hearthReportId, "hI");
   FIELD(Optional<Int>, retryCount, "rc");
@@ -97,6 +111,7 @@ struct VespOstrelProtocolPayload {
   FIELD(Optional<Bool>, fanoutLastChunk, "flc");
   FIELD(Optional<String>, url);
   FIELD(Optional<Int>, visoRetryCount, "frc");
+  // An HTTP exchange in a tunnel.
   FIELD(Optional<Int>, webtunnelVersion, "wV");
   FIELD(Optional<String>, httpUrl, "u");
   FIELD(Optional<VespOstrelProtocolHttpHeaders>, httpHeaders, "h");
@@ -105,6 +120,7 @@ struct VespOstrelProtocolPayload {
   FIELD(Optional<Data>, httpBodyKey, "bk");
   FIELD(Optional<Int>, httpResponseStatus, "hs");
   FIELD(Optional<String>, httpErrorMsg, "hr");
+  // More switches of the delivery.
   FIELD(Optional<Bool>, writeToSkyvault, "sv");
   FIELD(Optional<Bool>, pessimisticCheck, "x-pessimistic");
   FIELD(Optional<Bool>, unfilteredHeaders, "nH");
@@ -115,6 +131,7 @@ struct VespOstrelProtocolPayload {
   FIELD(Optional<Int>, testDropPoint, "x-dp");
   FIELD(Optional<Bool>, userPlusOne, "up1");
   FIELD(Optional<Bool>, isInitiatorKey, "is-initiator-key");
+  // Media relays: who asks for which session, and why.
   FIELD(Optional<Int>, hoplineUserType, "qtu");
   FIELD(Optional<Int>, errorCode, "eC");
   FIELD(Optional<Bool>, messageCheckpoint, "mc");
@@ -122,6 +139,7 @@ struct VespOstrelProtocolPayload {
   FIELD(Optional<Int>, protocolVersion, "qv");
   FIELD(Optional<String>, applicationId, "qai");
   FIELD(Optional<Int>, reason, "hl");
+  // The relay that was used before, and the one in use.
   FIELD(Optional<Int>, prevErrorCode, "qpec");
   FIELD(Optional<Data>, prevAccessToken, "qpat");
   FIELD(Optional<Data>, prevRelayIp, "qpip");
@@ -136,6 +154,7 @@ struct VespOstrelProtocolPayload {
   FIELD(Optional<String>, pluginConfig, "qplc");
   FIELD(Optional<Int>, pluginStream, "qpls");
   FIELD(Optional<Bool>, pluginDevMode, "qpld");
+  // The relay session that is asked for.
   FIELD(Optional<Bool>, hlNewSession, "qns");
   FIELD(Optional<Int>, requestType, "qat");
   FIELD(Optional<Data>, vespSessionId, "qvesp");
@@ -144,26 +163,31 @@ struct VespOstrelProtocolPayload {
   FIELD(Optional<String>, groupId, "qgid");
   FIELD(Optional<Int>, groupMemberCount, "qgmc");
   FIELD(Optional<Int>, allocateInfoAttribute, "qia");
+  // The relay that was given. Addresses are 4 or 16 octets as the sender has them.
   FIELD(Optional<Data>, relayIp, "hlip");
   FIELD(Optional<Data>, relayIpv6, "hlip6");
   FIELD(Optional<Int>, relayPort, "hlp");
   FIELD(Optional<Data>, relayAccessToken, "hlst");
   FIELD(Optional<Data>, relaySessionKey, "hlsk");
   FIELD(Optional<Data>, relaySessionId, "hlsi");
+  // Times are in milliseconds, as the sender counts them.
   FIELD(Optional<Int64>, expiryEpochTimeMillis, "qe");
   FIELD(Optional<Data>, initiatorIp, "qsi");
   FIELD(Optional<UInt64>, participantId, "hli");
+  // What the relay is and how it is reached.
   FIELD(Optional<Data>, softwareVersion, "qswv");
   FIELD(Optional<String>, relayBuildVersion, "hlbv");
   FIELD(Optional<Int>, relayHighPriorityPort, "hlhpp");
   FIELD(Optional<Int>, ipFamilyPreference, "qipp");
   FIELD(Optional<Int64>, allocationEpochTimeMillis, "qsat");
+  // What became of the allocation, for one participant and for each.
   FIELD(Optional<Int>, allocationStatus, "hls");
   FIELD(Optional<Array<VespHoplineAllocationStatus>>, allocationStatuses, "qal");
   FIELD(Optional<Array<VespHoplineSelfAllocToken>>, selfAllocTokenList, "qsatv");
   FIELD(Optional<Data>, relayReportingBlob, "hlep");
   FIELD(Optional<Int>, relayServerType, "hlast");
   FIELD(Optional<Array<VespHoplinePluginAllocation>>, pluginAllocations, "qpla");
+  // What an answer says of the command that it answers.
   FIELD(Optional<Int>, hlErrorCode, "qec");
   FIELD(Optional<Int>, originalCommand, "oC");
   FIELD(Optional<Bool>, isBulkedPayload, "iB");
@@ -172,6 +196,7 @@ struct VespOstrelProtocolPayload {
   FIELD(Optional<Bool>, expectsPeerResponse, "eR");
   FIELD(Optional<Int>, allowGDR, "gdr");
   FIELD(Optional<Int>, sendMode, "sm");
+  // Whom the device knows the sender as.
   FIELD(Optional<Bool>, isTrustedSender, "htu");
   FIELD(Optional<Bool>, isUPlusOneKey, "is-u-plus-one-key");
 

@@ -30,10 +30,17 @@ def check(sound, what):
         print("FAILED:", what)
 
 
+def heard(said):
+    """What the command said, but for the line of a service that lacks a wall on this machine (in a
+    chroot, say), which is no matter of these tests."""
+    return b"".join(line for line in said.splitlines(keepends=True)
+                    if not line.startswith(b"Running without: "))
+
+
 def run(*words, stdin=b"", **more):
     done = subprocess.run([keelgate, *map(str, words)], input=stdin, capture_output=True,
                           timeout=240, **more)
-    return done.returncode, done.stdout, done.stderr.decode()
+    return done.returncode, done.stdout, heard(done.stderr).decode()
 
 
 def objects(output):
@@ -169,12 +176,12 @@ def stream():
         check(json.loads(process.stdout.readline())["id"] == identity, "a reply while input is open")
     # The reader goes away while the input stays open and silent.
     process.stdout.close()
-    check(process.wait(60) == 0 and process.stderr.read() == b"", "the reader goes away")
+    check(process.wait(60) == 0 and heard(process.stderr.read()) == b"", "the reader goes away")
     process.stdin.close()
     process = subprocess.Popen(f"yes '{request(1)}' | '{keelgate}' stream | head -3", shell=True,
                                stdout=subprocess.PIPE, stderr=subprocess.PIPE)
     out, err = process.communicate(timeout=60)
-    check(len(objects(out)) == 3 and err == b"", f"a short reader: {err}")
+    check(len(objects(out)) == 3 and heard(err) == b"", f"a short reader: {err}")
 
 
 def peak_memory(requests):
@@ -253,7 +260,7 @@ def on_terminal(*words, **environment):
         pass  # A terminal whose last user is gone.
     process.wait()
     os.close(main)
-    return said
+    return heard(said)
 
 
 def terminal():

@@ -73,6 +73,8 @@ struct Environment {
   unsigned missing = 0;
   /// Or part of the sentence of a service that refuses.
   std::string refusal = {};
+  /// Without one this environment is another.
+  bool needsUserNamespace = false;
 };
 
 const std::vector<Environment> environments{
@@ -96,17 +98,14 @@ const std::vector<Environment> environments{
            becomeUser({1000, 27});
          },
      .missing = namespaces | layerNoSupplementaryGroups},
-    {.name = "a user",
-     .before =
-         [] {
-           becomeUser({});
-         }},
+    {.name = "a user", .before = [] { becomeUser({}); }, .needsUserNamespace = true},
     {.name = "a user with his groups",
      .before =
          [] {
            becomeUser({1000, 27});
          },
-     .missing = layerNoSupplementaryGroups},
+     .missing = layerNoSupplementaryGroups,
+     .needsUserNamespace = true},
     {.name = "user namespaces switched off, as root",
      .before =
          [] {
@@ -199,7 +198,8 @@ const std::vector<Environment> environments{
          [] {
            refuseCalls({{SYS_capset, EPERM}});
          },
-     .refusal = "capset"},
+     .refusal = "capset",
+     .needsUserNamespace = true},
     {.name = "no process to be had",
      .before =
          [] {
@@ -238,6 +238,9 @@ TEST_P(EnvironmentTest, RunsAndReportsOrRefusesWithReason) {
   if (geteuid() != 0) GTEST_SKIP() << "only root can imitate every environment";
   static const std::uint64_t whole = RawClient(OBEDIENT_SERVICE).layers();
   const Environment& environment = GetParam();
+  if (environment.needsUserNamespace && (whole & layerUserNamespace) == 0) {
+    GTEST_SKIP() << "this machine gives no user namespaces (a chroot never does)";
+  }
   RawOptions options;
   options.before = environment.before;
   RawClient service(OBEDIENT_SERVICE, options);

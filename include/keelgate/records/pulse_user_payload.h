@@ -65,27 +65,34 @@ struct PulseHoplinePluginAllocation {
 /// none; everything else that the message lacked is absent. Payloads nest at most as deep as
 /// property lists may, which is 256.
 struct PulseUserPayload {
+  /// What the payload is: the one field that is always there.
   FIELD(Int, command);
   FIELD(Optional<Int>, commandContext);
   FIELD(Optional<Int>, version);
+  /// The content, encrypted by its sender, in one of several wrappings.
   FIELD(Optional<Data>, payload);
   FIELD(Optional<Data>, bulkedPayload);
   FIELD(Optional<Data>, fanoutPayload);
   FIELD(Optional<Data>, additionalPayload);
   FIELD(Optional<Data>, payloadMetadata);
+  /// Which message it is, and where it waited.
   FIELD(Optional<String>, messageId);
   FIELD(Optional<Data>, messageUUID);
   FIELD(Optional<String>, queueId);
+  /// Receipts: what the sender wants to hear of the delivery.
   FIELD(Optional<Bool>, deliveryStatus);
   FIELD(Optional<PulseUserPayloadDeliveryContext>, deliveryContext);
   FIELD(Optional<Int>, certifiedDeliveryVersion);
   FIELD(Optional<Data>, certifiedDeliveryRts);
   FIELD(Optional<Bool>, noResponseNeeded);
   FIELD(Optional<Bool>, generateDeliveryReceipt);
+  /// Who it is from and for. Tokens are opaque octets.
   FIELD(Optional<Data>, sessionToken);
   FIELD(Optional<Data>, hearthSessionToken);
   FIELD(Optional<String>, destinationId);
   FIELD(Optional<String>, userAgent);
+  /// An attachment in the chunk store: owner, signature, length in octets, and where to fetch or
+  /// put it. Its expiry is in nanoseconds, as the sender counts.
   FIELD(Optional<String>, BCSOwnerId);
   FIELD(Optional<Data>, BCSFileSignature);
   FIELD(Optional<Int64>, BCSFileLength);
@@ -97,18 +104,22 @@ struct PulseUserPayload {
   FIELD(Optional<String>, BCSDownloadUrl);
   FIELD(Optional<String>, BCSUploadUrl);
   FIELD(Optional<Int64>, BCSExpiryNanos);
+  /// What surrounds the attachment.
   FIELD(Optional<Int>, contentVersion);
   FIELD(Optional<String>, contentHeaders);
   FIELD(Optional<Data>, contentBody);
   FIELD(Optional<Data>, contentReferenceSignature);
   FIELD(Optional<Int>, attachmentSize);
+  /// Addresses of the exchange.
   FIELD(Optional<Data>, token);
   FIELD(Optional<String>, senderId);
   FIELD(Optional<String>, senderOpaqueId);
   FIELD(Optional<String>, mspId);
+  /// How an exchange went. Times are in nanoseconds, as the sender counts them.
   FIELD(Optional<Int>, responseStatus);
   FIELD(Optional<Int64>, epochTimeNanos);
   FIELD(Optional<Int64>, originalEpochTimeNanos);
+  /// What failed, if something did.
   FIELD(Optional<Int>, failReason);
   FIELD(Optional<Data>, failMessageId);
   FIELD(Optional<String>, failMessageIdString);
@@ -116,12 +127,15 @@ struct PulseUserPayload {
   FIELD(Optional<Int>, failUploadAttachmentSize);
   FIELD(Optional<String>, failReasonMessage);
   FIELD(Optional<Int64>, failTimeElapsed);
+  /// How to keep and treat the message.
   FIELD(Optional<String>, encryptionType);
   FIELD(Optional<Int>, storageFlags);
   FIELD(Optional<Int>, priority);
   FIELD(Optional<Int>, senderExpectsAck);
+  /// Payloads inside this one: a copy for each destination, and a bulk of messages.
   FIELD(Array<PulseUserPayload>, dstIdTokenList);
   FIELD(Array<PulseUserPayload>, ostrelMessageList);
+  /// Limits and switches of the delivery.
   FIELD(Optional<Int>, storageCheckVersion);
   FIELD(Optional<Int64>, dateExpirationSeconds);
   FIELD(Optional<Int>, ostrelProtocol);
@@ -130,6 +144,7 @@ struct PulseUserPayload {
   FIELD(Optional<Bool>, traceProfile);
   FIELD(Optional<Bool>, groupMessage);
   FIELD(Optional<String>, contentType);
+  /// Header values that stand by themselves; those of a tunnelled exchange are in httpHeaders.
   FIELD(Optional<String>, adhocServiceOverride);
   FIELD(Optional<Data>, responseIdentifier);
   FIELD(Optional<String>, responseIdentifierString);
@@ -137,6 +152,7 @@ struct PulseUserPayload {
   FIELD(Optional<String>, traceId);
   FIELD(Optional<String>, splunkHint);
   FIELD(Optional<String>, asHttpHeader);
+  /// Reports, retries and the parts of a fan-out.
   FIELD(Optional<Int>, hearthDeliveryStatus);
   FIELD(Optional<String>, hearthReportId);
   FIELD(Optional<Int>, retryCount);
@@ -145,6 +161,7 @@ struct PulseUserPayload {
   FIELD(Optional<Bool>, fanoutLastChunk);
   FIELD(Optional<String>, url);
   FIELD(Optional<Int>, visoRetryCount);
+  /// An HTTP exchange in a tunnel.
   FIELD(Optional<Int>, webtunnelVersion);
   FIELD(Optional<String>, httpUrl);
   FIELD(Optional<PulseUserPayloadHttpHeaders>, httpHeaders);
@@ -153,6 +170,7 @@ struct PulseUserPayload {
   FIELD(Optional<Data>, httpBodyKey);
   FIELD(Optional<Int>, httpResponseStatus);
   FIELD(Optional<String>, httpErrorMsg);
+  /// More switches of the delivery.
   FIELD(Optional<Bool>, writeToSkyvault);
   FIELD(Optional<Bool>, pessimisticCheck);
   FIELD(Optional<Bool>, unfilteredHeaders);
@@ -163,6 +181,7 @@ struct PulseUserPayload {
   FIELD(Optional<Int>, testDropPoint);
   FIELD(Optional<Bool>, userPlusOne);
   FIELD(Optional<Bool>, isInitiatorKey);
+  /// Media relays: who asks for which session, and why.
   FIELD(Optional<Int>, hoplineUserType);
   FIELD(Optional<Int>, errorCode);
   FIELD(Optional<Bool>, messageCheckpoint);
@@ -170,6 +189,7 @@ struct PulseUserPayload {
   FIELD(Optional<Int>, protocolVersion);
   FIELD(Optional<String>, applicationId);
   FIELD(Optional<Int>, reason);
+  /// The relay that was used before, and the one in use.
   FIELD(Optional<Int>, prevErrorCode);
   FIELD(Optional<Data>, prevAccessToken);
   FIELD(Optional<Data>, prevRelayIp);
@@ -178,11 +198,13 @@ struct PulseUserPayload {
   FIELD(Optional<Data>, activeRelayIp);
   FIELD(Optional<Int>, selfAllocTokenCountOld);
   FIELD(Optional<Int>, selfAllocTokenCount);
+  /// Plugins: those asked for together, and one by itself.
   FIELD(Array<PulseHoplinePluginRequest>, pluginRequests);
   FIELD(Optional<String>, pluginName);
   FIELD(Optional<String>, pluginConfig);
   FIELD(Optional<Int>, pluginStream);
   FIELD(Optional<Bool>, pluginDevMode);
+  /// The relay session that is asked for.
   FIELD(Optional<Bool>, hlNewSession);
   FIELD(Optional<Int>, requestType);
   FIELD(Optional<Data>, vespSessionId);
@@ -191,26 +213,31 @@ struct PulseUserPayload {
   FIELD(Optional<String>, groupId);
   FIELD(Optional<Int>, groupMemberCount);
   FIELD(Optional<Int>, allocateInfoAttribute);
+  /// The relay that was given. Addresses are 4 or 16 octets as the sender has them.
   FIELD(Optional<Data>, relayIp);
   FIELD(Optional<Data>, relayIpv6);
   FIELD(Optional<Int>, relayPort);
   FIELD(Optional<Data>, relayAccessToken);
   FIELD(Optional<Data>, relaySessionKey);
   FIELD(Optional<Data>, relaySessionId);
+  /// Times are in milliseconds, as the sender counts them.
   FIELD(Optional<Int64>, expiryEpochTimeMillis);
   FIELD(Optional<Data>, initiatorIp);
   FIELD(Optional<UInt64>, participantId);
+  /// What the relay is and how it is reached.
   FIELD(Optional<Data>, softwareVersion);
   FIELD(Optional<String>, relayBuildVersion);
   FIELD(Optional<Int>, relayHighPriorityPort);
   FIELD(Optional<Int>, ipFamilyPreference);
   FIELD(Optional<Int64>, allocationEpochTimeMillis);
+  /// What became of the allocation, for one participant and for each.
   FIELD(Optional<Int>, allocationStatus);
   FIELD(Array<PulseHoplineAllocationStatus>, allocationStatuses);
   FIELD(Array<PulseHoplineSelfAllocToken>, selfAllocTokenList);
   FIELD(Optional<Data>, relayReportingBlob);
   FIELD(Optional<Int>, relayServerType);
   FIELD(Array<PulseHoplinePluginAllocation>, pluginAllocations);
+  /// What an answer says of the command that it answers.
   FIELD(Optional<Int>, hlErrorCode);
   FIELD(Optional<Int>, originalCommand);
   FIELD(Optional<Bool>, isBulkedPayload);
@@ -219,6 +246,7 @@ struct PulseUserPayload {
   FIELD(Optional<Bool>, expectsPeerResponse);
   FIELD(Optional<Int>, allowGDR);
   FIELD(Optional<Int>, sendMode);
+  /// Whom the device knows the sender as.
   FIELD(Optional<Bool>, isTrustedSender);
   FIELD(Optional<Bool>, isUPlusOneKey);
 

@@ -17,6 +17,7 @@ struct SkyvaultSharingToken {
   LABELS(SkyvaultSharingToken);
 };
 
+/// The smallest kind; all of it may be absent.
 struct VespSampleInvitation {
   FIELD(Optional<String>, title);
   FIELD(Optional<Date>, date);
@@ -25,6 +26,7 @@ struct VespSampleInvitation {
   LABELS(VespSampleInvitation);
 };
 
+/// The least version of the home's hub, and the features that it must have.
 struct VespHearthInvitationRequestedCapabilities {
   FIELD(Double, hearthdVersion);
   FIELD(Array<Int>, homeSupportedFeatures);
@@ -41,6 +43,7 @@ struct VespHearthInviteeScheduleWeekDayRule {
   LABELS(VespHearthInviteeScheduleWeekDayRule);
 };
 
+/// Days on which the invited person may come in. The end may lie before the start.
 struct VespHearthInviteeScheduleYearDayRule {
   FIELD(Optional<Date>, startDate);
   FIELD(Optional<Date>, endDate);
@@ -48,6 +51,7 @@ struct VespHearthInviteeScheduleYearDayRule {
   LABELS(VespHearthInviteeScheduleYearDayRule);
 };
 
+/// When the invited person may come in. Both lists are always present.
 struct VespHearthInviteeSchedule {
   FIELD(Optional<Array<VespHearthInviteeScheduleWeekDayRule>>, weekDayRules);
   FIELD(Optional<Array<VespHearthInviteeScheduleYearDayRule>>, yearDayRules);
@@ -62,19 +66,24 @@ struct VespHearthInvitation {
 
   FIELD(Optional<String>, homeName);
   FIELD(Optional<Date>, inviteExpiryDate);
+  /// What the home's hub must be able to do.
   FIELD(Optional<VespHearthInvitationRequestedCapabilities>, requestedCapabilities);
+  /// What the invited person may do, and when.
   FIELD(Optional<Bool>, homeSuppressInviteNotification);
   FIELD(Optional<Int>, inviteePrivilege);
   FIELD(Optional<Bool>, doesHomeHaveCameras);
   FIELD(Optional<VespHearthInviteeSchedule>, inviteeSchedule);
+  /// The home, and the hub that speaks for it.
   FIELD(Optional<UUID>, homeUUID);
   FIELD(Optional<Data>, controllerPublicKey);
   FIELD(Optional<String>, controllerPairingName);
+  /// The invitation itself.
   FIELD(Optional<UUID>, invitationIdentifier);
   FIELD(Optional<SkyvaultSharingToken>, invitationShareToken);
   FIELD(Optional<String>, userId);
   FIELD(Optional<Int>, invitationState);
   FIELD(Optional<Int>, presenceAuthorizationStatus);
+  /// Of whoever issued the invitation. Nothing vouches for it yet.
   FIELD(Optional<Data>, issuerPublicKeyExternalRepresentation);
 
   LABELS(VespHearthInvitation);
@@ -94,6 +103,7 @@ struct VespCofferSharingInvitation {
   LABELS(VespCofferSharingInvitation);
 };
 
+/// An invitation to share measurements.
 struct VespVitalsInvitation {
   /// A serialised message that nobody has looked into.
   FIELD(Data, untrustedData);
@@ -101,6 +111,7 @@ struct VespVitalsInvitation {
   LABELS(VespVitalsInvitation);
 };
 
+/// An invitation to share activity.
 struct VespStrideSharingInvitation {
   FIELD(Int, item);
   /// A serialised message that nobody has looked into.
@@ -122,6 +133,7 @@ struct VespInvitationContextType : std::variant<VespDictionaryContext> {
   CASES(VespInvitationContextType, dictionary);
 };
 
+/// Which kind the invitation is, and its record.
 struct VespInvitationContext {
   /// The schema string that named the kind.
   FIELD(String, schema);
@@ -131,6 +143,7 @@ struct VespInvitationContext {
   LABELS(VespInvitationContext);
 };
 
+/// The envelope. Its values are those of the message, unchecked.
 struct VespInvitation {
   FIELD(VespInvitationContext, context);
   FIELD(Int, state);

@@ -16,17 +16,22 @@ struct VespSessionInvitation {
 
   FIELD(TransportType, transportType);
   FIELD(UInt, version);
+  /// Hints and switches for setting up the connection.
   FIELD(Optional<UInt>, connectionCountHint);
   FIELD(Optional<Bool>, disableEncryption);
   FIELD(Optional<Bool>, singleChannelDirectMode);
   FIELD(Optional<Bool>, useStunMessageIntegrity);
   FIELD(Optional<Bool>, useSecureHLControlMessage);
+  /// The offer itself; opaque here.
   FIELD(Optional<Data>, blob);
   FIELD(Optional<Bool>, messageIsRealTime);
+  /// The caller's key. Nothing vouches for it yet.
   FIELD(Optional<Data>, unauthenticatedPublicKey);
   FIELD(Optional<Bool>, assumeRemoteDeviceEncryption);
+  /// Opaque to everybody but the two ends.
   FIELD(Optional<Data>, sessionMessageContext);
   FIELD(Optional<Bool>, usePhoneTetherLocalMessage);
+  /// Who calls, and in which session.
   FIELD(String, participantID);
   FIELD(Bool, declineOnNetworkError);
   FIELD(String, sessionID);
@@ -39,6 +44,7 @@ struct VespSessionInvitation {
 /// The call is taken.
 struct VespSessionAccept {
   FIELD(UInt, version);
+  /// The answer itself; opaque here.
   FIELD(Optional<Data>, blob);
   FIELD(String, sessionID);
   FIELD(String, participantID);
@@ -48,6 +54,7 @@ struct VespSessionAccept {
   FIELD(Optional<Bool>, useSecureHLControlMessage);
   FIELD(Optional<Data>, unauthenticatedPublicKey);
   FIELD(Optional<Bool>, remoteUsePhoneTetherLocalMessage);
+  /// What the other side's media are secured with, and where its streams begin.
   FIELD(Optional<Data>, remoteKeyMaterialData);
   FIELD(Optional<Int>, remoteSSRC);
   FIELD(Optional<Int>, remoteSecStart);
@@ -74,6 +81,7 @@ struct VespSessionCancel {
   FIELD(UInt, version);
   FIELD(String, sessionID);
   FIELD(String, participantID);
+  /// Absent when the sender gave none.
   FIELD(Optional<VespSessionEndedReason>, remoteEndReason);
   FIELD(Optional<Data>, sessionMessageContext);
 
@@ -88,6 +96,7 @@ struct VespSessionReinitiate {
   FIELD(UInt, version);
   FIELD(String, sessionID);
   FIELD(String, participantID);
+  /// What is to be done anew.
   FIELD(VespSessionReinitiateSubcommand, sessionReinitiateSubcommand);
 
   LABELS(VespSessionReinitiate);

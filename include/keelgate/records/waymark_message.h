@@ -43,21 +43,28 @@ struct WaymarkGroupFields {
 /// stands in the record itself; `groupFields` has the groups 2 to 32, empty ones too.
 struct WaymarkMessage {
   FIELD(WMMessageType, messageType);
+  /// The protocol version that the sender speaks.
   FIELD(UInt, interfaceVersion);
+  /// When it was sent, as which message of which check-in.
   FIELD(Double, sendDate);
   FIELD(String, messageID);
   FIELD(String, sessionID);
   FIELD(Optional<String>, summaryText);
+  /// The first group of recipients.
   FIELD(Optional<String>, receiverHandle);
   FIELD(Optional<String>, sharingInvitationData);
   FIELD(Optional<String>, shareURL);
   FIELD(Optional<String>, participantID);
+  /// What is checked in on, and when it should end.
   FIELD(Optional<WMsessionType>, sessionType);
   FIELD(Optional<Double>, estimatedEndTime);
   FIELD(Optional<Double>, coarseEstimatedEndTime);
   FIELD(Optional<WMSessionDestinationType>, sessionDestinationType);
   FIELD(Optional<String>, sessionDestinationMapItem);
+  /// What the sender's device last warned about.
   FIELD(Optional<WMDeviceConfigurationLowPowerModeWarningState>, lowPowerModeWarningState);
+  /// What set it off, when and where. Degrees, metres and metres per second as the sender has
+  /// them; hunc and vunc are the horizontal and vertical uncertainty.
   FIELD(Optional<Double>, triggerTime);
   FIELD(Optional<Double>, latitude);
   FIELD(Optional<Double>, longitude);
@@ -68,9 +75,11 @@ struct WaymarkMessage {
   FIELD(Optional<GLClientLocationReferenceFrame>, referenceFrame);
   FIELD(Optional<Double>, speed);
   FIELD(Optional<WMTriggerCategory>, triggerType);
+  /// Where the sender left its last known state for the recipients.
   FIELD(Optional<String>, safetyCacheKey);
   FIELD(Optional<String>, safetyCacheToken);
   FIELD(Optional<Bool>, isSOSTrigger);
+  /// Always present, with 31 groups.
   FIELD(Optional<Array<WaymarkGroupFields>>, groupFields);
 
   LABELS(WaymarkMessage);
