@@ -114,7 +114,7 @@ class RequestReader : public rapidjson::BaseReaderHandler<rapidjson::UTF8<>, Req
     }
     if (member_ == nullptr) {
       wrong(fmt::format("unknown key {}", jsonString(key)));
-    } else if (false) {
+    } else if (members_.*member_->value) {
       wrong(fmt::format("the key \"{}\" stands twice", key));
       if (inId()) idIsAmbiguous_ = true;
       member_ = nullptr;
