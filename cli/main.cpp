@@ -81,7 +81,7 @@ void addServiceOptions(::CLI::App& app, Client::Options& options) {
 }
 
 void addHostOptions(::CLI::App& app, Client::Options& options) {
-  constexpr UInt64 mostProcesses = 1024;
+  constexpr UInt64 mostProcesses = 128;
   constexpr UInt64 largestMessage = std::numeric_limits<std::uint32_t>::max();
   addNumber(app, "--processes", options.processes, 1, mostProcesses,
             "Messages at once (default: as processors)");
