@@ -95,11 +95,11 @@ PropertyList::Tree data(std::string_view text) {
 }
 
 PropertyList::Dictionary with(PropertyList::Dictionary changes, PropertyList::Dictionary base) {
-  for (auto& [key, value] : base) {
-    const auto same = [&](const auto& entry) {
-      return entry.first == key;
+  for (auto& entry : base) {
+    const auto same = [&](const auto& change) {
+      return change.first == entry.first;
     };
-    if (std::none_of(changes.begin(), changes.end(), same)) changes.emplace_back(key, value);
+    if (std::none_of(changes.begin(), changes.end(), same)) changes.push_back(std::move(entry));
   }
   return changes;
 }
