@@ -65,10 +65,6 @@ concept HasField = requires {
 // complete, which is asserted where structs are decoded.
 constexpr int span = 240;
 
-/// An object of its own for each type, so that types can be compared in a table.
-template <class T>
-inline constexpr char typeIdentity = 0;
-
 template <class F>
 struct FieldCount : std::integral_constant<std::size_t, 1> {};
 template <class F, std::size_t n>

@@ -14,6 +14,7 @@
 #include <array>
 #include <concepts>
 #include <cstddef>
+#include <string_view>
 #include <tuple>
 #include <utility>
 
@@ -34,18 +35,15 @@ struct Label {
   }
 };
 
-/// The type of a field's value as a number that can be compared in a table.
-template <class V>
-constexpr const void* typeTag() {
-  return &Keelgate::Detail::typeIdentity<V>;
-}
-
+/// The types of the fields' values, each spelt as the compiler has it. Not the addresses of
+/// objects: under a sanitizer those are no constants that can be compared.
 template <class S>
 constexpr auto typeTags() {
-  std::array<const void*, Keelgate::FieldsOf<S>::size> tags{};
+  std::array<std::string_view, Keelgate::FieldsOf<S>::size> tags{};
   std::size_t n = 0;
-  Keelgate::FieldsOf<S>::each(
-      [&](auto field) { tags[n++] = typeTag<typename decltype(field)::Value>(); });
+  Keelgate::FieldsOf<S>::each([&](auto field) {
+    tags[n++] = Keelgate::Detail::prettyFunction<typename decltype(field)::Value>();
+  });
   return tags;
 }
 
