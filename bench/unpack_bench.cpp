@@ -29,7 +29,7 @@ void measure(benchmark::State& state, const std::string& name, Body body) {
   if (message.empty()) return state.SkipWithError("no such example; run from the root of the tree");
   const Bytes bytes = std::as_bytes(std::span(message));
   for (auto _ : state) benchmark::DoNotOptimize(body(bytes));
-  state.SetBytesProcessed(static_cast<std::int64_t>(state.iterations() * bytes.size()));
+  state.SetBytesProcessed(state.iterations() * static_cast<std::int64_t>(bytes.size()));
 }
 
 template <class Unpacker>
