@@ -123,7 +123,6 @@ void freshWorkerWithoutSpare(benchmark::State& state) {
       std::make_shared<ServiceProcess>(ServiceSettings{.path = KEELGATE_SERVICE,
                                                        .socket = {},
                                                        .requireLayers = false,
-                                                       .largestMessage = 1u << 20,
                                                        .messagesPerWorker = 1,
                                                        .cpuSecondsPerWorker = 5,
                                                        .maximumWorkers = 8},
@@ -131,7 +130,7 @@ void freshWorkerWithoutSpare(benchmark::State& state) {
   const Data bytes = message();
   measure(state, std::chrono::milliseconds(2), [&] {
     const Deadline deadline = deadlineAfter(std::chrono::seconds(5));
-    Worker worker(service, *service->fork(deadline));
+    Worker worker(service, *service->fork(Transport::shortMessage, deadline));
     ReceivedReply reply;
     if (worker.exchange({.record = recordNumber<VespCommandResponse>,
                          .command = 0,

@@ -43,7 +43,6 @@ ServiceSettings settingsFor(const Client::Options& options, std::size_t processe
   return {.path = options.servicePath,
           .socket = options.socket,
           .requireLayers = options.requireLayers,
-          .largestMessage = options.largestMessage,
           .messagesPerWorker = std::max<std::uint64_t>(options.messagesPerProcess, 1),
           .cpuSecondsPerWorker = cpuSeconds(options),
           .maximumWorkers = slotsPerPlace * processes};
@@ -85,6 +84,8 @@ class Pool::Place {
 Pool::Pool(const Client::Options& options, std::size_t processes)
     : owner_(getpid()),
       settings_(settingsFor(options, processes)),
+      // The seal is for good, so a worker that is used again must be ready for the largest.
+      foreseen_(options.messagesPerProcess > 1 ? options.largestMessage : Transport::shortMessage),
       log_(options.log),
       // Each worker's channel twice while it is forked, and the two ends of each service, of which
       // every call may hold an old one.
@@ -112,14 +113,14 @@ std::uint64_t Pool::layers(Deadline deadline) {
 
 void Pool::exchange(const ClientRequest& request, Deadline deadline, const Accept& accept) {
   const Place place(*this, deadline);
-  Worker worker = take(deadline, false);
+  Worker worker = take(request.message.size(), deadline, false);
   const bool used = worker.served() > 0;
   Optional<HostError> failure =
       attempt(std::move(worker), request, deadline, accept, settings_.messagesPerWorker);
   // It may have been the doing of the messages before: this one gets a worker to itself. A message
   // that was alone with its worker has had its only try.
   if (failure && used && failure->reason != Reason::timedOut) {
-    failure = attempt(take(deadline, true), request, deadline, accept, 1);
+    failure = attempt(take(request.message.size(), deadline, true), request, deadline, accept, 1);
   }
   if (failure) throw HostError(*failure);
 }
@@ -155,16 +156,17 @@ void Pool::keep(Worker worker, bool spent) {
   }
 }
 
-Worker Pool::take(Deadline deadline, bool fresh) {
+Worker Pool::take(std::size_t length, Deadline deadline, bool fresh) {
   Lock lock(mutex_);
   for (;;) {
     const Service service = running(lock, deadline);
-    if (!fresh) {
+    if (!fresh && length <= foreseen_) {
       if (Optional<Worker> idle = takeIdle()) return std::move(*idle);
     }
     lock.unlock();
     try {
-      if (auto forked = service->fork(deadline)) return {service, std::move(*forked)};
+      auto forked = service->fork(std::max<std::uint64_t>(length, foreseen_), deadline);
+      if (forked) return {service, std::move(*forked)};
     } catch (const StartFailure& failure) {
       throw HostError(Reason::startFailed, failure.sentence);
     }
@@ -275,9 +277,9 @@ void Pool::forkAhead() noexcept {
 }
 
 /// Nobody waits for these workers: what goes wrong is met again by whoever needs one.
-Optional<Worker> Pool::forkQuietly(const Service& service) noexcept {
+Optional<Worker> Pool::forkQuietly(const Service& service) const noexcept {
   try {
-    if (auto forked = service->fork(deadlineAfter(killPatience))) {
+    if (auto forked = service->fork(foreseen_, deadlineAfter(killPatience))) {
       return Worker(service, std::move(*forked));
     }
   } catch (const std::exception&) {

@@ -67,10 +67,10 @@ class Pool {
   Optional<HostError> attempt(Worker worker, const ClientRequest& request, Deadline deadline,
                               const Accept& accept, std::uint64_t mayServe);
   void keep(Worker worker, bool spent);
-  Worker take(Deadline deadline, bool fresh);
+  Worker take(std::size_t length, Deadline deadline, bool fresh);
   Optional<Worker> takeIdle();
   void forkAhead() noexcept;
-  static Optional<Worker> forkQuietly(const Service& service) noexcept;
+  Optional<Worker> forkQuietly(const Service& service) const noexcept;
 
   Service running(Lock& lock, Deadline deadline);
   void awaitBackOff(Lock& lock, Deadline deadline);
@@ -79,6 +79,8 @@ class Pool {
 
   const pid_t owner_;
   const ServiceSettings settings_;
+  /// Bytes: what a worker must be ready for before its message is known.
+  const std::uint64_t foreseen_;
   const LogSink log_;
   DescriptorBook book_;
   Turnstile turnstile_;

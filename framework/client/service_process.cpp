@@ -51,9 +51,8 @@ ServiceProcess::~ServiceProcess() {
 
 void ServiceProcess::shakeHands(const ServiceSettings& settings, Deadline deadline) {
   ControlFrame hello = makeFrame(ControlKind::hello, 0);
-  hello.numbers[0] = settings.largestMessage;
-  hello.numbers[1] = settings.messagesPerWorker;
-  hello.numbers[2] = settings.cpuSecondsPerWorker;
+  hello.numbers[0] = settings.messagesPerWorker;
+  hello.numbers[1] = settings.cpuSecondsPerWorker;
   ControlFrame answer;
   const int control = handles_.control.get();
   // A service that has already refused takes no hello, and its reason is waiting to be read.
@@ -90,7 +89,8 @@ void ServiceProcess::failToStart(bool late) {
                      true);
 }
 
-Optional<ServiceProcess::Forked> ServiceProcess::fork(Deadline deadline) {
+Optional<ServiceProcess::Forked> ServiceProcess::fork(std::uint64_t longestMessage,
+                                                      Deadline deadline) {
   int ends[2];
   if (socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends) != 0) {
     throw StartFailure(
@@ -102,8 +102,9 @@ Optional<ServiceProcess::Forked> ServiceProcess::fork(Deadline deadline) {
   const Descriptor theirs(book_, ends[1]);
   const Optional<std::uint32_t> slot = claimSlot();
   if (!slot) return std::nullopt;
-  if (!sendFrame(handles_.control.get(), makeFrame(ControlKind::fork, *slot), theirs.get(),
-                 deadline)) {
+  ControlFrame frame = makeFrame(ControlKind::fork, *slot);
+  frame.numbers[0] = longestMessage;
+  if (!sendFrame(handles_.control.get(), frame, theirs.get(), deadline)) {
     lose();
     return std::nullopt;
   }

@@ -26,7 +26,6 @@ struct ServiceSettings {
   String path;
   String socket;
   bool requireLayers;
-  std::uint64_t largestMessage;
   std::uint64_t messagesPerWorker;
   std::uint64_t cpuSecondsPerWorker;
   /// How many workers may be alive at a time, those included that have answered and not yet ended.
@@ -48,9 +47,9 @@ class ServiceProcess {
     std::uint32_t slot;
     Descriptor channel;
   };
-  /// Asks for a worker, without waiting for it; nothing when the service is lost. Throws
-  /// StartFailure when no channel can be made.
-  Optional<Forked> fork(Deadline deadline);
+  /// Asks for a worker for messages of at most so many bytes, without waiting for it; nothing when
+  /// the service is lost. Throws StartFailure when no channel can be made.
+  Optional<Forked> fork(std::uint64_t longestMessage, Deadline deadline);
   /// SIGKILL for the worker, if it still runs.
   void kill(std::uint32_t slot) noexcept;
   /// How the worker ended, as wait status; nothing when the service is lost or it takes too long.

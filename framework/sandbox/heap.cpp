@@ -26,7 +26,7 @@ void prepareHeap() {
   mallopt(M_ARENA_MAX, 1);
   // -1 is "never": a freed area stays ours, so that a freed message leaves room for the next one.
   mallopt(M_TRIM_THRESHOLD, -1);
-  if (!growHeap(heapBase)) throw Refusal(Transport::Obstacle::heap);
+  if (!growHeap(heapFor(0))) throw Refusal(Transport::Obstacle::heap);
 #endif
   try {
     throw Refusal(Transport::Obstacle::heap, 0);

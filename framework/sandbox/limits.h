@@ -2,7 +2,10 @@
 /// The numbers that bound a worker, and the resource limits that are set from them.
 #pragma once
 
+#include "framework/transport/frames.h"
+
 #include <sys/resource.h>
+#include <algorithm>
 #include <cstddef>
 #include <cstdint>
 
@@ -27,9 +30,11 @@ constexpr rlim_t stackLimit = rlim_t{8} << 20;
 /// fork frame brings.
 constexpr rlim_t zygoteDescriptors = 16;
 
-/// Bytes of heap that a message of `length` bytes is worth.
+/// Bytes of heap that a message of `length` bytes is worth. Short ones all get the same, which is
+/// there in the zygote already.
 constexpr std::size_t heapFor(std::uint64_t length) {
-  return heapBase + heapPerByte * static_cast<std::size_t>(length);
+  return heapBase +
+         heapPerByte * static_cast<std::size_t>(std::max(length, Transport::shortMessage));
 }
 
 /// For the zygote and all that it forks: no core, no file, no locked memory, no message queue; a

@@ -9,11 +9,14 @@
 #include "framework/sandbox/landlock.h"
 #include "framework/sandbox/limits.h"
 #include "framework/sandbox/namespaces.h"
+#include "framework/sandbox/pages.h"
 #include "framework/sandbox/refusal.h"
 #include "framework/sandbox/self_check.h"
 #include "framework/sandbox/spawn.h"
 
+#include <poll.h>
 #include <unistd.h>
+#include <ctime>
 #include <new>
 
 namespace Keelgate::Sandbox {
@@ -25,11 +28,10 @@ ZygoteSeal sealZygote(std::uint32_t) {
   return {.layers = 0, .landlockAbi = 0, .workerFilter = {}};
 }
 
-void sealWorker(const WorkerSeal& seal, const std::function<std::size_t()>& heapNeeded) {
+void sealWorker(const WorkerSeal& seal) {
   keepOnly(seal.channel);
   dieWithParent();
   if (getppid() != seal.parent) _exit(0);
-  heapNeeded();
 }
 
 #else
@@ -37,6 +39,13 @@ void sealWorker(const WorkerSeal& seal, const std::function<std::size_t()>& heap
 using namespace Transport;
 
 namespace {
+
+/// Whether the message is there already: then its answer is waited for, and is not to wait for us.
+bool isAwaited() {
+  pollfd channel{.fd = serviceDescriptor, .events = POLLIN, .revents = 0};
+  constexpr timespec atOnce{};
+  return ppoll(&channel, 1, &atOnce, nullptr) != 0;
+}
 
 /// In a user namespace the launcher's map decides who nobody is outside; without one, becoming
 /// nobody is what it says.
@@ -82,15 +91,15 @@ ZygoteSeal sealZygote(std::uint32_t given) {
   return seal;
 }
 
-void sealWorker(const WorkerSeal& seal, const std::function<std::size_t()>& heapNeeded) {
+void sealWorker(const WorkerSeal& seal) {
   keepOnly(seal.channel);
   dieWithParent();
   // It may have died before the line above.
   if (getppid() != seal.parent) _exit(0);
   limitWorker(seal.cpuSeconds);
-
-  const std::size_t bytes = heapNeeded();
-  if (!growHeap(bytes)) throw std::bad_alloc();
+  const bool growsBeyondZygotes = seal.longestMessage > shortMessage;
+  if (growsBeyondZygotes && !growHeap(heapFor(seal.longestMessage))) throw std::bad_alloc();
+  if (!isAwaited()) touchPages();
   enforce(seal.filter);
 }
 

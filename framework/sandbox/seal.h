@@ -11,7 +11,6 @@
 #include <linux/filter.h>
 #include <sys/types.h>
 #include <cstdint>
-#include <functional>
 #include <vector>
 
 namespace Keelgate::Sandbox {
@@ -35,12 +34,13 @@ struct WorkerSeal {
   /// The zygote as the worker sees it.
   pid_t parent;
   std::uint64_t cpuSeconds;
+  /// Bytes, in the length of the longest message that it will be given.
+  std::uint64_t longestMessage;
   const std::vector<sock_filter>& filter;
 };
 
-/// Seals a worker. `heapNeeded` is called when everything is done that does not depend on the
-/// message; it reads the header, which the trusted client wrote, and returns how many bytes of heap
-/// the message is worth. Nothing that a stranger wrote has been read when this returns.
-void sealWorker(const WorkerSeal& seal, const std::function<std::size_t()>& heapNeeded);
+/// Seals a worker, which has read nothing yet from its channel. Throws std::bad_alloc where the
+/// machine has not even the base of a heap.
+void sealWorker(const WorkerSeal& seal);
 
 }  // namespace Keelgate::Sandbox

@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "framework/server/worker.h"
 
-#include "framework/sandbox/limits.h"
 #include "framework/sandbox/refusal.h"
 #include "framework/sandbox/seal.h"
 #include "framework/server/channel.h"
@@ -27,7 +26,7 @@ RequestHeader receiveHeader(const WorkerOptions& options, std::uint32_t sequence
   if (!receiveAll(std::as_writable_bytes(std::span(&header, 1)))) _exit(0);
   if (header.magic != Transport::magic || header.version != Transport::protocolVersion ||
       header.sequence != sequence || header.serviceLength > Transport::maximumServiceLength ||
-      header.bodyLength > options.largestMessage) {
+      header.bodyLength > options.longestMessage) {
     _exit(Transport::protocolExitStatus);
   }
   return header;
@@ -76,22 +75,15 @@ void answer(const KeelgateServer& server, const RequestHeader& header) {
 }  // namespace
 
 void work(const KeelgateServer& server, const WorkerOptions& options, int channel) try {
-  RequestHeader header;
-  const Sandbox::WorkerSeal seal{.channel = channel,
-                                 .parent = options.parent,
-                                 .cpuSeconds = options.cpuSeconds,
-                                 .filter = options.filter};
-  Sandbox::sealWorker(seal, [&] {
-    header = receiveHeader(options, 0);
-    // The seal is for good, so a worker that is used again needs the largest heap at once.
-    const bool once = options.messages == 1;
-    return Sandbox::heapFor(once ? header.bodyLength : options.largestMessage);
-  });
-  for (std::uint32_t sequence = 0;;) {
-    answer(server, header);
-    if (++sequence == options.messages) _exit(0);
-    header = receiveHeader(options, sequence);
+  Sandbox::sealWorker({.channel = channel,
+                       .parent = options.parent,
+                       .cpuSeconds = options.cpuSeconds,
+                       .longestMessage = options.longestMessage,
+                       .filter = options.filter});
+  for (std::uint32_t sequence = 0; sequence != options.messages; ++sequence) {
+    answer(server, receiveHeader(options, sequence));
   }
+  _exit(0);
 } catch (const std::bad_alloc&) {
   // At once: whatever would run at an orderly exit wants memory, and calls that are forbidden.
   _exit(Transport::resourceExitStatus);

@@ -11,14 +11,14 @@
 
 namespace Keelgate {
 
-/// What every worker of a zygote is told: the client's hello, and the zygote's own part.
+/// What a worker is told: by the client's hello and its fork, and by the zygote.
 struct WorkerOptions {
-  /// Bytes.
-  std::uint64_t largestMessage;
   std::uint64_t messages;
   std::uint64_t cpuSeconds;
   pid_t parent;
   std::vector<sock_filter> filter;
+  /// Bytes.
+  std::uint64_t longestMessage;
 };
 
 /// Seals the process, answers as many messages as it may on `channel`, and exits. Called in a fresh

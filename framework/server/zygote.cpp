@@ -76,9 +76,8 @@ void Zygote::greet(std::uint32_t layers, std::uint32_t landlockAbi) {
   const Optional<ReceivedControl> hello = receiveControl();
   if (!hello) _exit(0);
   if (hello->frame.kind != ControlKind::hello) throw Refusal(Obstacle::badFrame, 0);
-  options_.largestMessage = hello->frame.numbers[0];
-  options_.messages = hello->frame.numbers[1];
-  options_.cpuSeconds = hello->frame.numbers[2];
+  options_.messages = hello->frame.numbers[0];
+  options_.cpuSeconds = hello->frame.numbers[1];
   sendControl({.magic = {},
                .version = {},
                .kind = ControlKind::ready,
@@ -92,6 +91,7 @@ bool Zygote::takeFrame() {
   if (!received) return false;
   switch (received->frame.kind) {
     case ControlKind::fork:
+      options_.longestMessage = received->frame.numbers[0];
       fork(received->frame.slot, received->descriptor);
       return true;
     case ControlKind::kill:

@@ -6,7 +6,7 @@
 ///     client                          zygote
 ///     hello{options}            ->
 ///                               <-    ready{layers}            or refused{obstacle} and it exits
-///     fork{slot} + descriptor   ->                             a worker on that descriptor
+///     fork{slot, length} + descriptor ->                       a worker on that descriptor
 ///     kill{slot}                ->                             SIGKILL for that slot's worker
 ///                               <-    exit{slot, status, ...}  exactly one for every fork
 ///
@@ -73,8 +73,9 @@ enum class Obstacle : std::uint64_t {
 };
 
 /// `numbers` is named by the functions of the frames' own modules; what each kind carries:
-///   hello: [0] largest message in bytes, [1] messages per worker, [2] CPU seconds per worker
+///   hello: [0] messages per worker, [1] CPU seconds per worker
 ///   ready: [0] layers (Layer), [1] Landlock ABI
+///   fork:  [0] length in bytes of the longest message that the worker will be given
 ///   exit:  [0] wait status as wait4 gives it, [1] peak resident bytes, [2] CPU microseconds;
 ///          a worker that could not be forked has the status of one whose heap did not suffice
 ///   refused: [0] Obstacle, [1] errno or 0
@@ -120,6 +121,10 @@ constexpr std::size_t maximumLogLength = 512;
 
 /// A topic identifier has some forty characters; this bounds what a caller can make us copy.
 constexpr std::size_t maximumServiceLength = std::size_t{64} * 1024;
+
+/// Workers that are forked before their message is there are forked for messages up to this many
+/// bytes. What is longer takes so long to read that the wait for a worker of its own is lost in it.
+constexpr std::uint64_t shortMessage = std::uint64_t{256} << 10;
 
 /// The exit status of a worker whose heap did not suffice.
 constexpr int resourceExitStatus = 75;

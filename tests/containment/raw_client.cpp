@@ -67,7 +67,7 @@ RawClient::RawClient(const std::string& path, const RawOptions& options) {
   close(program);
   close(ends[1]);
   control_ = ends[0];
-  sendFrame(ControlKind::hello, 0, {options.largestMessage, options.messages, options.cpuSeconds});
+  sendFrame(ControlKind::hello, 0, {options.messages, options.cpuSeconds});
   first_ = receiveFrame();
 }
 
@@ -129,9 +129,9 @@ ControlFrame RawClient::receiveFrame() {
   return frame;
 }
 
-int RawClient::fork(std::uint32_t slot) {
+int RawClient::fork(std::uint32_t slot, std::uint64_t longestMessage) {
   const auto ends = makePair(SOCK_STREAM);
-  sendFrame(ControlKind::fork, slot, {}, ends[1]);
+  sendFrame(ControlKind::fork, slot, {longestMessage}, ends[1]);
   close(ends[1]);
   return ends[0];
 }
@@ -152,7 +152,7 @@ WorkerEnd RawClient::end(std::uint32_t slot) {
 }
 
 std::pair<RawReply, WorkerEnd> RawClient::obey(std::string_view order) {
-  const int channel = fork(0);
+  const int channel = fork(0, order.size());
   sendOrder(channel, order);
   RawReply reply = receiveReply(channel);
   close(channel);

@@ -35,7 +35,6 @@ struct RawReply {
 };
 
 struct RawOptions {
-  std::uint64_t largestMessage = 64 << 20;
   std::uint64_t messages = 1;
   std::uint64_t cpuSeconds = 5;
   /// Runs in the service's process before it is executed, to take something from it.
@@ -70,8 +69,9 @@ class RawClient {
   /// The next control frame; a frame of zeros when the service has gone.
   Transport::ControlFrame receiveFrame();
 
-  /// Asks for a worker; returns the channel to it, which is the caller's to close.
-  int fork(std::uint32_t slot);
+  /// Asks for a worker for messages of so many bytes; returns the channel to it, which is the
+  /// caller's to close.
+  int fork(std::uint32_t slot, std::uint64_t longestMessage = Transport::shortMessage);
   void kill(std::uint32_t slot);
   /// Waits for the end of a slot's worker.
   WorkerEnd end(std::uint32_t slot);

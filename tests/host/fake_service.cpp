@@ -179,5 +179,5 @@ int main(int, char** arguments) {
   if (manner == "babbles") ready.magic = 0;
   if (manner != "mute") send(channel, &ready, sizeof ready, MSG_NOSIGNAL);
   while (manner == "mute" || manner == "stuck") pause();
-  Zygote(hello.numbers[1], manner == "early").serve();
+  Zygote(hello.numbers[0], manner == "early").serve();
 }
