@@ -105,6 +105,16 @@ def many_files():
         done = subprocess.run([keelgate, *record, odd, odd], capture_output=True)
         check(b"\\ufffd" not in done.stdout and b"\x1b" not in done.stdout + done.stderr
               and objects(done.stdout)[0]["file"].endswith("\ufffd\x1b[1m"), "an odd name")
+    with tempfile.TemporaryDirectory() as folder:
+        # Longer than what workers are forked ahead for, and up to the limit; short ones between.
+        sizes = [1 << 18, (1 << 18) + 1, len(data), 20 << 20, (1 << 18) - 1]
+        files = [pathlib.Path(folder, str(size)) for size in sizes]
+        for file, size in zip(files, sizes):
+            file.write_bytes(data.ljust(size))
+        for reuse in (1, 3):
+            status, out, _ = run(*record, "--max-message", 20 << 20, "--messages-per-process",
+                                 reuse, *files)
+            check(status == 0 and len(objects(out)) == len(sizes), f"long messages: {out[:500]}")
     for empty in (["--service", "", "--command", "1"], ["--service=", "--command=1"]):
         reply = objects(run("unpack", *empty, stdin=data)[1])[0]
         check(reply["error"].get("service") == "", f"an empty service: {reply}")
