@@ -1,5 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The command numbers that the framework knows.
+/// The command numbers that the framework knows. To be known says nothing of being served: which
+/// service answers which command is in the program's tables.
+///
+/// Values and pure functions; callable from any thread. Nothing throws.
 #pragma once
 
 #include <keelgate/enumeration.h>
@@ -11,7 +14,8 @@
 
 namespace Keelgate {
 
-/// A known command. There is no way to hold an unknown one.
+/// A known command. There is no way to hold an unknown one. A client message is held against this
+/// list before a byte of it is looked at. The numbers travel, so a case is never renumbered.
 class CommandType {
  public:
   NESTED_ENUMERATION(Case, UInt64, sampleMessage = 1, sampleReply = 2, checkInStart = 3,
@@ -27,6 +31,7 @@ class CommandType {
     return CommandType(*known);
   }
 
+  /// Implicit, so that a case can stand wherever a command is wanted.
   constexpr CommandType(Case which) : which_(which) {}
 
   [[nodiscard]] constexpr UInt64 rawValue() const { return rawValueOf(which_); }

@@ -20,6 +20,9 @@
 /// same in every translation unit, which __COUNTER__ is not. A walker is instantiated per type of
 /// value and not per field, because fields are passed as values; with structs of 156 fields that is
 /// the difference between seconds and minutes of compile time.
+///
+/// Everything happens at compile time: constants, pure functions and no state. Callable from any
+/// thread; nothing here throws, a visitor may.
 #pragma once
 
 #include <keelgate/enumeration.h>
@@ -36,7 +39,9 @@
 
 namespace Keelgate {
 
-/// One described member: where it is, what it is called, and the key that it travels under.
+/// One described member: where it is, what it is called, and the key that it travels under. A value
+/// and not a type with the member in its arguments, so that one instantiation of a visitor serves
+/// all fields of one type. The texts are literals and live as long as the program.
 template <class S, class V>
 struct Field {
   using Struct = S;
@@ -53,23 +58,29 @@ struct Field {
 
 namespace Detail {
 
+// Never defined: a pointer to it is a source line as a type, which overloads can be chosen by.
 template <int line>
 struct Line;
 
+// Only asked when S is complete: an answer given earlier would stand for good.
 template <class S, int line>
 concept HasField = requires {
   S::template keelgateField<S>(static_cast<Line<line>*>(nullptr));
 };
 
 // How far above its closing macro a struct may begin. A list that begins further up is not
-// complete, which is asserted where structs are decoded.
+// complete, which is asserted where structs are decoded. The largest struct, a payload of 156
+// fields and its comments, takes some 200 lines.
 constexpr int span = 240;
 
+// A line declares one field, or with FIELD_FAMILY an array of them.
 template <class F>
 struct FieldCount : std::integral_constant<std::size_t, 1> {};
 template <class F, std::size_t n>
 struct FieldCount<std::array<F, n>> : std::integral_constant<std::size_t, n> {};
 
+// A list of types that is only ever added up. Not a std::tuple, which is slow to compile at 156
+// elements.
 template <class... V>
 struct Types {
   template <class... W>
@@ -102,11 +113,14 @@ std::false_type takesMore(...);
 
 }  // namespace Detail
 
-/// The list of S, whose closing macro stands on the line `end`.
+/// The list of S, whose closing macro stands on the line `end`. S holds no more than an alias of
+/// it, so it is instantiated when somebody asks, by when S is complete. Asked inside S it would
+/// find no fields, and say so for good.
 template <class S, int end>
 class FieldList {
   static constexpr int first = end > Detail::span ? end - Detail::span : 1;
 
+  // Counted first, because the array of the lines needs its size as a constant.
   template <int... offsets>
   static constexpr std::size_t countLines(std::integer_sequence<int, offsets...>) {
     constexpr bool has[] = {Detail::HasField<S, first + offsets>...};
@@ -131,6 +145,7 @@ class FieldList {
     return S::template keelgateField<S>(static_cast<Detail::Line<lines[i]>*>(nullptr));
   }
 
+  // A family is visited as the single fields that it stands for.
   template <class Visitor, class V>
   static constexpr void visit(Visitor& visitor, Field<S, V> field) {
     visitor(field);
@@ -147,6 +162,7 @@ class FieldList {
     static_cast<void>(sequence);
   }
 
+  // The zero in front: a struct without fields would make an array without elements.
   template <std::size_t... i>
   static constexpr std::size_t total(std::index_sequence<i...>) {
     const std::size_t counts[] = {0, Detail::FieldCount<decltype(onLine<i>())>::value...};
@@ -173,9 +189,12 @@ class FieldList {
   friend class FieldList;
 
  public:
+  /// In fields, with each member of a family counted.
   static constexpr std::size_t size = total(Lines());
 
-  /// False when a member of S was declared without FIELD, or too far above the closing macro.
+  /// False when a member of S was declared without FIELD, or too far above the closing macro. The
+  /// compiler is asked whether S can be made from as many values as there are fields, and cannot be
+  /// made from one more. A walker that missed a member would drop it without a word.
   static constexpr bool isComplete() {
     using All = decltype(types(Lines()));
     return decltype(Detail::takes<S>(All(), 0))::value &&
@@ -189,14 +208,15 @@ class FieldList {
   }
 
   /// Calls `visitor(field, otherField)` for the fields of two lists of one length, neither of which
-  /// has a numbered family.
+  /// has a numbered family. For the copies from schema to record, which agree position by position.
   template <class Other, class Visitor>
   static constexpr void eachWith(Other, Visitor&& visitor) {
     static_assert(size == Other::size && size == lines.size() && size == Other::lines.size());
     eachPair<Other>(visitor, Lines());
   }
 
-  /// The names, and the keys, in declaration order.
+  /// The names, and the keys, in declaration order. As arrays, for tables and comparisons that are
+  /// made at compile time.
   static constexpr std::array<std::string_view, size> names = [] {
     std::array<std::string_view, size> all{};
     std::size_t n = 0;
@@ -211,11 +231,13 @@ class FieldList {
   }();
 };
 
+/// What is decoded from a message: a struct that closed its list with CODING_KEYS.
 template <class T>
 concept Schema = requires {
   typename T::CodingKeys;
 };
 
+/// What is handed to the client: a struct that closed its list with LABELS.
 template <class T>
 concept Record = requires {
   typename T::Labels;
@@ -237,6 +259,7 @@ struct FieldsOf<T> {
 };
 }  // namespace Detail
 
+/// The list of either, for walkers that do not care which it is.
 template <Described T>
 using FieldsOf = typename Detail::FieldsOf<T>::Type;
 
@@ -246,6 +269,7 @@ concept CaseKeyed = requires {
   T::caseNames;
 };
 
+/// Whether a value of the type may be absent.
 template <class T>
 constexpr bool isOptional = false;
 template <class T>

@@ -26,6 +26,8 @@
 #undef LABELS
 #undef CASES
 
+// The list twice: as the enumerators, and as text that is read at compile time. So the names in
+// JSON and `describe` cannot disagree with the code.
 #define ENUMERATION(Name_, Raw_, ...)                                                 \
   enum class Name_ : Raw_ { __VA_ARGS__ };                                            \
   constexpr auto keelgateCases(Name_) {                                               \
@@ -34,6 +36,7 @@
   }                                                                                   \
   static_assert(true)
 
+// Inside a class only a friend is found by its argument alone.
 #define NESTED_ENUMERATION(Name_, Raw_, ...)                                          \
   enum class Name_ : Raw_ { __VA_ARGS__ };                                            \
   friend constexpr auto keelgateCases(Name_) {                                        \
@@ -42,6 +45,7 @@
   }                                                                                   \
   static_assert(true)
 
+// For codes that a newer sender may add to: an unknown number becomes `default_`.
 #define DEFAULTING_ENUMERATION(Name_, Raw_, default_, ...) \
   ENUMERATION(Name_, Raw_, __VA_ARGS__);                   \
   constexpr Name_ keelgateDefault(Name_) {                 \
@@ -49,7 +53,8 @@
   }                                                        \
   static_assert(true)
 
-// A member, and its name or its name and wire key.
+// A member, and its name or its name and wire key. A template over Self: the struct is not complete
+// here, and a pointer to its member is only formed when a walker asks, by when it is.
 #define FIELD(Type, member_, ...)                                 \
   Type member_;                                                   \
   template <class Self>                                           \
@@ -59,6 +64,7 @@
   }                                                               \
   static_assert(true)
 
+// Repetition by hand: the preprocessor has no loop, and 124 lines would hide a missing one.
 #define KEELGATE_2_TO_32(do_, Type, base_)                                                        \
   do_(Type, base_, 2) do_(Type, base_, 3) do_(Type, base_, 4) do_(Type, base_, 5)                 \
       do_(Type, base_, 6) do_(Type, base_, 7) do_(Type, base_, 8) do_(Type, base_, 9)             \
@@ -83,7 +89,8 @@
   }                                                                             \
   static_assert(true)
 
-// Close the list of a schema, or of a record.
+// Close the list of a schema, or of a record. They stand below the last field: only the lines above
+// them are searched.
 #define CODING_KEYS(Self_) using CodingKeys = ::Keelgate::FieldList<Self_, __LINE__>
 #define LABELS(Self_)      using Labels = ::Keelgate::FieldList<Self_, __LINE__>
 

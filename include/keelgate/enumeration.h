@@ -10,6 +10,8 @@
 /// table. Every case states its raw value, because the values travel. NESTED_ENUMERATION is the
 /// form for an enumeration inside a struct. The macros exist only between
 /// <keelgate/describe_begin.h> and <keelgate/describe_end.h>.
+///
+/// Values and pure functions; callable from any thread. Nothing throws.
 #pragma once
 
 #include <keelgate/values.h>
@@ -21,7 +23,8 @@
 
 namespace Keelgate {
 
-/// A case as `describe` and JSON show it.
+/// A case as `describe` and JSON show it. Never negative: the list takes decimal digits alone, so a
+/// negative number on the wire is an unknown one.
 struct EnumerationCase {
   std::string_view name;
   UInt64 rawValue;
@@ -29,6 +32,7 @@ struct EnumerationCase {
 
 namespace Detail {
 
+/// How many names stand in a list with commas, which no name can hold.
 constexpr std::size_t countNames(std::string_view list) {
   std::size_t n = 1;
   for (char c : list) n += c == ',' ? 1 : 0;
@@ -60,6 +64,7 @@ constexpr std::array<EnumerationCase, n> casesIn(std::string_view list) {
   return cases;
 }
 
+/// The same for a list of names alone, as the cases of a variant have it.
 template <std::size_t n>
 constexpr std::array<std::string_view, n> namesIn(std::string_view list) {
   std::array<std::string_view, n> names{};
@@ -73,6 +78,8 @@ constexpr std::array<std::string_view, n> namesIn(std::string_view list) {
 
 }  // namespace Detail
 
+/// An enumeration that was declared by one of the macros; found by its argument, so that it may
+/// stand in any namespace or class.
 template <class E>
 concept Enumeration = std::is_enum_v<E> && requires(E value) {
   keelgateCases(value);
@@ -88,12 +95,14 @@ concept Defaulting = Enumeration<E> && requires(E value) {
 template <Enumeration E>
 inline constexpr auto casesOf = keelgateCases(E{});
 
+/// The number that travels.
 template <Enumeration E>
 constexpr UInt64 rawValueOf(E value) {
   return static_cast<UInt64>(value);
 }
 
-/// The case with this raw value, or nothing.
+/// The case with this raw value, or nothing. The only way from a stranger's number to a case: a
+/// bare cast would let any number in, and a switch over the cases would run past its end with it.
 template <Enumeration E>
 constexpr Optional<E> fromRawValue(UInt64 rawValue) {
   for (const EnumerationCase& entry : casesOf<E>) {
@@ -111,13 +120,15 @@ constexpr std::string_view nameOf(E value) {
   return {};
 }
 
-/// The case with this raw value, or the enumeration's default.
+/// The case with this raw value, or the enumeration's default. For the few codes for which an
+/// unknown number is no error.
 template <Defaulting E>
 constexpr E defaulting(UInt64 rawValue) {
   return fromRawValue<E>(rawValue).value_or(keelgateDefault(E{}));
 }
 
-/// The same for an optional number: absent stays absent.
+/// The same for an optional number: absent stays absent. The default is what an unknown code means,
+/// and never what a missing one does.
 template <Defaulting E>
 constexpr Optional<E> defaulting(Optional<UInt> rawValue) {
   if (!rawValue) return std::nullopt;

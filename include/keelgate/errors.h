@@ -4,6 +4,9 @@
 /// A rejected message throws the very error that its unpacker threw inside the sandbox, with all of
 /// its fields; a failure of the host itself throws HostError. Errors are values: copy them freely,
 /// use separate ones from separate threads.
+///
+/// Sentences, descriptions and reasons can quote what the message or its sender chose. They are
+/// UTF-8, and nothing else is promised: escape them before they reach a terminal or a log.
 #pragma once
 
 #include <keelgate/command_type.h>
@@ -21,6 +24,7 @@ namespace Keelgate {
 /// What the errors share: what() gives one readable English sentence, valid as long as the error.
 class KEELGATE_API Error : public std::exception {
  public:
+  /// Owned by the error. For people: programs go by the fields of the single errors.
   [[nodiscard]] const char* what() const noexcept override { return sentence_.c_str(); }
 
  protected:
@@ -30,7 +34,7 @@ class KEELGATE_API Error : public std::exception {
   String sentence_;
 };
 
-/// A step of a coding path: a wire key, or a position in an array.
+/// A step of a coding path: a wire key, or a position in an array. Positions count from 0.
 using CodingKey = std::variant<String, std::size_t>;
 
 /// The message does not have the form that its schema demands.
@@ -48,14 +52,17 @@ class KEELGATE_API DecodingError : public Error {
     dataCorrupted,
   };
 
+  /// For whoever decodes, or reads a decoded reply; applications only receive it.
   DecodingError(Kind itsKind, Optional<String> itsKey, Array<CodingKey> itsPath,
                 String itsDescription);
 
   Kind kind;
   /// The wire key that is missing; present with keyNotFound alone.
   Optional<String> key;
-  /// Outermost first.
+  /// Outermost first. At most 512 steps, which is as deep as property lists nest. An honest service
+  /// takes the keys from its schemas; one that was taken over writes what it likes.
   Array<CodingKey> codingPath;
+  /// What is wrong, without the path: in English, for people.
   String debugDescription;
 };
 
@@ -64,13 +71,16 @@ class KEELGATE_API Breach : public Error {
  public:
   Breach(String itsDomain, String itsErrorType, Optional<String> itsKeyPath = std::nullopt);
 
+  /// Which part refused, e.g. "com.tessen.Keelgate.VespServiceUnpacker".
   String domain;
   /// The reason, for people.
   String errorType;
   Optional<String> keyPath;
 };
 
-/// The host gave the message up; nothing is known of its content.
+/// The host gave the message up; nothing is known of its content. The message may be without fault,
+/// as when the machine is overloaded. It is not tried again for that: a message that was alone with
+/// its process has had its only try.
 class KEELGATE_API HostError : public Error {
  public:
   enum class Reason : std::uint8_t {
@@ -91,6 +101,7 @@ class KEELGATE_API HostError : public Error {
   HostError(Reason itsReason, String itsDescription);
 
   Reason reason;
+  /// What is known beyond the reason, for people; the reason's own sentence where that is nothing.
   String description;
 };
 
@@ -98,7 +109,7 @@ class KEELGATE_API HostError : public Error {
 
 namespace VespKeelgateService {
 
-/// The program has no unpacker for the message.
+/// The program has no unpacker for the message. Nothing of the message was decoded.
 class KEELGATE_API VespClientMessageUnpackingError : public Keelgate::Error {
  public:
   enum class Case : std::uint8_t {
@@ -108,9 +119,11 @@ class KEELGATE_API VespClientMessageUnpackingError : public Keelgate::Error {
     noUnpackerForService,
   };
 
+  /// The only ways to make one, so that each case comes with its own field.
   static VespClientMessageUnpackingError unimplementedCommand(Keelgate::CommandType command);
   static VespClientMessageUnpackingError noUnpackerForService(Keelgate::String service);
 
+  /// The same for both cases; with `code` it names the case to other languages.
   static constexpr const char* domain = "VespKeelgateService.VespClientMessageUnpackingError";
 
   /// The position of the case.

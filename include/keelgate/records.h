@@ -17,6 +17,7 @@
 
 namespace Keelgate {
 
+/// Types as a table that is walked at compile time. A value of it is an empty tag.
 template <class... T>
 struct TypeList {
   static constexpr std::size_t size = sizeof...(T);
@@ -34,6 +35,7 @@ using OutputRecords = TypeList<PulseUserPayload, VespCommandResponse, VespComman
                                VespInvitation, VespClientMessageResult>;
 
 namespace Detail {
+// The fold stops at the type; a type that is not in the list has its length for position.
 template <class T, class... All>
 constexpr std::size_t positionOf(TypeList<All...>) {
   std::size_t position = 0;
@@ -47,13 +49,18 @@ template <class T>
 concept OutputRecord = Detail::positionOf<T>(OutputRecords())
 < OutputRecords::size;
 
+/// What stands for the record in a request, and is the place of its unpacker in the server.
 template <OutputRecord T>
 constexpr std::size_t recordNumber = Detail::positionOf<T>(OutputRecords());
 
-/// The context that comes with every client message.
+/// The context that comes with every client message. Set by the caller from what delivered the
+/// message. An attacker may choose both, since a message can be sent to any service with any
+/// number.
 struct VespClientMessageContext {
+  /// Any number; one that CommandType does not know is refused with a Breach.
   UInt64 command;
-  /// The delivery-service topic that the message arrived under.
+  /// The delivery-service topic that the message arrived under. Compared exactly, with regard to
+  /// case.
   String service;
 };
 

@@ -17,7 +17,8 @@
 
 namespace Keelgate {
 
-/// A borrowed octet string: the bytes of a message. Valid only as long as its owner.
+/// A borrowed octet string: the bytes of a message. Valid only as long as its owner. Nobody changes
+/// the bytes while a call looks at them.
 using Bytes = std::span<const std::byte>;
 
 /// The word-sized and the explicitly sized integers are both 64 bits wide, and are distinct types
@@ -28,22 +29,27 @@ using Int64 = long long;
 using UInt64 = unsigned long long;
 static_assert(sizeof(Int) == 8 && sizeof(UInt) == 8, "the word-sized integers have 64 bits");
 
+/// IEEE 754, 64 bits. NaN and the infinities are values that a message can hold.
 using Double = double;
 using Bool = bool;
 
-/// UTF-8, always valid.
+/// UTF-8, always valid. Zero characters may stand in it, and characters that drive a terminal too.
 using String = std::string;
 
-/// An owned octet string.
+/// An owned octet string. Not looked into: what is in it is as the sender made it.
 using Data = std::vector<std::byte>;
 
+/// Absent means that the message had no such value, or null in its place, and never that a value
+/// was refused.
 template <class T>
 using Optional = std::optional<T>;
 
+/// In the order of the message, unless the field says otherwise.
 template <class T>
 using Array = std::vector<T>;
 
-/// A point in time, in seconds since 2001-01-01T00:00:00Z, never NaN or infinite.
+/// A point in time, in seconds since 2001-01-01T00:00:00Z, never NaN or infinite. Any finite
+/// number, also far outside the calendar: who converts it checks the range first.
 struct Date {
   double secondsSinceReferenceDate;
 

@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The HTTP headers that push payloads and web-tunnel responses carry.
+/// The HTTP headers that push payloads and web-tunnel responses carry. A value that owns its texts;
+/// separate ones may be used from separate threads.
 #pragma once
 
 #include <keelgate/describe.h>
@@ -9,7 +10,8 @@
 
 namespace Keelgate {
 
-/// Every value is as it was received.
+/// Every value is as it was received. Whoever sends them on checks them first: nothing here keeps a
+/// line end out of a value, and with it a header that somebody else wrote.
 struct PulseUserPayloadHttpHeaders {
   FIELD(Optional<String>, adhocServiceOverride);
   FIELD(Optional<String>, responseIdentifierString);

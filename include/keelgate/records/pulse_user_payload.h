@@ -1,5 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The record of a push payload, and the records inside it.
+/// The record of a push payload, and the records inside it. Values that own all that they hold;
+/// separate ones may be used from separate threads.
+///
+/// Numbers are the sender's codes and counts, checked for their type and their 64 bits alone.
 #pragma once
 
 #include <keelgate/describe.h>
@@ -27,7 +30,8 @@ struct PulseHoplinePluginRequest {
   LABELS(PulseHoplinePluginRequest);
 };
 
-/// What a media relay answered for one participant.
+/// What a media relay answered for one participant. The participant is a number of 64 bits without
+/// sign: read as a signed one, half of them would turn negative.
 struct PulseHoplineAllocationStatus {
   FIELD(Optional<UInt64>, participantId);
   FIELD(Optional<Int>, allocationStatus);
@@ -37,7 +41,8 @@ struct PulseHoplineAllocationStatus {
   LABELS(PulseHoplineAllocationStatus);
 };
 
-/// What a device needs to allocate a relay by itself. Addresses and keys are raw octets.
+/// What a device needs to allocate a relay by itself. Addresses and keys are raw octets. Their
+/// lengths are the sender's, and a port may be any integer.
 struct PulseHoplineSelfAllocToken {
   FIELD(Optional<Data>, relayIp);
   FIELD(Optional<Data>, relayIpv6);
@@ -64,12 +69,16 @@ struct PulseHoplinePluginAllocation {
 /// One push payload. The two payload lists and the four relay lists are empty where the message had
 /// none; everything else that the message lacked is absent. Payloads nest at most as deep as
 /// property lists may, which is 256.
+///
+/// Whoever walks it depth first by recursion needs a stack for that, or a limit of its own: a
+/// message of some KB nests to the full depth.
 struct PulseUserPayload {
   /// What the payload is: the one field that is always there.
   FIELD(Int, command);
   FIELD(Optional<Int>, commandContext);
   FIELD(Optional<Int>, version);
-  /// The content, encrypted by its sender, in one of several wrappings.
+  /// The content, encrypted by its sender, in one of several wrappings. Opaque to the service,
+  /// which has no key.
   FIELD(Optional<Data>, payload);
   FIELD(Optional<Data>, bulkedPayload);
   FIELD(Optional<Data>, fanoutPayload);
@@ -144,7 +153,8 @@ struct PulseUserPayload {
   FIELD(Optional<Bool>, traceProfile);
   FIELD(Optional<Bool>, groupMessage);
   FIELD(Optional<String>, contentType);
-  /// Header values that stand by themselves; those of a tunnelled exchange are in httpHeaders.
+  /// Header values that stand by themselves; those of a tunnelled exchange are in httpHeaders. A
+  /// message may bring both, and neither fills in for the other.
   FIELD(Optional<String>, adhocServiceOverride);
   FIELD(Optional<Data>, responseIdentifier);
   FIELD(Optional<String>, responseIdentifierString);
@@ -198,7 +208,7 @@ struct PulseUserPayload {
   FIELD(Optional<Data>, activeRelayIp);
   FIELD(Optional<Int>, selfAllocTokenCountOld);
   FIELD(Optional<Int>, selfAllocTokenCount);
-  /// Plugins: those asked for together, and one by itself.
+  /// Plugins: those asked for together, and independently of them one by itself.
   FIELD(Array<PulseHoplinePluginRequest>, pluginRequests);
   FIELD(Optional<String>, pluginName);
   FIELD(Optional<String>, pluginConfig);

@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-/// What every client message gives: one record, under the name of its kind.
+/// What every client message gives: one record, under the name of its kind. Values that own all
+/// that they hold; separate ones may be used from separate threads.
 #pragma once
 
 #include <keelgate/describe.h>
@@ -13,7 +14,9 @@
 
 namespace Keelgate {
 
-/// One case for each kind. A new kind of client message is one more alternative here.
+/// One case for each kind. A new kind of client message is one more alternative here. In a
+/// std::visit the compiler then shows every place that has to know it. The position of an
+/// alternative travels between service and client, which are always of one build.
 struct VespClientMessageType
     : std::variant<VespSampleMessage, VespSessionInvitation, VespSessionAccept, VespSessionDecline,
                    VespSessionCancel, VespSessionReinitiate, VespRestrictedMessage,
@@ -22,6 +25,7 @@ struct VespClientMessageType
         sessionCancel, sessionReinitiate, messageTypeRestricted, waymarkMessage);
 };
 
+/// The one record whose JSON is not an object of its own, but its case.
 struct VespClientMessageResult {
   FIELD(VespClientMessageType, result);
 

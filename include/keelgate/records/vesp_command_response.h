@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The delivery service's short answer to a command.
+/// The delivery service's short answer to a command. A value that owns all that it holds; separate
+/// ones may be used from separate threads.
 #pragma once
 
 #include <keelgate/describe.h>
@@ -9,15 +10,18 @@
 
 namespace Keelgate {
 
-/// Only the command number is always there.
+/// Only the command number is always there. Nothing ties the answer to a command that was asked:
+/// whoever sent that compares the numbers.
 struct VespCommandResponse {
   FIELD(Int, command);
-  /// The message that is answered.
+  /// The message that is answered, by number or by identifier. Deliberate: a number here, a text in
+  /// payloads.
   FIELD(Optional<Int64>, messageId);
   FIELD(Optional<Data>, messageUUID);
-  /// How it went.
+  /// How it went, in the delivery service's codes.
   FIELD(Optional<Int>, responseStatus);
   FIELD(Optional<Int>, failReason);
+  /// Opaque octets.
   FIELD(Optional<Data>, token);
   FIELD(Optional<Bool>, internalBuild);
   FIELD(Optional<Bool>, loggingProfile);

@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The answer to an HTTP request that the delivery service made for the device.
+/// The answer to an HTTP request that the delivery service made for the device. A value that owns
+/// all that it holds; separate ones may be used from separate threads.
 #pragma once
 
 #include <keelgate/describe.h>
@@ -10,16 +11,20 @@
 
 namespace Keelgate {
 
-/// `httpBody` is the stored or inline body, of any length.
+/// `httpBody` is the stored or inline body, of any length. Only the command number is always there.
+/// Body and headers come from the server that was asked, so they are a third party's and not the
+/// delivery service's.
 struct VespCommandWebTunnelResponse {
   FIELD(Int, command);
-  /// The message that is answered.
+  /// The message that is answered, by number or by identifier. Deliberate: a number here, a text in
+  /// payloads.
   FIELD(Optional<Int>, messageId);
   FIELD(Optional<Data>, messageUUID);
   FIELD(Optional<Int>, responseStatus);
   FIELD(Optional<String>, contentType);
   /// In nanoseconds, as the sender counts.
   FIELD(Optional<Int64>, epochTimeNanos);
+  /// Any text: that it is a URL, or the one that was asked for, is not checked.
   FIELD(Optional<String>, httpUrl);
   /// Absent when the message had none.
   FIELD(Optional<PulseUserPayloadHttpHeaders>, httpHeaders);
@@ -27,6 +32,7 @@ struct VespCommandWebTunnelResponse {
   /// Where a body is that was too large to carry, and the key that opens it.
   FIELD(Optional<String>, httpBodyUrl);
   FIELD(Optional<Data>, httpBodyKey);
+  /// Of the HTTP exchange, where responseStatus is the delivery's.
   FIELD(Optional<Int>, httpResponseStatus);
   FIELD(Optional<String>, httpErrorMsg);
 

@@ -1,5 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The record of an invitation: an envelope around one of five kinds.
+/// The record of an invitation: an envelope around one of five kinds. Values that own all that they
+/// hold; separate ones may be used from separate threads.
+///
+/// Anybody can send an invitation. That one was decoded says nothing of who sent it.
 #pragma once
 
 #include <keelgate/describe.h>
@@ -10,7 +13,8 @@
 
 namespace Keelgate {
 
-/// A cloud sharing token: opaque octets, never empty.
+/// A cloud sharing token: opaque octets, never empty. Not parsed here: that it opens anything is
+/// for the cloud to say.
 struct SkyvaultSharingToken {
   FIELD(Data, tokenData);
 
@@ -26,7 +30,8 @@ struct VespSampleInvitation {
   LABELS(VespSampleInvitation);
 };
 
-/// The least version of the home's hub, and the features that it must have.
+/// The least version of the home's hub, and the features that it must have. Both are always there
+/// once the message has the dictionary; the features are codes.
 struct VespHearthInvitationRequestedCapabilities {
   FIELD(Double, hearthdVersion);
   FIELD(Array<Int>, homeSupportedFeatures);
@@ -34,7 +39,8 @@ struct VespHearthInvitationRequestedCapabilities {
   LABELS(VespHearthInvitationRequestedCapabilities);
 };
 
-/// The times are as the sender counts them; neither they nor the day mask are checked.
+/// The times are as the sender counts them; neither they nor the day mask are checked. A rule with
+/// nothing in it is kept as one.
 struct VespHearthInviteeScheduleWeekDayRule {
   FIELD(Optional<Int>, startTime);
   FIELD(Optional<Int>, endTime);
@@ -51,7 +57,8 @@ struct VespHearthInviteeScheduleYearDayRule {
   LABELS(VespHearthInviteeScheduleYearDayRule);
 };
 
-/// When the invited person may come in. Both lists are always present.
+/// When the invited person may come in. Both lists are always present, and empty where the message
+/// has none; no schedule at all is an absent VespHearthInviteeSchedule.
 struct VespHearthInviteeSchedule {
   FIELD(Optional<Array<VespHearthInviteeScheduleWeekDayRule>>, weekDayRules);
   FIELD(Optional<Array<VespHearthInviteeScheduleYearDayRule>>, yearDayRules);
@@ -59,7 +66,8 @@ struct VespHearthInviteeSchedule {
   LABELS(VespHearthInviteeSchedule);
 };
 
-/// An invitation to join a home. Deliberate: it has no share URL.
+/// An invitation to join a home. Every field may be absent. Deliberate: it has no share URL: the
+/// message's has its type checked and goes no further.
 struct VespHearthInvitation {
   /// Keeps the octets of a sharing token; throws Breach when there are none.
   static SkyvaultSharingToken decodeSkyvaultToken(Data tokenData);
@@ -89,7 +97,8 @@ struct VespHearthInvitation {
   LABELS(VespHearthInvitation);
 };
 
-/// An invitation to share a group of stored credentials.
+/// An invitation to share a group of stored credentials. Its share URL is needed to decode the
+/// token and is not kept.
 struct VespCofferSharingInvitation {
   /// Keeps the octets of a sharing token; throws Breach when there are none, or no share URL.
   static SkyvaultSharingToken decodeSkyvaultToken(Data tokenData, const String& shareURL);
@@ -120,7 +129,8 @@ struct VespStrideSharingInvitation {
   LABELS(VespStrideSharingInvitation);
 };
 
-/// The kind of an invitation, with its record.
+/// The kind of an invitation, with its record. The position of an alternative travels between
+/// service and client, which are of one build.
 struct VespDictionaryContext
     : std::variant<VespSampleInvitation, VespHearthInvitation, VespCofferSharingInvitation,
                    VespVitalsInvitation, VespStrideSharingInvitation> {
@@ -137,6 +147,7 @@ struct VespInvitationContextType : std::variant<VespDictionaryContext> {
 struct VespInvitationContext {
   /// The schema string that named the kind.
   FIELD(String, schema);
+  /// Always 1, the number of the one way: any other is refused.
   FIELD(Int, contextType);
   FIELD(VespInvitationContextType, context);
 
@@ -146,9 +157,11 @@ struct VespInvitationContext {
 /// The envelope. Its values are those of the message, unchecked.
 struct VespInvitation {
   FIELD(VespInvitationContext, context);
+  /// The sender's code. Any integer.
   FIELD(Int, state);
   /// As the sender counts it; not compared with any clock.
   FIELD(Optional<Double>, expiration);
+  /// Any text, an empty one too.
   FIELD(String, identifier);
 
   LABELS(VespInvitation);

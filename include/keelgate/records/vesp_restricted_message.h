@@ -9,8 +9,11 @@
 
 namespace Keelgate {
 
+/// What the framework may do with a kind of message.
 ENUMERATION(ClientMessageType, UInt, unrestricted = 0, restricted = 1);
 
+/// It is the same for every message of its service. So it cannot leak any, and bytes that would
+/// harm a decoder never meet one.
 struct VespRestrictedMessage {
   FIELD(ClientMessageType, messageType);
 

@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The record of the conferencing test tool's messages.
+/// The record of the conferencing test tool's messages. A value that owns its text; separate ones
+/// may be used from separate threads.
 #pragma once
 
 #include <keelgate/describe.h>
@@ -9,8 +10,11 @@
 
 namespace Keelgate {
 
+/// The fields are optional because the framework's record is so; the service always gives the first
+/// two.
 struct VespSampleMessage {
-  /// The command number that the message itself states.
+  /// The command number that the message itself states. Deliberate: it may be another than the one
+  /// that the message arrived with.
   FIELD(Optional<Int>, command);
   FIELD(Optional<String>, clientName);
   FIELD(Optional<Date>, date);

@@ -1,5 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The records of the call services: an invitation to a session, its answers and follow-ups.
+/// The records of the call services: an invitation to a session, its answers and follow-ups. Values
+/// that own all that they hold; separate ones may be used from separate threads.
+///
+/// Each names a session and a participant, as texts that the sender chose. Nothing here knows which
+/// sessions exist: an answer may come for a call that never was. Unlike a check-in's codes, an
+/// unknown number of any enumeration here fails the message.
 #pragma once
 
 #include <keelgate/describe.h>
@@ -9,7 +14,8 @@
 
 namespace Keelgate {
 
-/// A call is offered.
+/// A call is offered. The switches are wishes of a stranger. The host decides, above all on those
+/// that would take protection away.
 struct VespSessionInvitation {
   /// How the media of the call travel.
   NESTED_ENUMERATION(TransportType, UInt, peerToPeer = 0, relay = 1, multiwayRelay = 2);
@@ -31,7 +37,7 @@ struct VespSessionInvitation {
   /// Opaque to everybody but the two ends.
   FIELD(Optional<Data>, sessionMessageContext);
   FIELD(Optional<Bool>, usePhoneTetherLocalMessage);
-  /// Who calls, and in which session.
+  /// Who calls, and in which session, as they say.
   FIELD(String, participantID);
   FIELD(Bool, declineOnNetworkError);
   FIELD(String, sessionID);
@@ -41,7 +47,8 @@ struct VespSessionInvitation {
   LABELS(VespSessionInvitation);
 };
 
-/// The call is taken.
+/// The call is taken. What an invitation calls the sender's own is `remote` here: it is seen from
+/// the caller.
 struct VespSessionAccept {
   FIELD(UInt, version);
   /// The answer itself; opaque here.
@@ -56,13 +63,15 @@ struct VespSessionAccept {
   FIELD(Optional<Bool>, remoteUsePhoneTetherLocalMessage);
   /// What the other side's media are secured with, and where its streams begin.
   FIELD(Optional<Data>, remoteKeyMaterialData);
+  /// Deliberate: signed, as they travel.
   FIELD(Optional<Int>, remoteSSRC);
   FIELD(Optional<Int>, remoteSecStart);
 
   LABELS(VespSessionAccept);
 };
 
-/// The call is refused.
+/// The call is refused. Deliberate: declined elsewhere gives this record too, and which of the two
+/// commands it came with is not kept.
 struct VespSessionDecline {
   FIELD(UInt, version);
   FIELD(String, sessionID);
@@ -74,6 +83,7 @@ struct VespSessionDecline {
 
 /// The caller takes the offer back, or a participant leaves.
 struct VespSessionCancel {
+  /// Why the other side says that it ended.
   NESTED_ENUMERATION(VespSessionEndedReason, UInt, unknown = 0, localHangUp = 1, remoteHangUp = 2,
                      noAnswer = 3, answeredElsewhere = 4, declinedElsewhere = 5, busy = 6,
                      networkFailure = 7, mediaFailure = 8);
@@ -90,6 +100,7 @@ struct VespSessionCancel {
 
 /// A running session is set up anew.
 struct VespSessionReinitiate {
+  /// There is no default: to do the wrong thing anew would be worse than to do nothing.
   NESTED_ENUMERATION(VespSessionReinitiateSubcommand, UInt, restartConnection = 0,
                      renegotiateMedia = 1, switchTransport = 2, rekey = 3);
 

@@ -1,5 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The record of a safety check-in. A code that the framework does not know is its default case.
+/// The record of a safety check-in. A code that the framework does not know is its default case: a
+/// newer sender's check-in must still arrive, since somebody may depend on it.
+///
+/// Values that own all that they hold; separate ones may be used from separate threads.
 #pragma once
 
 #include <keelgate/describe.h>
@@ -9,10 +12,12 @@
 
 namespace Keelgate {
 
+/// What the check-in tells. The one code that is required.
 DEFAULTING_ENUMERATION(WMMessageType, UInt, unknown, unknown = 0, sessionStart = 1,
                        sessionUpdate = 2, sessionEnd = 3, trigger = 4, cacheUpdate = 5,
                        locationUpdate = 6);
 
+/// What is waited for.
 DEFAULTING_ENUMERATION(WMsessionType, UInt, unknown, unknown = 0, timer = 1, destination = 2,
                        workout = 3);
 
@@ -22,14 +27,18 @@ DEFAULTING_ENUMERATION(WMSessionDestinationType, UInt, unknown, unknown = 0, hom
 DEFAULTING_ENUMERATION(WMDeviceConfigurationLowPowerModeWarningState, UInt, unknown, unknown = 0,
                        notShown = 1, shown = 2, dismissed = 3);
 
+/// What the coordinates refer to.
 DEFAULTING_ENUMERATION(GLClientLocationReferenceFrame, UInt, unknown, unknown = 0, wgs84 = 1,
                        shifted = 2);
 
+/// Why the sender's device raised it.
 DEFAULTING_ENUMERATION(WMTriggerCategory, UInt, unknown, unknown = 0, timerExpired = 1,
                        noProgress = 2, offRoute = 3, unresponsive = 4, emergency = 5);
 
-/// One group of recipients. Receivers know a group by its number, not by its place in the list.
+/// One group of recipients. Receivers know a group by its number, not by its place in the list. An
+/// empty group is a group: all that the number says is that it may have recipients.
 struct WaymarkGroupFields {
+  /// 2 to 32.
   FIELD(UInt, groupNumber);
   FIELD(Optional<String>, receiverHandle);
   FIELD(Optional<String>, sharingInvitationData);
@@ -40,7 +49,8 @@ struct WaymarkGroupFields {
 };
 
 /// Times, angles, lengths and speeds are as the sender counts them. The first group of recipients
-/// stands in the record itself; `groupFields` has the groups 2 to 32, empty ones too.
+/// stands in the record itself; `groupFields` has the groups 2 to 32, empty ones too. No value is
+/// tied to another: a latitude may come without a longitude.
 struct WaymarkMessage {
   FIELD(WMMessageType, messageType);
   /// The protocol version that the sender speaks.
