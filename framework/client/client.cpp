@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
+/// The public face: limits are checked, a pool is asked, and what it says is turned into a record
+/// or thrown. Everything with threads in it is the pool's.
 #include <keelgate/client.h>
 
 #include "framework/client/pool.h"
@@ -19,6 +21,7 @@ namespace {
 /// More could not be in work on any machine, and each costs a process or two.
 constexpr std::size_t mostProcesses = 128;
 
+/// Positions in a message are kept in 32 bits by whoever reads it.
 constexpr std::size_t messageCeiling = 0xffff'ffff;
 
 std::size_t processesFor(const Client::Options& options) {
@@ -49,6 +52,7 @@ class Client::Implementation {
 
   template <OutputRecord R>
   R unpack(Bytes message, const VespClientMessageContext& context) {
+    // First of all, so that nothing that follows goes uncounted.
     const Deadline deadline = deadlineAfter(options_.timeLimit);
     checkSize("the message", message.size(), limit_);
     checkSize("the service identifier", context.service.size(), Transport::maximumServiceLength);
@@ -61,6 +65,7 @@ class Client::Implementation {
                       if (reply.kind == Transport::ReplyKind::error) {
                         Transport::throwError(reply.body());
                       }
+                      // Within the call, so that a reply that turns out to be none ends its worker.
                       record = Transport::decodeRecord<R>(reply.body());
                     });
     return std::move(*record);

@@ -37,6 +37,7 @@ bool sendFrame(int control, const ControlFrame& frame, int descriptor, Deadline 
     std::memcpy(CMSG_DATA(header), &descriptor, sizeof descriptor);
   }
   for (;;) {
+    // Without a signal: the application's handling of SIGPIPE is its own.
     if (sendmsg(control, &packet, MSG_DONTWAIT | MSG_NOSIGNAL) >= 0) return true;
     if (errno == EINTR) continue;
     if (errno != EAGAIN) return false;
@@ -53,6 +54,7 @@ Received receiveFrame(int control, ControlFrame& frame) noexcept {
   } while (n < 0 && errno == EINTR);
   if (n < 0 && errno == EAGAIN) return Received::nothing;
   if (n != sizeof frame) return Received::end;
+  // Copied only when it has its length, so that no part of `frame` is ever what was there before.
   std::memcpy(&frame, packet.data(), sizeof frame);
   const bool right = frame.magic == Transport::magic && frame.version == Transport::protocolVersion;
   return right ? Received::frame : Received::end;

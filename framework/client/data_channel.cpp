@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
+/// Every call here is one that does not wait; waiting is done in one place, until the deadline. So
+/// a worker that reads slowly, or sends a byte a second, costs the time limit and no more.
 #include "framework/client/data_channel.h"
 
 #include <poll.h>
@@ -19,6 +21,7 @@ namespace {
 /// Most replies fit; room grows twofold from here with the bytes that have arrived.
 constexpr std::size_t firstBuffer = 4096;
 
+/// An interruption is the same: whoever asked goes round again, by way of the deadline.
 bool wouldBlock() noexcept {
   return errno == EAGAIN || errno == EINTR;
 }
@@ -53,6 +56,7 @@ DataChannel::Look DataChannel::look() const noexcept {
 Ending DataChannel::exchange(const ClientRequest& request, Deadline deadline,
                              ReceivedReply& reply) {
   if (const Ending sent = send(request, deadline); sent != Ending::answered) return sent;
+  // 64 bits hold it for the largest message that there is.
   const std::uint64_t allowance =
       replyBase + request.service.size() + replyFactor * request.message.size();
   const Ending received = receive(allowance, deadline, reply);
@@ -68,6 +72,7 @@ Ending DataChannel::send(const ClientRequest& request, Deadline deadline) const 
                              .serviceLength = static_cast<std::uint32_t>(request.service.size()),
                              .bodyLength = request.message.size(),
                              .command = request.command};
+  // Three pieces and one call: the message, which may be large, is copied by the kernel alone.
   Pieces pieces{pieceOf(&header, sizeof header),
                 pieceOf(request.service.data(), request.service.size()),
                 pieceOf(request.message.data(), request.message.size())};
@@ -112,6 +117,7 @@ Ending DataChannel::receive(std::uint64_t allowance, Deadline deadline, Received
       return e;
     }
     std::memcpy(&header, &reply.buffer[at], sizeof header);
+    // Before the length is used for anything.
     if (!isHonest(header, reply.log.size(), allowance)) return Ending::violation;
     at += sizeof header;
     if (const Ending e = await(at + header.bodyLength, deadline, reply); e != Ending::answered) {
@@ -122,6 +128,7 @@ Ending DataChannel::receive(std::uint64_t allowance, Deadline deadline, Received
     reply.length = header.bodyLength;
     at += header.bodyLength;
     if (header.kind != ReplyKind::log) {
+      // What lies behind the answer would be taken for the beginning of the next one.
       return filled_ == at ? Ending::answered : Ending::violation;
     }
     const Bytes line = reply.body();

@@ -19,7 +19,8 @@
 
 namespace Keelgate {
 
-/// A message on its way. Everything is borrowed for the time of the call.
+/// A message on its way. Everything is borrowed for the time of the call. The lengths have been
+/// checked against the client's limits.
 struct ClientRequest {
   /// recordNumber<Record> of the record that is asked for.
   std::uint16_t record;
@@ -31,6 +32,7 @@ struct ClientRequest {
 /// The bytes of a reply, not decoded.
 struct ReceivedReply {
   Transport::ReplyKind kind{};
+  /// All that has arrived, headers and log lines too; the body is a part of it, and no copy.
   Data buffer;
   std::size_t offset = 0;
   std::size_t length = 0;
@@ -57,10 +59,13 @@ enum class Ending {
 /// and a record of 156 absent fields takes some 200 bytes; a value that is shared within a message
 /// may grow 64-fold. The base: short messages may share values up to a MiB in all, and an error
 /// repeats the service identifier and a path.
+///
+/// Without a bound a taken-over worker could have the client gather a reply until the machine's
+/// memory is used up.
 constexpr std::uint64_t replyBase = std::uint64_t{2} << 20;
 constexpr std::uint64_t replyFactor = 128;
 
-/// One thread at a time.
+/// One thread at a time. After any Ending but `answered` the channel is of no more use.
 class DataChannel {
  public:
   explicit DataChannel(Descriptor own) noexcept : channel_(std::move(own)) {}
@@ -74,6 +79,7 @@ class DataChannel {
   Ending exchange(const ClientRequest& request, Deadline deadline, ReceivedReply& reply);
 
  private:
+  /// Header, service identifier, message.
   using Pieces = std::array<iovec, 3>;
 
   Ending send(const ClientRequest& request, Deadline deadline) const;
@@ -84,7 +90,8 @@ class DataChannel {
                               std::uint64_t allowance) const noexcept;
 
   Descriptor channel_;
-  /// Of the next request.
+  /// Of the next request. A reply that repeats it cannot be one that was prepared for an earlier
+  /// request.
   std::uint32_t sequence_ = 0;
   /// How far the reply's buffer is filled.
   std::size_t filled_ = 0;

@@ -23,6 +23,7 @@ short waitFor(int descriptor, short events, Deadline deadline) noexcept {
     const nanoseconds left = std::max(nanoseconds(0), nanoseconds(deadline - Clock::now()));
     const timespec timeout{.tv_sec = left.count() / 1'000'000'000,
                            .tv_nsec = left.count() % 1'000'000'000};
+    // Nanoseconds: poll's milliseconds would end a wait early or late by up to one of them.
     const int ready = ppoll(&entry, 1, &timeout, nullptr);
     if (ready > 0) return entry.revents;
     if (ready == 0) return 0;

@@ -1,5 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 /// Points in time that calls end at, and the one way to wait for a descriptor.
+///
+/// Pure functions of the clock; callable from any thread. The clock is the steady one: who sets the
+/// machine's time neither ends a call early nor keeps it waiting.
 #pragma once
 
 #include <chrono>

@@ -13,6 +13,8 @@ DescriptorBook::DescriptorBook(std::size_t capacity) : entries_(capacity) {
   for (std::atomic<int>& entry : entries_) entry = none;
 }
 
+// Looked at before it is tried: the first entries are taken as a rule, and a failed exchange is
+// dear.
 std::atomic<int>* DescriptorBook::enter(int descriptor) noexcept {
   for (std::atomic<int>& entry : entries_) {
     int expected = none;
@@ -26,6 +28,7 @@ std::atomic<int>* DescriptorBook::enter(int descriptor) noexcept {
 
 void DescriptorBook::closeAll() noexcept {
   for (std::atomic<int>& entry : entries_) {
+    // Exchanged, so that each is closed once even if two threads of the child do this.
     if (const int descriptor = entry.exchange(none); descriptor != none) ::close(descriptor);
   }
 }

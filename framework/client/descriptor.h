@@ -27,6 +27,7 @@ class DescriptorBook {
   friend class Descriptor;
   std::atomic<int>* enter(int descriptor) noexcept;
 
+  /// Its size never changes. -1 where nothing is entered.
   std::vector<std::atomic<int>> entries_;
 };
 
@@ -46,11 +47,13 @@ class Descriptor {
   }
   ~Descriptor() { close(); }
 
+  /// Does nothing where there is none.
   void close() noexcept;
   [[nodiscard]] int get() const noexcept { return descriptor_; }
   explicit operator bool() const noexcept { return descriptor_ >= 0; }
 
  private:
+  /// Entry and descriptor go together: none has one without the other, but for a full book.
   int descriptor_ = -1;
   std::atomic<int>* entry_ = nullptr;
 };

@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
+/// The client spawns and never forks: a fork would copy the page tables of the whole application,
+/// however large, and run in a copy of it whose locks nobody will release.
 #include "framework/client/launch.h"
 
 #include "framework/transport/frames.h"
@@ -31,6 +33,7 @@ String errorText(int error) {
   throw StartFailure(what + ": " + errorText(error), true);
 }
 
+/// Empty where /proc is not mounted: then the folder that was configured is left.
 String ownFolder() {
   std::array<char, 4096> path;
   const ssize_t n = readlink("/proc/self/exe", path.data(), path.size());
@@ -61,10 +64,12 @@ class SpawnPlan {
  public:
   explicit SpawnPlan(int control) {
     posix_spawn_file_actions_init(&actions_);
+    // Also where it is 3 already: the duplicate is the one that stays open across the execution.
     posix_spawn_file_actions_adddup2(&actions_, control, Transport::serviceDescriptor);
     for (int fd = 0; fd < Transport::serviceDescriptor; ++fd) {
       posix_spawn_file_actions_addclose(&actions_, fd);
     }
+    // Whatever the application forgot to mark: an open file would be a way out of the sandbox.
     posix_spawn_file_actions_addclosefrom_np(&actions_, Transport::serviceDescriptor + 1);
     posix_spawnattr_init(&attributes_);
     sigset_t signals;
@@ -86,10 +91,12 @@ class SpawnPlan {
   pid_t run(const String& path) const {
     String name = path;
     char* const arguments[] = {name.data(), nullptr};
+    // Environments hold secrets, and variables that change what a program does.
     char* const environment[] = {nullptr};
     pid_t pid = -1;
     const int error =
         posix_spawn(&pid, path.c_str(), &actions_, &attributes_, arguments, environment);
+    // These pass with the load on the machine; the others don't.
     if (error == EAGAIN || error == ENOMEM) fail("The service could not be started", error);
     if (error != 0) {
       throw StartFailure("The service " + path + " could not be started: " + errorText(error) +
@@ -109,6 +116,7 @@ class SpawnPlan {
 ServiceHandles launchService(const String& path, DescriptorBook& book) {
   const String program = path.empty() ? findService() : path;
   int ends[2];
+  // Packets keep their bounds: nobody can leave half a frame in the way of the next.
   if (socketpair(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0, ends) != 0) {
     fail("No channel for the service could be made", errno);
   }
@@ -136,6 +144,7 @@ ServiceHandles connectService(const String& socket, DescriptorBook& book, Deadli
   if (socket.size() >= sizeof address.sun_path) {
     throw StartFailure("The socket's path is longer than the system allows: " + socket, false);
   }
+  // The rest of the field is zero and ends the path.
   std::memcpy(address.sun_path, socket.data(), socket.size());
   Descriptor control(book, ::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0));
   if (!control) fail("No channel for the service could be made", errno);

@@ -1,5 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 /// Where a service comes from: a process of our own, or the socket of an activated one.
+///
+/// A launcher is looked after by its pidfd and never by its number, which the kernel may give to
+/// another process as soon as somebody has waited for this one.
 #pragma once
 
 #include "framework/client/deadline.h"
@@ -25,6 +28,7 @@ class StartFailure : public std::exception {
 
 /// The client's ends of a service.
 struct ServiceHandles {
+  /// SOCK_SEQPACKET; its end is the service's end.
   Descriptor control;
   /// The pidfd of the launcher; none for an activated service.
   Descriptor launcher;
@@ -32,7 +36,8 @@ struct ServiceHandles {
 
 /// Starts the program, or where `path` is empty the VespKeelgateService beside the running program
 /// or in the installed libexec folder. It gets an empty environment, its own session and nothing
-/// but descriptor 3. Throws StartFailure. Callable from any thread.
+/// but descriptor 3. Throws StartFailure. Callable from any thread. Not waited for: whether it
+/// works is for the handshake to tell.
 ServiceHandles launchService(const String& path, DescriptorBook& book);
 
 /// By pidfd, so that no other process can be meant.
@@ -41,7 +46,8 @@ void killLauncher(const Descriptor& launcher) noexcept;
 /// told the kernel that nobody will.
 void reapLauncher(const Descriptor& launcher) noexcept;
 
-/// Connects to an activated service. Throws StartFailure. Callable from any thread.
+/// Connects to an activated service. Throws StartFailure. Callable from any thread. Waits at most
+/// until the deadline for the listener to take the connection.
 ServiceHandles connectService(const String& socket, DescriptorBook& book, Deadline deadline);
 
 }  // namespace Keelgate

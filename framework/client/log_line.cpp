@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
+/// What a stranger may have written, on its way to somebody's terminal. Pure but for the last
+/// function; callable from any thread.
 #include "framework/client/log_line.h"
 
 #include "framework/transport/wire.h"
@@ -56,6 +58,7 @@ void logLine(const LogSink& sink, std::string_view line) {
     sink(line);
     return;
   }
+  // One write for the whole line keeps lines of several threads apart.
   const String text = String(line) + '\n';
   // There is nobody to tell that standard error is closed.
   static_cast<void>(!write(STDERR_FILENO, text.data(), text.size()));

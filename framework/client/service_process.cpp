@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
+/// The zygote never reads a message, so it is believed more than a worker is, but not blindly: a
+/// frame that it should not have sent makes the service a lost one.
 #include "framework/client/service_process.h"
 
 #include "framework/client/control_frames.h"
@@ -22,6 +24,7 @@ using Transport::ControlKind;
 namespace {
 
 #ifndef KEELGATE_UNSEALED
+/// What a sealed service always reports; anything less is not the program that was meant.
 constexpr std::uint64_t firstWalls = [] {
   std::uint64_t walls = 0;
   for (std::size_t i = 0; i < Transport::firstWalls; ++i) walls |= Transport::namedLayers[i].layer;
@@ -51,6 +54,7 @@ ServiceProcess::~ServiceProcess() {
 
 void ServiceProcess::shakeHands(const ServiceSettings& settings, Deadline deadline) {
   ControlFrame hello = makeFrame(ControlKind::hello, 0);
+  // Said once and for all workers: what bounds a worker is fixed before any message is known.
   hello.numbers[0] = settings.messagesPerWorker;
   hello.numbers[1] = settings.cpuSecondsPerWorker;
   ControlFrame answer;
@@ -99,11 +103,13 @@ Optional<ServiceProcess::Forked> ServiceProcess::fork(std::uint64_t longestMessa
         true);
   }
   Descriptor ours(book_, ends[0]);
+  // In the book as well: a copy in a forked child would keep the worker's channel open.
   const Descriptor theirs(book_, ends[1]);
   const Optional<std::uint32_t> slot = claimSlot();
   if (!slot) return std::nullopt;
   ControlFrame frame = makeFrame(ControlKind::fork, *slot);
   frame.numbers[0] = longestMessage;
+  // A zygote that takes no frame for so long forks for nobody else either.
   if (!sendFrame(handles_.control.get(), frame, theirs.get(), deadline)) {
     lose();
     return std::nullopt;
@@ -125,6 +131,7 @@ Optional<std::uint32_t> ServiceProcess::claimSlot() {
     readUntil(lock, deadlineAfter(killPatience), [&] { return free() != slots_.end(); });
   }
   const auto slot = free();
+  // Not even a kill gave one back: the zygote does nothing any more.
   if (slot == slots_.end()) destroy();
   if (isLost()) return std::nullopt;
   *slot = Slot{.phase = Slot::Phase::running};
@@ -164,6 +171,8 @@ void ServiceProcess::collect() noexcept {
   if (!reading_) readAll();
 }
 
+// The first thread that finds nobody reading reads for all; when it has what it came for, it wakes
+// the others, and one of them takes its place.
 template <class Condition>
 void ServiceProcess::readUntil(Lock& lock, Deadline deadline, Condition condition) {
   if (!reading_) readAll();
@@ -198,6 +207,7 @@ void ServiceProcess::readAll() noexcept {
 }
 
 void ServiceProcess::noteExit(const ControlFrame& frame) noexcept {
+  // The slot comes from outside and is a number to be checked like any other.
   const bool known = frame.kind == ControlKind::exit && frame.slot < slots_.size();
   Slot none;
   Slot& slot = known ? slots_[frame.slot] : none;
@@ -208,8 +218,11 @@ void ServiceProcess::noteExit(const ControlFrame& frame) noexcept {
   slot.status = static_cast<int>(frame.numbers[0]);
   slot.phase = slot.phase == Slot::Phase::released ? Slot::Phase::free : Slot::Phase::ended;
   const int signal = WIFSIGNALED(slot.status) ? WTERMSIG(slot.status) : 0;
+  // Ending for want of processor time, or by our own hand, shows nothing of the address layout. Any
+  // other signal may be somebody's miss, and the next try must not meet the same layout.
   const bool expected = signal == 0 || signal == SIGXCPU || (signal == SIGKILL && slot.killed);
   State running = State::running;
+  // Exchanged: a lost service stays lost.
   if (!expected) state_.compare_exchange_strong(running, State::retired);
 }
 
@@ -224,6 +237,7 @@ void ServiceProcess::destroy() noexcept {
   shutdown(handles_.control.get(), SHUT_RDWR);
 }
 
+// The zygote ends when its channel does, and its workers with it; the launcher is last.
 void ServiceProcess::end(milliseconds patience) noexcept {
   if (!handles_.control) return;
   lose();

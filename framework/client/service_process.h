@@ -29,6 +29,7 @@ struct ServiceSettings {
   std::uint64_t messagesPerWorker;
   std::uint64_t cpuSecondsPerWorker;
   /// How many workers may be alive at a time, those included that have answered and not yet ended.
+  /// It bounds the processes that a client has on the machine.
   std::size_t maximumWorkers;
 };
 
@@ -53,6 +54,7 @@ class ServiceProcess {
   /// SIGKILL for the worker, if it still runs.
   void kill(std::uint32_t slot) noexcept;
   /// How the worker ended, as wait status; nothing when the service is lost or it takes too long.
+  /// The caller has had a worker on the slot and has not released it.
   Optional<int> awaitExit(std::uint32_t slot, Deadline deadline);
   /// Nobody will ask for this slot again.
   void release(std::uint32_t slot) noexcept;
@@ -65,7 +67,8 @@ class ServiceProcess {
   [[nodiscard]] bool isUsable() const noexcept { return state_ == State::running; }
   [[nodiscard]] bool isLost() const noexcept { return state_ == State::lost; }
 
-  /// SIGKILL for all of it.
+  /// SIGKILL for all of it. For a service that does not do what it is told. Whoever waits for news
+  /// of it is woken.
   void destroy() noexcept;
   /// Closes the channel, waits for the end so long, and then uses SIGKILL.
   void end(std::chrono::milliseconds patience) noexcept;
@@ -74,10 +77,14 @@ class ServiceProcess {
   [[nodiscard]] std::uint64_t layers() const noexcept { return layers_; }
 
  private:
+  /// It only ever moves to the right. A retired service finishes what it has.
   enum class State { running, retired, lost };
   struct Slot {
+    /// `released`: nobody asks any more, and it has not ended; `ended`: the other way round. Only
+    /// when both have happened is the slot free, so that no exit can be taken for another worker's.
     enum class Phase { free, running, released, ended };
     Phase phase = Phase::free;
+    /// By us: then a death by SIGKILL says nothing of the message.
     bool killed = false;
     int status = 0;
   };
@@ -87,6 +94,8 @@ class ServiceProcess {
   [[noreturn]] static void failToStart(bool late);
   Optional<std::uint32_t> claimSlot();
   void killSlot(std::uint32_t slot) noexcept;
+  /// Until the condition holds, the service is lost or the deadline has passed; the lock is given
+  /// up meanwhile.
   template <class Condition>
   void readUntil(Lock& lock, Deadline deadline, Condition condition);
   void readAll() noexcept;
@@ -94,11 +103,13 @@ class ServiceProcess {
   void lose() noexcept;
 
   DescriptorBook& book_;
+  /// Constant between construction and end().
   ServiceHandles handles_;
   std::uint64_t layers_ = 0;
   std::atomic<State> state_ = State::running;
 
   std::mutex mutex_;
+  /// Somebody has read the channel, or stopped reading it.
   std::condition_variable news_;
   /// Whether a thread polls the channel for all.
   bool reading_ = false;

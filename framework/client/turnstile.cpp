@@ -12,6 +12,7 @@ bool Turnstile::enter(Deadline deadline) {
   Waiter self;
   waiting_.push_back(&self);
   const bool admitted = self.called.wait_until(lock, deadline, [&] { return self.admitted; });
+  // Under the lock still, so nobody can admit a waiter that has gone.
   if (!admitted) std::erase(waiting_, &self);
   return admitted;
 }

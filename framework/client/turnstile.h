@@ -17,11 +17,14 @@ class Turnstile {
  public:
   explicit Turnstile(std::size_t places) : free_(places) {}
 
-  /// Whether a place came free before the deadline.
+  /// Whether a place came free before the deadline. Throws std::bad_alloc. Whoever entered leaves,
+  /// exactly once.
   bool enter(Deadline deadline);
   void leave() noexcept;
 
  private:
+  /// On the stack of the thread that waits. One condition each: a shared one would wake all for one
+  /// place.
   struct Waiter {
     std::condition_variable called;
     bool admitted = false;

@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+/// What became of a worker, as the reasons that the application is given.
 #include "framework/client/worker.h"
 
 #include <sys/wait.h>
@@ -16,6 +17,8 @@ namespace {
 /// The zygote tells of a death at once; on a machine that swaps, somewhat later.
 constexpr milliseconds exitPatience{500};
 
+/// An exit status is the worker's own word, and one that was taken over may choose it: what it can
+/// claim so is one of the host's errors, for the message that it was sent.
 HostError explain(int status) {
   if (WIFEXITED(status) && WEXITSTATUS(status) == Transport::resourceExitStatus) {
     return {Reason::resourcesExhausted, ""};
@@ -25,6 +28,7 @@ HostError explain(int status) {
             "it ended with status " + std::to_string(WEXITSTATUS(status)) + " and no answer"};
   }
   const int signal = WTERMSIG(status);
+  // The kernel's limit, which stands behind the deadline: we were stopped ourselves.
   if (signal == SIGXCPU) return {Reason::timedOut, "it used up its processor time"};
   return {Reason::crashed, "signal " + std::to_string(signal) + " (" + strsignal(signal) + ")"};
 }

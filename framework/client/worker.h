@@ -1,5 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 /// One worker of a service, owned.
+///
+/// It keeps its service alive: a service that has been replaced ends with the last worker of it
+/// that somebody still waits for.
 #pragma once
 
 #include "framework/client/data_channel.h"
@@ -22,6 +25,7 @@ class Worker {
 
   /// Gives the message to the worker. The reply, or what became of the worker: its death is
   /// explained by its wait status, and one that is late or lies is killed. Throws std::bad_alloc.
+  /// After an error it must be dropped.
   Optional<HostError> exchange(const ClientRequest& request, Deadline deadline,
                                ReceivedReply& reply);
 
@@ -40,6 +44,7 @@ class Worker {
   std::uint32_t slot_;
   DataChannel channel_;
   std::uint64_t served_ = 0;
+  /// Set when it may be left to end by itself.
   bool finished_ = false;
 };
 

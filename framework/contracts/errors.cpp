@@ -1,10 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
+/// The sentences of the errors. They are made where the error is thrown and again where it is
+/// thrown anew, so that they need not travel.
 #include <keelgate/errors.h>
 
 namespace Keelgate {
 
 namespace {
 
+/// For people, so a key with a dot in it is not told from two keys.
 String pathText(const Array<CodingKey>& path) {
   if (path.empty()) return {};
   String text = " (at ";
@@ -31,6 +34,7 @@ const char* reasonText(HostError::Reason reason) {
     case HostError::Reason::startFailed:
       return "the service could not be started";
   }
+  // A reason that is none of them, which only a cast can make.
   return "the host gave up";
 }
 

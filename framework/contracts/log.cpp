@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+/// Where lines of the log go: to the thread's innermost capture, or to standard error.
 #include "framework/contracts/log.h"
 
 #include <cstdio>
@@ -6,8 +7,9 @@
 namespace Keelgate {
 
 namespace {
+/// Of each thread: what one message logs never stands in the reply to another.
 thread_local LogCapture* innermost = nullptr;
-}
+}  // namespace
 
 LogCapture::LogCapture() : outer_(innermost) {
   innermost = this;
@@ -20,6 +22,7 @@ LogCapture::~LogCapture() {
 // NOLINTNEXTLINE(readability-convert-member-functions-to-static)
 void LogHandle::error(std::string_view format, std::string_view argument) const {
   String line(format);
+  // Put in as it is and once: a "%@" in the argument is text.
   if (const std::size_t at = line.find("%@"); at != String::npos) line.replace(at, 2, argument);
   if (innermost != nullptr) {
     innermost->lines.push_back(std::move(line));

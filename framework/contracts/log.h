@@ -11,7 +11,8 @@
 namespace Keelgate {
 
 /// A handle logs from any thread. A line goes to the capture of the calling thread, or to standard
-/// error where there is none.
+/// error where there is none. There is one level, because a service that decodes strangers'
+/// messages has nothing to say but that one was refused.
 class LogHandle {
  public:
   /// At error level. `format` holds "%@" once, which `argument` takes the place of.
@@ -19,11 +20,13 @@ class LogHandle {
 };
 
 namespace Log {
+/// The handle of the framework; no other is made.
 inline constexpr LogHandle keelgate;
-}
+}  // namespace Log
 
 /// Takes the lines that are logged on this thread for as long as it lives: a sealed worker has no
-/// standard error, so that its lines travel with its reply.
+/// standard error, so that its lines travel with its reply. Captures nest: the innermost takes the
+/// lines. Made and destroyed on one thread, last one first.
 class LogCapture {
  public:
   LogCapture();
@@ -31,6 +34,7 @@ class LogCapture {
   LogCapture(const LogCapture&) = delete;
   LogCapture& operator=(const LogCapture&) = delete;
 
+  /// In the order of logging. As many as were logged; the sender of the reply bounds them.
   Array<String> lines;
 
  private:

@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+/// The process-wide switches. Atomic, because they may be asked from any thread once it serves.
 #include "framework/contracts/process.h"
 
 #include <atomic>
@@ -12,6 +13,8 @@ std::atomic<bool> readOnly = false;
 }  // namespace
 
 void register_for_dlsym_callbacks() noexcept {
+  // A trap and not abort(), which sends a signal by system calls that a sealed worker does not
+  // have: it would die of the filter, and its wait status would name the wrong cause.
   std::set_terminate([] { __builtin_trap(); });
 }
 

@@ -9,12 +9,15 @@
 
 namespace Keelgate {
 
+/// For a kind of message that is known by the record that is asked for.
 template <class U>
 concept MessageUnpacker = requires(const U& unpacker, Bytes from) {
   typename U::SchemaType;
   { unpacker.unpack(from) } -> std::same_as<typename U::SchemaType>;
 };
 
+/// For a kind of message that is told by what it arrived with. `from` and `with` are borrowed for
+/// the time of the call.
 template <class U>
 concept ContextualUnpacker = requires(const U& unpacker, Bytes from,
                                       const typename U::Context& with) {

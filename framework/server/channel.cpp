@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
+/// Control frames come from the client, which is trusted, yet anything but an exact frame is fatal:
+/// the zygote is the one process whose state every worker inherits.
 #include "framework/server/channel.h"
 
 #include "framework/sandbox/refusal.h"
@@ -83,6 +85,7 @@ void endControl(const ControlFrame& last) {
 
 bool receiveAll(std::span<std::byte> bytes) {
   while (!bytes.empty()) {
+    // read and write, and not recv and send: these two are all that the filter leaves a worker.
     const ssize_t got = read(serviceDescriptor, bytes.data(), bytes.size());
     if (got <= 0) return false;
     bytes = bytes.subspan(static_cast<std::size_t>(got));

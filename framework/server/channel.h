@@ -19,7 +19,8 @@ struct ReceivedControl {
 };
 
 /// The next control frame, or nothing when the client has gone. Throws Sandbox::Refusal for a
-/// packet that is no frame of this protocol.
+/// packet that is no frame of this protocol. Of `kind` it checks only that a fork brings a
+/// descriptor and nothing else does.
 Optional<ReceivedControl> receiveControl();
 
 /// Sends a frame; the magic number and version are filled in. A client that has gone is no error:
@@ -29,7 +30,8 @@ void sendControl(Transport::ControlFrame frame);
 /// Sends a last frame. The caller exits then.
 void endControl(const Transport::ControlFrame& last);
 
-/// Fills `bytes` from the data channel. False at its end.
+/// Fills `bytes` from the data channel. False at its end. An error is an end too: a process with
+/// three system calls has nothing to do about it.
 bool receiveAll(std::span<std::byte> bytes);
 
 /// Writes all of `bytes` to the data channel. False when the client has gone.

@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+/// Registration and the one place where errors of a message are caught. Out here they are bytes.
 #include "framework/server/keelgate_server.h"
 
 #include "framework/contracts/log.h"
@@ -21,10 +22,12 @@ void KeelgateServer::add(std::size_t record, Handler handler) {
 }
 
 Reply KeelgateServer::answer(const Request& request) const {
+  // Outside the try, so that what was logged before an error travels with it.
   LogCapture capture;
   Reply reply{.kind = ReplyKind::error, .body = {}, .log = {}};
   try {
     if (request.record >= handlers_.size() || !handlers_[request.record]) {
+      // The number comes from the client, of which another build may know more records.
       throw Breach("com.tessen.Keelgate.KeelgateServer", "No unpacker for the record");
     }
     reply.body = handlers_[request.record](request);
@@ -36,6 +39,8 @@ Reply KeelgateServer::answer(const Request& request) const {
   } catch (const VespClientMessageUnpackingError& error) {
     reply.body = Transport::encodeError(error);
   }
+  // Anything else that is thrown is a defect of the program, or an end of memory: no reply hides
+  // it.
   reply.log = std::move(capture.lines);
   return reply;
 }

@@ -35,9 +35,10 @@ struct Reply {
   Array<String> log;
 };
 
+/// It knows records and no formats: what a message is, is the unpackers' business.
 class KeelgateServer {
  public:
-  /// The shared server of this process.
+  /// The shared server of this process. Made at its first use.
   static KeelgateServer& service();
 
   /// Registers the unpacker for the record that it gives, which no other may be registered for.
@@ -59,7 +60,7 @@ class KeelgateServer {
   }
 
   /// Serves under this identifier until the channel closes. Without one there is no sandbox to
-  /// serve in, and it returns at once.
+  /// serve in, and it returns at once. With one it does not return: the process exits in it.
   void resume(Optional<SandboxID> sandboxID);
 
   /// Unpacks one message. Errors of the message are in the reply; std::bad_alloc comes through. A
@@ -71,6 +72,7 @@ class KeelgateServer {
 
   void add(std::size_t record, Handler handler);
 
+  /// By the number of the record; empty where nobody is registered.
   std::array<Handler, OutputRecords::size> handlers_;
 };
 

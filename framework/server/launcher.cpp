@@ -32,6 +32,8 @@ void resetSignals() {
   sigprocmask(SIG_SETMASK, &none, nullptr);
 }
 
+/// A shell that starts the service by hand has no packet socket there. Without this check it would
+/// wait for ever, or read from somebody's file.
 bool startedByClient() {
   int type = 0;
   socklen_t size = sizeof type;
@@ -39,6 +41,7 @@ bool startedByClient() {
          type == SOCK_SEQPACKET;
 }
 
+/// The client shows the reason as a sentence with what to do about it, so it must arrive.
 [[noreturn]] void refuse(const Refusal& why) {
   endControl({.magic = {},
               .version = {},
@@ -94,6 +97,7 @@ std::uint32_t giveLayers(const Sandbox::Birth& birth, bool groupsLeft) {
 
 [[noreturn]] void launch(const KeelgateServer& server) try {
   resetSignals();
+  // Before anything is made: what the one who starts us left open must not reach a worker.
   Sandbox::keepOnly(Transport::serviceDescriptor);
   const bool groupsLeft = Sandbox::leaveGroups();
   const Tether tether = makeTether();

@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
+/// From a fork to its exit: seal, then header, body, answer for each message. There is no other
+/// state, and no way back into the zygote.
 #include "framework/server/worker.h"
 
 #include "framework/sandbox/refusal.h"
@@ -26,6 +28,8 @@ RequestHeader receiveHeader(const WorkerOptions& options, std::uint32_t sequence
   if (!receiveAll(std::as_writable_bytes(std::span(&header, 1)))) _exit(0);
   if (header.magic != Transport::magic || header.version != Transport::protocolVersion ||
       header.sequence != sequence || header.serviceLength > Transport::maximumServiceLength ||
+      // The heap was fixed for messages up to that length; a longer one would end for want of
+      // memory.
       header.bodyLength > options.longestMessage) {
     _exit(Transport::protocolExitStatus);
   }
@@ -48,6 +52,7 @@ void append(Data& frames, std::uint32_t sequence, ReplyKind kind, Bytes body) {
 Data frame(const Reply& reply, std::uint32_t sequence) {
   Data frames;
   std::size_t lines = 0;
+  // Cut here so that an honest worker keeps within what its client will take.
   for (const String& line : reply.log) {
     if (++lines > Transport::maximumLogFrames) break;
     append(
@@ -62,6 +67,7 @@ Data frame(const Reply& reply, std::uint32_t sequence) {
 /// From the first byte of the body on, this is the part that a stranger may take over.
 void answer(const KeelgateServer& server, const RequestHeader& header) {
   const std::size_t size = header.serviceLength + header.bodyLength;
+  // One piece for both, so one allocation and one read; not zeroed, because it is filled at once.
   const auto bytes = std::make_unique_for_overwrite<std::byte[]>(size);
   if (!receiveAll({bytes.get(), size})) _exit(0);
   const Reply reply = server.answer(

@@ -11,11 +11,15 @@
 
 namespace Keelgate {
 
-/// What a worker is told: by the client's hello and its fork, and by the zygote.
+/// What a worker is told: by the client's hello and its fork, and by the zygote. Filled in by the
+/// zygote and inherited by the fork, so a worker asks nobody for anything.
 struct WorkerOptions {
+  /// How many it may be given before it exits.
   std::uint64_t messages;
   std::uint64_t cpuSeconds;
+  /// The zygote, as it sees itself: a worker whose parent is another has lost it already.
   pid_t parent;
+  /// Built and tried by the zygote; loading it is all that is left to do.
   std::vector<sock_filter> filter;
   /// Bytes.
   std::uint64_t longestMessage;

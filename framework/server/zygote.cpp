@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+/// One loop over three descriptors: the client's frames, the workers' deaths, the launcher's.
 #include "framework/server/zygote.h"
 
 #include "framework/sandbox/refusal.h"
@@ -45,6 +46,7 @@ ControlFrame exitFrame(std::uint32_t slot, int status, const rusage& used) {
           .slot = slot,
           .reserved = 0,
           .numbers = {static_cast<std::uint64_t>(status),
+                      // The kernel counts in KiB.
                       static_cast<std::uint64_t>(used.ru_maxrss) * 1024,
                       microseconds(used.ru_utime) + microseconds(used.ru_stime), 0}};
 }
@@ -54,6 +56,8 @@ ControlFrame exitFrame(std::uint32_t slot, int status, const rusage& used) {
 void Zygote::serve() {
   const int deaths = openDeathSignals();
   options_.parent = getpid();
+  // Sealed before the first frame is read, though the client is trusted: whoever stands at the
+  // other end of an activated socket is whoever may connect to it.
   Sandbox::ZygoteSeal seal = Sandbox::sealZygote(given_);
   options_.filter = std::move(seal.workerFilter);
   greet(seal.layers, seal.landlockAbi);
@@ -105,13 +109,16 @@ bool Zygote::takeFrame() {
 void Zygote::fork(std::uint32_t slot, int channel) {
   const bool taken = std::any_of(children_.begin(), children_.end(),
                                  [slot](const Child& child) { return child.slot == slot; });
+  // Two workers on one slot: an exit could be told of the wrong one.
   if (taken) throw Refusal(Obstacle::badFrame, 0);
   const pid_t process = Sandbox::forkSelf(0);
+  // What was forked never comes back here.
   if (process == 0) work(server_, options_, channel);
   close(channel);
   if (process > 0) {
     children_.push_back({.slot = slot, .process = process});
   } else {
+    // Every fork gets its exit, also one that came to nothing: nobody waits for a worker in vain.
     sendControl(exitFrame(slot, W_EXITCODE(Transport::resourceExitStatus, 0), rusage{}));
   }
 }
@@ -131,6 +138,7 @@ void Zygote::reap() {
     if (process <= 0) return;
     const auto child = std::find_if(children_.begin(), children_.end(),
                                     [process](const Child& c) { return c.process == process; });
+    // The first process of a namespace inherits its orphans; nobody asked for those.
     if (child == children_.end()) continue;
     sendControl(exitFrame(child->slot, status, used));
     children_.erase(child);

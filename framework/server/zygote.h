@@ -12,6 +12,8 @@
 
 namespace Keelgate {
 
+/// For one thread, and for the only one of its process: a fork copies no other, and what another
+/// held locked would stay locked in every worker.
 class Zygote {
  public:
   /// `tether` hangs up when the launcher dies. `given` are the layers (Transport::Layer) that the
@@ -25,6 +27,7 @@ class Zygote {
   void serve();
 
  private:
+  /// Until it is reaped: its number cannot be another's before that.
   struct Child {
     std::uint32_t slot;
     pid_t process;
@@ -35,11 +38,13 @@ class Zygote {
   bool takeFrame();
   void fork(std::uint32_t slot, int channel);
   void kill(std::uint32_t slot) const;
+  /// Tells the client of every worker that has ended.
   void reap();
 
   const KeelgateServer& server_;
   int tether_;
   std::uint32_t given_;
+  /// What the next worker is forked with.
   WorkerOptions options_{};
   std::vector<Child> children_;
 };

@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+/// An error travels as its kind and its fields; the sentence is made anew on the other side.
 #include "framework/transport/error_coding.h"
 
 #include "framework/transport/wire.h"
@@ -9,6 +10,8 @@ using VespKeelgateService::VespClientMessageUnpackingError;
 
 namespace {
 
+/// Deliberate: the host's own error is none of them. What failed in the host is not for a worker to
+/// say, least of all for one that was taken over.
 enum class ErrorKind : std::uint8_t { decoding, breach, unpacking };
 
 /// A path leads through at most 512 nested containers, one step for each.
@@ -39,6 +42,7 @@ DecodingError readDecodingError(Reader& from) {
   const std::uint8_t kind = from.byte();
   if (kind > static_cast<std::uint8_t>(DecodingError::Kind::dataCorrupted)) throw MalformedReply();
   Optional<String> key = readOptional(from);
+  // A key that is missing is named, and nothing else is.
   if (key.has_value() != (DecodingError::Kind{kind} == DecodingError::Kind::keyNotFound)) {
     throw MalformedReply();
   }
@@ -59,6 +63,7 @@ VespClientMessageUnpackingError readUnpackingError(Reader& from) {
   if (from.flag()) {
     return VespClientMessageUnpackingError::noUnpackerForService(String(from.text()));
   }
+  // An unknown number has no place in the error, whatever the other side says.
   const Optional<CommandType> command = CommandType::fromRawValue(from.word());
   if (!command) throw MalformedReply();
   return VespClientMessageUnpackingError::unimplementedCommand(*command);
@@ -66,6 +71,7 @@ VespClientMessageUnpackingError readUnpackingError(Reader& from) {
 
 template <class E>
 [[noreturn]] void throwRead(Reader& from, E (*read)(Reader&)) {
+  // Read whole before it is thrown: bytes behind it make it no error.
   E error = read(from);
   from.end();
   throw error;

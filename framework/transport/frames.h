@@ -27,12 +27,15 @@
 
 namespace Keelgate::Transport {
 
+/// "KGAT". A frame that begins otherwise is no frame, and nothing of it is looked at.
 constexpr std::uint32_t magic = 0x4b47'4154;
+/// To be raised with any change of what travels: two builds that differ must refuse each other.
 constexpr std::uint16_t protocolVersion = 1;
 
 /// The channel's number in every process of the service.
 constexpr int serviceDescriptor = 3;
 
+/// From 1, here and below, so that a frame of zeros is none.
 enum class ControlKind : std::uint16_t { hello = 1, ready, fork, kill, exit, refused };
 
 /// The walls around a worker. layers.h names them.
@@ -72,7 +75,7 @@ enum class Obstacle : std::uint64_t {
   selfCheck,
 };
 
-/// `numbers` is named by the functions of the frames' own modules; what each kind carries:
+/// What stands in `numbers` for each kind, all others being 0:
 ///   hello: [0] messages per worker, [1] CPU seconds per worker
 ///   ready: [0] layers (Layer), [1] Landlock ABI
 ///   fork:  [0] length in bytes of the longest message that the worker will be given
@@ -87,6 +90,8 @@ struct ControlFrame {
   std::uint32_t reserved;
   std::uint64_t numbers[4];
 };
+// No padding in any of the three: they are sent as they lie in memory, and a gap would carry what
+// was there before.
 static_assert(sizeof(ControlFrame) == 48);
 
 struct RequestHeader {
@@ -96,12 +101,14 @@ struct RequestHeader {
   std::uint16_t record;
   /// Counts the requests of a worker from 0; the reply repeats it.
   std::uint32_t sequence;
+  /// In bytes; the identifier comes first behind the header, then the body.
   std::uint32_t serviceLength;
   std::uint64_t bodyLength;
   std::uint64_t command;
 };
 static_assert(sizeof(RequestHeader) == 32);
 
+/// Frames of `log` come first; one of the others is the last.
 enum class ReplyKind : std::uint16_t { log = 1, record, error };
 
 struct ReplyHeader {
@@ -126,7 +133,8 @@ constexpr std::size_t maximumServiceLength = std::size_t{64} * 1024;
 /// bytes. What is longer takes so long to read that the wait for a worker of its own is lost in it.
 constexpr std::uint64_t shortMessage = std::uint64_t{256} << 10;
 
-/// The exit status of a worker whose heap did not suffice.
+/// The exit status of a worker whose heap did not suffice. This and the next two are those that
+/// sysexits.h has for a passing failure, a breach of protocol and a lack of permission.
 constexpr int resourceExitStatus = 75;
 
 /// The exit status of a worker that was sent a frame which is not exactly right.

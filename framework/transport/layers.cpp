@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
+/// Every sentence says what to change, because whoever reads it has a machine in front of them
+/// where nothing starts.
 #include "framework/transport/layers.h"
 
 #include <span>
@@ -47,6 +49,7 @@ std::string_view explain(Obstacle obstacle) {
 
 std::string missingLayersLine(std::uint64_t layers) {
   std::string line;
+  // The first walls are not asked about: without one of them there is no service to report.
   for (const NamedLayer& row : std::span(namedLayers).subspan(firstWalls, secondWalls)) {
     if ((layers & row.layer) != 0) continue;
     line += line.empty() ? "Running without: " : ", ";

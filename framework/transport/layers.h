@@ -12,6 +12,7 @@
 
 namespace Keelgate::Transport {
 
+/// A layer, and what people call it. The texts live as long as the program.
 struct NamedLayer {
   Layer layer;
   std::string_view name;
@@ -40,6 +41,7 @@ inline constexpr std::array namedLayers{
     NamedLayer{layerNotRoot, "not the root user"},
     NamedLayer{layerNoSupplementaryGroups, "no supplementary groups"},
 };
+/// How many rows from the beginning; the second walls follow them.
 constexpr std::size_t firstWalls = 6;
 constexpr std::size_t secondWalls = 9;
 

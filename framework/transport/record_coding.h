@@ -4,6 +4,8 @@
 /// Written: integers and floating-point numbers as their 8 bytes, a boolean and the presence of an
 /// optional as a byte, text and octets behind their length, an array behind its count, an
 /// enumeration as its raw value, a case-keyed one as the case's position and then its record.
+///
+/// Pure functions; callable from any thread. Writing throws std::bad_alloc alone.
 #pragma once
 
 #include "framework/contracts/construct.h"
@@ -30,6 +32,7 @@ void write(Writer& to, const Optional<T>& value) {
   if (value) write(to, *value);
 }
 
+/// Behind its count, which the reader holds against the bytes that follow.
 template <class T>
 requires(isArray<Array<T>>) void write(Writer& to, const Array<T>& values) {
   to.word(values.size());
@@ -85,6 +88,7 @@ requires(isArray<Array<T>>) void read(Reader& from, Array<T>& values, int depth)
   }
 }
 
+/// The case that the byte names; a byte that names none is a lie.
 template <class T, std::size_t... i>
 void readCase(Reader& from, T& value, int depth, std::index_sequence<i...>) {
   const std::size_t which = from.byte();
@@ -109,12 +113,14 @@ void read(Reader& from, T& value, int depth) {
   } else if constexpr (std::integral<T>) {
     value = static_cast<T>(from.word());
   } else if constexpr (Enumeration<T>) {
+    // A number that is no case would run past the end of the first switch that meets it.
     const Optional<T> known = fromRawValue<T>(from.word());
     if (!known) throw MalformedReply();
     value = *known;
   } else if constexpr (std::same_as<T, Double>) {
     value = std::bit_cast<double>(from.word());
   } else if constexpr (std::same_as<T, Date>) {
+    // A date is finite by its own promise, which its reader may rely on.
     value.secondsSinceReferenceDate = std::bit_cast<double>(from.word());
     if (!std::isfinite(value.secondsSinceReferenceDate)) throw MalformedReply();
   } else if constexpr (std::same_as<T, UUID>) {
@@ -146,6 +152,7 @@ T decodeRecord(Bytes body) {
   Reader from(body);
   T record{};
   read(from, record, 0);
+  // Bytes behind the record: then it was not written by an honest service.
   from.end();
   return record;
 }

@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
+/// UTF-8, as strictly as it can be read. The host has its own check, apart from that of the
+/// program: it must not rely on anything that a taken-over worker did.
 #include "framework/transport/wire.h"
 
 namespace Keelgate::Transport {

@@ -3,6 +3,8 @@
 ///
 /// The reader faces a process that may be taken over. It accepts exactly one spelling of every
 /// value, checks before it allocates, and allocates only what bytes at hand justify.
+///
+/// Values; one thread at a time.
 #pragma once
 
 #include <keelgate/values.h>
@@ -20,6 +22,8 @@ class MalformedReply : public std::exception {
   [[nodiscard]] const char* what() const noexcept override { return "malformed reply"; }
 };
 
+/// Throws std::bad_alloc. Trusts its caller: it runs in the service, and the reader checks in the
+/// client what it wrote.
 class Writer {
  public:
   /// Room for most replies, in place of growing there byte by byte.
@@ -44,11 +48,14 @@ class Writer {
   Data out_;
 };
 
+/// Every function that takes something throws MalformedReply where there is not that much. Views
+/// that it gives point into the reply and live as long.
 class Reader {
  public:
   explicit Reader(Bytes reply) : rest_(reply) {}
 
   std::uint8_t byte() { return static_cast<std::uint8_t>(take(1)[0]); }
+  /// In the machine's order: both sides are on one machine.
   std::uint64_t word() {
     std::uint64_t value;
     std::memcpy(&value, take(sizeof value).data(), sizeof value);
@@ -64,7 +71,8 @@ class Reader {
   Bytes octets() { return take(word()); }
   /// The same, checked to be UTF-8.
   std::string_view text();
-  /// How many elements follow; each takes one byte at least.
+  /// How many elements follow; each takes one byte at least. So a count never makes more be set
+  /// aside than has arrived.
   std::size_t count() {
     const std::uint64_t value = word();
     if (value > rest_.size()) throw MalformedReply();
@@ -77,6 +85,7 @@ class Reader {
 
  private:
   Bytes take(std::uint64_t size) {
+    // Compared, not added to a position: no length that a liar announces can wrap.
     if (size > rest_.size()) throw MalformedReply();
     const Bytes taken = rest_.first(size);
     rest_ = rest_.subspan(size);
