@@ -59,8 +59,10 @@ class BinaryReader {
   LongKeys keys_;
   std::size_t offsetSize_ = 0;
   std::size_t tableStart_ = 0;
+  // What is left of the bytes that objects may claim.
   std::uint64_t claimable_ = 0;
   std::size_t depth_ = 0;
+  // 16 KiB, whatever the message nests: no recursion that a message could drive.
   std::array<Frame, Limits::nestedContainers> frames_;
 };
 
@@ -96,6 +98,8 @@ void BinaryReader::readTrailer() {
   const std::uint64_t table = trailer.bigEndian(8);
   const bool sizesFit = offsetSize_ >= 1 && offsetSize_ <= 8 && store_.referenceSize >= 1 &&
                         store_.referenceSize <= 8;
+  // Divided, because a product of two of these could wrap. What passes has no more objects than the
+  // message has bytes, so the numbers below fit 32 bits.
   if (!sizesFit || top >= objects || table < magic.size() || table > tableEnd ||
       objects > (tableEnd - table) / offsetSize_) {
     throw Damage(Problem::trailer, tableEnd);
@@ -117,6 +121,7 @@ void BinaryReader::follow(Frame& frame) {
   frame.next += store_.referenceSize;
 
   Node& node = store_.nodes[static_cast<std::size_t>(number)];
+  // Open is every container on the stack, and none beside.
   if (node.has(Node::open)) throw Damage(Problem::selfContaining, position);
   if (node.has(Node::done)) {
     node.set(Node::shared);
@@ -142,6 +147,7 @@ void BinaryReader::leave(const Frame& frame) {
 
 // Reads the object of this number, for the first time. A container becomes the innermost frame.
 void BinaryReader::enter(std::uint32_t number) {
+  // Inside the table, since the number is below the count that the table was checked for.
   const std::uint64_t offset =
       Cursor::bigEndianAt(store_.message, tableStart_ + number * offsetSize_, offsetSize_);
   if (offset < magic.size() || offset >= tableStart_) {
@@ -150,6 +156,7 @@ void BinaryReader::enter(std::uint32_t number) {
   Cursor object(store_.message, static_cast<std::size_t>(offset), tableStart_);
   Node& node = store_.nodes[number];
   const std::uint8_t marker = object.byte();
+  // A container takes it back until it is left.
   node.set(Node::done);
   readObject(node, number, object, marker);
 }
@@ -205,6 +212,7 @@ void BinaryReader::readSingleton(Node& node, std::uint8_t marker, std::size_t of
 
 void BinaryReader::readInteger(Node& node, Cursor& object, std::uint8_t width) {
   const std::size_t start = object.position();
+  // 1, 2, 4, 8 or 16 bytes. The narrow ones have no sign, 8 and 16 bytes do.
   if (width > 4) throw Damage(Problem::unknownMarker, start - 1);
   node.type = Type::integer;
   // Of 16 bytes the upper half may only repeat what the lower half says.
@@ -258,6 +266,7 @@ void BinaryReader::readUtf16(Node& node, Cursor& object, std::uint64_t units) {
   const std::size_t side = store_.side.size();
   store_.side.resize(side + 3 * static_cast<std::size_t>(units));
   const std::size_t length = utf8FromUtf16(bytes, store_.side.data() + side);
+  // Half a pair has no UTF-8, and whatever stood in for it could make two keys equal.
   if (length == failed) throw Damage(Problem::straySurrogate, start);
   if (length > Limits::messageLength) throw Damage(Problem::messageTooLarge, start);
   store_.side.resize(side + length);
@@ -282,6 +291,7 @@ void BinaryReader::openContainer(Node& node, Type type, Cursor& object, std::uin
   node.bits = start;
   node.count = static_cast<std::uint32_t>(count);
   node.flags = Node::open;
+  // Open until it is left: a reference to it from below closes a circle.
   frames_[depth_++] = {.number = number,
                        .highest = 0,
                        .next = start,
@@ -295,6 +305,7 @@ std::uint64_t BinaryReader::readCount(Cursor& object, std::uint8_t low) {
   if (low != 0x0F) return low;
   const std::size_t position = object.position();
   const std::uint8_t marker = object.byte();
+  // 1 to 8 bytes: no count needs 16.
   if (marker < 0x10 || marker > 0x13) throw Damage(Problem::badCount, position);
   return object.bigEndian(std::size_t{1} << (marker & 0x0F));
 }

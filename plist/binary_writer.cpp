@@ -12,6 +12,7 @@
 namespace PropertyList {
 namespace {
 
+// The widths that integers have. Offsets and references may have others, and are given these.
 std::size_t widthFor(std::uint64_t largest) noexcept {
   return largest <= 0xFF ? 1 : largest <= 0xFFFF ? 2 : largest <= 0xFFFF'FFFF ? 4 : 8;
 }
@@ -49,6 +50,7 @@ std::string encodedHead(unsigned marker, std::size_t count) {
   return out;
 }
 
+// As ASCII where it is, since that takes half the bytes.
 std::string encodedString(std::string_view text) {
   if (isAscii(std::as_bytes(std::span(text)))) {
     return encodedHead(0x50, text.size()).append(text);
@@ -115,6 +117,7 @@ class BinaryWriter {
   std::vector<std::byte> assembled() const;
 
   std::vector<Object> objects_;
+  // By their bytes: what a reader cannot tell apart is one object.
   std::unordered_map<std::string, std::size_t> scalars_;
 };
 
@@ -155,6 +158,7 @@ void BinaryWriter::refer(std::size_t container) {
 
 std::vector<std::byte> BinaryWriter::assembled() const {
   std::string out = "bplist00";
+  // Both widths are known only now: they depend on how many objects there are, and how long.
   const std::size_t referenceSize = widthFor(objects_.size() - 1);
   std::vector<std::size_t> offsets;
   for (const Object& object : objects_) {

@@ -98,7 +98,7 @@ class Cursor {
   std::string_view rest() const noexcept {
     return {reinterpret_cast<const char*>(here_), remaining()};
   }
-  // From an earlier position of this cursor up to here.
+  // From an earlier position of this cursor up to here. The start may lie no further than here.
   std::string_view since(std::size_t start) const noexcept {
     return {reinterpret_cast<const char*>(begin_ + start), position() - start};
   }
@@ -136,6 +136,7 @@ class Cursor {
   }
   void skipLongPlain() noexcept;
 
+  // Always begin_ <= here_ <= end_.
   const std::byte* begin_;
   const std::byte* here_;
   const std::byte* end_;

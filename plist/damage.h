@@ -54,7 +54,8 @@ enum class Problem : std::uint8_t {
 // The reason in one English sentence, ending with a full stop. Static storage, zero-terminated.
 std::string_view sentence(Problem problem) noexcept;
 
-// Thrown by Document and ExpansionBudget, and by nothing else.
+// Thrown by Document and ExpansionBudget, and by nothing else. Never with a text from the message:
+// what it says goes into replies and logs.
 class Damage : public std::exception {
  public:
   Damage(Problem problem, std::size_t offset) noexcept : offset_(offset), problem_(problem) {}

@@ -9,6 +9,7 @@
 
 namespace PropertyList {
 
+// A logic error and not Damage: no message can bring it about, only a defect of its reader.
 void Value::refuse() {
   throw std::logic_error("A property-list value was asked for another type");
 }
@@ -40,6 +41,7 @@ std::size_t Value::count() const {
 }
 
 ArrayRange Value::elements() const {
+  // A set has an order here: that of the message.
   if (type() != Type::array && type() != Type::set) refuse();
   return {*store_, store_->firstChild(number_), node().count, shared_};
 }
@@ -47,6 +49,7 @@ ArrayRange Value::elements() const {
 EntryRange Value::entries() const {
   const std::uint32_t count = expect(Type::dictionary).count;
   const std::size_t key = store_->firstChild(number_);
+  // From a key to its value: in binary all keys come first.
   const std::size_t apart = store_->referenceSize == 0 ? 1 : store_->referenceSize * count;
   return {*store_, key, key + apart, count, shared_};
 }

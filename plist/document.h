@@ -23,7 +23,8 @@
 
 namespace PropertyList {
 
-// All integers from -2^63 to 2^64 - 1: two's complement bits, and how to read them.
+// All integers from -2^63 to 2^64 - 1: two's complement bits, and how to read them. No single
+// built-in type holds both ends, so the range is checked by whoever has a field to fill.
 struct Integer {
   std::uint64_t bits;
   bool negative;
@@ -38,6 +39,7 @@ class EntryRange;
 // defect and throws std::logic_error.
 class Value {
  public:
+  // Of every value, null included.
   Type type() const noexcept { return node().type; }
   // Each throws std::logic_error for a value of another type, and nothing else. They cost a
   // look-up; none allocates or converts.
@@ -51,7 +53,8 @@ class Value {
   ArrayRange elements() const;  // of an array or set, in order
   EntryRange entries() const;   // of a dictionary, in order
 
-  // A value of this container as a bare number, and back: for who keeps many of them.
+  // A value of this container as a bare number, and back: for who keeps many of them. Only a number
+  // that this container gave may come back.
   std::uint32_t number() const noexcept { return number_; }
   Value child(std::uint32_t number) const noexcept { return {*store_, number, shared_}; }
 
@@ -72,6 +75,7 @@ class Value {
     if (node().type != type) refuse();
     return node();
   }
+  // Apart, so that the accessors stay small enough to be inlined.
   [[noreturn]] static void refuse();
 
   const Store* store_;
@@ -85,7 +89,9 @@ struct Entry {
   Value value;
 };
 
-// The elements of an array or set, to be walked with `for`.
+// The elements of an array or set, to be walked with `for`. Walked once and forwards; an iterator
+// at the end may not be read or moved. Nothing is copied: the elements of a shared array cost
+// nothing until somebody makes something of them.
 class ArrayRange {
  public:
   class Iterator {
@@ -125,7 +131,7 @@ class ArrayRange {
   Iterator first_;
 };
 
-// The entries of a dictionary, to be walked with `for`.
+// The entries of a dictionary, to be walked with `for`. Every key occurs once: that was checked.
 class EntryRange {
  public:
   class Iterator {
@@ -159,6 +165,7 @@ class EntryRange {
         : store_(&store), key_(key), value_(value), remaining_(count), shared_(shared) {}
 
     const Store* store_;
+    // Positions as the store counts them. The two move in step.
     std::size_t key_;
     std::size_t value_;
     std::uint32_t remaining_;
@@ -179,8 +186,9 @@ class EntryRange {
 
 class Document {
  public:
-  // Throws Damage for anything that is no property list, and std::bad_alloc.
-  // A small message costs no allocation, a larger one a few: never one per object.
+  // Throws Damage for anything that is no property list, and std::bad_alloc. A small message costs
+  // no allocation, a larger one a few: never one per object. The message must not change while the
+  // Document lives: what was checked is not checked again.
   explicit Document(Bytes message);
 
   // Values point at the document, so it stays where it is.

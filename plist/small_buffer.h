@@ -38,6 +38,7 @@ class SmallBuffer {
 
   // Each of the following throws std::bad_alloc and then leaves the elements as they were.
   void push(T value) {
+    // A copy is pushed: a reference to an element would dangle when the buffer moves.
     if (size_ == capacity_) reserve(2 * capacity_);
     data_[size_++] = value;
   }
@@ -46,11 +47,13 @@ class SmallBuffer {
     resize(size_ + count);
     if (count > 0) std::memcpy(data_ + start, values, count * sizeof(T));
   }
-  // Elements beyond the old size are unset.
+  // Elements beyond the old size are unset. At least doubled, so that many small steps cost no more
+  // than one large one.
   void resize(std::size_t size) {
     if (size > capacity_) reserve(std::max(size, 2 * capacity_));
     size_ = size;
   }
+  // Exactly so much: for who knows how much comes.
   void reserve(std::size_t capacity) {
     if (capacity > capacity_) grow(capacity);
   }
@@ -66,6 +69,7 @@ class SmallBuffer {
  private:
   // Apart, so that what appends stays small enough to be inlined.
   [[gnu::noinline]] void grow(std::size_t capacity) {
+    // The product would wrap, and a small block be taken for a vast one.
     if (capacity > static_cast<std::size_t>(-1) / sizeof(T)) throw std::bad_alloc();
     // Null at first, so that the first growth is an allocation and the inline elements are copied.
     void* const grown = std::realloc(heap_, capacity * sizeof(T));
@@ -78,6 +82,7 @@ class SmallBuffer {
 
   // Unset until used: clearing 2 KiB would cost more than reading a small message.
   alignas(T) std::byte inline_[N * sizeof(T)];
+  // Null as long as the elements are inline; data_ points at whichever holds them.
   void* heap_ = nullptr;
   T* data_ = reinterpret_cast<T*>(inline_);
   std::size_t size_ = 0;

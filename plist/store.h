@@ -36,6 +36,7 @@ constexpr bool isContainer(Type type) noexcept {
   return type == Type::array || type == Type::dictionary || type == Type::set;
 }
 
+// All zero is a node that has not been read yet.
 struct Node {
   enum Flag : std::uint8_t {
     shared = 1,    // referenced more than once
@@ -55,8 +56,11 @@ struct Node {
   bool has(Flag flag) const noexcept { return (flags & flag) != 0; }
   void set(Flag flag) noexcept { flags = static_cast<std::uint8_t>(flags | flag); }
 };
+// A byte of offset table can ask for a node, so this is the factor between a hostile message and
+// its table.
 static_assert(sizeof(Node) == 16);
 
+// Inline room for a small message: 128 nodes are 2 KiB, on the stack of whoever decodes.
 struct Store {
   Bytes message;
   SmallBuffer<Node, 128> nodes;
@@ -64,7 +68,8 @@ struct Store {
   std::size_t referenceSize = 0;  // bytes; 0 for XML
   std::uint32_t top = 0;
 
-  // A string's or data's bytes.
+  // A string's or data's bytes. The view is good until the side buffer grows: readers keep offsets,
+  // and views only once they are through.
   std::string_view text(const Node& node) const noexcept {
     const auto offset = static_cast<std::size_t>(node.bits);
     if (node.has(Node::inSide)) return {side.data() + offset, node.count};
@@ -77,6 +82,7 @@ struct Store {
     return referenceSize == 0 ? container + std::size_t{1}
                               : static_cast<std::size_t>(nodes[container].bits);
   }
+  // The reader has held every reference against the number of objects.
   std::uint32_t child(std::size_t position) const noexcept {
     const std::uint64_t number =
         referenceSize == 0 ? position : Cursor::bigEndianAt(message, position, referenceSize);

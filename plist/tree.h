@@ -25,6 +25,7 @@ struct Date {
   bool operator==(const Date&) const = default;
 };
 
+// No field takes one. It is here so that messages that have one can be made.
 struct Uid {
   std::uint64_t number;
 
@@ -41,6 +42,7 @@ struct Set {
   bool operator==(const Set&) const;
 };
 
+// One type with all cases, so that tests can write down what no schema has.
 struct Tree {
   using Variant = std::variant<std::nullptr_t, bool, std::int64_t, std::uint64_t, double, Date,
                                std::string, Data, Array, Dictionary, Uid, Set>;
@@ -48,6 +50,7 @@ struct Tree {
   // Implicit, so that a message can be written down as nested braces.
   Tree(std::nullptr_t) noexcept : value(nullptr) {}
   Tree(bool boolean) noexcept : value(boolean) {}
+  // With or without a sign is kept: it decides how a number with its highest bit set is written.
   template <std::signed_integral Number>
   Tree(Number number) noexcept : value(std::int64_t{number}) {}
   template <std::unsigned_integral Number>

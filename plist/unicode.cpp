@@ -14,6 +14,7 @@ struct Range {
   char32_t last;
 };
 
+// Above ASCII, in order. Twelve are few enough to be tried one by one.
 constexpr std::array<Range, 12> nameStartRanges = {{{0xC0, 0xD6},
                                                     {0xD8, 0xF6},
                                                     {0xF8, 0x2FF},
@@ -51,6 +52,7 @@ Character firstCharacter(std::string_view text) noexcept {
     if ((next & 0xC0u) != 0x80) return malformed;
     codePoint = (codePoint << 6) | (next & 0x3Fu);
   }
+  // By length: what could have been written shorter is not well-formed.
   constexpr std::array<char32_t, 5> smallest = {0, 0, 0x80, 0x800, 0x10000};
   if (codePoint < smallest[length] || codePoint > 0x10FFFF || isSurrogate(codePoint)) {
     return malformed;
@@ -112,6 +114,7 @@ std::size_t utf8FromUtf16(Bytes units, char* out) noexcept {
         return failed;
       }
       at += 2;
+      // Ten bits from each half. A pair takes two units and four bytes, so three a unit are enough.
       c = 0x10000 + ((c & 0x3FF) << 10) + (unit(at) & 0x3FF);
     }
     written += encodeUtf8(c, out + written);
@@ -120,6 +123,7 @@ std::size_t utf8FromUtf16(Bytes units, char* out) noexcept {
 }
 
 bool isXmlCharacter(char32_t c) noexcept {
+  // What XML excludes it excludes as a character reference too.
   if (c < 0x20) return c == '\t' || c == '\n' || c == '\r';
   return c <= 0x10FFFF && !isSurrogate(c) && c != 0xFFFE && c != 0xFFFF;
 }

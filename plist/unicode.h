@@ -23,6 +23,7 @@ Character firstCharacter(std::string_view text) noexcept;
 // Writes a character, no surrogate, as 1 to 4 bytes of UTF-8; returns how many.
 std::size_t encodeUtf8(char32_t codePoint, char* out) noexcept;
 
+// Whether no byte is above 0x7F. Control characters and zero are ASCII.
 bool isAscii(Bytes bytes) noexcept;
 
 // Converts big-endian UTF-16 of an even number of bytes to UTF-8. `out` has room for 3 bytes per
@@ -30,7 +31,8 @@ bool isAscii(Bytes bytes) noexcept;
 inline constexpr std::size_t failed = static_cast<std::size_t>(-1);
 std::size_t utf8FromUtf16(Bytes units, char* out) noexcept;
 
-// What XML 1.0 calls Char, NameStartChar and NameChar.
+// What XML 1.0 calls Char, NameStartChar and NameChar. They say what may stand in a document, not
+// what is sensible to show.
 bool isXmlCharacter(char32_t codePoint) noexcept;
 bool isXmlNameStart(char32_t codePoint) noexcept;
 bool isXmlNameCharacter(char32_t codePoint) noexcept;

@@ -48,6 +48,8 @@ struct ShortText {
   constexpr bool begins(std::uint64_t word) const noexcept { return (word & mask) == bits; }
 };
 
+// The texts behind the '<' and the "</" of tags without white space or attributes. A tag that is
+// spelt otherwise is as good, and slower.
 struct Spelling {
   std::string_view name;
   // What follows '<' and "</" in the tags of most writers.
@@ -85,9 +87,11 @@ class ElementTable {
  private:
   static constexpr std::uint64_t firstFour = ShortText("four").mask;
 
+  // The highest five bits of the product: all of the four characters have a say in them.
   constexpr std::size_t slot(std::uint64_t word) const noexcept {
     return static_cast<std::size_t>((word & firstFour) * factor_ >> 59);
   }
+  // Whether this factor keeps all ten apart. If none did, the program would not compile.
   constexpr bool fill() noexcept {
     std::array<bool, 32> taken{};
     for (std::size_t i = 0; i < spellings.size(); ++i) {
@@ -100,6 +104,7 @@ class ElementTable {
   }
 
   std::uint64_t factor_ = 0x9E37'79B9'7F4A'7C15;
+  // A slot that nobody has holds the first element. That does no harm: a candidate is compared.
   std::array<Element, 32> slots_{};
 };
 

@@ -63,6 +63,8 @@ class XmlReader {
   XmlScanner scanner_;
   SmallBuffer<std::string_view, 64> keys_;
   std::size_t depth_ = 0;
+  // As in the binary reader: fixed, so that depth is a number that is compared and not a stack that
+  // overflows.
   std::array<Frame, Limits::nestedContainers> frames_;
 };
 
@@ -188,6 +190,7 @@ void XmlReader::place(Element element) {
 }
 
 void XmlReader::openContainer(Type type, bool isEmpty) {
+  // Empty ones count: a limit that depends on the spelling would be none.
   if (depth_ == Limits::nestedContainers) scanner_.fail(Problem::tooDeep);
   const auto number = static_cast<std::uint32_t>(store_.nodes.size());
   add(type, number + std::uint64_t{1});
@@ -204,6 +207,7 @@ void XmlReader::closeContainer() {
   node.bits = store_.nodes.size();
   node.count = isDictionary ? frame.children / 2 : frame.children;
   if (!isDictionary) return;
+  // A key without a value. Looked at last, so that a wrong end tag is told as such.
   if (frame.children % 2 != 0) scanner_.fail(Problem::missingValue);
   checkKeys(frame.number);
 }
@@ -211,6 +215,7 @@ void XmlReader::closeContainer() {
 // XML shares nothing: all keys together are no longer than the message, whatever their number.
 void XmlReader::checkKeys(std::uint32_t dictionary) {
   keys_.clear();
+  // No more than are there: the count is of what was read.
   keys_.reserve(store_.nodes[dictionary].count);
   std::size_t key = dictionary + std::size_t{1};
   for (std::uint32_t i = 0; i < store_.nodes[dictionary].count; ++i) {
@@ -264,6 +269,7 @@ void XmlReader::decodeRest(const XmlScanner::Text& text) {
   if (!text.inSide) store_.side.resize(start + text.length / 4 * 3 + 3);
   const auto length = decodeBase64(view(text), store_.side.data() + start);
   if (!length) scanner_.fail(Problem::badBase64);
+  // The buffer gives back what the encoding, white space and padding took.
   store_.side.resize(start + *length);
 }
 

@@ -19,6 +19,7 @@ constexpr char lower(char c) noexcept {
   return c >= 'A' && c <= 'Z' ? static_cast<char>(c | 0x20) : c;
 }
 
+// Letters of ASCII alone: in some locales I is not the capital of i.
 bool isWord(std::string_view text, std::string_view word) noexcept {
   return std::ranges::equal(text, word, {}, lower);
 }
@@ -66,6 +67,7 @@ bool isDecimal(std::string_view text) noexcept {
     text.remove_prefix(length);
     return length;
   };
+  // Counted on both sides of the point: a point by itself is no number.
   std::size_t mantissa = digits();
   if (text.starts_with('.')) {
     text.remove_prefix(1);
@@ -109,6 +111,7 @@ std::optional<Integer> parseInteger(std::string_view text) noexcept {
   if (!magnitude) return std::nullopt;
   // Minus zero is zero: an integer has no sign then.
   if (!text.starts_with('-') || *magnitude == 0) return Integer{*magnitude, false};
+  // 2^63 itself has a negative and no positive form in 64 bits with sign.
   if (*magnitude > std::uint64_t{1} << 63) return std::nullopt;
   return Integer{~*magnitude + 1, true};
 }
@@ -135,6 +138,7 @@ std::optional<double> parseReal(std::string_view text) noexcept {
 std::optional<double> parseDate(std::string_view text) noexcept {
   text = trimmed(text);
   constexpr std::string_view form = "0000-00-00T00:00:00Z";
+  // Every place, so that what follows reads digits and nothing else.
   const bool fits = std::ranges::equal(
       text, form, [](char c, char model) { return model == '0' ? isDigit(c) : c == model; });
   if (!fits) return std::nullopt;

@@ -51,6 +51,7 @@ char32_t XmlScanner::character() {
     return static_cast<char32_t>(first);
   }
   if (cursor_.atEnd()) fail(Problem::truncated);
+  // One decoder for all text: what one place takes for a character no other sees as bytes.
   const Character next = firstCharacter(cursor_.rest());
   if (next.length == 0) fail(Problem::badUtf8);
   if (!isXmlCharacter(next.codePoint)) fail(Problem::forbiddenCharacter);
@@ -94,6 +95,7 @@ void XmlScanner::attributeValue() {
   const char quote = cursor_.peek();
   if (quote != '"' && quote != '\'') fail(Problem::badTag);
   cursor_.skip(1);
+  // A quote of the other kind is a character like any other.
   while (cursor_.peek() != quote) {
     if (cursor_.peek() == '<') fail(Problem::badTag);
     if (cursor_.skipIf("&")) {
@@ -123,6 +125,7 @@ char32_t XmlScanner::reference() {
   for (const Entity& entity : entities) {
     if (cursor_.skipIf(entity.name)) return entity.character;
   }
+  // Only these five: with no declarations there is nothing else that a name could stand for.
   fail(Problem::badReference);
 }
 
@@ -218,6 +221,7 @@ void XmlScanner::section() {
   cursor_.skip(3);
 }
 
+// From the message as it stands, since that position.
 void XmlScanner::append(std::size_t start) {
   const std::string_view piece = cursor_.since(start);
   side_.append(piece.data(), piece.size());

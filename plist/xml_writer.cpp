@@ -14,6 +14,7 @@ namespace {
 
 constexpr double secondsPerDay = 86400;
 
+// All three that could be taken for markup, also where XML would let '>' stand.
 void appendEscaped(std::string& out, std::string_view text) {
   while (!text.empty()) {
     const Character next = firstCharacter(text);
@@ -41,6 +42,7 @@ void appendEscaped(std::string& out, std::string_view text) {
   }
 }
 
+// Apart from the reader's tables, so that a fault in those shows when the two meet in a test.
 std::string base64(const Data& data) {
   constexpr std::string_view alphabet =
       "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";
@@ -68,6 +70,7 @@ std::string spelt(double number) {
 
 // The calendar date so many days after 2001-01-01, found by going from years to days.
 std::string spelt(Date date) {
+  // Down, also before 2001: the time of day is counted forwards from midnight.
   const double day = std::floor(date.seconds / secondsPerDay);
   constexpr double firstDay = -730'485;  // 0001-01-01
   constexpr double lastDay = 2'921'573;  // 9999-12-31
@@ -77,6 +80,7 @@ std::string spelt(Date date) {
   const auto isLeap = [](int year) {
     return year % 4 == 0 && (year % 100 != 0 || year % 400 == 0);
   };
+  // Whole cycles of 400 years first, all of which have the same length, then single years.
   int left = static_cast<int>(day - firstDay);
   int year = 1 + 400 * (left / 146'097);
   left %= 146'097;
@@ -124,6 +128,7 @@ class XmlWriter {
   void step();
 
   std::string out_;
+  // The containers that are open, outermost first; their number is the indentation.
   std::vector<Frame> frames_;
 };
 
