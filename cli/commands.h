@@ -22,11 +22,12 @@ struct UnpackOptions {
 /// that cannot be read has no reply and does not keep the others from theirs.
 void unpack(Client::Options options, const UnpackOptions& what, Console& console);
 
-/// Answers the requests on standard input until it ends.
+/// Answers the requests on standard input until it ends. Replies are flushed one by one: whoever is
+/// at the other end of the pipe may wait for each before writing the next request.
 void stream(Client::Options options, Console& console);
 
 /// Prints what this build knows, or what has the given name. An unknown name is said on the console
-/// together with the nearest ones.
+/// together with the nearest ones. Starts no service.
 void describe(const Optional<String>& name, Bool json, Console& console);
 
 /// Prints the versions of the command and of its service, and the service's sandbox layers.

@@ -1,4 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
+/// Everything that is said on standard error is escaped here, at the last moment, so that no caller
+/// can forget it. Results are JSON or the program's own text, and are fit to be shown when they
+/// come.
 #include "cli/console.h"
 
 #include "cli/files.h"
@@ -19,6 +22,7 @@ namespace Keelgate::CLI {
 
 namespace {
 
+/// In columns. In fewer than 40 no table can be read; 80 is what is left where nobody says.
 constexpr std::size_t narrowest = 40;
 constexpr std::size_t usual = 80;
 
@@ -49,6 +53,7 @@ Console::Console() {
     // Opened the wrong way round, so that using it fails as it would have.
     open("/dev/null", standard == STDIN_FILENO ? O_WRONLY : O_RDONLY);
   }
+  // Or a reader such as head, which has enough, would end this process in the middle of its work.
   std::signal(SIGPIPE, SIG_IGN);
 }
 
@@ -93,6 +98,7 @@ void Console::clearProgress() {
   const std::lock_guard lock(mutex_);
   if (!progressShown_) return;
   constexpr std::string_view clear = "\r\033[K";
+  // Where it could not be cleared it still stands there.
   progressShown_ = write(STDERR_FILENO, clear.data(), clear.size()) < 0;
 }
 
@@ -115,11 +121,13 @@ std::size_t outputWidth() {
   const std::string_view columns = variable("COLUMNS");
   std::from_chars(columns.data(), columns.data() + columns.size(), width);
   winsize window{};
+  // Asked of standard output, where the table goes.
   if (width == 0 && ioctl(STDOUT_FILENO, TIOCGWINSZ, &window) == 0) width = window.ws_col;
   return std::max(width == 0 ? usual : width, narrowest);
 }
 
 Bool outputHasColour() {
+  // NO_COLOR counts unless it is empty, whatever stands in it.
   return isTerminal(STDOUT_FILENO) && variable("NO_COLOR").empty() && variable("TERM") != "dumb";
 }
 

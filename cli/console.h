@@ -10,7 +10,8 @@
 
 namespace Keelgate::CLI {
 
-/// Exit statuses. The larger of two is the one that counts.
+/// Exit statuses. The larger of two is the one that counts. Scripts go by them: the numbers stay as
+/// they are.
 enum class Status : std::uint8_t {
   done = 0,
   rejected = 1,

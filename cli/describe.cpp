@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
+/// One description, printed twice: as JSON for programs and as tables for people. Neither knows a
+/// record by name.
 #include "cli/commands.h"
 #include "cli/description.h"
 #include "cli/table.h"
@@ -11,6 +13,7 @@ namespace {
 
 // ------------------------------------------------------------------------------------- JSON
 
+/// The texts are names from the program's own tables; they are escaped all the same.
 template <class Out>
 void writeText(Out& out, std::string_view key, std::string_view value) {
   writeKey(out, key);
@@ -43,6 +46,7 @@ void writeServices(Out& out, const Description& what) {
   });
 }
 
+/// Schemas say what a message must have, records what they may lack: one table, two ways to ask.
 template <class Out>
 void writeTables(Out& out, std::string_view key, const Array<StructTable>& tables, Bool schemas) {
   writeKey(out, key);
@@ -115,6 +119,7 @@ class Page {
 
  private:
   String text_;
+  /// Asked once, so that a page is of one kind.
   Bool colour_ = outputHasColour();
 };
 
@@ -211,6 +216,7 @@ String pageText(const Description& what, Bool overview) {
     addFields(page, what);
   }
   addEnumerations(page, what);
+  // An overview is the only page that does not show all there is.
   if (overview) page.line("`keelgate describe NAME` shows the fields of one.");
   return std::move(page).take();
 }

@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+/// The walk is at compile time, over types; what it leaves behind is plain data.
 #include "cli/description.h"
 
 #include "program/service/tables.h"
@@ -110,7 +111,8 @@ class Walk {
   Description& to_;
 };
 
-/// The name of the case that carries R in a client message's result.
+/// The name of the case that carries R in a client message's result. Every row's record is a case:
+/// one that is none would have no name here, and no way out of the service either.
 template <class R, class... Cases>
 std::string_view caseNameOf(const std::variant<Cases...>*) {
   constexpr bool is[] = {std::same_as<R, Cases>...};
@@ -137,7 +139,8 @@ Array<CommandRow> commandsOf(Walk& walk) {
   return rows;
 }
 
-/// How many characters must change between two names.
+/// How many characters must change between two names. One row of the usual table at a time, since
+/// names are short and many.
 std::size_t distance(std::string_view one, std::string_view other) {
   Array<std::size_t> row(other.size() + 1);
   std::iota(row.begin(), row.end(), std::size_t{0});
@@ -209,6 +212,7 @@ Bool isEmpty(const Description& description) {
 }
 
 Array<std::string_view> nearestNames(const Description& all, std::string_view name) {
+  // More would be a list to search, and `describe` without a name has that already.
   constexpr std::size_t most = 3;
   // A third of the name may be mistyped; a part of a name is like it too.
   const auto unlike = [&](std::string_view candidate) {

@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
+/// Plain descriptors and no streams: a pipe has to be waited for together with others, and an error
+/// has to keep its reason.
 #include "cli/files.h"
 
 #include <fcntl.h>
@@ -14,6 +16,7 @@ namespace Keelgate::CLI {
 
 namespace {
 
+/// What a pipe holds on Linux, so a full one is taken in one piece.
 constexpr std::size_t chunk = std::size_t{64} << 10;
 
 [[noreturn]] void fail() {
@@ -84,10 +87,12 @@ Data readFile(const String& path, std::size_t limit) {
 
   // A file's own idea of its size saves growing, and is not relied on.
   std::size_t room = chunk;
+  // One more than its size, so that its end is seen without growing.
   if (S_ISREG(status.st_mode)) room = static_cast<std::size_t>(status.st_size) + 1;
   Data bytes;
   for (;;) {
     const std::size_t size = bytes.size();
+    // Not read any further: an endless device must not fill the memory.
     if (size == limit) return bytes;
     bytes.resize(size + std::min(room, limit - size));
     const std::size_t n = readSome(input.descriptor(), bytes.data() + size, bytes.size() - size);
@@ -144,6 +149,7 @@ Bool LineReader::wait() const {
       if (errno == EINTR) continue;
       fail();
     }
+    // POLLERR on the writing end of a pipe: its reader has gone.
     if (entries[1].revents != 0 || (entries[2].revents & POLLERR) != 0) return false;
     if (entries[0].revents != 0) return true;
   }

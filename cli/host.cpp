@@ -34,6 +34,7 @@ Status statusOf(Verdict verdict) {
     case Verdict::serviceLost:
       break;
   }
+  // Also for a verdict that is none, which only a cast can make: the worst is the safest.
   return Status::serviceLost;
 }
 

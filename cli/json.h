@@ -47,7 +47,8 @@ void writeString(Out& out, std::string_view text) {
   out.RawValue(json.data(), json.size(), rapidjson::kStringType);
 }
 
-/// A value whose JSON text is ready.
+/// A value whose JSON text is ready. The writer does not look at the text; the type that it is told
+/// matters for keys alone.
 template <class Out>
 void writeRaw(Out& out, std::string_view json) {
   out.RawValue(json.data(), json.size(), rapidjson::kNumberType);
@@ -112,7 +113,8 @@ void writeJson(Out& out, const T& value) {
   }
 }
 
-/// One object and a newline; `members(out)` writes what is in it.
+/// One object and a newline; `members(out)` writes what is in it. Whole in memory before any of it
+/// is printed: half an object on standard output could not be taken back.
 template <class Members>
 String jsonObject(Layout layout, const Members& members) {
   rapidjson::StringBuffer buffer;

@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
+/// Whoever reads the command's output takes it for well-formed JSON that cannot move a cursor. Both
+/// are decided here, character by character.
 #include "cli/json_text.h"
 
 #include <fmt/format.h>
@@ -19,6 +21,7 @@ namespace chrono = std::chrono;
 constexpr int base64 = sodium_base64_VARIANT_ORIGINAL;
 
 constexpr chrono::sys_seconds referenceDate = chrono::sys_days(chrono::year(2001) / 1 / 1);
+/// Years of four digits: from here to before endOfTime.
 constexpr chrono::sys_seconds firstSecond = chrono::sys_days(chrono::year(1) / 1 / 1);
 constexpr chrono::sys_seconds endOfTime = chrono::sys_days(chrono::year(10000) / 1 / 1);
 
@@ -51,6 +54,7 @@ void appendQuoted(String& to, unsigned codePoint, std::string_view bytes) {
   }
   const Bool control = codePoint < 0x20 || (codePoint >= 0x7f && codePoint < 0xa0);
   const Bool lineEnd = codePoint == 0x2028 || codePoint == 0x2029;
+  // All of these are in the basic plane, so four digits do.
   if (control || lineEnd) {
     fmt::format_to(std::back_inserter(to), "\\u{:04x}", codePoint);
   } else {
@@ -80,6 +84,7 @@ String jsonString(std::string_view text) {
     if (character) {
       appendQuoted(to, *character, bytes);
     } else {
+      // U+FFFD, one for each byte: the length still shows how much was there.
       to += "\xef\xbf\xbd";
     }
   });
@@ -98,6 +103,7 @@ String numberText(Double value) {
   if (std::isnan(value)) return "\"nan\"";
   if (std::isinf(value)) return value > 0 ? "\"inf\"" : "\"-inf\"";
   String text = fmt::format("{}", value);
+  // Else a reader that tells integers from fractions would take 3.0 for an integer.
   if (text.find_first_of(".e") == String::npos) text += ".0";
   return text;
 }
@@ -149,6 +155,7 @@ String base64Text(Bytes bytes) {
 }
 
 Optional<Data> fromBase64(std::string_view text) {
+  // Exactly enough for padded base64. Of another length it is refused, never cut.
   Data bytes(text.size() / 4 * 3);
   std::size_t length = 0;
   const int failed = sodium_base642bin(reinterpret_cast<unsigned char*>(bytes.data()), bytes.size(),

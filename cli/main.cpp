@@ -27,6 +27,7 @@ constexpr std::string_view version = KEELGATE_VERSION;
 struct Arguments {
   Bool version = false;
   Bool verbose = false;
+  /// Of whichever subcommand was chosen; the others leave it alone.
   Client::Options host;
   String record;
   String service;
@@ -59,7 +60,9 @@ template <class N>
 void addSeconds(::CLI::App& app, const std::string& names, std::chrono::milliseconds& to,
                 const std::string& help) {
   const auto read = [&to](const std::string& text) {
+    // Some thirty years. In milliseconds it is far from the end of 64 bits.
     constexpr double longest = 1e9;
+    // strtod knows signs, exponents, hexadecimal and "inf" too; a limit is none of these.
     const Bool plain = text.find_first_not_of("0123456789.") == std::string::npos;
     char* end = nullptr;
     const double seconds = std::strtod(text.c_str(), &end);
@@ -81,6 +84,7 @@ void addServiceOptions(::CLI::App& app, Client::Options& options) {
 }
 
 void addHostOptions(::CLI::App& app, Client::Options& options) {
+  // The client would cut them to these; here somebody typed them, and is told.
   constexpr UInt64 mostProcesses = 128;
   constexpr UInt64 largestMessage = std::numeric_limits<std::uint32_t>::max();
   addNumber(app, "--processes", options.processes, 1, mostProcesses,
@@ -114,6 +118,7 @@ void addUnpack(::CLI::App& app, Arguments& arguments) {
                             std::numeric_limits<UInt64>::max(), "The command they arrived with")
                       ->excludes(record)
                       ->needs(service);
+  // A service's name goes back in the error: bytes that are no text could not.
   service->needs(command)->check([](const std::string& id) {
     return isUtf8(id) ? std::string() : "the identifier is not UTF-8";
   });
@@ -263,6 +268,7 @@ void keelgate(Array<String> words, Console& console) {
     // Said already.
   } catch (const std::exception& error) {
     console.complain(error.what());
+    // As a rule a HostError from the start of the service; whatever it was, no more is unpacked.
     console.note(Status::serviceLost);
   }
 }
@@ -273,6 +279,7 @@ void keelgate(Array<String> words, Console& console) {
 
 int main(int count, char** words) {
   Keelgate::CLI::Console console;
+  // base64 is all that is used of it, yet it has to be initialised before any of it.
   if (sodium_init() < 0) return static_cast<int>(Keelgate::CLI::Status::serviceLost);
   Keelgate::CLI::keelgate({words + 1, words + count}, console);
   return static_cast<int>(console.status());

@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+/// The queue is its own order: slots leave at the front, and only when their reply is there.
 #include "cli/ordered_work.h"
 
 #include <sys/eventfd.h>
@@ -63,6 +64,8 @@ void OrderedWork::run() {
   for (;;) {
     work_.wait(lock, [&] { return stopped_ || closed_ || next_ < slots_.size(); });
     if (stopped_ || next_ == slots_.size()) return;
+    // Stays where it is: a deque moves nothing when its ends change, and this slot is not answered
+    // yet.
     Slot& slot = slots_[next_++];
     lock.unlock();
     Reply reply = slot.job();
@@ -82,8 +85,10 @@ void OrderedWork::deliver(std::unique_lock<std::mutex>& lock) {
     const Reply reply = std::move(*slots_.front().reply);
     const std::size_t weight = slots_.front().weight;
     slots_.pop_front();
+    // It counts from the front, which has just moved on.
     --next_;
     lock.unlock();
+    // Without the lock: a reader of standard output that takes its time holds nobody else up.
     const Bool goOn = sink_(reply);
     lock.lock();
     // Not before: a reply that cannot be written yet is memory too.

@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
+/// From what the client gives or throws to the text that is printed. The names of kinds and reasons
+/// are promised to scripts; the sentences are for people and may change.
 #include "cli/reply.h"
 
 #include "program/service/tables.h"
@@ -75,6 +77,7 @@ void writePreface(Out& out, const Preface& preface) {
   writeRaw(out, preface.value);
 }
 
+/// Keys as strings and positions as numbers: a dictionary with the key "1" is no array.
 template <class Out>
 void writeError(Out& out, const DecodingError& error) {
   writeField(out, "kind", String(nameOf(error.kind)));
@@ -113,6 +116,7 @@ void writeError(Out& out, const HostError& error) {
   writeField(out, "description", error.description);
 }
 
+/// Rejected is the mildest; a caller that knows worse says so afterwards.
 template <class E>
 Reply rejection(const E& error, const Preface& preface, Layout layout) {
   return {.json = jsonObject(layout,

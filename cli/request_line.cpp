@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
+/// Read as events and never as a tree: a line is as large as its message, and a tree of a hostile
+/// id would be many times as large.
 #include "cli/request_line.h"
 
 #include <fmt/format.h>
@@ -31,6 +33,7 @@ struct Member {
   std::string_view demand;
 };
 
+/// What a request may have, and nothing else.
 constexpr Member memberTable[] = {
     {"record", &Members::record, rapidjson::kStringType, "a string"},
     {"service", &Members::service, rapidjson::kStringType, "a string"},
@@ -48,6 +51,7 @@ class RequestReader : public rapidjson::BaseReaderHandler<rapidjson::UTF8<>, Req
     const std::string_view text = value ? "true" : "false";
     return scalar(text, text, rapidjson::kTrueType);
   }
+  // Digit by digit as it was written: a double in between would change a command above 2^53.
   bool RawNumber(const char* text, SizeType size, bool) {
     return scalar({text, size}, {text, size}, rapidjson::kNumberType);
   }
@@ -116,6 +120,7 @@ class RequestReader : public rapidjson::BaseReaderHandler<rapidjson::UTF8<>, Req
       wrong(fmt::format("unknown key {}", jsonString(key)));
     } else if (members_.*member_->value) {
       wrong(fmt::format("the key \"{}\" stands twice", key));
+      // To echo either would be a guess, and the caller would take the reply for another's.
       if (inId()) idIsAmbiguous_ = true;
       member_ = nullptr;
     }
@@ -187,6 +192,7 @@ Subject subjectOf(const Members& members) {
   demand(members.service || members.command, "neither \"record\" nor \"service\" is given");
   demand(members.service.has_value(), "\"command\" needs \"service\"");
   demand(members.command.has_value(), "\"service\" needs \"command\"");
+  // JSON also has -1, 1.5 and 1e3, which are numbers and no commands.
   const Optional<UInt64> command = decimal(*members.command);
   demand(command.has_value(), "\"command\" must be an integer from 0 to 18446744073709551615");
   return VespClientMessageContext{.command = *command, .service = *members.service};
@@ -206,11 +212,13 @@ Optional<UInt64> decimal(std::string_view text) {
   UInt64 number = 0;
   const char* end = text.data() + text.size();
   const auto [rest, error] = std::from_chars(text.data(), end, number);
+  // All of the text or none: "12a" is no 12.
   if (error != std::errc() || rest != end) return std::nullopt;
   return number;
 }
 
 RequestLine readRequestLine(std::string_view line) {
+  // Iterative, because recursion would let a nested id choose the depth of the stack.
   constexpr unsigned flags = rapidjson::kParseNumbersAsStringsFlag |
                              rapidjson::kParseValidateEncodingFlag | rapidjson::kParseIterativeFlag;
   rapidjson::MemoryStream stream(line.data(), line.size());

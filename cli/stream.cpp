@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+/// Requests from standard input, replies to standard output, any number in flight.
 #include "cli/commands.h"
 #include "cli/files.h"
 #include "cli/host.h"
@@ -36,6 +37,7 @@ void stream(Client::Options options, Console& console) {
   OrderedWork work(threads, [&](const Reply& reply) {
     // A rejected message is a normal answer here.
     if (reply.verdict != Verdict::rejected) console.note(statusOf(reply.verdict));
+    // The reply still goes out, then work ends: there is no service for what follows.
     const Bool lost = reply.verdict == Verdict::serviceLost;
     if (lost) console.complain(reply.problem);
     return console.print(reply.json) && !lost;

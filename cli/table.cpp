@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+/// Columns are as wide as their longest cell, and give way from the widest where that is too much.
 #include "cli/table.h"
 
 #include <algorithm>
@@ -17,6 +18,7 @@ constexpr std::size_t narrowestColumn = 8;
 String takeLine(String& text, std::size_t width) {
   if (text.size() <= width) return std::exchange(text, {});
   const std::size_t space = text.rfind(' ', width);
+  // A word that is longer than its column is cut: it has to go somewhere.
   const Bool atSpace = space != String::npos && space > 0;
   String line = text.substr(0, atSpace ? space : width);
   text.erase(0, line.size() + (atSpace ? 1 : 0));
@@ -33,6 +35,7 @@ Array<String> linesOf(Array<String> cells, const Array<std::size_t>& widths) {
       part.resize(widths[i], ' ');
       line.append(gap, ' ') += part;
     }
+    // Trailing spaces would wrap on a terminal of just this width.
     line.erase(line.find_last_not_of(' ') + 1);
     lines.push_back(std::move(line));
   } while (!std::ranges::all_of(cells, &String::empty));

@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+/// Files are read where they are unpacked, so no more of them are in memory than there are threads.
 #include "cli/commands.h"
 #include "cli/files.h"
 #include "cli/host.h"
