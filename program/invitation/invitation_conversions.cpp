@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
+/// Copies field by field, named where schema and record differ. Nothing is checked here: ranges and
+/// the order of dates are the framework's.
 #include "program/invitation/invitation_conversions.h"
 
 #include "framework/contracts/construct.h"
@@ -40,6 +42,7 @@ VespHearthInviteeScheduleYearDayRule convertRule(const YearDayRuleSchema& schema
 /// An absent list of rules gives an empty one.
 template <class R, class S>
 Array<R> convertRules(const Optional<Array<S>>& schemas) {
+  // Present and empty: a schedule without rules is not the same as no schedule.
   Array<R> rules;
   if (!schemas) return rules;
   rules.reserve(schemas->size());
@@ -98,6 +101,7 @@ VespHearthInvitation convertKind(VespHearthInvitationSchema&& schema) {
 }
 
 VespCofferSharingInvitation convertKind(VespCofferSharingInvitationSchema&& schema) {
+  // First, since its decoder may throw, and with the URL, which only it needs.
   SkyvaultSharingToken token = VespCofferSharingInvitation::decodeSkyvaultToken(
       std::move(schema.invitationToken), schema.shareURL);
   return construct<VespCofferSharingInvitation>({

@@ -10,6 +10,7 @@
 
 namespace VespKeelgateService {
 
+/// Both are required once the dictionary is there.
 struct VespHearthInvitationRequestedCapabilitiesSchema {
   FIELD(Double, hearthdVersion, "kHearthdVersionKey");
   FIELD(Array<Int64>, homeSupportedFeatures, "kHearthdSupportedFeaturesKey");
@@ -17,6 +18,7 @@ struct VespHearthInvitationRequestedCapabilitiesSchema {
   CODING_KEYS(VespHearthInvitationRequestedCapabilitiesSchema);
 };
 
+/// Any numbers. A rule of an empty dictionary is a rule.
 struct VespHearthInviteeScheduleWeekDayRuleSchema {
   FIELD(Optional<Int64>, startTime, "HRWeekDayScheduleRuleCodingKeyStartTime");
   FIELD(Optional<Int64>, endTime, "HRWeekDayScheduleRuleCodingKeyEndTime");
@@ -32,6 +34,8 @@ struct VespHearthInviteeScheduleYearDayRuleSchema {
   CODING_KEYS(VespHearthInviteeScheduleYearDayRuleSchema);
 };
 
+/// A list is decoded whole or not at all: one mistyped rule fails the message. A schedule with a
+/// rule missing would be another schedule.
 struct VespHearthInviteeScheduleSchema {
   FIELD(Optional<Array<VespHearthInviteeScheduleWeekDayRuleSchema>>, weekDayRules,
         "HRWeekDayScheduleRules");
@@ -41,6 +45,7 @@ struct VespHearthInviteeScheduleSchema {
   CODING_KEYS(VespHearthInviteeScheduleSchema);
 };
 
+/// All of it is optional, so an empty dictionary is an invitation.
 struct VespHearthInvitationSchema {
   FIELD(Optional<String>, homeName, "kHomeName");
   FIELD(Optional<Date>, invitationExpiryDate, "kInvitationExpiryDateKey");

@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The envelope of an invitation, and the five kinds that its context can hold.
+/// The envelope of an invitation, and the five kinds that its context can hold. Data alone: how the
+/// context is decoded is in the unpacker, and everything else follows from the lists.
 #pragma once
 
 #include "program/invitation/vesp_hearth_invitation_schema.h"
@@ -12,6 +13,7 @@
 
 namespace VespKeelgateService {
 
+/// All of it is optional: an empty dictionary is such an invitation.
 struct VespSampleInvitationSchema {
   FIELD(Optional<String>, title);
   FIELD(Optional<Date>, date);
@@ -48,9 +50,11 @@ struct VespStrideSharingInvitationSchema {
   CODING_KEYS(VespStrideSharingInvitationSchema);
 };
 
-/// Not the framework's type of the same name: this one is the number on the wire.
+/// Not the framework's type of the same name: this one is the number on the wire. One way so far;
+/// another number is refused before the schema string is looked at.
 ENUMERATION(VespInvitationContextType, Int, dictionary = 1);
 
+/// In the order of the framework's cases.
 struct VespDictionaryContextClientSchema
     : std::variant<VespSampleInvitationSchema, VespHearthInvitationSchema,
                    VespCofferSharingInvitationSchema, VespVitalsInvitationSchema,
@@ -59,6 +63,7 @@ struct VespDictionaryContextClientSchema
         vespCofferSharingInvitation, vespVitalsInvitation, vespStrideSharingInvitation);
 };
 
+/// A level of naming: the framework's record has one too.
 struct VespDictionaryContextData : std::variant<VespDictionaryContextClientSchema> {
   CASES(VespDictionaryContextData, dictionaryContext);
 };
@@ -76,6 +81,7 @@ struct VespInvitationContextSchema {
   static VespInvitationContextSchema decode(const KeyedContainer& container);
 };
 
+/// `state` and `expiration` travel as they are: neither a range nor a clock is asked.
 struct VespInvitationSchema {
   FIELD(VespInvitationContextSchema, context, "c");
   FIELD(Int64, state, "s");

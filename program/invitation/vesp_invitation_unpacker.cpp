@@ -21,11 +21,13 @@ VespDictionaryContextData decodeKind(const KeyedContainer& container) {
   return VespDictionaryContextClientSchema(container.decode<Payload>("cD"));
 }
 
+/// A row of the table that chooses the kind.
 struct Kind {
   std::string_view schema;
   VespDictionaryContextData (*decode)(const KeyedContainer& container);
 };
 
+/// Compared exactly: no prefix, no other case.
 constexpr Kind kinds[] = {
     {"com.tessen.Vesp.schema.invitation", decodeKind<VespSampleInvitationSchema>},
     {"ht-invite-v1", decodeKind<VespHearthInvitationSchema>},
@@ -39,6 +41,7 @@ VespDictionaryContextData decodeContextData(const String& schema, const KeyedCon
   for (const Kind& kind : kinds) {
     if (kind.schema == schema) return kind.decode(container);
   }
+  // Thrown before the data are looked at: whatever they are, there is no kind to read them as.
   throw Keelgate::Breach("com.tessen.Keelgate.VespKeelgateService",
                          "Unknown invitation schema: (" + schema + ")");
 }
@@ -63,6 +66,7 @@ VespInvitation VespInvitationUnpacker::unpack(Bytes from) const {
   return construct<VespInvitation>({
       .context = construct<VespInvitationContext>({
           .schema = std::move(schema.context.schema),
+          // The only case there is: any other number was refused when it was decoded.
           .contextType = static_cast<Int>(VespInvitationContextType::dictionary),
           .context = std::move(context),
       }),

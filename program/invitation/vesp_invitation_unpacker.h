@@ -13,12 +13,14 @@ struct VespInvitationUnpacker {
   using SchemaType = Keelgate::VespInvitation;
   using Schema = VespInvitationSchema;
 
+  /// Throws DecodingError, or Breach for a kind that nobody knows.
   SchemaType unpack(Bytes from) const;
 
   /// Throws what the records' constructors and token decoders throw.
   static Keelgate::VespDictionaryContext convertContext(VespDictionaryContextClientSchema&& kind);
 };
 
+// Here, where the framework's contract is known; the schemas themselves know nothing of it.
 static_assert(Keelgate::VespInvitationClientPayload<VespSampleInvitationSchema>);
 static_assert(Keelgate::VespInvitationClientPayload<VespHearthInvitationSchema>);
 static_assert(Keelgate::VespInvitationClientPayload<VespCofferSharingInvitationSchema>);

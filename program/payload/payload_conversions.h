@@ -1,5 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 /// From the nested schemas of payloads to their records: straight copies, in order.
+///
+/// Pure functions; callable from any thread. What they are given they consume.
 #pragma once
 
 #include "framework/contracts/construct.h"
@@ -25,7 +27,8 @@ Optional<R> convertIfPresent(Optional<S>&& schema) {
   return convert<R>(*std::move(schema));
 }
 
-/// Deliberate: the record cannot tell an absent list from an empty one.
+/// Deliberate: the record cannot tell an absent list from an empty one. The first element that is
+/// refused ends the message; no list is ever shortened.
 template <class R, class S>
 Array<R> convertEach(Optional<Array<S>>&& schemas, R (*convertOne)(S&&) = convert<R, S>) {
   Array<R> records;

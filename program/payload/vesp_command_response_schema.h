@@ -10,6 +10,7 @@
 
 namespace VespKeelgateService {
 
+/// Only the command is required.
 struct VespCommandResponseSchema {
   FIELD(Int, command, "c");
   FIELD(Optional<Int64>, messageId, "i");

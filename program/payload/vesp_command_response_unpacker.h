@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The delivery service's answers to commands.
+/// The delivery service's answers to commands. A value without fields; callable from any thread.
 #pragma once
 
 #include "program/payload/vesp_command_response_schema.h"
@@ -12,6 +12,7 @@ struct VespCommandResponseUnpacker {
   using SchemaType = Keelgate::VespCommandResponse;
   using Schema = VespCommandResponseSchema;
 
+  /// Throws DecodingError.
   SchemaType unpack(Bytes from) const;
 };
 

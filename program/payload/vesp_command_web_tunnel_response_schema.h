@@ -12,6 +12,7 @@
 
 namespace VespKeelgateService {
 
+/// Only the command is required. "h" is the dictionary of headers here as in a payload.
 struct VespCommandWebTunnelResponseSchema {
   FIELD(Int, command, "c");
   FIELD(Optional<Int>, messageId, "i");

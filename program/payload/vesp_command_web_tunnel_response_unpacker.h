@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-/// Web-tunnel responses.
+/// Web-tunnel responses. A value without fields; callable from any thread.
 #pragma once
 
 #include "program/payload/vesp_command_web_tunnel_response_schema.h"
@@ -12,6 +12,7 @@ struct VespCommandWebTunnelResponseUnpacker {
   using SchemaType = Keelgate::VespCommandWebTunnelResponse;
   using Schema = VespCommandWebTunnelResponseSchema;
 
+  /// Throws DecodingError.
   SchemaType unpack(Bytes from) const;
 };
 

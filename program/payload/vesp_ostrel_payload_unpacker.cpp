@@ -20,6 +20,8 @@ PulseUserPayload VespOstrelPayloadUnpacker::unpack(Bytes from) const {
 }
 
 PulseUserPayload VespOstrelPayloadUnpacker::convertPayload(VespOstrelProtocolPayload&& payload) {
+  // In this order, inner payloads first: it decides which error a message with several faults
+  // gives.
   auto tokens = convertEach(std::move(payload.dstIdTokenList), convertPayload);
   auto messages = convertEach(std::move(payload.ostrelMessageList), convertPayload);
   auto headers = convertIfPresent<PulseUserPayloadHttpHeaders>(std::move(payload.httpHeaders));
@@ -31,6 +33,7 @@ PulseUserPayload VespOstrelPayloadUnpacker::convertPayload(VespOstrelProtocolPay
   auto allocations =
       convertEach<PulseHoplinePluginAllocation>(std::move(payload.pluginAllocations));
 
+  // The eight fields that change their type; the compiler checks that the other 148 do not.
   return construct(fieldByField<PulseUserPayload>(
       std::move(payload),  //
       label<&PulseUserPayload::deliveryContext> = std::move(context),

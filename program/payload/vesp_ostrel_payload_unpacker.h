@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-/// Push payloads.
+/// Push payloads. A value without fields; callable from any thread.
 #pragma once
 
 #include "program/payload/vesp_ostrel_protocol_payload.h"
@@ -12,6 +12,8 @@ struct VespOstrelPayloadUnpacker {
   using SchemaType = Keelgate::PulseUserPayload;
   using Schema = VespOstrelProtocolPayload;
 
+  /// Throws DecodingError. Takes stack for every payload inside a payload: at most 256 of them,
+  /// which the worker's stack has room for twice over.
   SchemaType unpack(Bytes from) const;
 
   /// Payloads inside the payload are converted first. Throws only what a record's constructor

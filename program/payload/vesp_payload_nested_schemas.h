@@ -12,6 +12,7 @@
 
 namespace VespKeelgateService {
 
+/// All of it is optional, here and below: an empty dictionary is a record of absent values.
 struct VespOstrelProtocolHttpHeaders {
   FIELD(Optional<String>, adhocServiceOverride, "aS");
   FIELD(Optional<String>, responseIdentifierString, "ri");
@@ -38,6 +39,7 @@ struct VespHoplinePluginRequest {
   CODING_KEYS(VespHoplinePluginRequest);
 };
 
+/// For one participant; "t" and "tP" are its token and its destination.
 struct VespHoplineAllocationStatus {
   FIELD(Optional<UInt64>, participantId, "hli");
   FIELD(Optional<Int>, allocationStatus, "hls");
@@ -47,6 +49,7 @@ struct VespHoplineAllocationStatus {
   CODING_KEYS(VespHoplineAllocationStatus);
 };
 
+/// The keys are those of the payload's own relay.
 struct VespHoplineSelfAllocToken {
   FIELD(Optional<Data>, relayIp, "hlip");
   FIELD(Optional<Data>, relayIpv6, "hlip6");

@@ -10,8 +10,11 @@
 
 namespace VespKeelgateService {
 
+/// A node lives on the stack of the decoder that made it and must not outlive the outer one, nor
+/// the key, which is a schema's or the message's. One thread.
 class CodingPath {
  public:
+  /// The whole message: an empty path.
   CodingPath() = default;
   CodingPath(const CodingPath& outer, std::string_view key) : outer_(&outer), key_(key) {}
   CodingPath(const CodingPath& outer, std::size_t index)
@@ -36,6 +39,7 @@ class CodingPath {
   }
 
  private:
+  /// Null for the whole message alone.
   const CodingPath* outer_ = nullptr;
   std::string_view key_;
   std::size_t index_ = 0;

@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
+/// The sentences say what was expected and what type was there, never which value: they go into
+/// logs that others read.
 #include "program/schema/decoding_errors.h"
 
 namespace VespKeelgateService::Errors {
@@ -34,6 +36,7 @@ std::string_view nameOf(PropertyList::Type type) {
     case Type::set:
       return "a set";
   }
+  // A type that is none, which only a cast can make.
   return "something else";
 }
 
@@ -77,6 +80,7 @@ DecodingError invalidUUID(const CodingPath& path) {
   return corrupted(path, "The string is no UUID.");
 }
 
+// Without a path: what is damaged, or too much, is the message as a whole.
 DecodingError damaged(const PropertyList::Damage& damage) {
   return {Kind::dataCorrupted,
           std::nullopt,

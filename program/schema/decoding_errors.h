@@ -1,5 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 /// Every error that keyed decoding can throw, built in one place.
+///
+/// Pure functions; callable from any thread. They give the error, and the caller throws it. Nothing
+/// of the message stands in a description but the type that was found.
 #pragma once
 
 #include "plist/damage.h"

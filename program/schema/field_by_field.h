@@ -7,6 +7,8 @@
 /// The two lists are compared at compile time, position by position: they have the same length and
 /// the same names in the same order, and a field whose type changes must be given by its label. A
 /// field that moved, went missing or was forgotten does not compile.
+///
+/// A pure function; callable from any thread. Values are moved, so nothing throws.
 #pragma once
 
 #include <keelgate/describe.h>
@@ -22,11 +24,13 @@ namespace VespKeelgateService {
 
 namespace Detail {
 
+/// A value with the field that it is for.
 template <auto member, class V>
 struct Labelled {
   V value;
 };
 
+/// What stands to the left of the = in a call. The = makes a Labelled and assigns nothing.
 template <auto member>
 struct Label {
   template <class V>
@@ -47,11 +51,13 @@ constexpr auto typeTags() {
   return tags;
 }
 
+/// Also their order: swapped fields of one type would otherwise be copied crosswise.
 template <class S, class R>
 consteval bool namesAgree() {
   return Keelgate::FieldsOf<S>::names == Keelgate::FieldsOf<R>::names;
 }
 
+/// Pointers to members of different types cannot be compared, and are never the same.
 template <class A, class B>
 constexpr bool isSameMember(A one, B other) {
   if constexpr (std::same_as<A, B>) {
@@ -79,9 +85,11 @@ consteval bool changesAreLabelled() {
 
 }  // namespace Detail
 
+/// `label<&Record::field> = value` gives one field, in place of the schema's.
 template <auto member>
 inline constexpr Detail::Label<member> label{};
 
+/// Every field of the record comes from the schema or from a change, never from neither.
 template <class R, class S, auto... members, class... V>
 R fieldByField(S&& schema, Detail::Labelled<members, V>... changes) {
   static_assert(!std::is_lvalue_reference_v<S>, "fieldByField consumes its schema: move it");

@@ -32,9 +32,11 @@ constexpr std::uint32_t keyHash(std::string_view key) {
   return hash * 0x9e37'79b1u;
 }
 
+/// Made by the compiler; constants, usable from any thread.
 template <Keelgate::Schema S>
 class KeyTable {
   static constexpr std::size_t count = S::CodingKeys::size;
+  // A power of two, so that a slot is the hash's highest bits.
   static constexpr std::size_t capacity = std::bit_ceil(4 * count);
   static constexpr int shift = 32 - std::countr_zero(capacity);
   static constexpr std::uint16_t vacant = 0xffff;
@@ -67,6 +69,7 @@ class KeyTable {
 
   /// The position of the field that travels under this key, or `none`.
   static constexpr std::size_t find(std::string_view key) {
+    // Ends: at least three slots in four are vacant.
     for (std::size_t at = home(key);; at = (at + 1) % capacity) {
       const std::uint16_t field = slots[at];
       if (field == vacant || S::CodingKeys::keys[field] == key) return field;

@@ -24,6 +24,7 @@ namespace VespKeelgateService {
 /// The textual form, in upper case.
 std::string uuidText(const Keelgate::UUID& uuid);
 
+/// Pure; callable from any thread. Throws std::bad_alloc.
 template <class T>
 PropertyList::Tree mirror(const T& value) {
   if constexpr (Keelgate::Enumeration<T>) {

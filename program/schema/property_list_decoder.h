@@ -37,7 +37,7 @@ concept DecodesItself = requires(const KeyedContainer& container) {
   { S::decode(container) } -> std::same_as<S>;
 };
 
-/// What the readers of one message share.
+/// What the readers of one message share. Handed down by reference; lives as long as the decoding.
 struct Decoding {
   PropertyList::ExpansionBudget& budget;
 };
@@ -57,7 +57,7 @@ class KeyedContainer {
   }
 
   /// Reads the value under a key. A search from the start: made for the few fields of a schema that
-  /// decodes itself.
+  /// decodes itself. Throws keyNotFound where it is missing, and valueNotFound where it is null.
   template <class T>
   [[nodiscard]] T decode(std::string_view key) const {
     for (const PropertyList::Entry entry : value_.entries()) {
@@ -102,6 +102,7 @@ class FieldValues {
   explicit FieldValues(const PropertyList::Value& dictionary) : dictionary_(dictionary) {
     numbers_.fill(absent);
     for (const PropertyList::Entry entry : dictionary.entries()) {
+      // Keys that no field has are passed over: a newer sender may know more of them.
       const std::size_t field = KeyTable<S>::find(entry.key);
       if (field != KeyTable<S>::none) numbers_[field] = entry.value.number();
     }
@@ -119,6 +120,7 @@ class FieldValues {
   std::array<std::uint32_t, S::CodingKeys::size> numbers_;
 };
 
+/// In declaration order, whatever the order in the message: the same faults give the same error.
 template <Keelgate::Schema S>
 void decodeSchema(Decoding& decoding, const PropertyList::Value& value, const CodingPath& path,
                   S& into) {
@@ -147,6 +149,7 @@ void decodeArray(Decoding& decoding, const PropertyList::Value& value, const Cod
                  Keelgate::Array<T>& into) {
   using PropertyList::Type;
   if (value.type() != Type::array) throw Errors::typeMismatch(path, "an array", value.type());
+  // Before the memory is reserved: a shared array costs its message a byte for each reference.
   decoding.budget.spend(value, value.count() * sizeof(T));
   into.reserve(value.count());
   std::size_t index = 0;
@@ -162,6 +165,7 @@ void decodeCase(Decoding& decoding, const PropertyList::Value& value, const Codi
                 T& into, std::index_sequence<i...>) {
   const KeyedContainer container(decoding, value, path, Keelgate::typeName<T>());
   decoding.budget.spend(value, sizeof(T));
+  // With two, the order in the dictionary would choose the case.
   if (value.count() != 1) throw Errors::notOneKey(path);
   const PropertyList::Entry entry = *value.entries().begin();
   const CodingPath inner(path, entry.key);
@@ -193,8 +197,10 @@ void decodeValue(Decoding& decoding, const PropertyList::Value& value, const Cod
   }
 }
 
+/// Has no settings and keeps nothing.
 class PropertyListDecoder {
  public:
+  /// Throws DecodingError and std::bad_alloc. The schema owns all that it holds: the bytes may go.
   template <Keelgate::Schema S>
   [[nodiscard]] S decode(Keelgate::Bytes from) {
     try {
@@ -205,6 +211,7 @@ class PropertyListDecoder {
       decodeSchema(decoding, document.top(), CodingPath(), schema);
       return schema;
     } catch (const PropertyList::Damage& damage) {
+      // From the check of the document, or from the budget while fields are read.
       throw Errors::damaged(damage);
     }
   }

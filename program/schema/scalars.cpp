@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
+/// No value is rounded, cut or read as another type to make it fit: what a record says is what the
+/// message said.
 #include "program/schema/scalars.h"
 
 #include <cmath>
@@ -40,6 +42,7 @@ Int64 decodeSigned(const Value& value, const CodingPath& path, std::string_view 
   expect(Type::integer, value, path, expected);
   const Integer integer = value.integer();
   const auto number = static_cast<Int64>(integer.bits);
+  // From 2^63 on: read as signed it would turn negative.
   if (!integer.negative && number < 0) throw Errors::numberDoesNotFit(path, expected);
   return number;
 }
@@ -58,6 +61,7 @@ void decode(ExpansionBudget&, const Value& value, const CodingPath& path, Double
   }
   expect(Type::integer, value, path, "Double");
   const Integer integer = value.integer();
+  // Of the smallest number too, which has no positive form with a sign.
   const std::uint64_t magnitude = integer.negative ? 0 - integer.bits : integer.bits;
   const auto rounded = static_cast<double>(magnitude);
   // 2^64 itself is what the largest numbers round to, and is out of range for the way back.
@@ -76,6 +80,7 @@ void decode(ExpansionBudget&, const Value& value, const CodingPath& path, Bool& 
 void decode(ExpansionBudget& budget, const Value& value, const CodingPath& path, String& into) {
   expect(Type::string, value, path, "String");
   const std::string_view text = value.string();
+  // Before the copy: one long string may be referenced a million times.
   budget.spend(value, text.size());
   into = text;
 }
@@ -95,6 +100,7 @@ void decode(ExpansionBudget&, const Value& value, const CodingPath& path, Date& 
 void decode(ExpansionBudget&, const Value& value, const CodingPath& path, UUID& into) {
   expect(Type::string, value, path, "UUID");
   const std::string_view text = value.string();
+  // 32 digits and 4 dashes. No braces, no prefix, no white space: one spelling but for the case.
   if (text.size() != 36) throw Errors::invalidUUID(path);
   std::size_t digits = 0;
   for (std::size_t at = 0; at < text.size(); ++at) {

@@ -1,6 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 /// The single values of a property list as the types that fields have: no conversions but the ones
 /// that are listed with each.
+///
+/// Pure but for the budget, which belongs to one decoding. Each throws DecodingError with `path`,
+/// and Damage where the budget is used up.
 #pragma once
 
 #include "plist/document.h"
@@ -47,6 +50,7 @@ Keelgate::Int64 decodeSigned(const Value& value, const CodingPath& path, std::st
 Keelgate::UInt64 decodeUnsigned(const Value& value, const CodingPath& path,
                                 std::string_view expected);
 
+/// Numbers have a fixed size and are part of what their record was paid for: no budget is asked.
 inline void decode(ExpansionBudget&, const Value& value, const CodingPath& path,
                    Keelgate::Int& into) {
   into = static_cast<Keelgate::Int>(decodeSigned(value, path, "Int"));

@@ -1,5 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 /// The framework's value types under the program's own names, for the schema headers.
+///
+/// Aliases alone. Schema headers include nothing that decodes, so that `describe` can list them
+/// without a decoder being linked.
 #pragma once
 
 #include <keelgate/values.h>

@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
+/// The order is the point of this file: what the process may no longer do comes before what it
+/// will.
 #include "program/service/start_up.h"
 
 #include "framework/contracts/process.h"
@@ -10,12 +12,14 @@ namespace VespKeelgateService {
 
 namespace {
 
+/// Written once, before there is anything to serve.
 Keelgate::KeelgateServer* server = nullptr;
 
 }  // namespace
 
 int startUp() {
   Keelgate::register_for_dlsym_callbacks();
+  // Before the server is touched, and never undone.
   Keelgate::Preferences::setDirectMode(1);
   Keelgate::Preferences::setReadOnly(1);
 
@@ -28,6 +32,7 @@ int startUp() {
       VespClientMessageUnpacker(ServiceToUnpackerMap(Services())));
 
   server->resume(Keelgate::SandboxID::keelgate);
+  // Where there was no sandbox to serve in.
   return 0;
 }
 

@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+/// The entry, apart from main() so that a test can call it. For the main thread, once.
 #pragma once
 
 namespace VespKeelgateService {

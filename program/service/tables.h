@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 /// What the service answers: the registration of a new kind of message is a row here. The entry
 /// registers these tables, and `keelgate describe` prints them.
+///
+/// Types alone: nothing here exists at run time.
 #pragma once
 
 #include "program/invitation/vesp_invitation_unpacker.h"
@@ -20,7 +22,8 @@ using MessageUnpackers =
     Keelgate::TypeList<VespOstrelPayloadUnpacker, VespCommandResponseUnpacker,
                        VespCommandWebTunnelResponseUnpacker, VespInvitationUnpacker>;
 
-/// By the service that a client message arrived under.
+/// By the service that a client message arrived under. Identifiers are compared exactly, with
+/// regard to case.
 using Services = Keelgate::TypeList<
     Service<"com.tessen.private.braid.rtcengine.rtctester", VespSampleMessageUnpacker>,
     Service<"com.tessen.private.braid.viso.video", VisoAudioVideoMessageUnpacker>,

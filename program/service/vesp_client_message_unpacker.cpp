@@ -12,12 +12,14 @@ const AnyServiceUnpacker* ServiceToUnpackerMap::find(const String& service) cons
 
 void ServiceToUnpackerMap::insert(String service, AnyServiceUnpacker unpacker) {
   const bool isNew = entries_.emplace(std::move(service), std::move(unpacker)).second;
+  // Better no service than one whose second row is never asked.
   if (!isNew) std::terminate();
 }
 
 VespClientMessageResult VespClientMessageUnpacker::unpack(Bytes from, const Context& with) const {
   const AnyServiceUnpacker* unpacker = serviceToUnpackerMap_.find(with.service);
   if (unpacker == nullptr) {
+    // As it was received, and not logged: whoever sent it would write into the log at will.
     throw VespClientMessageUnpackingError::noUnpackerForService(with.service);
   }
   return (*unpacker)(from, with);

@@ -41,6 +41,7 @@ class ServiceToUnpackerMap {
   std::map<String, AnyServiceUnpacker> entries_;
 };
 
+/// Stateless but for the map, which is never written after start-up: callable from any thread.
 class VespClientMessageUnpacker {
  public:
   using SchemaType = VespClientMessageResult;

@@ -10,6 +10,7 @@
 
 namespace VespKeelgateService {
 
+/// Deliberate: the name travels as "client". A key "clientName" is an unknown one.
 struct VespSampleMessageSchema {
   FIELD(Int, command);
   FIELD(String, clientName, "client");

@@ -7,12 +7,14 @@
 
 namespace VespKeelgateService {
 
+/// A value without fields; callable from any thread.
 struct VespSampleMessageUnpacker {
   using SchemaType = VespClientMessageResult;
   using Context = VespClientMessageContext;
   using Commands =
       Keelgate::TypeList<OnAnyCommand<VespSampleMessageSchema, Keelgate::VespSampleMessage>>;
 
+  /// Throws Breach for an unknown command, and DecodingError.
   VespClientMessageResult unpack(Bytes from, const Context& with) const;
 };
 

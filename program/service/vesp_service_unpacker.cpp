@@ -10,6 +10,7 @@ CommandType checkCommand(const VespClientMessageContext& context) {
   if (command) return *command;
   Keelgate::Log::keelgate.error("Invalid command ID %@",
                                 Keelgate::rendered(Optional<UInt64>(context.command)));
+  // Logged first: the one line of the program, and a number is all that stands in it.
   throw Keelgate::Breach("com.tessen.Keelgate.VespServiceUnpacker",
                          "Invalid command ID " + std::to_string(context.command));
 }

@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 /// What the unpackers of the single services share: their contract, their command tables, and the
 /// check of the command number that each of them begins with.
+///
+/// The tables are types, and the functions pure but for the log: callable from any thread.
 #pragma once
 
 #include "framework/contracts/unpacker.h"
@@ -27,7 +29,8 @@ concept VespServiceUnpacker = Keelgate::ContextualUnpacker<U> &&
   typename U::Commands;
 };
 
-/// A row of a command table: this command is decoded as S and gives an R.
+/// A row of a command table: this command is decoded as S and gives an R. Being known to the
+/// framework is checked before any table is asked.
 template <UInt64 number, class S, class R>
 struct On {
   static constexpr Optional<UInt64> command = number;
@@ -46,13 +49,14 @@ struct OnAnyCommand {
 /// In a row whose message is answered without being decoded.
 struct NoSchema {};
 
-/// A row of the service table.
+/// The identifier of a row as a template argument, which a string literal by itself cannot be.
 template <std::size_t n>
 struct ServiceIdentifier {
   char text[n];
   consteval ServiceIdentifier(const char (&literal)[n]) { std::copy_n(literal, n, text); }
 };
 
+/// A row of the service table: an identifier, and the unpacker of what arrives under it.
 template <ServiceIdentifier literal, class U>
 struct Service {
   static constexpr std::string_view identifier{literal.text, sizeof(literal.text) - 1};

@@ -12,6 +12,7 @@
 
 namespace VespKeelgateService {
 
+/// The largest, and the only one that says how media travel.
 struct VespSessionInvitationSchema {
   using TransportType = Keelgate::VespSessionInvitation::TransportType;
 
@@ -38,6 +39,7 @@ struct VespSessionInvitationSchema {
   CODING_KEYS(VespSessionInvitationSchema);
 };
 
+/// Keys that it shares with the invitation mean the same, but for "pclm".
 struct VespSessionAcceptSchema {
   FIELD(UInt, version, "v");
   FIELD(Optional<Data>, blob, "b");
@@ -67,6 +69,7 @@ struct VespSessionDeclineSchema {
   CODING_KEYS(VespSessionDeclineSchema);
 };
 
+/// The reason may be absent, but not unknown.
 struct VespSessionCancelSchema {
   using VespSessionEndedReason = Keelgate::VespSessionCancel::VespSessionEndedReason;
 
@@ -79,6 +82,7 @@ struct VespSessionCancelSchema {
   CODING_KEYS(VespSessionCancelSchema);
 };
 
+/// The subcommand is required, and no number stands for an unknown one.
 struct VespSessionReinitiateSchema {
   using VespSessionReinitiateSubcommand =
       Keelgate::VespSessionReinitiate::VespSessionReinitiateSubcommand;

@@ -11,12 +11,15 @@ using Keelgate::construct;
 
 namespace {
 
+/// The command alone chose the row: a message that does not fit it is never tried as another kind,
+/// which would let its sender pick the reading that suits best.
 template <class Row>
 VespClientMessageResult unpackAs(Bytes from) {
   auto schema = PropertyListDecoder().decode<typename Row::Schema>(from);
   return {.result = construct(fieldByField<typename Row::Record>(std::move(schema)))};
 }
 
+/// A walk over the rows of the table, of which at most one has the number.
 template <class... Row>
 VespClientMessageResult unpackCommand(Keelgate::TypeList<Row...>, CommandType command, Bytes from) {
   VespClientMessageResult (*unpack)(Bytes) = nullptr;

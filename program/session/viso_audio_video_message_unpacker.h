@@ -8,6 +8,7 @@
 
 namespace VespKeelgateService {
 
+/// A value without fields; callable from any thread.
 struct VisoAudioVideoMessageUnpacker {
   using SchemaType = VespClientMessageResult;
   using Context = VespClientMessageContext;
@@ -22,6 +23,8 @@ struct VisoAudioVideoMessageUnpacker {
                          On<237, VespSessionDeclineSchema, Keelgate::VespSessionDecline>,
                          On<238, VespSessionReinitiateSchema, Keelgate::VespSessionReinitiate>>;
 
+  /// Throws Breach for an unknown command, VespClientMessageUnpackingError for one without a row,
+  /// and DecodingError.
   VespClientMessageResult unpack(Bytes from, const Context& with) const;
 };
 

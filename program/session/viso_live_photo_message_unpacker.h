@@ -7,11 +7,14 @@
 
 namespace VespKeelgateService {
 
+/// A value without fields; callable from any thread.
 struct VisoLivePhotoMessageUnpacker {
   using SchemaType = VespClientMessageResult;
   using Context = VespClientMessageContext;
   using Commands = Keelgate::TypeList<On<245, NoSchema, Keelgate::VespRestrictedMessage>>;
 
+  /// Deliberate: any bytes will do, none and damaged ones too. Throws Breach for an unknown
+  /// command, and VespClientMessageUnpackingError for any other than the table's.
   VespClientMessageResult unpack(Bytes from, const Context& with) const;
 };
 

@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
+/// Goes by the fields' names, which are the wire keys, so that the 124 numbered fields need no list
+/// of their own that could differ from the schema's.
 #include "program/waymark/waymark_group_fold.h"
 
 #include "framework/contracts/construct.h"
@@ -13,6 +15,7 @@ using Keelgate::WaymarkGroupFields;
 
 namespace {
 
+/// A prefix, and where the group's record keeps it. No name begins with two of them.
 struct Family {
   std::string_view prefix;
   Optional<String> WaymarkGroupFields::*member;
@@ -46,7 +49,9 @@ class GroupMap {
     for (const Family& family : families) {
       if (!name.starts_with(family.prefix)) continue;
       const Optional<UInt> number = groupNumber(name);
+      // The unnumbered field is the first group, which lives in the message's own record.
       if (!number) continue;
+      // Always so for a numbered field. The others only have to compile.
       if constexpr (std::same_as<V, Optional<String>>) {
         group(*number).*family.member = std::move(value);
       }
@@ -61,6 +66,7 @@ class GroupMap {
   }
 
  private:
+  // Made at the first sight of its number, value or not: every message gives all 31.
   WaymarkGroupFields& group(UInt number) {
     const auto known = groups_.find(number);
     if (known != groups_.end()) return known->second;

@@ -7,11 +7,13 @@
 
 namespace VespKeelgateService {
 
+/// A value without fields; callable from any thread.
 struct WaymarkMessageUnpacker {
   using SchemaType = VespClientMessageResult;
   using Context = VespClientMessageContext;
   using Commands = Keelgate::TypeList<OnAnyCommand<WaymarkSchema, Keelgate::WaymarkMessage>>;
 
+  /// Throws Breach for an unknown command, and DecodingError.
   VespClientMessageResult unpack(Bytes from, const Context& with) const;
 };
 
