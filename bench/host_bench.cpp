@@ -86,6 +86,25 @@ double bareRoundTrip() {
   return result;
 }
 
+Client::Options options(std::size_t messagesPerProcess) {
+  Client::Options options;
+  options.processes = 1;
+  options.messagesPerProcess = messagesPerProcess;
+  options.servicePath = KEELGATE_SERVICE;
+  return options;
+}
+
+/// A client and a worker that are in full swing: what a service without C6 would cost.
+double warmRoundTrip() {
+  static const double result = [] {
+    Client client(options(1'000'000'000));
+    const Data bytes = message();
+    return medianOf(5000,
+                    [&] { benchmark::DoNotOptimize(client.unpack<VespCommandResponse>(bytes)); });
+  }();
+  return result;
+}
+
 /// Runs the call with a pause behind each, in which the service can get ready for the next one.
 template <class Call>
 void measure(benchmark::State& state, std::chrono::microseconds pause, Call call) {
@@ -99,14 +118,7 @@ void measure(benchmark::State& state, std::chrono::microseconds pause, Call call
   state.counters["median_us"] = middle;
   state.counters["x_fork"] = middle / bareFork();
   state.counters["x_trip"] = middle / bareRoundTrip();
-}
-
-Client::Options options(std::size_t messagesPerProcess) {
-  Client::Options options;
-  options.processes = 1;
-  options.messagesPerProcess = messagesPerProcess;
-  options.servicePath = KEELGATE_SERVICE;
-  return options;
+  state.counters["x_warm"] = middle / warmRoundTrip();
 }
 
 void bareForkExitWait(benchmark::State& state) {
@@ -161,6 +173,32 @@ void coldStart(benchmark::State& state) {
     benchmark::DoNotOptimize(client->unpack<VespCommandResponse>(bytes));
   });
 }
+
+#ifdef KEELGATE_OBEDIENT_SERVICE
+/// From the deadline of a message whose worker spins until its caller has the error.
+void pastTheDeadline(benchmark::State& state) {
+  constexpr std::chrono::milliseconds limit(20);
+  Client::Options its = options(1);
+  its.servicePath = KEELGATE_OBEDIENT_SERVICE;
+  its.timeLimit = limit;
+  Client client(its);
+  constexpr std::string_view order = "spin";
+  std::vector<double> samples;
+  for (auto _ : state) {
+    samples.push_back(timed([&] {
+                        try {
+                          client.unpack<VespCommandResponse>(std::as_bytes(std::span(order)));
+                        } catch (const HostError&) {
+                        }
+                      }) -
+                      Micros(limit).count());
+    state.SetIterationTime(samples.back() / 1e6);
+  }
+  state.counters["longest_us"] = *std::max_element(samples.begin(), samples.end());
+  state.counters["median_us"] = median(std::move(samples));
+}
+BENCHMARK(pastTheDeadline)->UseManualTime()->Iterations(100);
+#endif
 
 /// Kilobytes that all processes below this one have resident, shared pages counted in each.
 std::size_t residentBelow(const std::filesystem::path& process) {

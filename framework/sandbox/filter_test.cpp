@@ -81,7 +81,7 @@ void expectEverywhere(std::span<const Rule> rules, Expected&& expected) {
   }
 }
 
-TEST(Filter, WorkerReadsWritesAndExits) {
+TEST(Filter, C1WorkerReadsWritesAndExits) {
   expectEverywhere(workerRules(), [](int number, unsigned first) -> unsigned {
     if ((number == 0 || number == 1) && first == 3) return SECCOMP_RET_ALLOW;
     if (number == 231) return SECCOMP_RET_ALLOW;

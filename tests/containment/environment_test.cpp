@@ -53,8 +53,8 @@ void refuseCalls(const std::vector<Refused>& rows) {
   if (syscall(SYS_seccomp, SECCOMP_SET_MODE_FILTER, 0, &handed) != 0) _exit(126);
 }
 
-void becomeUser(std::vector<gid_t> groups) {
-  if (setgroups(groups.size(), groups.data()) != 0 || setresgid(1000, 1000, 1000) != 0 ||
+void becomeUser(const std::vector<gid_t>& with) {
+  if (setgroups(with.size(), with.data()) != 0 || setresgid(1000, 1000, 1000) != 0 ||
       setresuid(1000, 1000, 1000) != 0) {
     _exit(126);
   }
@@ -68,151 +68,94 @@ constexpr unsigned allNamespaceFlags = CLONE_NEWUSER | CLONE_NEWPID | CLONE_NEWN
 
 struct Environment {
   std::string name;
-  std::function<void()> before;
+  std::vector<Refused> refused = {};
   /// Second walls that are missing then.
   unsigned missing = 0;
   /// Or part of the sentence of a service that refuses.
   std::string refusal = {};
+  /// The caller is a user with these groups, and not root.
+  Optional<std::vector<gid_t>> user = {};
+  std::function<void()> before = [] {
+  };
   /// Without one this environment is another.
   bool needsUserNamespace = false;
 };
 
+const std::vector<gid_t> groups{1000, 27};
+
 const std::vector<Environment> environments{
-    {.name = "nothing taken away",
-     .before =
-         [] {
-         }},
+    {.name = "nothing taken away"},
     {.name = "a container's profile, as root",
-     .before =
-         [] {
-           refuseCalls({{SYS_clone, EPERM, allNamespaceFlags},
-                        {SYS_unshare, EPERM},
-                        {SYS_mount, EPERM},
-                        {SYS_pivot_root, EPERM}});
-         },
+     .refused = {{SYS_clone, EPERM, allNamespaceFlags},
+                 {SYS_unshare, EPERM},
+                 {SYS_mount, EPERM},
+                 {SYS_pivot_root, EPERM}},
      .missing = namespaces},
     {.name = "a container's profile, as a user with groups",
-     .before =
-         [] {
-           refuseCalls({{SYS_clone, EPERM, allNamespaceFlags}, {SYS_unshare, EPERM}});
-           becomeUser({1000, 27});
-         },
-     .missing = namespaces | layerNoSupplementaryGroups},
-    {.name = "a user", .before = [] { becomeUser({}); }, .needsUserNamespace = true},
+     .refused = {{SYS_clone, EPERM, allNamespaceFlags}, {SYS_unshare, EPERM}},
+     .missing = namespaces | layerNoSupplementaryGroups,
+     .user = groups},
+    {.name = "a user", .user = std::vector<gid_t>(), .needsUserNamespace = true},
     {.name = "a user with his groups",
-     .before =
-         [] {
-           becomeUser({1000, 27});
-         },
      .missing = layerNoSupplementaryGroups,
+     .user = groups,
      .needsUserNamespace = true},
     {.name = "user namespaces switched off, as root",
-     .before =
-         [] {
-           refuseCalls({{SYS_clone, ENOSPC, CLONE_NEWUSER}});
-         },
+     .refused = {{SYS_clone, ENOSPC, CLONE_NEWUSER}},
      .missing = layerUserNamespace},
     {.name = "user namespaces switched off, as a user",
-     .before =
-         [] {
-           refuseCalls({{SYS_clone, EPERM, CLONE_NEWUSER}});
-           becomeUser({});
-         },
-     .missing = namespaces},
+     .refused = {{SYS_clone, EPERM, CLONE_NEWUSER}},
+     .missing = namespaces,
+     .user = std::vector<gid_t>()},
     {.name = "no process namespace",
-     .before =
-         [] {
-           refuseCalls({{SYS_clone, EINVAL, CLONE_NEWPID}});
-         },
+     .refused = {{SYS_clone, EINVAL, CLONE_NEWPID}},
      .missing = layerPidNamespace},
     {.name = "namespaces given, mounting refused by a security module",
-     .before =
-         [] {
-           refuseCalls({{SYS_mount, EACCES}});
-         },
+     .refused = {{SYS_mount, EACCES}},
      .missing = layerEmptyRoot},
     {.name = "one namespace unknown to the kernel",
-     .before =
-         [] {
-           refuseCalls({{SYS_unshare, EINVAL, CLONE_NEWCGROUP}});
-         },
+     .refused = {{SYS_unshare, EINVAL, CLONE_NEWCGROUP}},
      .missing = layerCgroupNamespace},
     {.name = "root that may not change its identifiers, and no namespaces",
-     .before =
-         [] {
-           refuseCalls({{SYS_clone, EPERM, allNamespaceFlags},
-                        {SYS_unshare, EPERM},
-                        {SYS_setresuid, EPERM},
-                        {SYS_setresgid, EPERM}});
-         },
+     .refused = {{SYS_clone, EPERM, allNamespaceFlags},
+                 {SYS_unshare, EPERM},
+                 {SYS_setresuid, EPERM},
+                 {SYS_setresgid, EPERM}},
      .missing = namespaces | layerNotRoot},
     {.name = "a kernel without Landlock",
-     .before =
-         [] {
-           refuseCalls({{SYS_landlock_create_ruleset, ENOSYS}});
-         },
+     .refused = {{SYS_landlock_create_ruleset, ENOSYS}},
      .missing = layerLandlock},
     {.name = "Landlock switched off",
-     .before =
-         [] {
-           refuseCalls({{SYS_landlock_create_ruleset, EOPNOTSUPP}});
-         },
+     .refused = {{SYS_landlock_create_ruleset, EOPNOTSUPP}},
      .missing = layerLandlock},
-    {.name = "a kernel without close_range",
-     .before =
-         [] {
-           refuseCalls({{SYS_close_range, ENOSYS}});
-         }},
+    {.name = "a kernel without close_range", .refused = {{SYS_close_range, ENOSYS}}},
+    // A user namespace is refused in there; the process still becomes nobody.
     {.name = "chroot",
+     .missing = layerUserNamespace | layerEmptyRoot,
      .before =
          [] {
            if (chroot("/var") != 0 || chdir("/") != 0) _exit(126);
-         },
-     // A user namespace is refused in there; the process still becomes nobody.
-     .missing = layerUserNamespace | layerEmptyRoot},
+         }},
     {.name = "signals ignored by the one who starts it",
      .before =
          [] {
            for (int number = 1; number < NSIG; ++number) std::signal(number, SIG_IGN);
          }},
-    {.name = "seccomp refused",
-     .before =
-         [] {
-           refuseCalls({{SYS_seccomp, EPERM}});
-         },
-     .refusal = "allow seccomp"},
-    {.name = "limits refused",
-     .before =
-         [] {
-           refuseCalls({{SYS_prlimit64, EPERM}});
-         },
-     .refusal = "resource limits"},
-    {.name = "prctl refused",
-     .before =
-         [] {
-           refuseCalls({{SYS_prctl, EPERM}});
-         },
-     .refusal = "The service could not"},
+    {.name = "seccomp refused", .refused = {{SYS_seccomp, EPERM}}, .refusal = "allow seccomp"},
+    {.name = "limits refused", .refused = {{SYS_prlimit64, EPERM}}, .refusal = "resource limits"},
+    {.name = "prctl refused", .refused = {{SYS_prctl, EPERM}}, .refusal = "The service could not"},
     {.name = "capabilities kept",
-     .before =
-         [] {
-           refuseCalls({{SYS_capset, EPERM}});
-         },
+     .refused = {{SYS_capset, EPERM}},
      .refusal = "capset",
      .needsUserNamespace = true},
-    {.name = "no process to be had",
-     .before =
-         [] {
-           refuseCalls({{SYS_clone, EAGAIN}});
-         },
-     .refusal = "ulimit -u"},
+    {.name = "no process to be had", .refused = {{SYS_clone, EAGAIN}}, .refusal = "ulimit -u"},
     {.name = "an address space that is too small",
+     .refusal = "ulimit -v",
      .before =
          [] {
            const rlimit small{.rlim_cur = 64 << 20, .rlim_max = 64 << 20};
            setrlimit(RLIMIT_AS, &small);
-         },
-     .refusal = "ulimit -v"},
+         }},
 };
 
 /// For people who read a failure.
@@ -242,7 +185,11 @@ TEST_P(EnvironmentTest, RunsAndReportsOrRefusesWithReason) {
     GTEST_SKIP() << "this machine gives no user namespaces (a chroot never does)";
   }
   RawOptions options;
-  options.before = environment.before;
+  options.before = [&] {
+    environment.before();
+    if (!environment.refused.empty()) refuseCalls(environment.refused);
+    if (environment.user) becomeUser(*environment.user);
+  };
   RawClient service(OBEDIENT_SERVICE, options);
   if (!environment.refusal.empty()) {
     EXPECT_NE(service.refusal().find(environment.refusal), std::string::npos) << service.refusal();

@@ -5,10 +5,13 @@
 /// A message is a line of words:
 ///
 ///     call N [A...]    system call N with up to six arguments; its result is the answer's
-///     messageId int80 N          the same by the old 32-bit gate vsyscall N       slot N of the
-///     vsyscall page say HEX          writes these bytes to the channel, and answers afterwards
+///                      messageId
+///     int80 N          the same by the old 32-bit gate
+///     vsyscall N       slot N of the vsyscall page
+///     say HEX          writes these bytes to the channel, and answers afterwards
 ///     drip HEX         the same, one byte a second
 ///     eat BYTES        takes and touches that much memory in pieces of 64 KiB, and keeps it
+///     count            how many of these this process has been given
 ///     log N LENGTH     logs N lines of that length, and answers
 ///     fault | trap | abort | recurse | spin | throw | execute
 ///     answer           behaves
@@ -109,6 +112,9 @@ void misbehave(const std::string& how) {
   }
 }
 
+/// What a message could leave behind for the next.
+long messagesSeen = 0;
+
 long obey(const std::string& order) {
   std::istringstream words(order);
   std::string verb;
@@ -125,6 +131,7 @@ long obey(const std::string& order) {
     const std::string line(static_cast<std::size_t>(numbers.at(1)), 'x');
     for (long rest = numbers.at(0); rest > 0; --rest) Log::keelgate.error("%@", line);
   }
+  if (verb == "count") return ++messagesSeen;
   if (verb == "call") return call(numbers);
   if (verb == "int80") return callByGate(numbers.at(0));
   if (verb == "vsyscall") return callVsyscall(numbers.at(0));

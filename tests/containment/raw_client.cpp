@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "tests/containment/raw_client.h"
 
+#include "framework/client/control_frames.h"
 #include "framework/transport/layers.h"
 #include "framework/transport/record_coding.h"
 
@@ -101,26 +102,10 @@ std::vector<pid_t> RawClient::workers() const {
 
 void RawClient::sendFrame(ControlKind kind, std::uint32_t slot, std::vector<std::uint64_t> numbers,
                           int descriptor, std::uint32_t magic) {
-  ControlFrame frame{.magic = magic,
-                     .version = protocolVersion,
-                     .kind = kind,
-                     .slot = slot,
-                     .reserved = 0,
-                     .numbers = {}};
+  ControlFrame frame = makeFrame(kind, slot);
+  frame.magic = magic;
   std::copy(numbers.begin(), numbers.end(), std::begin(frame.numbers));
-  iovec place{.iov_base = &frame, .iov_len = sizeof frame};
-  alignas(cmsghdr) std::array<char, CMSG_SPACE(sizeof(int))> room{};
-  msghdr packet{};
-  packet.msg_iov = &place;
-  packet.msg_iovlen = 1;
-  if (descriptor >= 0) {
-    packet.msg_control = room.data();
-    packet.msg_controllen = room.size();
-    cmsghdr* const item = CMSG_FIRSTHDR(&packet);
-    *item = {.cmsg_len = CMSG_LEN(sizeof(int)), .cmsg_level = SOL_SOCKET, .cmsg_type = SCM_RIGHTS};
-    std::memcpy(CMSG_DATA(item), &descriptor, sizeof descriptor);
-  }
-  sendmsg(control_, &packet, MSG_NOSIGNAL);
+  Keelgate::sendFrame(control_, frame, descriptor, deadlineAfter(std::chrono::seconds(1)));
 }
 
 ControlFrame RawClient::receiveFrame() {

@@ -68,6 +68,7 @@ void obey(Bytes script, std::uint32_t sequence) {
     if (step.op == Op::pause) usleep(step.amount * 1000);
     if (step.op == Op::raise) die(static_cast<int>(step.amount));
     if (step.op == Op::raiseIfUsed && sequence > 0) die(static_cast<int>(step.amount));
+    if (step.op == Op::hitZygote) kill(getppid(), static_cast<int>(step.amount));
     if (step.op == Op::exit) _exit(static_cast<int>(step.amount));
     while (step.op == Op::endless) writeAll(std::array<std::byte, 4096>());
   }
@@ -78,7 +79,8 @@ void obey(Bytes script, std::uint32_t sequence) {
   for (std::uint64_t i = 0; i < messages; ++i) {
     RequestHeader header;
     readAll(&header, sizeof header);
-    if (header.command == dieAfterHeader) die(SIGSEGV);
+    const std::uint64_t signal = header.command - raiseAfterHeader;
+    if (signal > 0 && signal < NSIG) die(static_cast<int>(signal));
     if (header.command == answerBeforeBody) writeFrame(header.sequence, {});
     while (header.command == ignoreBody || header.command == answerBeforeBody) pause();
     String service(header.serviceLength, ' ');

@@ -11,7 +11,17 @@
 
 namespace Keelgate::Host {
 
-enum class Op : std::uint8_t { write, answer, log, pause, raise, raiseIfUsed, exit, endless };
+enum class Op : std::uint8_t {
+  write,
+  answer,
+  log,
+  pause,
+  raise,
+  raiseIfUsed,
+  hitZygote,
+  exit,
+  endless
+};
 
 /// Behind it stand `amount` bytes for write, answer and log; for the others it is the milliseconds,
 /// the signal or the status.
@@ -22,9 +32,10 @@ struct Step {
 
 /// Contexts whose command is one of these don't get as far as their script.
 enum Interruption : std::uint64_t {
-  dieAfterHeader = 1'000'001,
-  ignoreBody = 1'000'002,
-  answerBeforeBody = 1'000'003,
+  ignoreBody = 1'000'001,
+  answerBeforeBody = 1'000'002,
+  /// And the number of a signal.
+  raiseAfterHeader = 2'000'000,
 };
 
 /// Builds a script, step by step.
