@@ -26,8 +26,10 @@ constexpr bool isSpace(char c) noexcept {
   return c == ' ' || c == '\n' || c == '\t' || c == '\r';
 }
 
+// Cheap to copy: a copy is how a reader looks ahead, or goes back.
 class Cursor {
  public:
+  // The whole message.
   explicit Cursor(Bytes message) noexcept : Cursor(message, 0, message.size()) {}
   // The window [from, to) of the message, with from <= to <= its length.
   Cursor(Bytes message, std::size_t from, std::size_t to) noexcept
@@ -72,7 +74,7 @@ class Cursor {
   }
 
   // The word that stands at `offset`, in the machine's byte order. Requires that it ends in the
-  // text.
+  // text. By memcpy, since nothing in a message is aligned.
   template <typename Word>
   static Word wordAt(std::string_view text, std::size_t offset) noexcept {
     Word word;
@@ -104,7 +106,7 @@ class Cursor {
   }
   // Moves on by at most what remains.
   void skip(std::size_t length) noexcept { here_ += length < remaining() ? length : remaining(); }
-  // Moves past the literal if it stands here; says whether it did.
+  // Moves past the literal if it stands here; says whether it did. Case counts, as it does in XML.
   bool skipIf(std::string_view literal) noexcept {
     if (!rest().starts_with(literal)) return false;
     here_ += literal.size();

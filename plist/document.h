@@ -195,6 +195,7 @@ class Document {
   Document(const Document&) = delete;
   Document& operator=(const Document&) = delete;
 
+  // Of any type: that it must be a dictionary is for whoever has a schema.
   Value top() const noexcept { return {store_, store_.top, false}; }
 
  private:

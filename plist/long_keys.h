@@ -34,6 +34,7 @@ class LongKeys {
   void collectStrings();
   void rankStrings();
 
+  // Read alone: nodes and texts stay as they are.
   Store& store_;
   SmallBuffer<std::string_view, 64> keys_;
   SmallBuffer<std::uint32_t, 8> deferred_;  // dictionaries

@@ -18,6 +18,8 @@
 
 namespace PropertyList {
 
+// What values can be. The last two and null exist in binary alone: no field takes the two, and null
+// is absence.
 enum class Type : std::uint8_t {
   null,
   boolean,
@@ -60,7 +62,8 @@ struct Node {
 // its table.
 static_assert(sizeof(Node) == 16);
 
-// Inline room for a small message: 128 nodes are 2 KiB, on the stack of whoever decodes.
+// Inline room for a small message: 128 nodes are 2 KiB, on the stack of whoever decodes. Two
+// formats, one shape: whoever walks it asks the members below and never knows which it is.
 struct Store {
   Bytes message;
   SmallBuffer<Node, 128> nodes;
@@ -96,7 +99,8 @@ struct Store {
   }
 };
 
-// Fill a store whose message is set. Throw Damage and std::bad_alloc.
+// Fill a store whose message is set. Throw Damage and std::bad_alloc. They leave the store as it is
+// then: a Document whose constructor throws is never seen.
 void readBinary(Store& store);
 void readXml(Store& store);
 

@@ -19,6 +19,7 @@ namespace PropertyList {
 
 struct Tree;
 
+// Any double; a writer refuses what its format cannot say.
 struct Date {
   double seconds;  // since 2001-01-01T00:00:00Z
 

@@ -11,6 +11,7 @@
 
 namespace PropertyList {
 
+// With its length, because the number alone does not tell how it was spelt.
 struct Character {
   char32_t codePoint;
   std::size_t length;  // in UTF-8 bytes; 0 where the text is not well-formed

@@ -16,6 +16,8 @@
 
 namespace PropertyList {
 
+// All that a property list may have below its root. `yes` and `no` stand for what is spelt as the
+// keywords of C++.
 enum class Element : std::uint8_t {
   string,
   key,
@@ -75,7 +77,8 @@ constexpr const Spelling& spellingOf(Element element) noexcept {
 }
 
 // Tells the elements apart by the first four characters: a multiplication gives each a slot of its
-// own, and the compiler looks for the factor.
+// own, and the compiler looks for the factor. A message cannot make it slow: there is one
+// multiplication for any word, and no list to search.
 class ElementTable {
  public:
   constexpr ElementTable() noexcept {

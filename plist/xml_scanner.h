@@ -25,6 +25,7 @@ class XmlScanner {
   XmlScanner(Bytes message, SmallBuffer<char, 512>& side) noexcept
       : cursor_(message), side_(side) {}
 
+  // For the reader of elements, which tests and passes tags by itself.
   Cursor& cursor() noexcept { return cursor_; }
 
   // Byte order mark, XML declaration and document type, with what may stand around them.
@@ -42,7 +43,8 @@ class XmlScanner {
     if (!usualEndTag(element)) unusualEndTag(element.name);
   }
 
-  // The text that stands here, up to the end tag of `element`, which is passed.
+  // The text that stands here, up to the end tag of `element`, which is passed. An offset and no
+  // view, because assembling the next text may move the side buffer.
   struct Text {
     std::size_t offset;  // in the message or in the side buffer
     std::size_t length;
@@ -56,9 +58,11 @@ class XmlScanner {
     return {start, end - start, false};
   }
 
+  // Where the cursor stands now, which is at or just behind the fault.
   [[noreturn]] void fail(Problem problem) const { throw Damage(problem, cursor_.position()); }
 
  private:
+  // Leaves the cursor where it was unless the tag is spelt as most writers do.
   bool usualEndTag(const Spelling& element) noexcept {
     constexpr ShortText beginning("</");
     if (!beginning.begins(cursor_.word(0)) || !element.end.begins(cursor_.word(2))) return false;

@@ -20,7 +20,9 @@ class DescriptorBook {
   /// Room for so many; what is opened beyond it works, but stays open in a forked child.
   explicit DescriptorBook(std::size_t capacity);
 
-  /// In a forked child: closes the child's copies. Their owners must never run again.
+  /// In a forked child: closes the child's copies. Their owners must never run again. Nothing but
+  /// system calls and atomics: after a fork there may be a lock that nobody will release, also
+  /// inside the C library.
   void closeAll() noexcept;
 
  private:

@@ -31,7 +31,9 @@ class Turnstile {
   };
 
   std::mutex mutex_;
+  /// Above 0 only while nobody waits.
   std::size_t free_;
+  /// First come, first served.
   std::deque<Waiter*> waiting_;
 };
 

@@ -32,13 +32,14 @@ constexpr std::uint32_t magic = 0x4b47'4154;
 /// To be raised with any change of what travels: two builds that differ must refuse each other.
 constexpr std::uint16_t protocolVersion = 1;
 
-/// The channel's number in every process of the service.
+/// The channel's number in every process of the service. The first behind the standard ones, which
+/// a service has not got.
 constexpr int serviceDescriptor = 3;
 
 /// From 1, here and below, so that a frame of zeros is none.
 enum class ControlKind : std::uint16_t { hello = 1, ready, fork, kill, exit, refused };
 
-/// The walls around a worker. layers.h names them.
+/// The walls around a worker. layers.h names them. A report is the sum of its bits.
 enum Layer : std::uint32_t {
   /// The first walls: never missing in a service that said it was ready.
   layerStrictFilter = 1u << 0,
@@ -86,6 +87,7 @@ struct ControlFrame {
   std::uint32_t magic;
   std::uint16_t version;
   ControlKind kind;
+  /// Of fork, kill and exit; 0 in the others.
   std::uint32_t slot;
   std::uint32_t reserved;
   std::uint64_t numbers[4];
@@ -94,6 +96,8 @@ struct ControlFrame {
 // was there before.
 static_assert(sizeof(ControlFrame) == 48);
 
+/// Stands before every request on a data channel. Written by the client, which is trusted; the
+/// bytes that follow it are not.
 struct RequestHeader {
   std::uint32_t magic;
   std::uint16_t version;
@@ -111,11 +115,14 @@ static_assert(sizeof(RequestHeader) == 32);
 /// Frames of `log` come first; one of the others is the last.
 enum class ReplyKind : std::uint16_t { log = 1, record, error };
 
+/// Stands before every frame that a worker sends. It may be taken over by then: any of these may be
+/// a lie.
 struct ReplyHeader {
   std::uint32_t magic;
   std::uint16_t version;
   ReplyKind kind;
   std::uint32_t sequence;
+  /// Always 0: another number would be a second spelling of one frame.
   std::uint32_t reserved;
   std::uint64_t bodyLength;
 };

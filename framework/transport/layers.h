@@ -46,7 +46,7 @@ constexpr std::size_t firstWalls = 6;
 constexpr std::size_t secondWalls = 9;
 
 /// One line for the log that names the second walls which `layers` lacks; empty when none is
-/// missing.
+/// missing. It ends without a full stop, so that a sentence can go on from it.
 std::string missingLayersLine(std::uint64_t layers);
 
 /// A sentence that says what a service could not have and how to get it. `error` is the errno that

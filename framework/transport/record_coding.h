@@ -23,6 +23,7 @@ namespace Keelgate::Transport {
 
 // ---------------------------------------------------------------------------------- writing
 
+// Declared before its special cases: they and it call one another.
 template <class T>
 void write(Writer& to, const T& value);
 
@@ -56,6 +57,7 @@ void write(Writer& to, const T& value) {
   } else if constexpr (std::same_as<T, Data>) {
     to.octets(value);
   } else if constexpr (CaseKeyed<T>) {
+    // A byte is enough: the largest of these enumerations has eight cases.
     to.byte(static_cast<std::uint8_t>(value.index()));
     std::visit([&](const auto& payload) { write(to, payload); }, value);
   } else {
@@ -97,6 +99,7 @@ void readCase(Reader& from, T& value, int depth, std::index_sequence<i...>) {
   if (!known) throw MalformedReply();
 }
 
+/// Only records count as depth: only through one of them can a value hold another of its own kind.
 template <class T>
 void readRecord(Reader& from, T& value, int depth) {
   static_assert(T::Labels::isComplete(), "a member of the record is not in its list of fields");
@@ -138,7 +141,7 @@ void read(Reader& from, T& value, int depth) {
   }
 }
 
-/// The body of a record frame.
+/// The body of a record frame. For the service. Throws std::bad_alloc.
 template <Record T>
 Data encodeRecord(const T& record) {
   Writer to;
@@ -147,6 +150,8 @@ Data encodeRecord(const T& record) {
 }
 
 /// The record that a body holds. Throws MalformedReply, or what the record's constructor throws.
+/// For the client. What it gives is a record that an honest service might have sent: whether this
+/// one did is not to be known.
 template <Record T>
 T decodeRecord(Bytes body) {
   Reader from(body);

@@ -30,6 +30,7 @@ class Writer {
   Writer() { out_.reserve(512); }
   void byte(std::uint8_t value) { out_.push_back(std::byte{value}); }
   void word(std::uint64_t value) { append(&value, sizeof value); }
+  /// Behind their length, so that no octet needs escaping.
   void octets(Bytes value) {
     word(value.size());
     append(value.data(), value.size());
@@ -40,6 +41,7 @@ class Writer {
   [[nodiscard]] Data take() && { return std::move(out_); }
 
  private:
+  // Through void*, so that a number is written as it lies in memory.
   void append(const void* from, std::size_t size) {
     const auto* bytes = static_cast<const std::byte*>(from);
     out_.insert(out_.end(), bytes, bytes + size);
@@ -84,6 +86,7 @@ class Reader {
   }
 
  private:
+  // Everything that is read comes through here.
   Bytes take(std::uint64_t size) {
     // Compared, not added to a position: no length that a liar announces can wrap.
     if (size > rest_.size()) throw MalformedReply();

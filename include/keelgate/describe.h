@@ -127,6 +127,7 @@ class FieldList {
     return static_cast<std::size_t>(std::count(std::begin(has), std::end(has), true));
   }
 
+  // From the top down: the order of the lines is the order of the fields.
   template <int... offsets>
   static constexpr auto findLines(std::integer_sequence<int, offsets...> range) {
     constexpr bool has[] = {Detail::HasField<S, first + offsets>...};
@@ -201,7 +202,8 @@ class FieldList {
            !decltype(Detail::takesMore<S>(All(), 0))::value;
   }
 
-  /// Calls `visitor(field)` for every field in declaration order.
+  /// Calls `visitor(field)` for every field in declaration order. At compile time or at run time.
+  /// The field comes by value.
   template <class Visitor>
   static constexpr void each(Visitor&& visitor) {
     eachOf(visitor, Lines());
@@ -243,6 +245,7 @@ concept Record = requires {
   typename T::Labels;
 };
 
+/// Either kind of struct. None is both.
 template <class T>
 concept Described = Schema<T> || Record<T>;
 

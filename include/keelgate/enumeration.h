@@ -39,6 +39,7 @@ constexpr std::size_t countNames(std::string_view list) {
   return n;
 }
 
+/// Of the spaces that the preprocessor leaves; it leaves no other white space.
 constexpr std::string_view trim(std::string_view text) {
   while (!text.empty() && text.front() == ' ') text.remove_prefix(1);
   while (!text.empty() && text.back() == ' ') text.remove_suffix(1);
@@ -91,7 +92,7 @@ concept Defaulting = Enumeration<E> && requires(E value) {
   keelgateDefault(value);
 };
 
-/// All cases in declaration order.
+/// All cases in declaration order. A constant of the program: views of it never end.
 template <Enumeration E>
 inline constexpr auto casesOf = keelgateCases(E{});
 

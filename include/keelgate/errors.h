@@ -83,6 +83,8 @@ class KEELGATE_API Breach : public Error {
 /// its process has had its only try.
 class KEELGATE_API HostError : public Error {
  public:
+  /// For programs, which may treat them differently: timedOut and crashed say nothing of the next
+  /// message, startFailed does.
   enum class Reason : std::uint8_t {
     /// The process that held the message died.
     crashed,
@@ -98,6 +100,7 @@ class KEELGATE_API HostError : public Error {
     startFailed,
   };
 
+  /// An empty description stands for the reason's own sentence.
   HostError(Reason itsReason, String itsDescription);
 
   Reason reason;

@@ -13,6 +13,8 @@
 
 namespace VespKeelgateService {
 
+/// Values are decoded and never combined: no field decides whether another counts, and no list has
+/// a length that another must have.
 struct VespOstrelProtocolPayload {
   // What the payload is: the one field that is always there.
   FIELD(Int, command, "c");

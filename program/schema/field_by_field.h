@@ -67,7 +67,8 @@ constexpr bool isSameMember(A one, B other) {
   }
 }
 
-/// Whether every field whose type changes has a label.
+/// Whether every field whose type changes has a label. A label may stand on a field whose type
+/// agrees, too: then it replaces the value.
 template <class S, class R, auto... members>
 consteval bool changesAreLabelled() {
   std::array<bool, Keelgate::FieldsOf<R>::size> labelled{};

@@ -16,7 +16,9 @@
 
 namespace VespKeelgateService {
 
-/// The wire keys of a schema are told apart by their length and five of their characters.
+/// The wire keys of a schema are told apart by their length and five of their characters. That is
+/// as good as it must be: keys that meet are compared in full, and how many of a schema's own meet
+/// is known when it is built.
 constexpr std::uint32_t keyHash(std::string_view key) {
   const std::size_t n = key.size();
   if (n == 0) return 0;
@@ -39,6 +41,7 @@ class KeyTable {
   // A power of two, so that a slot is the hash's highest bits.
   static constexpr std::size_t capacity = std::bit_ceil(4 * count);
   static constexpr int shift = 32 - std::countr_zero(capacity);
+  // No schema has so many fields.
   static constexpr std::uint16_t vacant = 0xffff;
 
   static constexpr std::size_t home(std::string_view key) {

@@ -49,6 +49,7 @@ void decodeValue(Decoding& decoding, const PropertyList::Value& value, const Cod
 /// A dictionary as the fields of a schema see it. Borrowed by the schemas that decode themselves.
 class KeyedContainer {
  public:
+  /// Throws typeMismatch for a value of another type. All of it is borrowed.
   KeyedContainer(Decoding& decoding, const PropertyList::Value& value, const CodingPath& path,
                  std::string_view schema)
       : decoding_(decoding), value_(value), path_(path) {
@@ -69,6 +70,7 @@ class KeyedContainer {
     throw Errors::keyNotFound(path_, key);
   }
 
+  /// The dictionary, and where it stands.
   [[nodiscard]] const PropertyList::Value& value() const { return value_; }
   [[nodiscard]] const CodingPath& path() const { return path_; }
 
@@ -114,6 +116,7 @@ class FieldValues {
   }
 
  private:
+  // No object has this number: a message of 4 GiB has fewer.
   static constexpr std::uint32_t absent = 0xffff'ffff;
 
   const PropertyList::Value& dictionary_;

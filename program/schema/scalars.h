@@ -83,7 +83,8 @@ void decode(ExpansionBudget& budget, const Value& value, const CodingPath& path,
 void decode(ExpansionBudget& budget, const Value& value, const CodingPath& path,
             Keelgate::UUID& into);
 
-/// An integer that is one of the enumeration's raw values.
+/// An integer that is one of the enumeration's raw values. A negative integer is none of them,
+/// rather than one that is out of range.
 template <Keelgate::Enumeration E>
 void decode(ExpansionBudget&, const Value& value, const CodingPath& path, E& into) {
   const Keelgate::Optional<Keelgate::UInt64> number =
