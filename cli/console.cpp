@@ -91,6 +91,7 @@ void Console::progress(std::size_t done, std::size_t total) {
   const std::lock_guard lock(mutex_);
   // Without a newline: the next thing that is said takes its place.
   const String line = fmt::format("\r{} of {} messages", done, total);
+  // Best effort: what cannot be shown is not remembered as shown.
   progressShown_ = write(STDERR_FILENO, line.data(), line.size()) > 0;
 }
 

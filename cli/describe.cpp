@@ -132,6 +132,7 @@ void addTable(Page& page, Array<String> headings, const Rows& rows, Cells cells)
 }
 
 void addUnpackers(Page& page, const Description& what) {
+  // Of a single name most tables are empty, and headings without rows would say nothing.
   if (what.messageUnpackers.empty()) return;
   page.heading("Record types");
   addTable(page, {"RECORD", "UNPACKER", "SCHEMA"}, what.messageUnpackers,
@@ -225,6 +226,7 @@ String pageText(const Description& what, Bool overview) {
 
 void describe(const Optional<String>& name, Bool json, Console& console) {
   const Description all = describeAll();
+  // Everything is described and then cut down: one walk, whatever is asked.
   const Description what = name ? describeNamed(all, *name) : all;
   if (isEmpty(what)) {
     const Array<std::string_view> nearest = nearestNames(all, *name);

@@ -104,6 +104,7 @@ class Walk {
     if (std::ranges::count(to_.enumerations, typeName<E>(), &EnumerationTable::name) > 0) return;
     EnumerationTable table{
         .name = typeName<E>(), .cases = {casesOf<E>.begin(), casesOf<E>.end()}, .fallback = {}};
+    // Without one, another number fails the message; a reader of the table has to see which it is.
     if constexpr (Defaulting<E>) table.fallback = nameOf(keelgateDefault(E{}));
     to_.enumerations.push_back(std::move(table));
   }
@@ -166,6 +167,7 @@ Array<std::string_view> namesOf(const Description& all) {
   for (const auto& table : all.records) names.push_back(table.name);
   for (const auto& table : all.enumerations) names.push_back(table.name);
   std::ranges::sort(names);
+  // The record of a message unpacker stands among the records too, and services share unpackers.
   names.erase(std::unique(names.begin(), names.end()), names.end());
   return names;
 }

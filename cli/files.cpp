@@ -70,6 +70,7 @@ Bool writeAll(int descriptor, std::string_view text) {
     if (n >= 0) {
       text.remove_prefix(static_cast<std::size_t>(n));
     } else if (errno == EPIPE) {
+      // The reader has had enough: no fault, and nobody to tell.
       return false;
     } else if (errno == EAGAIN) {
       waitFor(descriptor, POLLOUT);

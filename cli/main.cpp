@@ -190,6 +190,7 @@ UnpackOptions unpackOptions(const ::CLI::App& unpack, const Arguments& arguments
     options.subject =
         VespClientMessageContext{.command = arguments.command, .service = arguments.service};
   }
+  // As filters do: a pipe needs no file to be named.
   if (options.files.empty()) options.files.emplace_back("-");
   if (arguments.pretty) options.layout = Layout::pretty;
   if (arguments.compact) options.layout = Layout::compact;
@@ -202,6 +203,7 @@ void run(const ::CLI::App& app, Arguments& arguments, Console& console) {
   } else if (app.got_subcommand("stream")) {
     stream(arguments.host, console);
   } else if (app.got_subcommand("describe")) {
+    // Asked for by count: an empty name is a name too, and nothing has it.
     const Bool named = app.get_subcommand("describe")->count("NAME") > 0;
     describe(named ? Optional<String>(arguments.name) : std::nullopt, arguments.json, console);
   } else if (arguments.verbose) {
@@ -212,6 +214,7 @@ void run(const ::CLI::App& app, Arguments& arguments, Console& console) {
 }
 
 void build(::CLI::App& app, Arguments& arguments) {
+  // None is right with --version alone, which is for checkUsage to see.
   app.require_subcommand(0, 1);
   app.add_flag("--version", arguments.version, "Show the version");
   app.add_flag("--verbose", arguments.verbose, "The service's version and sandbox layers too")
@@ -248,6 +251,7 @@ void parse(::CLI::App& app, const Arguments& arguments, Array<String> words, Con
     const auto chosen = app.get_subcommands();
     const String subcommand = chosen.empty() ? "" : chosen.front()->get_name() + " ";
     console.complain(error.what());
+    // Of the subcommand that was meant, so that the help is the one that is wanted.
     console.complain(fmt::format("see `keelgate {}--help`", subcommand));
     console.note(Status::unusable);
     throw;

@@ -43,6 +43,7 @@ Bool OrderedWork::add(Job job, std::size_t weight) {
     return stopped_ || slots_.empty() ||
            (slots_.size() < capacity_ && weight_ + weight <= largestWindow);
   });
+  // Work may have ended while this thread waited for room.
   if (stopped_) return false;
   weight_ += weight;
   slots_.push_back({.job = std::move(job), .weight = weight, .reply = std::nullopt});
@@ -53,6 +54,7 @@ Bool OrderedWork::add(Job job, std::size_t weight) {
 void OrderedWork::finish() {
   {
     const std::lock_guard lock(mutex_);
+    // The threads go on until the queue is empty, and then end.
     closed_ = true;
     work_.notify_all();
   }
@@ -94,6 +96,7 @@ void OrderedWork::deliver(std::unique_lock<std::mutex>& lock) {
     // Not before: a reply that cannot be written yet is memory too.
     weight_ -= weight;
     room_.notify_one();
+    // The threads that wait are told; those in work see it when they are through.
     if (!goOn) end();
   }
   delivering_ = false;

@@ -145,7 +145,8 @@ String unpack(Client& client, const Subject& subject, Bytes message, const Prefa
   if (const auto* context = std::get_if<VespClientMessageContext>(&subject)) {
     return recordObject(client.unpackClientMessage(message, *context), preface, layout);
   }
-  // The record that is asked for by name, which the caller has checked.
+  // The record that is asked for by name, which the caller has checked. Only here does a name
+  // become a type: behind it everything is checked by the compiler.
   String json;
   MessageUnpackers::each([&]<class U>(std::type_identity<U>) {
     using R = typename U::SchemaType;
@@ -158,6 +159,7 @@ String unpack(Client& client, const Subject& subject, Bytes message, const Prefa
 }  // namespace
 
 const Array<std::string_view>& recordNames() {
+  // Made once, which the language keeps safe from any thread.
   static const Array<std::string_view> names = [] {
     Array<std::string_view> all;
     MessageUnpackers::each(
@@ -191,6 +193,7 @@ Reply answer(Client& client, const Subject& subject, Bytes message, const Prefac
 Reply givenUp(const HostError& error, const Preface& preface, Layout layout) {
   Reply reply = rejection(error, preface, layout);
   reply.problem += advice(error.reason);
+  // The one reason that is not about this message: the next would fare no better.
   if (error.reason == HostError::Reason::startFailed) reply.verdict = Verdict::serviceLost;
   return reply;
 }

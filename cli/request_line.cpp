@@ -63,6 +63,7 @@ class RequestReader : public rapidjson::BaseReaderHandler<rapidjson::UTF8<>, Req
     return scalar(value, json, rapidjson::kStringType);
   }
   bool StartObject() {
+    // The request itself. Anything else at this depth is no object.
     if (depth_ == 0) return ++depth_ == 1;
     if (inId()) id_.StartObject();
     return open();
@@ -100,6 +101,7 @@ class RequestReader : public rapidjson::BaseReaderHandler<rapidjson::UTF8<>, Req
   [[nodiscard]] bool inId() const { return member_ != nullptr && member_->key == "id"; }
 
   void wrong(Keelgate::String problem) {
+    // The first is the one that explains the others.
     if (problem_.empty()) problem_ = std::move(problem);
   }
 
@@ -148,6 +150,7 @@ class RequestReader : public rapidjson::BaseReaderHandler<rapidjson::UTF8<>, Req
   void finish(std::string_view value, rapidjson::Type type) {
     if (member_ == nullptr) return;
     if (inId()) {
+      // Of any type: it is the caller's, and is handed back unread.
       members_.id = Keelgate::String(idText_.GetString(), idText_.GetSize());
     } else if (member_->type == type) {
       members_.*member_->value = Keelgate::String(value);
@@ -234,6 +237,7 @@ RequestLine readRequestLine(std::string_view line) {
     // The reader takes a null character for the end.
     if (!result.IsError())
       demand(stream.Tell() == line.size(), "not readable as JSON: a null character");
+    // Only from a line that was read to its end: half an id is another one.
     if (!result.IsError()) read.id = request.id();
     demand(request.problem().empty(), request.problem());
     read.content = requestOf(request.members());

@@ -72,6 +72,7 @@ String Table::text() const {
   const Array<std::size_t> widths = columnWidths();
   String all;
   for (const Array<String>& row : rows_) {
+    // By its place: a row of cells may look like it.
     const Bool heading = &row == &rows_.front();
     for (const String& line : linesOf(row, widths)) {
       all += emphasised(line, heading && emphasise_) + '\n';

@@ -47,6 +47,7 @@ DecodingError readDecodingError(Reader& from) {
     throw MalformedReply();
   }
   const std::size_t steps = from.count();
+  // An honest path is never longer. A longer one would only have the client build it.
   if (steps > maximumPathLength) throw MalformedReply();
   Array<CodingKey> path;
   for (std::size_t i = 0; i < steps; ++i) path.push_back(readCodingKey(from));

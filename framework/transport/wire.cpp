@@ -15,6 +15,7 @@ constexpr bool isContinuation(unsigned char c) {
 std::size_t characterLength(const unsigned char* at, std::size_t rest) noexcept {
   const unsigned char lead = at[0];
   if (lead < 0x80) return 1;
+  // 0xc0 and 0xc1 begin overlong forms alone, 0xf5 and above what lies beyond U+10FFFF.
   if (lead < 0xc2 || lead > 0xf4) return 0;
   const std::size_t length = lead < 0xe0 ? 2 : lead < 0xf0 ? 3 : 4;
   if (rest < length) return 0;

@@ -34,6 +34,8 @@ class CommandType {
   /// Implicit, so that a case can stand wherever a command is wanted.
   constexpr CommandType(Case which) : which_(which) {}
 
+  /// The number that travels, and the case as it is spelt here. The text lives as long as the
+  /// program.
   [[nodiscard]] constexpr UInt64 rawValue() const { return rawValueOf(which_); }
   [[nodiscard]] constexpr std::string_view name() const { return nameOf(which_); }
 

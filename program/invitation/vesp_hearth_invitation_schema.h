@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-/// An invitation to join a home. The spellings of the keys are not uniform, and are exactly these.
+/// An invitation to join a home. The spellings of the keys are not uniform, and are exactly these:
+/// they are those of the program that keeps the homes, and not ours to tidy. Data alone.
 #pragma once
 
 #include "program/schema/values.h"
@@ -55,6 +56,7 @@ struct VespHearthInvitationSchema {
   FIELD(Optional<Int64>, inviteePrivilege, "HRHomeInviteePrivilegeCodingKey");
   FIELD(Optional<Bool>, doesHomeHaveCameras, "HRIncomingInvitationHomeHasCamerasCodingKey");
   FIELD(Optional<VespHearthInviteeScheduleSchema>, inviteeSchedule, "HR.RG.Schedule");
+  // Texts on the wire. One that is no UUID fails the message.
   FIELD(Optional<UUID>, homeUUID, "kHomeUUID");
   FIELD(Optional<Data>, controllerPublicKey, "kControllerPublicKey");
   FIELD(Optional<String>, controllerPairingName, "kControllerPairingNameKey");

@@ -28,6 +28,7 @@ std::string uuidText(const Keelgate::UUID& uuid);
 template <class T>
 PropertyList::Tree mirror(const T& value) {
   if constexpr (Keelgate::Enumeration<T>) {
+    // As a signed number, which every raw value fits.
     return static_cast<std::int64_t>(value);
   } else if constexpr (std::same_as<T, Keelgate::Date>) {
     return PropertyList::Date{value.secondsSinceReferenceDate};

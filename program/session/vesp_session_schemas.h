@@ -25,6 +25,7 @@ struct VespSessionInvitationSchema {
   FIELD(Optional<Bool>, useSecureHLControlMessage, "shl");
   FIELD(Optional<Data>, blob, "b");
   FIELD(Optional<Bool>, messageIsRealTime, "rt");
+  // Deliberate: spelt out, unlike its neighbours.
   FIELD(Optional<Data>, unauthenticatedPublicKey, "unauthenticated-public-key");
   FIELD(Optional<Bool>, assumeRemoteDeviceEncryption, "re");
   FIELD(Optional<Data>, sessionMessageContext, "c");

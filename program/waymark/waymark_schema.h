@@ -30,6 +30,7 @@ struct WaymarkSchema {
   FIELD(Optional<UInt>, sessionDestinationType);
   FIELD(Optional<String>, sessionDestinationMapItem);
   FIELD(Optional<UInt>, lowPowerModeWarningState);
+  // Times, degrees and metres are numbers here: neither their unit nor their epoch is looked at.
   FIELD(Optional<Double>, triggerTime);
   FIELD(Optional<Double>, latitude);
   FIELD(Optional<Double>, longitude);

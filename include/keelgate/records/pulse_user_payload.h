@@ -101,7 +101,9 @@ struct PulseUserPayload {
   FIELD(Optional<String>, destinationId);
   FIELD(Optional<String>, userAgent);
   /// An attachment in the chunk store: owner, signature, length in octets, and where to fetch or
-  /// put it. Its expiry is in nanoseconds, as the sender counts.
+  /// put it. Its expiry is in nanoseconds, as the sender counts. URLs here and below are any text
+  /// that the sender chose: whoever fetches one shows its owner that the message was read, and from
+  /// where.
   FIELD(Optional<String>, BCSOwnerId);
   FIELD(Optional<Data>, BCSFileSignature);
   FIELD(Optional<Int64>, BCSFileLength);
@@ -148,6 +150,7 @@ struct PulseUserPayload {
   FIELD(Optional<Int>, storageCheckVersion);
   FIELD(Optional<Int64>, dateExpirationSeconds);
   FIELD(Optional<Int>, ostrelProtocol);
+  /// The next three may ask for more to be logged or traced. It is a stranger who asks.
   FIELD(Optional<Bool>, internalBuild);
   FIELD(Optional<Bool>, loggingProfile);
   FIELD(Optional<Bool>, traceProfile);
@@ -256,7 +259,8 @@ struct PulseUserPayload {
   FIELD(Optional<Bool>, expectsPeerResponse);
   FIELD(Optional<Int>, allowGDR);
   FIELD(Optional<Int>, sendMode);
-  /// Whom the device knows the sender as.
+  /// Whom the device knows the sender as, or so the message says: these are claims like all else in
+  /// it, and prove nothing.
   FIELD(Optional<Bool>, isTrustedSender);
   FIELD(Optional<Bool>, isUPlusOneKey);
 
