@@ -4,6 +4,7 @@
 // trip of the same bytes over a socket to a process that is already there.
 #include "framework/client/worker.h"
 #include "framework/transport/frames.h"
+#include "framework/transport/record_coding.h"
 
 #include <keelgate/client.h>
 
@@ -51,6 +52,20 @@ double medianOf(int n, Call call) {
   return median(std::move(samples));
 }
 
+Client::Options options(std::size_t messagesPerProcess) {
+  Client::Options options;
+  options.processes = 1;
+  options.messagesPerProcess = messagesPerProcess;
+  options.servicePath = KEELGATE_SERVICE;
+  return options;
+}
+
+/// Of the body that a service answers the message with.
+std::size_t replyLength() {
+  Client client(options(1));
+  return Transport::encodeRecord(client.unpack<VespCommandResponse>(message())).size();
+}
+
 double bareFork() {
   static const double result = medianOf(500, [] {
     const pid_t pid = fork();
@@ -64,15 +79,15 @@ double bareFork() {
 double bareRoundTrip() {
   static const double result = [] {
     const Data request(sizeof(Transport::RequestHeader) + message().size());
-    const Data reply(sizeof(Transport::ReplyHeader) + 64);
+    const Data reply(sizeof(Transport::ReplyHeader) + replyLength());
     int ends[2];
     if (socketpair(AF_UNIX, SOCK_STREAM, 0, ends) != 0) std::abort();
     const pid_t pid = fork();
+    if (pid == 0) close(ends[0]);
     Data buffer(4096);
     while (pid == 0) {
       if (read(ends[1], buffer.data(), buffer.size()) <= 0) _exit(0);
       if (write(ends[1], reply.data(), reply.size()) <= 0) _exit(0);
-      close(ends[0]);
     }
     close(ends[1]);
     const double trip = medianOf(2000, [&] {
@@ -84,14 +99,6 @@ double bareRoundTrip() {
     return trip;
   }();
   return result;
-}
-
-Client::Options options(std::size_t messagesPerProcess) {
-  Client::Options options;
-  options.processes = 1;
-  options.messagesPerProcess = messagesPerProcess;
-  options.servicePath = KEELGATE_SERVICE;
-  return options;
 }
 
 /// A client and a worker that are in full swing: what a service without C6 would cost.
@@ -106,10 +113,12 @@ double warmRoundTrip() {
 }
 
 /// Runs the call with a pause behind each, in which the service can get ready for the next one.
-template <class Call>
-void measure(benchmark::State& state, std::chrono::microseconds pause, Call call) {
+template <class Call, class Before = void (*)()>
+void measure(
+    benchmark::State& state, std::chrono::microseconds pause, Call call, Before before = [] {}) {
   std::vector<double> samples;
   for (auto _ : state) {
+    before();
     samples.push_back(timed(call));
     state.SetIterationTime(samples.back() / 1e6);
     if (pause.count() > 0) usleep(static_cast<useconds_t>(pause.count()));
@@ -167,11 +176,14 @@ void clientCall(benchmark::State& state, std::size_t messagesPerProcess,
 void coldStart(benchmark::State& state) {
   const Data bytes = message();
   std::optional<Client> client;
-  measure(state, {}, [&] {
-    client.reset();
-    client.emplace(options(1));
-    benchmark::DoNotOptimize(client->unpack<VespCommandResponse>(bytes));
-  });
+  // Ending the one before is not counted.
+  measure(
+      state, {},
+      [&] {
+        client.emplace(options(1));
+        benchmark::DoNotOptimize(client->unpack<VespCommandResponse>(bytes));
+      },
+      [&] { client.reset(); });
 }
 
 #ifdef KEELGATE_OBEDIENT_SERVICE
@@ -200,18 +212,31 @@ void pastTheDeadline(benchmark::State& state) {
 BENCHMARK(pastTheDeadline)->UseManualTime()->Iterations(100);
 #endif
 
-/// Kilobytes that all processes below this one have resident, shared pages counted in each.
-std::size_t residentBelow(const std::filesystem::path& process) {
-  std::size_t sum = 0;
+/// In kilobytes. Resident counts a page in each process that has it mapped; proportional shares it
+/// out among them, and is 0 where only root may ask.
+struct Memory {
+  std::size_t resident = 0;
+  std::size_t proportional = 0;
+};
+
+/// Of all processes below this one.
+Memory memoryBelow(const std::filesystem::path& process) {
+  Memory sum;
   for (const auto& task : std::filesystem::directory_iterator(process / "task")) {
     std::ifstream list(task.path() / "children");
-    for (int pid; list >> pid;) {
-      const auto child = std::filesystem::path("/proc") / std::to_string(pid);
+    for (std::string pid; list >> pid;) {
+      const auto child = std::filesystem::path("/proc") / pid;
       std::ifstream sizes(child / "statm");
       std::size_t all = 0;
       std::size_t resident = 0;
       sizes >> all >> resident;
-      sum += resident * 4 + residentBelow(child);
+      std::ifstream details(child / "smaps_rollup");
+      std::size_t proportional = 0;
+      for (std::string word; details >> word && word != "Pss:";) continue;
+      details >> proportional;
+      const Memory below = memoryBelow(child);
+      sum.resident += resident * 4 + below.resident;
+      sum.proportional += proportional + below.proportional;
     }
   }
   return sum;
@@ -222,7 +247,9 @@ void idleService(benchmark::State& state) {
   client.unpack<VespCommandResponse>(message());
   usleep(50'000);
   for (auto _ : state) state.SetIterationTime(1e-9);
-  state.counters["resident_KiB"] = static_cast<double>(residentBelow("/proc/self"));
+  const Memory memory = memoryBelow("/proc/self");
+  state.counters["resident_KiB"] = static_cast<double>(memory.resident);
+  state.counters["proportional_KiB"] = static_cast<double>(memory.proportional);
 }
 
 BENCHMARK(bareForkExitWait)->UseManualTime()->Iterations(500);

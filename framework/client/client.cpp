@@ -30,14 +30,17 @@ std::size_t processesFor(const Client::Options& options) {
   return std::clamp<std::size_t>(wanted, 1, mostProcesses);
 }
 
+Client::Options bounded(Client::Options options) {
+  options.largestMessage = std::min(options.largestMessage, messageCeiling);
+  return options;
+}
+
 }  // namespace
 
 class Client::Implementation {
  public:
   explicit Implementation(Options options)
-      : options_(std::move(options)),
-        limit_(std::min(options_.largestMessage, messageCeiling)),
-        pool_(makePool().release()) {}
+      : options_(bounded(std::move(options))), pool_(makePool().release()) {}
 
   ~Implementation() {
     Pool* pool = pool_.load();
@@ -54,7 +57,7 @@ class Client::Implementation {
   R unpack(Bytes message, const VespClientMessageContext& context) {
     // First of all, so that nothing that follows goes uncounted.
     const Deadline deadline = deadlineAfter(options_.timeLimit);
-    checkSize("the message", message.size(), limit_);
+    checkSize("the message", message.size(), options_.largestMessage);
     checkSize("the service identifier", context.service.size(), Transport::maximumServiceLength);
     Optional<R> record;
     ours().exchange({.record = static_cast<std::uint16_t>(recordNumber<R>),
@@ -66,14 +69,14 @@ class Client::Implementation {
                         Transport::throwError(reply.body());
                       }
                       // Within the call, so that a reply that turns out to be none ends its worker.
-                      record = Transport::decodeRecord<R>(reply.body());
+                      record = Transport::decodeRecord<R>(reply.body(), reply.memory);
                     });
     return std::move(*record);
   }
 
   ServiceReport report() {
-    const std::uint64_t layers = ours().layers(deadlineAfter(options_.timeLimit));
-    ServiceReport report{.version = KEELGATE_VERSION, .layers = {}};
+    const auto [version, layers] = ours().report(deadlineAfter(options_.timeLimit));
+    ServiceReport report{.version = Transport::versionText(version), .layers = {}};
     for (const Transport::NamedLayer& row : Transport::namedLayers) {
       report.layers.push_back({.name = String(row.name), .present = (layers & row.layer) != 0});
     }
@@ -106,7 +109,6 @@ class Client::Implementation {
   }
 
   const Options options_;
-  const std::size_t limit_;
   std::atomic<Pool*> pool_;
 };
 

@@ -57,8 +57,10 @@ Ending DataChannel::exchange(const ClientRequest& request, Deadline deadline,
                              ReceivedReply& reply) {
   if (const Ending sent = send(request, deadline); sent != Ending::answered) return sent;
   // 64 bits hold it for the largest message that there is.
-  const std::uint64_t allowance =
-      replyBase + request.service.size() + replyFactor * request.message.size();
+  reply.memory = heap_;
+  // The worker had the body twice at the end, by itself and framed.
+  const std::uint64_t allowance = std::min<std::uint64_t>(
+      replyBase + request.service.size() + replyFactor * request.message.size(), heap_ / 2);
   const Ending received = receive(allowance, deadline, reply);
   ++sequence_;
   return received;
@@ -83,6 +85,7 @@ Ending DataChannel::send(const ClientRequest& request, Deadline deadline) const 
     const ssize_t n = sendmsg(channel_.get(), &packet, MSG_DONTWAIT | MSG_NOSIGNAL);
     if (n >= 0) {
       if (!advance(pieces, static_cast<std::size_t>(n))) return Ending::answered;
+      if (Clock::now() >= deadline) return Ending::late;
     } else if (!wouldBlock()) {
       return Ending::died;
     } else if (const Ending ready = waitToSend(deadline); ready != Ending::answered) {
@@ -146,6 +149,8 @@ Ending DataChannel::await(std::size_t size, Deadline deadline, ReceivedReply& re
                            reply.buffer.size() - filled_, MSG_DONTWAIT);
     if (n == 0 || (n < 0 && !wouldBlock())) return Ending::died;
     if (n > 0) filled_ += static_cast<std::size_t>(n);
+    // A worker that never stops writing would never be waited for.
+    if (filled_ < size && Clock::now() >= deadline) return Ending::late;
   }
   return Ending::answered;
 }

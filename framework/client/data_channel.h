@@ -36,6 +36,8 @@ struct ReceivedReply {
   Data buffer;
   std::size_t offset = 0;
   std::size_t length = 0;
+  /// Bytes that its record may take in memory: it had to fit into the worker's heap.
+  std::size_t memory = 0;
   /// As the worker sent them: not to be shown before escapeLogLine.
   Array<String> log;
 
@@ -68,7 +70,8 @@ constexpr std::uint64_t replyFactor = 128;
 /// One thread at a time. After any Ending but `answered` the channel is of no more use.
 class DataChannel {
  public:
-  explicit DataChannel(Descriptor own) noexcept : channel_(std::move(own)) {}
+  /// `heap`: how much the worker has, in bytes.
+  DataChannel(Descriptor own, std::size_t heap) noexcept : channel_(std::move(own)), heap_(heap) {}
 
   /// What can be seen of the worker while nothing is asked of it.
   enum class Look { quiet, gone, talking };
@@ -90,6 +93,7 @@ class DataChannel {
                               std::uint64_t allowance) const noexcept;
 
   Descriptor channel_;
+  std::size_t heap_;
   /// Of the next request. A reply that repeats it cannot be one that was prepared for an earlier
   /// request.
   std::uint32_t sequence_ = 0;

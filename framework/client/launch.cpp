@@ -123,14 +123,21 @@ ServiceHandles launchService(const String& path, DescriptorBook& book) {
   ServiceHandles handles{.control = Descriptor(book, ends[0]), .launcher = {}};
   const Descriptor theirs(book, ends[1]);
   const pid_t pid = SpawnPlan(theirs.get()).run(program);
+  handles.launcher = Descriptor(book, static_cast<int>(syscall(SYS_pidfd_open, pid, 0)));
   // Where the application ignores SIGCHLD the process may be gone already: then the handshake
   // finds the channel closed, and there is nothing to signal.
-  handles.launcher = Descriptor(book, static_cast<int>(syscall(SYS_pidfd_open, pid, 0)));
+  if (!handles.launcher && errno != ESRCH) {
+    const int error = errno;
+    // Its number is still its own: nobody has waited for it.
+    kill(pid, SIGKILL);
+    waitpid(pid, nullptr, 0);
+    fail("The service could not be watched; raise the limit of open files (ulimit -n)", error);
+  }
   return handles;
 }
 
-void killLauncher(const Descriptor& launcher) noexcept {
-  syscall(SYS_pidfd_send_signal, launcher.get(), SIGKILL, nullptr, 0);
+void signalLauncher(const Descriptor& launcher, int signal) noexcept {
+  syscall(SYS_pidfd_send_signal, launcher.get(), signal, nullptr, 0);
 }
 
 void reapLauncher(const Descriptor& launcher) noexcept {

@@ -41,7 +41,7 @@ struct ServiceHandles {
 ServiceHandles launchService(const String& path, DescriptorBook& book);
 
 /// By pidfd, so that no other process can be meant.
-void killLauncher(const Descriptor& launcher) noexcept;
+void signalLauncher(const Descriptor& launcher, int signal) noexcept;
 /// Takes note of a launcher that has ended. The application may have waited for it already, or have
 /// told the kernel that nobody will.
 void reapLauncher(const Descriptor& launcher) noexcept;

@@ -5,7 +5,12 @@
 
 #include "framework/transport/wire.h"
 
+#include <poll.h>
 #include <unistd.h>
+
+#include <cerrno>
+#include <csignal>
+#include <ctime>
 
 namespace Keelgate {
 
@@ -36,6 +41,25 @@ void appendEscaped(String& to, std::string_view bytes) {
   }
 }
 
+/// A line that nobody reads is dropped: a stranger's message must not end the application by
+/// SIGPIPE, nor hold it at a pipe that is full.
+void writeToStandardError(const String& text) noexcept {
+  pollfd entry{.fd = STDERR_FILENO, .events = POLLOUT, .revents = 0};
+  if (poll(&entry, 1, 0) != 1 || (entry.revents & POLLOUT) == 0) return;
+  sigset_t pipe;
+  sigset_t before;
+  sigset_t pending;
+  sigemptyset(&pipe);
+  sigaddset(&pipe, SIGPIPE);
+  sigpending(&pending);
+  pthread_sigmask(SIG_BLOCK, &pipe, &before);
+  const bool broken = write(STDERR_FILENO, text.data(), text.size()) < 0 && errno == EPIPE;
+  // Only the one that this write made is taken away.
+  constexpr timespec atOnce{};
+  if (broken && sigismember(&pending, SIGPIPE) == 0) sigtimedwait(&pipe, nullptr, &atOnce);
+  pthread_sigmask(SIG_SETMASK, &before, nullptr);
+}
+
 }  // namespace
 
 String escapeLogLine(std::string_view line) {
@@ -59,9 +83,7 @@ void logLine(const LogSink& sink, std::string_view line) {
     return;
   }
   // One write for the whole line keeps lines of several threads apart.
-  const String text = String(line) + '\n';
-  // There is nobody to tell that standard error is closed.
-  static_cast<void>(!write(STDERR_FILENO, text.data(), text.size()));
+  writeToStandardError(String(line) + '\n');
 }
 
 }  // namespace Keelgate

@@ -106,12 +106,13 @@ bool Pool::isOurs() const noexcept {
   return getpid() == owner_;
 }
 
-std::uint64_t Pool::layers(Deadline deadline) {
+Pool::Report Pool::report(Deadline deadline) {
   Lock lock(mutex_);
-  return running(lock, deadline)->layers();
+  const Service service = running(lock, deadline);
+  return {.version = service->version(), .layers = service->layers()};
 }
 
-void Pool::exchange(const ClientRequest& request, Deadline deadline, const Accept& accept) {
+void Pool::exchange(const ClientRequest& request, Deadline deadline, const Accept& accept) try {
   const Place place(*this, deadline);
   Worker worker = take(request.message.size(), deadline, false);
   const bool used = worker.served() > 0;
@@ -123,6 +124,8 @@ void Pool::exchange(const ClientRequest& request, Deadline deadline, const Accep
     failure = attempt(take(request.message.size(), deadline, true), request, deadline, accept, 1);
   }
   if (failure) throw HostError(*failure);
+} catch (const std::bad_alloc&) {
+  throw HostError(Reason::resourcesExhausted, "this process has no memory for the reply");
 }
 
 Optional<HostError> Pool::attempt(Worker worker, const ClientRequest& request, Deadline deadline,
@@ -142,6 +145,8 @@ Optional<HostError> Pool::attempt(Worker worker, const ClientRequest& request, D
     throw;
   }
   keep(std::move(worker), spent);
+  // A reply can be made to take long to read, too.
+  if (Clock::now() >= deadline) return HostError(Reason::timedOut, "");
   return std::nullopt;
 }
 
@@ -192,7 +197,10 @@ Optional<Worker> Pool::takeIdle() {
 Pool::Service Pool::running(Lock& lock, Deadline deadline) {
   for (;;) {
     if (service_ && service_->isUsable()) return service_;
-    if (Clock::now() >= deadline) throw HostError(Reason::timedOut, "the service was restarting");
+    if (Clock::now() >= deadline) {
+      if (!lastFailure_.empty()) throw HostError(Reason::startFailed, lastFailure_);
+      throw HostError(Reason::timedOut, "the service was restarting");
+    }
     if (starting_) {
       started_.wait_until(lock, deadline);
       continue;
@@ -244,15 +252,21 @@ void Pool::start(Lock& lock, Deadline deadline) {
   proved_ = false;
   service_ = std::move(fresh);
   started_.notify_all();
+  lastFailure_ = failure ? failure->sentence : "";
   if (!failure) return;
   backOff_.noteDeath();
-  lastFailure_ = failure->sentence;
   if (!failure->mayPass) throw HostError(Reason::startFailed, failure->sentence);
 }
 
 void Pool::tellLayers(const ServiceProcess& service) {
   const String missing = Transport::missingLayersLine(service.layers());
-  if (!std::exchange(layersTold_, true) && !missing.empty()) logLine(log_, missing);
+  if (std::exchange(layersTold_, true) || missing.empty()) return;
+  try {
+    logLine(log_, missing);
+  } catch (...) {
+    // The application's own sink, against what it was asked for. Nobody must wait for this start
+    // for ever because of it.
+  }
 }
 
 /// Has as many workers forked as the calls that come next will take. The place that the calling
@@ -272,7 +286,11 @@ void Pool::forkAhead() noexcept {
     lock.lock();
     --forking_;
     if (!worker) return;
-    if (service == service_) idle_.push_back(std::move(*worker));
+    try {
+      if (service == service_) idle_.push_back(std::move(*worker));
+    } catch (const std::bad_alloc&) {
+      return;
+    }
   }
 }
 

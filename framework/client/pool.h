@@ -50,8 +50,14 @@ class Pool {
   /// Gives the message to a worker, and the reply to `accept`. Throws HostError.
   void exchange(const ClientRequest& request, Deadline deadline, const Accept& accept);
 
-  /// The walls that the running service has, as bits of Transport::Layer. Throws HostError.
-  std::uint64_t layers(Deadline deadline);
+  /// What the running service said of itself: Transport::versionText takes the one, and bits of
+  /// Transport::Layer are the other.
+  struct Report {
+    std::uint64_t version;
+    std::uint64_t layers;
+  };
+  /// Throws HostError.
+  Report report(Deadline deadline);
 
   /// Whether this is the process that made the pool, and not a fork of it.
   [[nodiscard]] bool isOurs() const noexcept;

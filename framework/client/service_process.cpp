@@ -23,6 +23,9 @@ using Transport::ControlKind;
 
 namespace {
 
+/// An honest worker is gone so long after its last answer.
+constexpr milliseconds leavePatience{10};
+
 #ifndef KEELGATE_UNSEALED
 /// What a sealed service always reports; anything less is not the program that was meant.
 constexpr std::uint64_t firstWalls = [] {
@@ -70,6 +73,7 @@ void ServiceProcess::shakeHands(const ServiceSettings& settings, Deadline deadli
   }
   if (answer.kind != ControlKind::ready) failToStart(false);
   layers_ = answer.numbers[0];
+  version_ = answer.numbers[1];
 #ifndef KEELGATE_UNSEALED
   // A service that was built for a sanitizer has no seal, and says so.
   if ((layers_ & firstWalls) != firstWalls) {
@@ -114,7 +118,8 @@ Optional<ServiceProcess::Forked> ServiceProcess::fork(std::uint64_t longestMessa
     lose();
     return std::nullopt;
   }
-  return Forked{.slot = *slot, .channel = std::move(ours)};
+  return Forked{
+      .slot = *slot, .channel = std::move(ours), .heap = Transport::heapFor(longestMessage)};
 }
 
 Optional<std::uint32_t> ServiceProcess::claimSlot() {
@@ -140,9 +145,9 @@ Optional<std::uint32_t> ServiceProcess::claimSlot() {
 
 void ServiceProcess::killSlot(std::uint32_t slot) noexcept {
   if (slots_[slot].phase == Slot::Phase::ended || slots_[slot].killed) return;
-  slots_[slot].killed = true;
   // Not waited for: if the zygote does not even read, its launcher is killed before long.
-  sendFrame(handles_.control.get(), makeFrame(ControlKind::kill, slot), noDescriptor, Clock::now());
+  slots_[slot].killed = sendFrame(handles_.control.get(), makeFrame(ControlKind::kill, slot),
+                                  noDescriptor, Clock::now());
 }
 
 void ServiceProcess::kill(std::uint32_t slot) noexcept {
@@ -150,25 +155,31 @@ void ServiceProcess::kill(std::uint32_t slot) noexcept {
   killSlot(slot);
 }
 
-Optional<int> ServiceProcess::awaitExit(std::uint32_t slot, Deadline deadline) {
+Optional<ServiceProcess::Exit> ServiceProcess::awaitExit(std::uint32_t slot, Deadline deadline) {
   Lock lock(mutex_);
   const auto ended = [&] {
     return slots_[slot].phase == Slot::Phase::ended;
   };
   readUntil(lock, deadline, ended);
   if (!ended()) return std::nullopt;
-  return slots_[slot].status;
+  return slots_[slot].exit;
 }
 
 void ServiceProcess::release(std::uint32_t slot) noexcept {
   const std::lock_guard lock(mutex_);
   Slot& its = slots_[slot];
   its.phase = its.phase == Slot::Phase::ended ? Slot::Phase::free : Slot::Phase::released;
+  its.since = Clock::now();
 }
 
 void ServiceProcess::collect() noexcept {
   const std::lock_guard lock(mutex_);
   if (!reading_) readAll();
+  // One that was taken over may have answered and stay, to use the processor and its memory.
+  const Deadline longAgo = Clock::now() - leavePatience;
+  for (std::uint32_t i = 0; i < slots_.size(); ++i) {
+    if (slots_[i].phase == Slot::Phase::released && slots_[i].since < longAgo) killSlot(i);
+  }
 }
 
 // The first thread that finds nobody reading reads for all; when it has what it came for, it wakes
@@ -215,9 +226,9 @@ void ServiceProcess::noteExit(const ControlFrame& frame) noexcept {
     lose();
     return;
   }
-  slot.status = static_cast<int>(frame.numbers[0]);
+  slot.exit = {.status = static_cast<int>(frame.numbers[0]), .neverStarted = frame.numbers[3] != 0};
   slot.phase = slot.phase == Slot::Phase::released ? Slot::Phase::free : Slot::Phase::ended;
-  const int signal = WIFSIGNALED(slot.status) ? WTERMSIG(slot.status) : 0;
+  const int signal = WIFSIGNALED(slot.exit.status) ? WTERMSIG(slot.exit.status) : 0;
   // Ending for want of processor time, or by our own hand, shows nothing of the address layout. Any
   // other signal may be somebody's miss, and the next try must not meet the same layout.
   const bool expected = signal == 0 || signal == SIGXCPU || (signal == SIGKILL && slot.killed);
@@ -232,7 +243,7 @@ void ServiceProcess::lose() noexcept {
 
 void ServiceProcess::destroy() noexcept {
   lose();
-  if (handles_.launcher) killLauncher(handles_.launcher);
+  if (handles_.launcher) signalLauncher(handles_.launcher, SIGTERM);
   // Ends the channel in every process that has a copy of it, and so whoever waits on it here.
   shutdown(handles_.control.get(), SHUT_RDWR);
 }
@@ -244,10 +255,18 @@ void ServiceProcess::end(milliseconds patience) noexcept {
   shutdown(handles_.control.get(), SHUT_RDWR);
   handles_.control.close();
   if (!handles_.launcher) return;
-  if (patience.count() == 0 ||
-      waitFor(handles_.launcher.get(), POLLIN, deadlineAfter(patience)) == 0) {
-    killLauncher(handles_.launcher);
-    waitFor(handles_.launcher.get(), POLLIN, deadlineAfter(killPatience));
+  const auto hasEnded = [&](milliseconds within) {
+    return waitFor(handles_.launcher.get(), POLLIN, deadlineAfter(within)) != 0;
+  };
+  if (!hasEnded(patience)) {
+    // It kills its zygote and waits for all that it leaves. If the launcher were killed, these
+    // would be left to the application where that is what collects orphans: as pid 1 of a
+    // container.
+    signalLauncher(handles_.launcher, SIGTERM);
+    if (!hasEnded(killPatience / 2)) {
+      signalLauncher(handles_.launcher, SIGKILL);
+      hasEnded(killPatience / 2);
+    }
   }
   reapLauncher(handles_.launcher);
   handles_.launcher.close();

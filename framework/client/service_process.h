@@ -47,15 +47,24 @@ class ServiceProcess {
   struct Forked {
     std::uint32_t slot;
     Descriptor channel;
+    /// Bytes of heap that it was given.
+    std::size_t heap;
   };
   /// Asks for a worker for messages of at most so many bytes, without waiting for it; nothing when
   /// the service is lost. Throws StartFailure when no channel can be made.
   Optional<Forked> fork(std::uint64_t longestMessage, Deadline deadline);
   /// SIGKILL for the worker, if it still runs.
   void kill(std::uint32_t slot) noexcept;
-  /// How the worker ended, as wait status; nothing when the service is lost or it takes too long.
+  /// How a worker ended.
+  struct Exit {
+    /// As waitpid gives it.
+    int status;
+    /// There was no process to be had for it, so it has read nothing.
+    bool neverStarted;
+  };
+  /// How the worker ended; nothing when the service is lost or it takes too long.
   /// The caller has had a worker on the slot and has not released it.
-  Optional<int> awaitExit(std::uint32_t slot, Deadline deadline);
+  Optional<Exit> awaitExit(std::uint32_t slot, Deadline deadline);
   /// Nobody will ask for this slot again.
   void release(std::uint32_t slot) noexcept;
   /// Takes note of the workers that have ended, without waiting.
@@ -75,6 +84,8 @@ class ServiceProcess {
 
   /// The walls that it has, as bits of Transport::Layer.
   [[nodiscard]] std::uint64_t layers() const noexcept { return layers_; }
+  /// Its version, as Transport::packVersion has it.
+  [[nodiscard]] std::uint64_t version() const noexcept { return version_; }
 
  private:
   /// It only ever moves to the right. A retired service finishes what it has.
@@ -86,7 +97,9 @@ class ServiceProcess {
     Phase phase = Phase::free;
     /// By us: then a death by SIGKILL says nothing of the message.
     bool killed = false;
-    int status = 0;
+    /// When it was released.
+    Deadline since{};
+    Exit exit{};
   };
   using Lock = std::unique_lock<std::mutex>;
 
@@ -106,6 +119,7 @@ class ServiceProcess {
   /// Constant between construction and end().
   ServiceHandles handles_;
   std::uint64_t layers_ = 0;
+  std::uint64_t version_ = 0;
   std::atomic<State> state_ = State::running;
 
   std::mutex mutex_;

@@ -2,6 +2,8 @@
 /// What became of a worker, as the reasons that the application is given.
 #include "framework/client/worker.h"
 
+#include "framework/transport/layers.h"
+
 #include <sys/wait.h>
 
 #include <csignal>
@@ -19,9 +21,17 @@ constexpr milliseconds exitPatience{500};
 
 /// An exit status is the worker's own word, and one that was taken over may choose it: what it can
 /// claim so is one of the host's errors, for the message that it was sent.
-HostError explain(int status) {
+HostError explain(const ServiceProcess::Exit& exit) {
+  if (exit.neverStarted) {
+    return {Reason::startFailed, Transport::sentence(Transport::Obstacle::process, 0)};
+  }
+  const int status = exit.status;
   if (WIFEXITED(status) && WEXITSTATUS(status) == Transport::resourceExitStatus) {
     return {Reason::resourcesExhausted, ""};
+  }
+  // What it could not have is memory: the zygote had all the rest.
+  if (WIFEXITED(status) && WEXITSTATUS(status) == Transport::refusedExitStatus) {
+    return {Reason::resourcesExhausted, "the machine has no memory for its worker"};
   }
   if (WIFEXITED(status)) {
     return {Reason::crashed,
@@ -66,8 +76,8 @@ Optional<HostError> Worker::exchange(const ClientRequest& request, Deadline dead
 }
 
 HostError Worker::explainDeath() {
-  if (const Optional<int> status = service_->awaitExit(slot_, deadlineAfter(exitPatience))) {
-    return explain(*status);
+  if (const auto exit = service_->awaitExit(slot_, deadlineAfter(exitPatience))) {
+    return explain(*exit);
   }
   service_->destroy();
   return {Reason::crashed, "the service ended with it"};

@@ -18,7 +18,9 @@ namespace Keelgate {
 class Worker {
  public:
   Worker(std::shared_ptr<ServiceProcess> service, ServiceProcess::Forked forked) noexcept
-      : service_(std::move(service)), slot_(forked.slot), channel_(std::move(forked.channel)) {}
+      : service_(std::move(service)),
+        slot_(forked.slot),
+        channel_(std::move(forked.channel), forked.heap) {}
   Worker(Worker&&) noexcept = default;
   Worker& operator=(Worker&&) = delete;
   ~Worker();

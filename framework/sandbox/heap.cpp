@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "framework/sandbox/heap.h"
 
-#include "framework/sandbox/limits.h"
 #include "framework/sandbox/refusal.h"
 
 #include <malloc.h>
@@ -10,7 +9,7 @@
 namespace Keelgate::Sandbox {
 
 bool growHeap(std::size_t bytes) noexcept {
-  for (; bytes >= heapBase; bytes /= 2) {
+  for (; bytes >= Transport::heapBase; bytes /= 2) {
     // Volatile, or the compiler sees that nobody uses it.
     void* volatile area = std::malloc(bytes);
     if (area == nullptr) continue;
@@ -26,7 +25,7 @@ void prepareHeap() {
   mallopt(M_ARENA_MAX, 1);
   // -1 is "never": a freed area stays ours, so that a freed message leaves room for the next one.
   mallopt(M_TRIM_THRESHOLD, -1);
-  if (!growHeap(heapFor(0))) throw Refusal(Transport::Obstacle::heap);
+  if (!growHeap(Transport::heapFor(0))) throw Refusal(Transport::Obstacle::heap);
 #endif
   try {
     throw Refusal(Transport::Obstacle::heap, 0);

@@ -6,6 +6,7 @@
 #include <unistd.h>
 #include <array>
 #include <cstddef>
+#include <cstdint>
 
 namespace Keelgate::Sandbox {
 
@@ -39,18 +40,18 @@ constexpr std::array abiRows{
 
 }  // namespace
 
-std::uint32_t renounceByLandlock() {
+bool renounceByLandlock() {
   const long abi =
       syscall(SYS_landlock_create_ruleset, nullptr, 0, LANDLOCK_CREATE_RULESET_VERSION);
   for (const AbiRow& row : abiRows) {
     if (abi < static_cast<long>(row.abi)) continue;
     const long ruleset = syscall(SYS_landlock_create_ruleset, &row.handled, row.size, 0);
-    if (ruleset < 0) return 0;
+    if (ruleset < 0) return false;
     const bool restricted = syscall(SYS_landlock_restrict_self, ruleset, 0) == 0;
     close(static_cast<int>(ruleset));
-    return restricted ? static_cast<std::uint32_t>(abi) : 0;
+    return restricted;
   }
-  return 0;
+  return false;
 }
 
 }  // namespace Keelgate::Sandbox

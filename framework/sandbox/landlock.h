@@ -3,13 +3,10 @@
 /// needs no privilege, so that it stands where a container forbids them.
 #pragma once
 
-#include <cstdint>
-
 namespace Keelgate::Sandbox {
 
 /// Gives up every right that the running kernel's Landlock knows, for this process and all that it
-/// forks; no_new_privs must be set. Returns the kernel's interface number, or 0 where there is no
-/// Landlock or it refuses.
-std::uint32_t renounceByLandlock();
+/// forks; no_new_privs must be set. False where there is no Landlock or it refuses.
+bool renounceByLandlock();
 
 }  // namespace Keelgate::Sandbox

@@ -30,6 +30,13 @@ void limitZygote() {
   limit(RLIMIT_MEMLOCK, 0, 0);
   limit(RLIMIT_MSGQUEUE, 0, 0);
   limit(RLIMIT_STACK, stackLimit, stackLimit);
+#ifndef KEELGATE_UNSEALED
+  // With less an honest message would die of its depth, as if it were an attack.
+  rlimit stack{};
+  if (getrlimit(RLIMIT_STACK, &stack) != 0 || stack.rlim_cur < stackLimit) {
+    throw Refusal(Transport::Obstacle::stack, 0);
+  }
+#endif
   limit(RLIMIT_NOFILE, zygoteDescriptors, zygoteDescriptors);
 }
 

@@ -36,6 +36,13 @@ bool writeTo(const std::string& path, const std::string& text) {
   return written;
 }
 
+bool isOwnProc() {
+  std::array<char, 16> number{};
+  const ssize_t size = readlink("/proc/self", number.data(), number.size());
+  return size > 0 &&
+         std::string(number.data(), static_cast<std::size_t>(size)) == std::to_string(getpid());
+}
+
 /// Returns the identifier outside that nobody inside stands for, or -1.
 long mapOne(const std::string& path, unsigned own) {
   const std::string inside = std::to_string(nobody) + ' ';
@@ -46,8 +53,9 @@ long mapOne(const std::string& path, unsigned own) {
 
 }  // namespace
 
-Birth forkIntoNamespaces() {
+Birth forkIntoNamespaces(bool userNamespace) {
   for (const int flags : {CLONE_NEWUSER | CLONE_NEWPID, CLONE_NEWUSER, CLONE_NEWPID, 0}) {
+    if (!userNamespace && (flags & CLONE_NEWUSER) != 0) continue;
     const pid_t child = forkSelf(static_cast<unsigned>(flags));
     if (child < 0) continue;
     return {.child = child,
@@ -58,6 +66,8 @@ Birth forkIntoNamespaces() {
 }
 
 std::uint32_t mapIdentifiers(pid_t child) {
+  // That of an outer process namespace has another process under this number.
+  if (!isOwnProc()) return 0;
   const std::string process = "/proc/" + std::to_string(child);
   // Without this an unprivileged caller may not write a group map, because dropping a group can
   // also open what a group was meant to lock out.

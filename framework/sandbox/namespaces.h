@@ -24,8 +24,9 @@ struct Birth {
 };
 
 /// Forks a child into a new user and a new process namespace, or into as many of the two as the
-/// machine gives. Throws Refusal when not even a plain fork succeeds. Single-threaded callers only.
-Birth forkIntoNamespaces();
+/// machine gives; without `userNamespace` none of that kind. Throws Refusal when not even a plain
+/// fork succeeds. Single-threaded callers only.
+Birth forkIntoNamespaces(bool userNamespace);
 
 /// Maps `nobody` of the child's user namespace to an unprivileged user outside: where the caller is
 /// root to nobody, so that a worker which breaks out of everything owns nothing, otherwise to the

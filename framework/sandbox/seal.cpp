@@ -17,7 +17,6 @@
 #include <poll.h>
 #include <unistd.h>
 #include <ctime>
-#include <new>
 
 namespace Keelgate::Sandbox {
 
@@ -25,7 +24,7 @@ namespace Keelgate::Sandbox {
 
 ZygoteSeal sealZygote(std::uint32_t) {
   dieWithParent();
-  return {.layers = 0, .landlockAbi = 0, .workerFilter = {}};
+  return {.layers = 0, .workerFilter = {}};
 }
 
 void sealWorker(const WorkerSeal& seal) {
@@ -66,8 +65,7 @@ ZygoteSeal sealZygote(std::uint32_t given) {
   layers |= unshareNamespaces();
   if ((layers & layerMountNamespace) != 0 && enterEmptyRoot()) layers |= layerEmptyRoot;
 
-  const std::uint32_t landlockAbi = renounceByLandlock();
-  if (landlockAbi != 0) layers |= layerLandlock;
+  if (renounceByLandlock()) layers |= layerLandlock;
 
   layers = becomeNobodyIn(layers);
   dropCapabilities();
@@ -82,8 +80,7 @@ ZygoteSeal sealZygote(std::uint32_t given) {
   layers |= layerLimits;
 
   prepareHeap();
-  ZygoteSeal seal{
-      .layers = layers, .landlockAbi = landlockAbi, .workerFilter = compile(workerRules())};
+  ZygoteSeal seal{.layers = layers, .workerFilter = compile(workerRules())};
 
   enforce(compile(zygoteRules()));
   proveFilter(seal.workerFilter);
@@ -98,7 +95,9 @@ void sealWorker(const WorkerSeal& seal) {
   if (getppid() != seal.parent) _exit(0);
   limitWorker(seal.cpuSeconds);
   const bool growsBeyondZygotes = seal.longestMessage > shortMessage;
-  if (growsBeyondZygotes && !growHeap(heapFor(seal.longestMessage))) throw std::bad_alloc();
+  if (growsBeyondZygotes && !growHeap(heapFor(seal.longestMessage))) {
+    throw Refusal(Obstacle::heap, 0);
+  }
   if (!isAwaited()) touchPages();
   enforce(seal.filter);
 }

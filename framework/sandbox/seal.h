@@ -19,7 +19,6 @@ namespace Keelgate::Sandbox {
 struct ZygoteSeal {
   /// Transport::Layer.
   std::uint32_t layers;
-  std::uint32_t landlockAbi;
   std::vector<sock_filter> workerFilter;
 };
 
@@ -39,8 +38,7 @@ struct WorkerSeal {
   const std::vector<sock_filter>& filter;
 };
 
-/// Seals a worker, which has read nothing yet from its channel. Throws std::bad_alloc where the
-/// machine has not even the base of a heap.
+/// Seals a worker, which has read nothing yet from its channel.
 void sealWorker(const WorkerSeal& seal);
 
 }  // namespace Keelgate::Sandbox

@@ -10,6 +10,7 @@
 #include "framework/server/channel.h"
 #include "framework/server/zygote.h"
 
+#include <sys/prctl.h>
 #include <sys/socket.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -65,8 +66,19 @@ Tether makeTether() {
   return {.zygoteEnd = ends[0], .launcherEnd = ends[1]};
 }
 
+/// Blocked from before there is a zygote, so that none of them is missed; the zygote unblocks them.
+sigset_t awaitedSignals() {
+  sigset_t awaited;
+  sigemptyset(&awaited);
+  sigaddset(&awaited, SIGTERM);
+  sigaddset(&awaited, SIGCHLD);
+  return awaited;
+}
+
 [[noreturn]] void beZygote(const KeelgateServer& server, const Tether& tether) try {
   close(tether.launcherEnd);
+  const sigset_t awaited = awaitedSignals();
+  sigprocmask(SIG_UNBLOCK, &awaited, nullptr);
   Sandbox::dieWithParent();
   std::uint32_t layers = 0;
   // Nothing to read: the launcher died.
@@ -88,11 +100,47 @@ std::uint32_t giveLayers(const Sandbox::Birth& birth, bool groupsLeft) {
   return layers;
 }
 
-/// Ends as the zygote ended; 128 and the signal's number as a shell has it.
+/// Ends as the zygote ended; 128 and the signal's number as a shell has it. SIGTERM ends the zygote
+/// first. Workers that no process namespace held come to the launcher when their zygote is gone: it
+/// waits for them too, or the application would find them among its children where it is what
+/// collects orphans, as pid 1 of a container is.
 [[noreturn]] void outlive(pid_t zygote) {
-  int status = 0;
-  while (waitpid(zygote, &status, 0) < 0 && errno == EINTR) continue;
-  _exit(WIFSIGNALED(status) ? 128 + WTERMSIG(status) : WEXITSTATUS(status));
+  const sigset_t awaited = awaitedSignals();
+  int zygoteStatus = 0;
+  bool zygoteLives = true;
+  for (;;) {
+    int status = 0;
+    pid_t ended = 0;
+    while ((ended = waitpid(-1, &status, WNOHANG)) > 0) {
+      if (ended != zygote) continue;
+      zygoteStatus = status;
+      zygoteLives = false;
+    }
+    if (ended < 0) break;
+    int signal = 0;
+    if (sigwait(&awaited, &signal) == 0 && signal == SIGTERM && zygoteLives) kill(zygote, SIGKILL);
+  }
+  _exit(WIFSIGNALED(zygoteStatus) ? 128 + WTERMSIG(zygoteStatus) : WEXITSTATUS(zygoteStatus));
+}
+
+/// The zygote, waiting to be told its layers, and what these are.
+struct Start {
+  pid_t zygote;
+  std::uint32_t layers;
+};
+
+Start startZygote(const KeelgateServer& server, const Tether& tether, bool groupsLeft) {
+  for (const bool userNamespace : {true, false}) {
+    const Sandbox::Birth birth = Sandbox::forkIntoNamespaces(userNamespace);
+    if (birth.child == 0) beZygote(server, tether);
+    const std::uint32_t layers = giveLayers(birth, groupsLeft);
+    const bool unmapped = birth.newUserNamespace && (layers & Transport::layerUserNamespace) == 0;
+    // In a namespace without maps root can become nobody else: it is better off without.
+    if (!unmapped || geteuid() != 0) return {.zygote = birth.child, .layers = layers};
+    kill(birth.child, SIGKILL);
+    waitpid(birth.child, nullptr, 0);
+  }
+  throw Refusal(Obstacle::process, 0);
 }
 
 [[noreturn]] void launch(const KeelgateServer& server) try {
@@ -100,19 +148,21 @@ std::uint32_t giveLayers(const Sandbox::Birth& birth, bool groupsLeft) {
   // Before anything is made: what the one who starts us left open must not reach a worker.
   Sandbox::keepOnly(Transport::serviceDescriptor);
   const bool groupsLeft = Sandbox::leaveGroups();
+  const sigset_t awaited = awaitedSignals();
+  sigprocmask(SIG_BLOCK, &awaited, nullptr);
+  // Where it is refused, orphans go where they always went.
+  prctl(PR_SET_CHILD_SUBREAPER, 1, 0, 0, 0);
   const Tether tether = makeTether();
-  const Sandbox::Birth birth = Sandbox::forkIntoNamespaces();
-  if (birth.child == 0) beZygote(server, tether);
+  const Start start = startZygote(server, tether, groupsLeft);
   close(tether.zygoteEnd);
-  const std::uint32_t layers = giveLayers(birth, groupsLeft);
   // The zygote's alone from now on, so that its end is the channel's end.
   close(Transport::serviceDescriptor);
   // One that has already refused does not listen, and its own status says why.
   std::signal(SIGPIPE, SIG_IGN);
-  if (write(tether.launcherEnd, &layers, sizeof layers) < 0 && errno != EPIPE) {
+  if (write(tether.launcherEnd, &start.layers, sizeof start.layers) < 0 && errno != EPIPE) {
     _exit(Transport::refusedExitStatus);
   }
-  outlive(birth.child);
+  outlive(start.zygote);
 } catch (const Refusal& why) {
   refuse(why);
 }

@@ -60,7 +60,7 @@ void Zygote::serve() {
   // other end of an activated socket is whoever may connect to it.
   Sandbox::ZygoteSeal seal = Sandbox::sealZygote(given_);
   options_.filter = std::move(seal.workerFilter);
-  greet(seal.layers, seal.landlockAbi);
+  greet(seal.layers);
   pollfd channels[]{{.fd = Transport::serviceDescriptor, .events = POLLIN, .revents = 0},
                     {.fd = deaths, .events = POLLIN, .revents = 0},
                     {.fd = tether_, .events = 0, .revents = 0}};
@@ -76,7 +76,7 @@ void Zygote::serve() {
   }
 }
 
-void Zygote::greet(std::uint32_t layers, std::uint32_t landlockAbi) {
+void Zygote::greet(std::uint32_t layers) {
   const Optional<ReceivedControl> hello = receiveControl();
   if (!hello) _exit(0);
   if (hello->frame.kind != ControlKind::hello) throw Refusal(Obstacle::badFrame, 0);
@@ -87,7 +87,7 @@ void Zygote::greet(std::uint32_t layers, std::uint32_t landlockAbi) {
                .kind = ControlKind::ready,
                .slot = 0,
                .reserved = 0,
-               .numbers = {layers, landlockAbi, 0, 0}});
+               .numbers = {layers, KEELGATE_VERSION_NUMBER, 0, 0}});
 }
 
 bool Zygote::takeFrame() {
@@ -119,7 +119,9 @@ void Zygote::fork(std::uint32_t slot, int channel) {
     children_.push_back({.slot = slot, .process = process});
   } else {
     // Every fork gets its exit, also one that came to nothing: nobody waits for a worker in vain.
-    sendControl(exitFrame(slot, W_EXITCODE(Transport::resourceExitStatus, 0), rusage{}));
+    ControlFrame none = exitFrame(slot, 0, rusage{});
+    none.numbers[3] = 1;
+    sendControl(none);
   }
 }
 

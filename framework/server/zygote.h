@@ -33,7 +33,7 @@ class Zygote {
     pid_t process;
   };
 
-  void greet(std::uint32_t layers, std::uint32_t landlockAbi);
+  void greet(std::uint32_t layers);
   /// False when the client has gone.
   bool takeFrame();
   void fork(std::uint32_t slot, int channel);

@@ -111,7 +111,8 @@ Data encodeError(const VespClientMessageUnpackingError& error) {
 }
 
 void throwError(Bytes body) {
-  Reader from(body);
+  // A path is short, and the rest of an error is its bytes.
+  Reader from(body, body.size());
   switch (ErrorKind{from.byte()}) {
     case ErrorKind::decoding:
       throwRead(from, readDecodingError);

@@ -22,6 +22,7 @@
 /// over.
 #pragma once
 
+#include <algorithm>
 #include <cstddef>
 #include <cstdint>
 
@@ -74,14 +75,15 @@ enum class Obstacle : std::uint64_t {
   heap,
   filter,
   selfCheck,
+  stack,
 };
 
 /// What stands in `numbers` for each kind, all others being 0:
 ///   hello: [0] messages per worker, [1] CPU seconds per worker
-///   ready: [0] layers (Layer), [1] Landlock ABI
+///   ready: [0] layers (Layer), [1] version of the service: 16 bits each for major, minor, patch
 ///   fork:  [0] length in bytes of the longest message that the worker will be given
 ///   exit:  [0] wait status as wait4 gives it, [1] peak resident bytes, [2] CPU microseconds;
-///          a worker that could not be forked has the status of one whose heap did not suffice
+///          [3] 1 for a worker that could not be forked, and so has read nothing
 ///   refused: [0] Obstacle, [1] errno or 0
 struct ControlFrame {
   std::uint32_t magic;
@@ -139,6 +141,24 @@ constexpr std::size_t maximumServiceLength = std::size_t{64} * 1024;
 /// Workers that are forked before their message is there are forked for messages up to this many
 /// bytes. What is longer takes so long to read that the wait for a worker of its own is lost in it.
 constexpr std::uint64_t shortMessage = std::uint64_t{256} << 10;
+
+/// Address space that every worker has, whatever its message: the program's own needs and the
+/// allocator's slack are far below. Untouched, it costs nothing.
+constexpr std::size_t heapBase = std::size_t{128} << 20;
+
+/// Address space for each byte of the message. The hungriest message is a list of empty payloads:
+/// some 8 KB for the schema and the record of each, as against 45 bytes of XML or a dozen of
+/// binary. A longer list than the base has room for, 16,000 at least and 26,000 in XML, would be no
+/// push payload any more, and to grant its factor would let 64 MiB of message ask for the whole
+/// machine.
+constexpr std::size_t heapPerByte = 64;
+
+/// Bytes of heap that a message of `length` bytes is worth. Short ones all get the same, which is
+/// there in the zygote already. The client counts with it too: no honest worker can have made a
+/// reply or a record that would not have fitted.
+constexpr std::size_t heapFor(std::uint64_t length) {
+  return heapBase + heapPerByte * static_cast<std::size_t>(std::max(length, shortMessage));
+}
 
 /// The exit status of a worker whose heap did not suffice. This and the next two are those that
 /// sysexits.h has for a passing failure, a breach of protocol and a lack of permission.

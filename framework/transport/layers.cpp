@@ -38,6 +38,9 @@ std::string_view explain(Obstacle obstacle) {
     case Obstacle::filter:
       return "The kernel refused the system call filter: use a kernel with CONFIG_SECCOMP_FILTER "
              "and allow seccomp in the profile that the service is started under";
+    case Obstacle::stack:
+      return "The service has too little stack for the deepest messages: raise the hard limit to "
+             "8 MiB (ulimit -H -s)";
     case Obstacle::selfCheck:
       return "The seal did not hold when the service tried it: run it on a kernel that enforces "
              "seccomp filters, not under an emulation of one";
@@ -56,6 +59,13 @@ std::string missingLayersLine(std::uint64_t layers) {
     line += row.name;
   }
   return line;
+}
+
+std::string versionText(std::uint64_t version) {
+  const auto part = [version](unsigned bits) {
+    return std::to_string((version >> bits) & 0xffff);
+  };
+  return part(32) + '.' + part(16) + '.' + part(0);
 }
 
 std::string sentence(Obstacle obstacle, int error) {

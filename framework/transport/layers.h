@@ -49,6 +49,9 @@ constexpr std::size_t secondWalls = 9;
 /// missing. It ends without a full stop, so that a sentence can go on from it.
 std::string missingLayersLine(std::uint64_t layers);
 
+/// "1.2.3", from what a ready frame carries.
+std::string versionText(std::uint64_t version);
+
 /// A sentence that says what a service could not have and how to get it. `error` is the errno that
 /// came with it, or 0. An obstacle that is none, from a service of another build, has one too.
 std::string sentence(Obstacle obstacle, int error);

@@ -9,6 +9,7 @@
 #pragma once
 
 #include "framework/contracts/construct.h"
+#include "framework/transport/frames.h"
 #include "framework/transport/wire.h"
 
 #include <keelgate/describe.h>
@@ -86,6 +87,7 @@ requires(isArray<Array<T>>) void read(Reader& from, Array<T>& values, int depth)
   // large as the shortest bytes that claim to be one. Made in place: a temporary payload takes 5 KB
   // of stack at every level of nesting, and the application may call from a thread with little.
   for (std::size_t rest = from.count(); rest > 0; --rest) {
+    from.charge(sizeof(T));
     read(from, values.emplace_back(), depth);
   }
 }
@@ -153,8 +155,8 @@ Data encodeRecord(const T& record) {
 /// For the client. What it gives is a record that an honest service might have sent: whether this
 /// one did is not to be known.
 template <Record T>
-T decodeRecord(Bytes body) {
-  Reader from(body);
+T decodeRecord(Bytes body, std::size_t memory = heapFor(0)) {
+  Reader from(body, memory);
   T record{};
   read(from, record, 0);
   // Bytes behind the record: then it was not written by an honest service.

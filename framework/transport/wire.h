@@ -54,7 +54,8 @@ class Writer {
 /// that it gives point into the reply and live as long.
 class Reader {
  public:
-  explicit Reader(Bytes reply) : rest_(reply) {}
+  /// `memory`: what the values that are read may take in all, in bytes.
+  Reader(Bytes reply, std::size_t memory) : rest_(reply), memory_(memory) {}
 
   std::uint8_t byte() { return static_cast<std::uint8_t>(take(1)[0]); }
   /// In the machine's order: both sides are on one machine.
@@ -80,6 +81,12 @@ class Reader {
     if (value > rest_.size()) throw MalformedReply();
     return value;
   }
+  /// Accounts for so much memory that is taken for a value. A record may be twenty times as large
+  /// as the shortest bytes that claim to be one.
+  void charge(std::size_t size) {
+    if (size > memory_) throw MalformedReply();
+    memory_ -= size;
+  }
   /// An honest reply ends where its record ends.
   void end() const {
     if (!rest_.empty()) throw MalformedReply();
@@ -96,6 +103,7 @@ class Reader {
   }
 
   Bytes rest_;
+  std::size_t memory_;
 };
 
 /// Whether the text is UTF-8 in its shortest form, without surrogates.

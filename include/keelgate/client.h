@@ -42,7 +42,8 @@ struct ServiceReport {
 /// A running service. All members may be called from many threads at once; each call holds one of
 /// the service's processes, and waits for one while all are taken. The client makes no threads,
 /// installs no signal handlers and leaves the application's children alone. In a process that was
-/// forked from the application it starts a service of its own at its first use.
+/// forked from the application it starts a service of its own at its first use; until then it
+/// shares the parent's channel, so that a service whose parent was killed ends with it.
 ///
 /// A call returns nothing partial: it gives the whole record, or throws and leaves the client as it
 /// was, ready for the next message.
@@ -78,8 +79,8 @@ class KEELGATE_API Client {
     std::function<void(std::string_view line)> log;
   };
 
-  /// Starts the service. Throws HostError: startFailed with a sentence that says what to do about
-  /// it, or timedOut where a service that was started is not ready within 10 s.
+  /// Starts the service, which has 10 s to get ready. Throws HostError (startFailed) with a sentence
+  /// that says what to do about it.
   Client();
   explicit Client(Options options);
   /// Ends it, within 200 ms: after 100 ms whatever still runs is killed. No call may be under way.

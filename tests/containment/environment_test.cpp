@@ -9,9 +9,11 @@
 #include <linux/filter.h>
 #include <linux/sched.h>
 #include <linux/seccomp.h>
+#include <sched.h>
 #include <sys/prctl.h>
 #include <sys/resource.h>
 #include <sys/syscall.h>
+#include <sys/wait.h>
 #include <unistd.h>
 #include <cerrno>
 #include <csignal>
@@ -58,6 +60,18 @@ void becomeUser(const std::vector<gid_t>& with) {
       setresuid(1000, 1000, 1000) != 0) {
     _exit(126);
   }
+}
+
+/// Goes on in a new process namespace, whose list of processes nobody has mounted.
+void becomeFirstProcess() {
+  if (unshare(CLONE_NEWPID) != 0) _exit(126);
+  const pid_t first = fork();
+  if (first == 0) return;
+  // The channel is the service's alone.
+  closefrom(STDERR_FILENO + 1);
+  int status = 0;
+  waitpid(first, &status, 0);
+  _exit(WIFEXITED(status) ? WEXITSTATUS(status) : 126);
 }
 
 constexpr unsigned inner = layerMountNamespace | layerNetworkNamespace | layerIpcNamespace |
@@ -107,6 +121,17 @@ const std::vector<Environment> environments{
      .refused = {{SYS_clone, EPERM, CLONE_NEWUSER}},
      .missing = namespaces,
      .user = std::vector<gid_t>()},
+    {.name = "maps refused, as root",
+     .refused = {{SYS_openat, EACCES}},
+     .missing = layerUserNamespace},
+    {.name = "maps refused, as a user",
+     .refused = {{SYS_openat, EACCES}},
+     .missing = layerUserNamespace,
+     .user = std::vector<gid_t>(),
+     .needsUserNamespace = true},
+    {.name = "the process list of another process namespace",
+     .missing = layerUserNamespace,
+     .before = becomeFirstProcess},
     {.name = "no process namespace",
      .refused = {{SYS_clone, EINVAL, CLONE_NEWPID}},
      .missing = layerPidNamespace},
@@ -149,6 +174,13 @@ const std::vector<Environment> environments{
      .refusal = "capset",
      .needsUserNamespace = true},
     {.name = "no process to be had", .refused = {{SYS_clone, EAGAIN}}, .refusal = "ulimit -u"},
+    {.name = "too little stack",
+     .refusal = "ulimit -H -s",
+     .before =
+         [] {
+           const rlimit small{.rlim_cur = 1 << 20, .rlim_max = 1 << 20};
+           setrlimit(RLIMIT_STACK, &small);
+         }},
     {.name = "an address space that is too small",
      .refusal = "ulimit -v",
      .before =

@@ -67,8 +67,10 @@ TEST(C2, EveryCallButThreeKillsTheWorker) {
   for (long call = 0; call <= 600; ++call) {
     orders.push_back("call " + std::to_string(call) + " 0 0 0");
     orders.push_back("call " + std::to_string(call) + " 3 0 0");
-    orders.push_back("call " + std::to_string(call + 0x4000'0000) + " 3 0 0");
-    orders.push_back("int80 " + std::to_string(call));
+    for (const char* argument : {" 0", " 3"}) {
+      orders.push_back("call " + std::to_string(call + 0x4000'0000) + argument + " 0 0");
+      orders.push_back("int80 " + std::to_string(call) + argument);
+    }
   }
   for (const char* call : {"-1", "2147483648", "4294967295"}) {
     orders.push_back("call " + std::string(call) + " 3 0 0");
@@ -78,6 +80,8 @@ TEST(C2, EveryCallButThreeKillsTheWorker) {
   obeyAll(orders, [&](const std::string& order, const RawReply& reply, const WorkerEnd& end) {
     const auto survived = survivedOrders.find(order);
     if (survived == survivedOrders.end()) {
+      // A kernel may have no vsyscall page at all.
+      if (order.starts_with("vsyscall") && end.signal() == SIGSEGV) return;
       EXPECT_EQ(outcome(reply, end), "signal " + std::to_string(SIGSYS)) << order;
       return;
     }

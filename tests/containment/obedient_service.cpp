@@ -6,7 +6,7 @@
 ///
 ///     call N [A...]    system call N with up to six arguments; its result is the answer's
 ///                      messageId
-///     int80 N          the same by the old 32-bit gate
+///     int80 N A        the same by the old 32-bit gate
 ///     vsyscall N       slot N of the vsyscall page
 ///     say HEX          writes these bytes to the channel, and answers afterwards
 ///     drip HEX         the same, one byte a second
@@ -35,11 +35,11 @@ using namespace Keelgate;
 /// What the link check looks for, whatever is inlined or stripped.
 [[gnu::used]] constexpr char marker[] = "an unpacker that obeys";
 
-long callByGate(long number) {
+long callByGate(long number, long first) {
   long result = number;
   asm volatile("int $0x80"
                : "+a"(result)
-               : "b"(3), "c"(0), "d"(0)
+               : "b"(first), "c"(0), "d"(0)
                : "memory", "r8", "r9", "r10", "r11");
   return result;
 }
@@ -133,7 +133,7 @@ long obey(const std::string& order) {
   }
   if (verb == "count") return ++messagesSeen;
   if (verb == "call") return call(numbers);
-  if (verb == "int80") return callByGate(numbers.at(0));
+  if (verb == "int80") return callByGate(numbers.at(0), numbers.at(1));
   if (verb == "vsyscall") return callVsyscall(numbers.at(0));
   if (verb == "eat") eat(static_cast<std::size_t>(numbers.at(0)));
   misbehave(verb);

@@ -1,6 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
 /// What one worker can do to the others, to the machine and to the protocol.
-#include "framework/sandbox/limits.h"
 #include "tests/containment/raw_client.h"
 
 #include <dirent.h>
@@ -132,14 +131,14 @@ TEST_F(Worker, C3SeenFromOutside) {
 
 TEST_F(Worker, C4MemoryIsFixedBeforeTheMessageIsRead) {
   NEEDS_SEAL();
-  constexpr std::size_t base = Sandbox::heapFor(0);
+  constexpr std::size_t base = Transport::heapFor(0);
   constexpr std::size_t length = 1 << 20;
   const auto eat = [&](std::size_t bytes, std::size_t messageLength) {
     std::string order = "eat " + std::to_string(bytes);
     order.resize(std::max(order.size(), messageLength), ' ');
     return service_.obey(order);
   };
-  constexpr std::size_t worth = Sandbox::heapFor(length);
+  constexpr std::size_t worth = Transport::heapFor(length);
   constexpr std::size_t slack = 8 << 20;
   EXPECT_EQ(resultOf(eat(base - slack, 0).first), 0);
   EXPECT_EQ(resultOf(eat(worth - slack, length).first), 0);

@@ -111,29 +111,47 @@ bool receive(ControlFrame& frame, int& descriptor) {
 
 class Zygote {
  public:
-  Zygote(std::uint64_t messages, bool early) : messages_(messages), early_(early) {}
+  Zygote(std::uint64_t messages, std::string_view manner)
+      : messages_(messages), early_(manner == "early"), barren_(manner == "barren") {}
 
   void serve() {
     sigset_t child;
     sigemptyset(&child);
     sigaddset(&child, SIGCHLD);
+    sigaddset(&child, SIGTERM);
     sigprocmask(SIG_BLOCK, &child, nullptr);
     pollfd entries[] = {{channel, POLLIN, 0}, {signalfd(-1, &child, SFD_NONBLOCK), POLLIN, 0}};
     for (;;) {
       poll(entries, 2, -1);
-      signalfd_siginfo ignored;
-      if (read(entries[1].fd, &ignored, sizeof ignored) > 0) reportExits();
+      signalfd_siginfo signal;
+      if (read(entries[1].fd, &signal, sizeof signal) > 0) {
+        if (signal.ssi_signo == SIGTERM) end();
+        reportExits();
+      }
       if (entries[0].revents == 0) continue;
       ControlFrame frame;
       int descriptor;
-      if (!receive(frame, descriptor)) _exit(0);
+      if (!receive(frame, descriptor)) end();
       if (frame.kind == ControlKind::fork) fork(frame.slot, descriptor);
       if (frame.kind == ControlKind::kill) kill(frame.slot);
     }
   }
 
  private:
+  /// Leaves nobody behind, as a launcher does.
+  [[noreturn]] void end() {
+    for (const auto& [pid, slot] : slots_) ::kill(pid, SIGKILL);
+    while (wait(nullptr) > 0) continue;
+    _exit(0);
+  }
   void fork(std::uint32_t slot, int descriptor) {
+    if (barren_) {
+      close(descriptor);
+      ControlFrame frame = makeFrame(ControlKind::exit, slot);
+      frame.numbers[3] = 1;
+      send(channel, &frame, sizeof frame, MSG_NOSIGNAL);
+      return;
+    }
     const pid_t pid = ::fork();
     if (pid == 0) {
       prctl(PR_SET_PDEATHSIG, SIGKILL);
@@ -161,6 +179,7 @@ class Zygote {
 
   std::uint64_t messages_;
   bool early_;
+  bool barren_;
   std::map<pid_t, std::uint32_t> slots_;
 };
 
@@ -181,5 +200,5 @@ int main(int, char** arguments) {
   if (manner == "babbles") ready.magic = 0;
   if (manner != "mute") send(channel, &ready, sizeof ready, MSG_NOSIGNAL);
   while (manner == "mute" || manner == "stuck") pause();
-  Zygote(hello.numbers[0], manner == "early").serve();
+  Zygote(hello.numbers[0], manner).serve();
 }

@@ -7,8 +7,12 @@
 
 #include <gtest/gtest.h>
 
+#include <fcntl.h>
+#include <sys/wait.h>
+
 #include <algorithm>
 #include <csignal>
+#include <limits>
 
 namespace Keelgate::Host {
 namespace {
@@ -179,7 +183,8 @@ TEST(C6, AWorkerSeesOneMessageUnlessMoreAreAllowed) {
   for (const std::size_t allowed : {1u, 3u}) {
     Client::Options options = fakeOptions();
     options.servicePath = KEELGATE_OBEDIENT_SERVICE;
-    options.largestMessage = 1u << 20;
+    // Far more than any worker can be forked for.
+    options.largestMessage = std::numeric_limits<std::size_t>::max();
     options.processes = 1;
     options.messagesPerProcess = allowed;
     Client client(options);
@@ -214,6 +219,17 @@ Data nestedPayloads(std::size_t depth) {
   return all;
 }
 
+/// A payload takes twenty times the memory of the shortest bytes that claim to be one.
+TEST(C8, ARecordTakesNoMoreMemoryThanItsWorkerHad) {
+  PulseUserPayload payload{};
+  payload.ostrelMessageList.resize(1000);
+  const Data body = Transport::encodeRecord(payload);
+  EXPECT_LT(body.size(), 250'000u);
+  constexpr std::size_t memory = 1000 * sizeof(PulseUserPayload);
+  EXPECT_NO_THROW(Transport::decodeRecord<PulseUserPayload>(body, memory));
+  EXPECT_THROW(Transport::decodeRecord<PulseUserPayload>(body, memory - 1), MalformedReply);
+}
+
 TEST(C8, NestingEndsBeforeTheStackOfTheClientDoes) {
   constexpr std::size_t most = Transport::maximumDepth;
   EXPECT_NO_THROW(Transport::decodeRecord<PulseUserPayload>(nestedPayloads(most)));
@@ -221,29 +237,62 @@ TEST(C8, NestingEndsBeforeTheStackOfTheClientDoes) {
   EXPECT_THROW(Transport::decodeRecord<PulseUserPayload>(nestedPayloads(50'000)), MalformedReply);
 }
 
+template <class R>
+void readRecord(Bytes body) {
+  Transport::decodeRecord<R>(body);
+}
+
+/// What the real service answers to a message of the examples.
+template <class R>
+Data replyTo(Client& service, const char* file, const VespClientMessageContext& context = {}) {
+  std::ifstream in(String(KEELGATE_EXAMPLES "/") + file, std::ios::binary);
+  const std::vector<char> message{std::istreambuf_iterator<char>(in), {}};
+  const Bytes bytes = std::as_bytes(std::span(message));
+  if constexpr (std::same_as<R, VespClientMessageResult>) {
+    return Transport::encodeRecord(service.unpackClientMessage(bytes, context));
+  } else {
+    return Transport::encodeRecord(service.unpack<R>(bytes));
+  }
+}
+
 /// Every reply with any one byte changed is a record, an error, or known to be a lie.
 TEST(C8, NoChangedByteOfAReplyDoesMore) {
-  VespInvitation invitation{};
-  invitation.context.schema = "1";
-  const Data replies[] = {
-      recordNumbered(7), Transport::encodeRecord(invitation),
-      Transport::encodeError(DecodingError(DecodingError::Kind::keyNotFound, "k",
-                                           {String("a"), std::size_t{1}}, "missing")),
-      Transport::encodeError(Breach("domain", "type", "path"))};
-  const auto read = [](std::size_t which, Bytes body) {
-    try {
-      if (which == 0) Transport::decodeRecord<VespCommandResponse>(body);
-      if (which == 1) Transport::decodeRecord<VespInvitation>(body);
-      if (which > 1) Transport::throwError(body);
-    } catch (const MalformedReply&) {
-    } catch (const Error&) {
-    }
-  };
-  for (std::size_t which = 0; which < std::size(replies); ++which) {
-    for (std::size_t i = 0; i < replies[which].size(); ++i) {
-      for (int value = 0; value < 256; ++value) {
-        EXPECT_NO_THROW(read(which, changed(replies[which], i, static_cast<std::uint8_t>(value))));
+  Client::Options options = fakeOptions();
+  options.servicePath = KEELGATE_SERVICE;
+  Client service(options);
+  using Unpacking = VespKeelgateService::VespClientMessageUnpackingError;
+  const std::pair<void (*)(Bytes), Data> replies[] = {
+      {readRecord<VespCommandResponse>,
+       replyTo<VespCommandResponse>(service, "command-response.xml")},
+      {readRecord<VespInvitation>, replyTo<VespInvitation>(service, "invitation-home.xml")},
+      {readRecord<VespCommandWebTunnelResponse>,
+       replyTo<VespCommandWebTunnelResponse>(service, "web-tunnel-response.xml")},
+      {readRecord<PulseUserPayload>, replyTo<PulseUserPayload>(service, "push-payload.xml")},
+      {readRecord<VespClientMessageResult>,
+       replyTo<VespClientMessageResult>(
+           service, "session-accept.xml",
+           {.command = 233, .service = "com.tessen.private.braid.viso.audio"})},
+      {Transport::throwError,
+       Transport::encodeError(DecodingError(DecodingError::Kind::keyNotFound, "k",
+                                            {String("a"), std::size_t{1}}, "missing"))},
+      {Transport::throwError, Transport::encodeError(Breach("domain", "type", "path"))},
+      {Transport::throwError,
+       Transport::encodeError(Unpacking::unimplementedCommand(*CommandType::fromRawValue(232)))},
+      {Transport::throwError, Transport::encodeError(Unpacking::noUnpackerForService("s"))}};
+  for (const auto& [read, reply] : replies) {
+    ASSERT_FALSE(reply.empty());
+    Data other = reply;
+    for (std::size_t i = 0; i < reply.size(); ++i) {
+      // All that a byte can be; of long replies what flips one bit, or some.
+      for (int change = 1; change < 256; change += reply.size() < 400 ? 1 : change) {
+        other[i] = reply[i] ^ static_cast<std::byte>(change);
+        try {
+          read(other);
+        } catch (const MalformedReply&) {
+        } catch (const Error&) {
+        }
       }
+      other[i] = reply[i];
     }
   }
 }
@@ -256,12 +305,15 @@ TEST(C8, NoChangedByteOfAFrameDoesMore) {
   Data frame(head.begin(), head.end());
   frame.insert(frame.end(), body.begin(), body.end());
   for (std::size_t i = 0; i < frame.size(); ++i) {
-    Data other = frame;
-    other[i] ^= std::byte{0x41};
-    const String outcome = outcomeOf(client, Script().write(other));
-    EXPECT_TRUE(outcome == "crashed" || outcome == "protocolViolation" ||
-                (i >= head.size() && outcome.starts_with("record")))
-        << i << ": " << outcome;
+    // All that the eight bits can be, and less of the body, which has been through that by itself.
+    for (int change = 1; change < 256; change += i < head.size() ? 1 : 100) {
+      Data other = frame;
+      other[i] ^= static_cast<std::byte>(change);
+      const String outcome = outcomeOf(client, Script().write(other));
+      EXPECT_TRUE(outcome == "crashed" || outcome == "protocolViolation" ||
+                  (i >= head.size() && outcome.starts_with("record")))
+          << i << ": " << outcome;
+    }
   }
 }
 
@@ -282,6 +334,25 @@ TEST(C8, LogLinesCannotSteerATerminal) {
   EXPECT_EQ(seen,
             "plain, Zürich €|\\x1b[2J\\x0d\\x0a\\x09\\x7f|"
             "\\xc2\\x9b1A \\xff\\xc0\\x80 \\xed\\xa0\\x80|");
+}
+
+/// Standard error may be a pipe whose reader has gone.
+TEST(C8, LogLinesCannotEndTheApplication) {
+  const pid_t child = fork();
+  if (child == 0) {
+    int ends[2];
+    if (pipe(ends) != 0 || dup2(ends[1], STDERR_FILENO) < 0) _exit(2);
+    close(ends[0]);
+    signal(SIGPIPE, SIG_DFL);
+    Client::Options options = fakeOptions();
+    options.log = nullptr;
+    Client client(options);
+    const Script logs = Script().log("a line").answer(recordNumbered(7));
+    _exit(outcomeOf(client, logs) == "record 7" ? 0 : 1);
+  }
+  int status = -1;
+  waitpid(child, &status, 0);
+  EXPECT_EQ(status, 0);
 }
 
 }  // namespace

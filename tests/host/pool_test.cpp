@@ -4,12 +4,14 @@
 
 #include <gtest/gtest.h>
 
+#include <sys/resource.h>
 #include <sys/socket.h>
 #include <sys/un.h>
 #include <sys/wait.h>
 
 #include <atomic>
 #include <csignal>
+#include <iterator>
 #include <thread>
 
 namespace Keelgate::Host {
@@ -46,6 +48,7 @@ TEST(Start, AFailureSaysWhatIsWrong) {
       {layers, "Running without: user namespace, mount namespace"},
       {fakeOptions("refuses"), "The kernel refused the system call filter: use a kernel with"},
       {fakeOptions("dies"), "ended, or said something unknown, while it was starting"},
+      {fakeOptions("mute"), "did not get ready in time"},
       {fakeOptions("babbles"), "ended, or said something unknown, while it was starting"}};
   for (const auto& [options, sentence] : rows) {
     const String outcome = startOf(options);
@@ -69,6 +72,39 @@ TEST(Start, MissingSecondWallsAreToldOnceAndReported) {
   std::size_t present = 0;
   for (const SandboxLayer& layer : client.report().layers) present += layer.present ? 1 : 0;
   EXPECT_EQ(present, 6u);
+}
+
+TEST(Start, ThereMayBeTooFewDescriptors) {
+  const auto used = static_cast<rlim_t>(openDescriptors());
+  rlimit before{};
+  getrlimit(RLIMIT_NOFILE, &before);
+  for (rlim_t spare = 0; spare < 8; ++spare) {
+    const rlimit few{.rlim_cur = used - 1 + spare, .rlim_max = before.rlim_max};
+    setrlimit(RLIMIT_NOFILE, &few);
+    const String outcome = startOf(fakeOptions());
+    setrlimit(RLIMIT_NOFILE, &before);
+    EXPECT_TRUE(outcome == "started" || outcome.find("ulimit -n") != String::npos) << outcome;
+    EXPECT_TRUE(children().empty()) << spare;
+  }
+}
+
+TEST(Pool, AMachineWithoutProcessesIsNotTheMessagesFault) {
+  Client client(fakeOptions("barren"));
+  EXPECT_EQ(outcomeOf(client, good()), "startFailed");
+}
+
+TEST(Pool, AWorkerThatStaysAfterItsAnswerIsKilled) {
+  Client client(fakeOptions());
+  const auto stays = good().then(Op::pause, 60'000);
+  for (int i = 0; i < 10; ++i) {
+    EXPECT_EQ(outcomeOf(client, stays), "record 7");
+    usleep(20'000);
+  }
+  const std::string zygote = std::to_string(*children().begin());
+  std::ifstream list("/proc/" + zygote + "/task/" + zygote + "/children");
+  const auto workers = std::distance(std::istream_iterator<pid_t>(list), {});
+  // Two that are kept ready, one that has just answered, one that is being killed.
+  EXPECT_LE(workers, 4);
 }
 
 TEST(Pool, AZygoteThatDoesNotServeIsReplacedInTime) {

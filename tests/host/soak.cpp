@@ -7,6 +7,8 @@
 // The message is what makes a worker of that service crash; by default, one of the fake service.
 #include "tests/host/host_testing.h"
 
+#include <sys/prctl.h>
+
 #include <atomic>
 #include <csignal>
 #include <iostream>
@@ -84,6 +86,8 @@ bool soak(const String& service, long messages, unsigned threads, Bytes message)
 int main(int count, char** arguments) {
   using namespace Keelgate::Host;
   if (count < 4) return 2;
+  // As pid 1 of a container: what the service leaves behind would be found among our children.
+  prctl(PR_SET_CHILD_SUBREAPER, 1);
   const Script script = Script().then(Op::raise, SIGSEGV);
   const std::string_view text(count == 5 ? arguments[4] : "");
   return soak(arguments[1], std::stol(arguments[2]),
