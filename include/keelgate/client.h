@@ -79,8 +79,8 @@ class KEELGATE_API Client {
     std::function<void(std::string_view line)> log;
   };
 
-  /// Starts the service, which has 10 s to get ready. Throws HostError (startFailed) with a sentence
-  /// that says what to do about it.
+  /// Starts the service, which has 10 s to get ready. Throws HostError (startFailed) with a
+  /// sentence that says what to do about it.
   Client();
   explicit Client(Options options);
   /// Ends it, within 200 ms: after 100 ms whatever still runs is killed. No call may be under way.
