@@ -6,6 +6,7 @@
 
 #include <grp.h>
 #include <gtest/gtest.h>
+#include <keelgate/client.h>
 #include <linux/filter.h>
 #include <linux/sched.h>
 #include <linux/seccomp.h>
@@ -18,6 +19,8 @@
 #include <cerrno>
 #include <csignal>
 #include <cstddef>
+#include <cstring>
+#include <filesystem>
 
 namespace Keelgate::Test {
 namespace {
@@ -204,23 +207,55 @@ void PrintTo(const Environment& environment, std::ostream* to) {
   *to << environment.name;
 }
 
-class EnvironmentTest : public testing::TestWithParam<Environment> {};
-
-TEST_P(EnvironmentTest, RunsAndReportsOrRefusesWithReason) {
-#ifdef KEELGATE_UNSEALED
-  GTEST_SKIP() << "this build has no seal";
-#endif
-  if (geteuid() != 0) GTEST_SKIP() << "only root can imitate every environment";
-  static const std::uint64_t whole = RawClient(OBEDIENT_SERVICE).layers();
-  const Environment& environment = GetParam();
-  if (environment.needsUserNamespace && (whole & layerUserNamespace) == 0) {
-    GTEST_SKIP() << "this machine gives no user namespaces (a chroot never does)";
+/// In the environment of the calling process, for good: what its client's service has and answers,
+/// or why there is none.
+std::string seenByClient(const std::string& service) {
+  Client::Options options;
+  options.servicePath = service;
+  options.log = [](std::string_view) {
+  };
+  try {
+    Client client(options);
+    std::string text;
+    for (const SandboxLayer& layer : client.report().layers) {
+      if (layer.present) text += layer.name + '\n';
+    }
+    const std::string_view order = "answer";
+    client.unpack<VespCommandResponse>(std::as_bytes(std::span(order)));
+    return text;
+  } catch (const HostError& error) {
+    return error.reason == HostError::Reason::startFailed ? error.description : "another reason";
   }
-  RawOptions options;
-  options.before = [&] {
+}
+
+class EnvironmentTest : public testing::TestWithParam<Environment> {
+ protected:
+  void SetUp() override {
+#ifdef KEELGATE_UNSEALED
+    GTEST_SKIP() << "this build has no seal";
+#endif
+    if (geteuid() != 0) GTEST_SKIP() << "only root can imitate every environment";
+    if (GetParam().needsUserNamespace && (whole() & layerUserNamespace) == 0) {
+      GTEST_SKIP() << "this machine gives no user namespaces (a chroot never does)";
+    }
+  }
+
+  static std::uint64_t whole() {
+    static const std::uint64_t layers = RawClient(OBEDIENT_SERVICE).layers();
+    return layers;
+  }
+  static void enter(const Environment& environment) {
     environment.before();
     if (!environment.refused.empty()) refuseCalls(environment.refused);
     if (environment.user) becomeUser(*environment.user);
+  }
+};
+
+TEST_P(EnvironmentTest, RunsAndReportsOrRefusesWithReason) {
+  const Environment& environment = GetParam();
+  RawOptions options;
+  options.before = [&] {
+    enter(environment);
   };
   RawClient service(OBEDIENT_SERVICE, options);
   if (!environment.refusal.empty()) {
@@ -229,10 +264,43 @@ TEST_P(EnvironmentTest, RunsAndReportsOrRefusesWithReason) {
     return;
   }
   ASSERT_TRUE(service.ready()) << service.refusal();
-  EXPECT_EQ(namesOf(service.layers()), namesOf(whole & ~std::uint64_t{environment.missing}));
+  EXPECT_EQ(namesOf(service.layers()), namesOf(whole() & ~std::uint64_t{environment.missing}));
   EXPECT_EQ(resultOf(service.obey("answer").first), 0);
   EXPECT_EQ(service.obey("call 39").second.signal(), SIGSYS);
   EXPECT_EQ(service.stop(), 0);
+}
+
+/// A whole application in that environment, its client included.
+TEST_P(EnvironmentTest, IsReportedByTheClient) {
+  const Environment& environment = GetParam();
+  // Where a user may read it, and inside the chroot.
+  const std::string service = "/var/tmp/keelgate-" + std::to_string(getpid());
+  std::filesystem::copy_file(OBEDIENT_SERVICE, service);
+  int ends[2];
+  ASSERT_EQ(pipe(ends), 0);
+  const pid_t application = fork();
+  if (application == 0) {
+    close(ends[0]);
+    enter(environment);
+    const std::string seen = seenByClient(
+        access(service.c_str(), X_OK) == 0 ? service : service.substr(std::strlen("/var")));
+    _exit(write(ends[1], seen.data(), seen.size()) < 0 ? 1 : 0);
+  }
+  close(ends[1]);
+  std::string seen;
+  for (char byte = 0; read(ends[0], &byte, 1) == 1;) seen += byte;
+  close(ends[0]);
+  waitpid(application, nullptr, 0);
+  std::filesystem::remove(service);
+  std::string expected;
+  for (const std::string_view name : namesOf(whole() & ~std::uint64_t{environment.missing})) {
+    expected += std::string(name) + '\n';
+  }
+  if (environment.refusal.empty()) {
+    EXPECT_EQ(seen, expected);
+  } else {
+    EXPECT_NE(seen.find(environment.refusal), std::string::npos) << seen;
+  }
 }
 
 INSTANTIATE_TEST_SUITE_P(C11, EnvironmentTest, testing::ValuesIn(environments),
