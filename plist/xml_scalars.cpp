@@ -100,8 +100,8 @@ constexpr int daysInMonth(int year, int month) noexcept {
 std::optional<Integer> parseInteger(std::string_view text) noexcept {
   if (const auto number = parseFewDigits(text)) return Integer{*number, false};
   text = trimmed(text);
-  // Deliberate: no sign before 0x, and no more than 16 digits, leading zeros included.
-  if (text.starts_with("0x") || text.starts_with("0X")) {
+  // Deliberate: no sign before 0x, no 0X, and no more than 16 digits, leading zeros included.
+  if (text.starts_with("0x")) {
     if (text.size() > 18) return std::nullopt;
     const auto bits = parseDigits(text.substr(2), 16);
     if (!bits) return std::nullopt;

@@ -13,11 +13,20 @@
 
 namespace Keelgate::Host {
 
-/// The fake service under a name that tells it how to start.
+/// The fake service under a name that tells it how to start; the names go when the program ends.
 inline String fakeService(const String& manner = "honest") {
+  struct Links {
+    std::set<std::filesystem::path> made;
+    std::error_code ignored;
+    ~Links() {
+      for (const auto& link : made) std::filesystem::remove(link, ignored);
+    }
+  };
+  static Links links;
   const auto link = std::filesystem::temp_directory_path() /
                     ("keelgate-" + std::to_string(getpid()) + "-fake_service." + manner);
-  if (!std::filesystem::is_symlink(link)) {
+  if (links.made.insert(link).second) {
+    std::filesystem::remove(link, links.ignored);
     std::filesystem::create_symlink(KEELGATE_FAKE_SERVICE, link);
   }
   return link.string();

@@ -338,14 +338,14 @@ TEST(C8, LogLinesCannotSteerATerminal) {
 
 /// Standard error may be a pipe whose reader has gone.
 TEST(C8, LogLinesCannotEndTheApplication) {
+  Client::Options options = fakeOptions();
+  options.log = nullptr;
   const pid_t child = fork();
   if (child == 0) {
     int ends[2];
     if (pipe(ends) != 0 || dup2(ends[1], STDERR_FILENO) < 0) _exit(2);
     close(ends[0]);
     signal(SIGPIPE, SIG_DFL);
-    Client::Options options = fakeOptions();
-    options.log = nullptr;
     Client client(options);
     const Script logs = Script().log("a line").answer(recordNumbered(7));
     _exit(outcomeOf(client, logs) == "record 7" ? 0 : 1);
