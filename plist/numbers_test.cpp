@@ -74,8 +74,8 @@ TEST(Numbers, XmlIntegers) {
       {"&#49;", 1}};
   for (const auto& [text, number] : sound) EXPECT_EQ(read(integer(text)), number) << text;
   for (const char* text :
-       {"", " ", "+", "-", "1 2", "1.0", "1e3", "0x", "0x1G", "0X1F", "-0x1", "+0x1", "0x-1", "x1", "+-1",
-        "18446744073709551616", "-9223372036854775809", "0x00000000000000001", "\xD9\xA1"}) {
+       {"", " ", "+", "-", "1 2", "1.0", "1e3", "0x", "0x1G", "0X1F", "-0x1", "+0x1", "0x-1", "x1",
+        "+-1", "18446744073709551616", "-9223372036854775809", "0x00000000000000001", "\xD9\xA1"}) {
     EXPECT_EQ(problemIn(integer(text)), Problem::badInteger) << text;
   }
 }

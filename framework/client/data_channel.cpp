@@ -143,7 +143,8 @@ Ending DataChannel::receive(std::uint64_t allowance, Deadline deadline, Received
 /// never because a length was announced.
 Ending DataChannel::await(std::size_t size, Deadline deadline, ReceivedReply& reply) {
   while (filled_ < size) {
-    if (filled_ == reply.buffer.size()) reply.buffer.resize(2 * filled_);
+    // One byte more than is wanted, so that bytes which are none of the answer show.
+    if (filled_ == reply.buffer.size()) reply.buffer.resize(std::min(2 * filled_, size + 1));
     if (waitFor(channel_.get(), POLLIN, deadline) == 0) return Ending::late;
     const ssize_t n = recv(channel_.get(), reply.buffer.data() + filled_,
                            reply.buffer.size() - filled_, MSG_DONTWAIT);

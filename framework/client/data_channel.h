@@ -57,8 +57,8 @@ enum class Ending {
 
 /// The most bytes that the body of a reply may have: base + factor x the message's length.
 ///
-/// The factor: the densest honest message is a list of empty dictionaries at 3 to 4 bytes each,
-/// and a record of 156 absent fields takes some 200 bytes; a value that is shared within a message
+/// The factor: the densest honest message is a list of empty payloads at a dozen bytes each, and
+/// a record of 156 absent fields takes some 200 bytes; a value that is shared within a message
 /// may grow 64-fold. The base: short messages may share values up to a MiB in all, and an error
 /// repeats the service identifier and a path.
 ///

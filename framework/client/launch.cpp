@@ -136,8 +136,14 @@ ServiceHandles launchService(const String& path, DescriptorBook& book) {
   return handles;
 }
 
-void signalLauncher(const Descriptor& launcher, int signal) noexcept {
-  syscall(SYS_pidfd_send_signal, launcher.get(), signal, nullptr, 0);
+void killLauncher(const Descriptor& launcher) noexcept {
+  syscall(SYS_pidfd_send_signal, launcher.get(), SIGKILL, nullptr, 0);
+}
+
+void askToEnd(const Descriptor& launcher) noexcept {
+  syscall(SYS_pidfd_send_signal, launcher.get(), SIGTERM, nullptr, 0);
+  // One that somebody stopped would not listen.
+  syscall(SYS_pidfd_send_signal, launcher.get(), SIGCONT, nullptr, 0);
 }
 
 void reapLauncher(const Descriptor& launcher) noexcept {

@@ -164,7 +164,7 @@ void Pool::keep(Worker worker, bool spent) {
 Worker Pool::take(std::size_t length, Deadline deadline, bool fresh) {
   Lock lock(mutex_);
   for (;;) {
-    const Service service = running(lock, deadline);
+    Service service = running(lock, deadline);
     if (!fresh && length <= foreseen_) {
       if (Optional<Worker> idle = takeIdle()) return std::move(*idle);
     }
@@ -175,6 +175,7 @@ Worker Pool::take(std::size_t length, Deadline deadline, bool fresh) {
     } catch (const StartFailure& failure) {
       throw HostError(Reason::startFailed, failure.sentence);
     }
+    service.reset();
     lock.lock();
   }
 }
@@ -273,8 +274,11 @@ void Pool::tellLayers(const ServiceProcess& service) {
 /// thread holds, if any, counts as free: it has its reply.
 void Pool::forkAhead() noexcept {
   const std::size_t each = settings_.messagesPerWorker == 1 ? 2 : 1;
+  // These outlive the lock: whoever drops a service last waits for its end.
+  Service service;
+  Optional<Worker> worker;
   Lock lock(mutex_);
-  const Service service = service_;
+  service = service_;
   if (!service) return;
   service->collect();
   const std::size_t others = busy_ == 0 ? 0 : busy_ - 1;
@@ -282,7 +286,8 @@ void Pool::forkAhead() noexcept {
          idle_.size() + forking_ + others < each * mostBusy_) {
     ++forking_;
     lock.unlock();
-    Optional<Worker> worker = forkQuietly(service);
+    worker.reset();
+    if (auto forked = forkQuietly(service)) worker.emplace(std::move(*forked));
     lock.lock();
     --forking_;
     if (!worker) return;

@@ -243,7 +243,7 @@ void ServiceProcess::lose() noexcept {
 
 void ServiceProcess::destroy() noexcept {
   lose();
-  if (handles_.launcher) signalLauncher(handles_.launcher, SIGTERM);
+  if (handles_.launcher) askToEnd(handles_.launcher);
   // Ends the channel in every process that has a copy of it, and so whoever waits on it here.
   shutdown(handles_.control.get(), SHUT_RDWR);
 }
@@ -262,9 +262,9 @@ void ServiceProcess::end(milliseconds patience) noexcept {
     // It kills its zygote and waits for all that it leaves. If the launcher were killed, these
     // would be left to the application where that is what collects orphans: as pid 1 of a
     // container.
-    signalLauncher(handles_.launcher, SIGTERM);
+    askToEnd(handles_.launcher);
     if (!hasEnded(killPatience / 2)) {
-      signalLauncher(handles_.launcher, SIGKILL);
+      killLauncher(handles_.launcher);
       hasEnded(killPatience / 2);
     }
   }

@@ -4,19 +4,20 @@
 #include "framework/sandbox/refusal.h"
 
 #include <malloc.h>
+#include <algorithm>
 #include <cstdlib>
 
 namespace Keelgate::Sandbox {
 
 bool growHeap(std::size_t bytes) noexcept {
-  for (; bytes >= Transport::heapBase; bytes /= 2) {
+  for (;;) {
     // Volatile, or the compiler sees that nobody uses it.
     void* volatile area = std::malloc(bytes);
-    if (area == nullptr) continue;
     std::free(area);
-    return true;
+    if (area != nullptr) return true;
+    if (bytes <= Transport::heapBase) return false;
+    bytes = std::max(bytes / 2, Transport::heapBase);
   }
-  return false;
 }
 
 void prepareHeap() {

@@ -11,9 +11,9 @@ namespace Keelgate::Sandbox {
 /// worker could not make. Throws Refusal. Single-threaded callers only.
 void prepareHeap();
 
-/// Grows the free part of the heap to `bytes`, or to the half, a quarter and so on where the
-/// machine has not that much: most messages need little of what they may have. False when even the
-/// base is not to be had.
+/// Grows the free part of the heap to `bytes`, or to the half, a quarter and so on, and at the
+/// least to the base, where the machine has not that much: most messages need little of what they
+/// may have. False when not even that is to be had.
 bool growHeap(std::size_t bytes) noexcept;
 
 }  // namespace Keelgate::Sandbox

@@ -94,10 +94,8 @@ void sealWorker(const WorkerSeal& seal) {
   // It may have died before the line above.
   if (getppid() != seal.parent) _exit(0);
   limitWorker(seal.cpuSeconds);
-  const bool growsBeyondZygotes = seal.longestMessage > shortMessage;
-  if (growsBeyondZygotes && !growHeap(heapFor(seal.longestMessage))) {
-    throw Refusal(Obstacle::heap, 0);
-  }
+  // Where there is no more to be had, the zygote's is enough for most messages.
+  if (seal.longestMessage > shortMessage) growHeap(heapFor(seal.longestMessage));
   if (!isAwaited()) touchPages();
   enforce(seal.filter);
 }

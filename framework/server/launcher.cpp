@@ -108,6 +108,7 @@ std::uint32_t giveLayers(const Sandbox::Birth& birth, bool groupsLeft) {
   const sigset_t awaited = awaitedSignals();
   int zygoteStatus = 0;
   bool zygoteLives = true;
+  bool asked = false;
   for (;;) {
     int status = 0;
     pid_t ended = 0;
@@ -118,8 +119,12 @@ std::uint32_t giveLayers(const Sandbox::Birth& birth, bool groupsLeft) {
     }
     if (ended < 0) break;
     int signal = 0;
-    if (sigwait(&awaited, &signal) == 0 && signal == SIGTERM && zygoteLives) kill(zygote, SIGKILL);
+    if (sigwait(&awaited, &signal) != 0 || signal != SIGTERM) continue;
+    asked = true;
+    if (zygoteLives) kill(zygote, SIGKILL);
   }
+  // What a service manager asked for is no failure.
+  if (asked) _exit(0);
   _exit(WIFSIGNALED(zygoteStatus) ? 128 + WTERMSIG(zygoteStatus) : WEXITSTATUS(zygoteStatus));
 }
 

@@ -31,7 +31,7 @@ namespace Keelgate::Transport {
 /// "KGAT". A frame that begins otherwise is no frame, and nothing of it is looked at.
 constexpr std::uint32_t magic = 0x4b47'4154;
 /// To be raised with any change of what travels: two builds that differ must refuse each other.
-constexpr std::uint16_t protocolVersion = 1;
+constexpr std::uint16_t protocolVersion = 2;
 
 /// The channel's number in every process of the service. The first behind the standard ones, which
 /// a service has not got.

@@ -154,15 +154,20 @@ TEST_F(Worker, C4MemoryIsFixedBeforeTheMessageIsRead) {
 
 TEST_F(Worker, C4AMachineThatHasLessStillAnswers) {
   NEEDS_SEAL();
-  RawOptions options;
-  options.before = [] {
-    const rlimit little{.rlim_cur = 512 << 20, .rlim_max = 512 << 20};
-    setrlimit(RLIMIT_AS, &little);
-  };
-  RawClient service(OBEDIENT_SERVICE, options);
-  std::string order = "answer";
-  order.resize(8 << 20, ' ');
-  EXPECT_EQ(resultOf(service.obey(order).first), 0);
+  // Of address space, in MiB; the least is hardly more than what the zygote needs.
+  for (const rlim_t space : {160, 200, 300, 512}) {
+    RawOptions options;
+    options.before = [space] {
+      const rlimit little{.rlim_cur = space << 20, .rlim_max = space << 20};
+      setrlimit(RLIMIT_AS, &little);
+    };
+    RawClient service(OBEDIENT_SERVICE, options);
+    for (const std::size_t length : {6, 1 << 18, 1 << 20, 3 << 20, 8 << 20}) {
+      std::string order = "answer";
+      order.resize(length, ' ');
+      EXPECT_EQ(resultOf(service.obey(order).first), 0) << space << " for " << length;
+    }
+  }
 }
 
 TEST(Stack, TheDeepestMessageFits) {

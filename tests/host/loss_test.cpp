@@ -110,6 +110,8 @@ TEST(C9, WhoeverIsHitWhileNothingIsAskedIsReplaced) {
   const std::string_view text = "<plist><dict><key>c</key><integer>1</integer></dict></plist>";
   for (const int signal : strikes) {
     for (const int depth : {0, 1, 2}) {
+      // The first process of a namespace takes no such signal from outside.
+      if (signal == SIGSEGV && depth == 1) continue;
       Client::Options options = limited();
       options.servicePath = KEELGATE_SERVICE;
       Client client(options);
