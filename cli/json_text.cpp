@@ -155,7 +155,9 @@ String base64Text(Bytes bytes) {
 }
 
 Optional<Data> fromBase64(std::string_view text) {
-  // Exactly enough for padded base64. Of another length it is refused, never cut.
+  if (text.size() % 4 != 0) return std::nullopt;
+  // An empty list of bytes has no address, and the library wants one.
+  if (text.empty()) return Data();
   Data bytes(text.size() / 4 * 3);
   std::size_t length = 0;
   const int failed = sodium_base642bin(reinterpret_cast<unsigned char*>(bytes.data()), bytes.size(),
