@@ -155,14 +155,14 @@ TEST_F(Worker, C4MemoryIsFixedBeforeTheMessageIsRead) {
 TEST_F(Worker, C4AMachineThatHasLessStillAnswers) {
   NEEDS_SEAL();
   // Of address space, in MiB; the least is hardly more than what the zygote needs.
-  for (const rlim_t space : {160, 200, 300, 512}) {
+  for (const rlim_t space : {160U, 200U, 300U, 512U}) {
     RawOptions options;
     options.before = [space] {
       const rlimit little{.rlim_cur = space << 20, .rlim_max = space << 20};
       setrlimit(RLIMIT_AS, &little);
     };
     RawClient service(OBEDIENT_SERVICE, options);
-    for (const std::size_t length : {6, 1 << 18, 1 << 20, 3 << 20, 8 << 20}) {
+    for (const std::size_t length : {6U, 1U << 18, 1U << 20, 3U << 20, 8U << 20}) {
       std::string order = "answer";
       order.resize(length, ' ');
       EXPECT_EQ(resultOf(service.obey(order).first), 0) << space << " for " << length;
