@@ -48,6 +48,7 @@ double median(std::vector<double> samples) {
 template <class Call>
 double medianOf(int n, Call call) {
   std::vector<double> samples;
+  samples.reserve(static_cast<std::size_t>(n));
   for (int i = 0; i < n; ++i) samples.push_back(timed(call));
   return median(std::move(samples));
 }
@@ -117,7 +118,7 @@ template <class Call, class Before = void (*)()>
 void measure(
     benchmark::State& state, std::chrono::microseconds pause, Call call, Before before = [] {}) {
   std::vector<double> samples;
-  for (auto _ : state) {
+  for ([[maybe_unused]] auto _ : state) {
     before();
     samples.push_back(timed(call));
     state.SetIterationTime(samples.back() / 1e6);
@@ -196,7 +197,7 @@ void pastTheDeadline(benchmark::State& state) {
   Client client(its);
   constexpr std::string_view order = "spin";
   std::vector<double> samples;
-  for (auto _ : state) {
+  for ([[maybe_unused]] auto _ : state) {
     samples.push_back(timed([&] {
                         try {
                           client.unpack<VespCommandResponse>(std::as_bytes(std::span(order)));
@@ -246,7 +247,7 @@ void idleService(benchmark::State& state) {
   Client client(options(1));
   client.unpack<VespCommandResponse>(message());
   usleep(50'000);
-  for (auto _ : state) state.SetIterationTime(1e-9);
+  for ([[maybe_unused]] auto _ : state) state.SetIterationTime(1e-9);
   const Memory memory = memoryBelow("/proc/self");
   state.counters["resident_KiB"] = static_cast<double>(memory.resident);
   state.counters["proportional_KiB"] = static_cast<double>(memory.proportional);
