@@ -21,7 +21,6 @@ using std::chrono::milliseconds;
 using Transport::MalformedReply;
 using Transport::ReplyHeader;
 using Transport::ReplyKind;
-using Transport::Writer;
 
 ReplyHeader headerFor(Bytes body, ReplyKind kind = ReplyKind::record) {
   return {Transport::magic, Transport::protocolVersion, kind, 0, 0, body.size()};

@@ -27,7 +27,7 @@ Client::Options limited() {
 template <class Call>
 String inTime(Call call) {
   const auto start = steady_clock::now();
-  const String outcome = call();
+  String outcome = call();
   EXPECT_LE(steady_clock::now() - start, limit + milliseconds(1000)) << outcome;
   return outcome;
 }
@@ -98,8 +98,8 @@ TEST(C9, AZygoteHitAtAnyStepOfAMessageIsReplaced) {
 std::vector<pid_t> childrenOf(const std::vector<pid_t>& parents) {
   std::vector<pid_t> all;
   for (const pid_t parent : parents) {
-    const std::string text = std::to_string(parent);
-    std::ifstream list("/proc/" + text + "/task/" + text + "/children");
+    const auto tasks = std::filesystem::path("/proc") / std::to_string(parent) / "task";
+    std::ifstream list(tasks / std::to_string(parent) / "children");
     for (pid_t pid; list >> pid;) all.push_back(pid);
   }
   return all;
