@@ -26,6 +26,11 @@ namespace {
 /// An honest worker is gone so long after its last answer.
 constexpr milliseconds leavePatience{10};
 
+/// A launcher gets so long to collect what it leaves: on a crowded machine it needs some. At the
+/// end of a client, which has promised to be quick, it gets less.
+constexpr milliseconds collectPatience{400};
+constexpr milliseconds lastPatience{80};
+
 #ifndef KEELGATE_UNSEALED
 /// What a sealed service always reports; anything less is not the program that was meant.
 constexpr std::uint64_t firstWalls = [] {
@@ -263,9 +268,9 @@ void ServiceProcess::end(milliseconds patience) noexcept {
     // would be left to the application where that is what collects orphans: as pid 1 of a
     // container.
     askToEnd(handles_.launcher);
-    if (!hasEnded(killPatience / 2)) {
+    if (!hasEnded(patience.count() == 0 ? collectPatience : lastPatience)) {
       killLauncher(handles_.launcher);
-      hasEnded(killPatience / 2);
+      hasEnded(patience.count() == 0 ? collectPatience : lastPatience / 4);
     }
   }
   reapLauncher(handles_.launcher);

@@ -202,11 +202,6 @@ std::vector<std::string_view> namesOf(std::uint64_t layers) {
   return names;
 }
 
-/// As the name of a test's case.
-void PrintTo(const Environment& environment, std::ostream* to) {
-  *to << environment.name;
-}
-
 /// In the environment of the calling process, for good: what its client's service has and answers,
 /// or why there is none.
 std::string seenByClient(const std::string& service) {

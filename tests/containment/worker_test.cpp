@@ -221,19 +221,6 @@ TEST_F(Worker, LogIsCutInNumberAndLength) {
                                      std::string(Transport::maximumLogLength, 'x')));
 }
 
-TEST_F(Worker, ServesAsManyMessagesAsItMay) {
-  RawOptions options;
-  options.messages = 3;
-  RawClient service(OBEDIENT_SERVICE, options);
-  const int channel = service.fork(0);
-  for (std::uint32_t sequence = 0; sequence < 3; ++sequence) {
-    sendOrder(channel, "answer", sequence);
-    EXPECT_EQ(resultOf(receiveReply(channel)), 0);
-  }
-  EXPECT_EQ(service.end(0).exitStatus(), 0);
-  close(channel);
-}
-
 TEST_F(Worker, WrongHeadersEndIt) {
   using Transport::RequestHeader;
   const RequestHeader right{.magic = Transport::magic,

@@ -161,23 +161,6 @@ TEST(Pool, OnlyAMessageThatFollowedOthersIsTriedAgain) {
             2u);
 }
 
-TEST(Pool, AWorkerSeesSoManyMessagesAndNoMore) {
-  Client::Options options = fakeOptions();
-  options.processes = 1;
-  options.messagesPerProcess = 3;
-  Client client(options);
-  // A reply that spells out its sequence is right only in the worker that counts the same.
-  const auto inPosition = [](std::uint32_t sequence) {
-    const Data body = recordNumbered(static_cast<Int>(sequence));
-    return Script().frame({Transport::magic, Transport::protocolVersion,
-                           Transport::ReplyKind::record, sequence, 0, body.size()},
-                          body);
-  };
-  for (std::uint32_t i = 0; i < 9; ++i) {
-    EXPECT_EQ(outcomeOf(client, inPosition(i % 3)), "record " + std::to_string(i % 3));
-  }
-}
-
 TEST(Pool, ManyThreadsShareFewProcesses) {
   Client client(fakeOptions());
   std::atomic<int> right = 0;
