@@ -23,14 +23,28 @@ namespace Keelgate {
 namespace {
 
 constexpr const char* serviceName = "VespKeelgateService";
+constexpr const char* noChannel = "No channel for the service could be made";
 constexpr const char* installedFolder = KEELGATE_SERVICE_FOLDER;
 
 String errorText(int error) {
   return std::generic_category().message(error);
 }
 
-[[noreturn]] void fail(const String& what, int error) {
-  throw StartFailure(what + ": " + errorText(error), true);
+/// Whose limit a call has met: a limit of this process, of its user or of the whole machine.
+const char* remedyFor(int error) {
+  switch (error) {
+    case EMFILE:
+      return "; raise the limit of open files (ulimit -n)";
+    case ENFILE:
+      return "; raise the machine's limit of open files (fs.file-max)";
+    case EAGAIN:
+      return "; raise the process limit (ulimit -u, or pids.max)";
+    case ENOMEM:
+    case ENOBUFS:
+      return "; the machine or the control group has too little memory left";
+    default:
+      return "";
+  }
 }
 
 /// Empty where /proc is not mounted: then the folder that was configured is left.
@@ -97,7 +111,9 @@ class SpawnPlan {
     const int error =
         posix_spawn(&pid, path.c_str(), &actions_, &attributes_, arguments, environment);
     // These pass with the load on the machine; the others don't.
-    if (error == EAGAIN || error == ENOMEM) fail("The service could not be started", error);
+    if (error == EAGAIN || error == ENOMEM) {
+      throw shortage("The service could not be started", error);
+    }
     if (error != 0) {
       throw StartFailure("The service " + path + " could not be started: " + errorText(error) +
                              "; it must be an executable file for this machine",
@@ -113,12 +129,16 @@ class SpawnPlan {
 
 }  // namespace
 
+StartFailure shortage(std::string_view what, int error) {
+  return {String(what) + ": " + errorText(error) + remedyFor(error), true};
+}
+
 ServiceHandles launchService(const String& path, DescriptorBook& book) {
   const String program = path.empty() ? findService() : path;
   int ends[2];
   // Packets keep their bounds: nobody can leave half a frame in the way of the next.
   if (socketpair(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0, ends) != 0) {
-    fail("No channel for the service could be made", errno);
+    throw shortage(noChannel, errno);
   }
   ServiceHandles handles{.control = Descriptor(book, ends[0]), .launcher = {}};
   const Descriptor theirs(book, ends[1]);
@@ -131,7 +151,7 @@ ServiceHandles launchService(const String& path, DescriptorBook& book) {
     // Its number is still its own: nobody has waited for it.
     kill(pid, SIGKILL);
     waitpid(pid, nullptr, 0);
-    fail("The service could not be watched; raise the limit of open files (ulimit -n)", error);
+    throw shortage("The service could not be watched", error);
   }
   return handles;
 }
@@ -160,7 +180,7 @@ ServiceHandles connectService(const String& socket, DescriptorBook& book, Deadli
   // The rest of the field is zero and ends the path.
   std::memcpy(address.sun_path, socket.data(), socket.size());
   Descriptor control(book, ::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0));
-  if (!control) fail("No channel for the service could be made", errno);
+  if (!control) throw shortage(noChannel, errno);
   // A listener whose queue is full would hold the call as long as it likes.
   const auto left = std::chrono::ceil<std::chrono::microseconds>(deadline - Clock::now());
   const timeval limit{.tv_sec = left.count() / 1'000'000, .tv_usec = left.count() % 1'000'000 + 1};

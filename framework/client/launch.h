@@ -11,6 +11,7 @@
 #include <keelgate/values.h>
 
 #include <exception>
+#include <string_view>
 
 namespace Keelgate {
 
@@ -25,6 +26,10 @@ class StartFailure : public std::exception {
   String sentence;
   bool mayPass;
 };
+
+/// A failure that passes with the load on the process or the machine, and how to be rid of it.
+/// `error` is the errno of the call that failed.
+StartFailure shortage(std::string_view what, int error);
 
 /// The client's ends of a service.
 struct ServiceHandles {

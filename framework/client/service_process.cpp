@@ -13,7 +13,6 @@
 #include <algorithm>
 #include <cerrno>
 #include <csignal>
-#include <system_error>
 
 namespace Keelgate {
 
@@ -106,10 +105,7 @@ Optional<ServiceProcess::Forked> ServiceProcess::fork(std::uint64_t longestMessa
                                                       Deadline deadline) {
   int ends[2];
   if (socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends) != 0) {
-    throw StartFailure(
-        "No channel for a worker could be made: " + std::generic_category().message(errno) +
-            "; raise the limit of open files (ulimit -n)",
-        true);
+    throw shortage("No channel for a worker could be made", errno);
   }
   Descriptor ours(book_, ends[0]);
   // In the book as well: a copy in a forked child would keep the worker's channel open.
