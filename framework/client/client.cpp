@@ -7,6 +7,7 @@
 #include "framework/transport/error_coding.h"
 #include "framework/transport/layers.h"
 #include "framework/transport/record_coding.h"
+#include "framework/transport/wire.h"
 
 #include <algorithm>
 #include <atomic>
@@ -15,6 +16,7 @@
 namespace Keelgate {
 
 using Reason = HostError::Reason;
+using VespKeelgateService::VespClientMessageUnpackingError;
 
 namespace {
 
@@ -59,6 +61,10 @@ class Client::Implementation {
     const Deadline deadline = deadlineAfter(options_.timeLimit);
     checkSize("the message", message.size(), options_.largestMessage);
     checkSize("the service identifier", context.service.size(), Transport::maximumServiceLength);
+    // What is not UTF-8 could not travel, and the table of services has none such.
+    if (!Transport::isUtf8(context.service)) {
+      throw VespClientMessageUnpackingError::noUnpackerForService(context.service);
+    }
     Optional<R> record;
     ours().exchange({.record = static_cast<std::uint16_t>(recordNumber<R>),
                      .command = context.command,

@@ -12,6 +12,7 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <csignal>
@@ -150,7 +151,7 @@ ServiceHandles launchService(const String& path, DescriptorBook& book) {
     const int error = errno;
     // Its number is still its own: nobody has waited for it.
     kill(pid, SIGKILL);
-    waitpid(pid, nullptr, 0);
+    while (waitpid(pid, nullptr, 0) < 0 && errno == EINTR) continue;
     throw shortage("The service could not be watched", error);
   }
   return handles;
@@ -183,7 +184,9 @@ ServiceHandles connectService(const String& socket, DescriptorBook& book, Deadli
   if (!control) throw shortage(noChannel, errno);
   // A listener whose queue is full would hold the call as long as it likes.
   const auto left = std::chrono::ceil<std::chrono::microseconds>(deadline - Clock::now());
-  const timeval limit{.tv_sec = left.count() / 1'000'000, .tv_usec = left.count() % 1'000'000 + 1};
+  // Of 0 the kernel would make no limit.
+  const auto most = std::max<std::int64_t>(left.count(), 1);
+  const timeval limit{.tv_sec = most / 1'000'000, .tv_usec = most % 1'000'000};
   setsockopt(control.get(), SOL_SOCKET, SO_SNDTIMEO, &limit, sizeof limit);
   if (connect(control.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0) {
     const int error = errno;

@@ -42,7 +42,8 @@ void appendEscaped(String& to, std::string_view bytes) {
 }
 
 /// A line that nobody reads is dropped: a stranger's message must not end the application by
-/// SIGPIPE, nor hold it at a pipe that is full.
+/// SIGPIPE, nor hold it at a pipe that is full. Two writers may still find the same last room in
+/// it; an application that cannot have that gives a sink of its own.
 void writeToStandardError(const String& text) noexcept {
   pollfd entry{.fd = STDERR_FILENO, .events = POLLOUT, .revents = 0};
   if (poll(&entry, 1, 0) != 1 || (entry.revents & POLLOUT) == 0) return;

@@ -20,8 +20,9 @@ namespace {
 constexpr milliseconds firstStartPatience{10'000};
 
 /// A start that a message waits for may take so long, even if the message's own time is up before:
-/// where the limit is shorter than a start takes, no service would ever get ready.
-constexpr milliseconds startPatience{900};
+/// where the limit is shorter than a start takes, no service would ever get ready. Ending one that
+/// did not get ready comes on top, and the sum stays below a second.
+constexpr milliseconds startPatience{500};
 
 /// How long a service is given to end by itself.
 constexpr milliseconds endPatience{100};
@@ -172,6 +173,7 @@ Worker Pool::take(std::size_t length, Deadline deadline, bool fresh) {
     try {
       auto forked = service->fork(std::max<std::uint64_t>(length, foreseen_), deadline);
       if (forked) return {service, std::move(*forked)};
+      if (service->isUsable()) throw HostError(Reason::timedOut, "no process came free in time");
     } catch (const StartFailure& failure) {
       throw HostError(Reason::startFailed, failure.sentence);
     }
@@ -231,31 +233,37 @@ void Pool::awaitBackOff(Lock& lock, Deadline deadline) {
 }
 
 void Pool::start(Lock& lock, Deadline deadline) {
+  const Deadline ready = std::max(deadline, deadlineAfter(startPatience));
+  // From here to where it is false again nothing may throw: everybody waits for this start.
+  std::deque<Worker> oldWorkers;
+  Optional<StartFailure> failure;
   starting_ = true;
-  std::deque<Worker> oldWorkers = std::exchange(idle_, {});
-  Service old = std::exchange(service_, nullptr);
+  oldWorkers.swap(idle_);
+  Service old = std::move(service_);
   lock.unlock();
   oldWorkers.clear();
   old.reset();
   Service fresh;
-  Optional<StartFailure> failure;
+  bool failed = true;
   try {
-    fresh = std::make_shared<ServiceProcess>(settings_, book_,
-                                             std::max(deadline, deadlineAfter(startPatience)));
+    fresh = std::make_shared<ServiceProcess>(settings_, book_, ready);
     tellLayers(*fresh);
-  } catch (const StartFailure& itsFailure) {
-    failure = itsFailure;
+    failed = false;
+  } catch (StartFailure& its) {
+    failure.emplace(std::move(its));
   } catch (const std::bad_alloc&) {
-    failure = StartFailure("There is no memory to start the service", true);
+    fresh.reset();
   }
   lock.lock();
   starting_ = false;
   proved_ = false;
   service_ = std::move(fresh);
   started_.notify_all();
-  lastFailure_ = failure ? failure->sentence : "";
-  if (!failure) return;
-  backOff_.noteDeath();
+  if (failed) backOff_.noteDeath();
+  lastFailure_.clear();
+  if (!failed) return;
+  if (!failure) failure.emplace("There is no memory to start the service", true);
+  lastFailure_ = failure->sentence;
   if (!failure->mayPass) throw HostError(Reason::startFailed, failure->sentence);
 }
 

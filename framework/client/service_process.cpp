@@ -27,8 +27,10 @@ constexpr milliseconds leavePatience{10};
 
 /// A launcher gets so long to collect what it leaves: on a crowded machine it needs some. At the
 /// end of a client, which has promised to be quick, it gets less.
-constexpr milliseconds collectPatience{400};
+constexpr milliseconds collectPatience{300};
 constexpr milliseconds lastPatience{80};
+/// One that was killed is gone when the kernel says so.
+constexpr milliseconds killedPatience{100};
 
 #ifndef KEELGATE_UNSEALED
 /// What a sealed service always reports; anything less is not the program that was meant.
@@ -43,10 +45,9 @@ constexpr std::uint64_t firstWalls = [] {
 
 ServiceProcess::ServiceProcess(const ServiceSettings& settings, DescriptorBook& book,
                                Deadline deadline)
-    : book_(book),
-      handles_(settings.socket.empty() ? launchService(settings.path, book)
-                                       : connectService(settings.socket, book, deadline)),
-      slots_(settings.maximumWorkers) {
+    : book_(book), slots_(settings.maximumWorkers) {
+  handles_ = settings.socket.empty() ? launchService(settings.path, book)
+                                     : connectService(settings.socket, book, deadline);
   try {
     shakeHands(settings, deadline);
   } catch (...) {
@@ -78,6 +79,13 @@ void ServiceProcess::shakeHands(const ServiceSettings& settings, Deadline deadli
   if (answer.kind != ControlKind::ready) failToStart(false);
   layers_ = answer.numbers[0];
   version_ = answer.numbers[1];
+  // Records travel as they stand in the schema of one build: another's would be misread.
+  if (version_ != Transport::ownVersion()) {
+    throw StartFailure("The service is of version " + Transport::versionText(version_) +
+                           " and its client of " + Transport::versionText(Transport::ownVersion()) +
+                           ": install both from one build",
+                       false);
+  }
 #ifndef KEELGATE_UNSEALED
   // A service that was built for a sanitizer has no seal, and says so.
   if ((layers_ & firstWalls) != firstWalls) {
@@ -110,7 +118,7 @@ Optional<ServiceProcess::Forked> ServiceProcess::fork(std::uint64_t longestMessa
   Descriptor ours(book_, ends[0]);
   // In the book as well: a copy in a forked child would keep the worker's channel open.
   const Descriptor theirs(book_, ends[1]);
-  const Optional<std::uint32_t> slot = claimSlot();
+  const Optional<std::uint32_t> slot = claimSlot(deadline);
   if (!slot) return std::nullopt;
   ControlFrame frame = makeFrame(ControlKind::fork, *slot);
   frame.numbers[0] = longestMessage;
@@ -123,23 +131,28 @@ Optional<ServiceProcess::Forked> ServiceProcess::fork(std::uint64_t longestMessa
       .slot = *slot, .channel = std::move(ours), .heap = Transport::heapFor(longestMessage)};
 }
 
-Optional<std::uint32_t> ServiceProcess::claimSlot() {
+Optional<std::uint32_t> ServiceProcess::claimSlot(Deadline deadline) {
   Lock lock(mutex_);
   const auto free = [&] {
     return std::find_if(slots_.begin(), slots_.end(),
                         [](const Slot& slot) { return slot.phase == Slot::Phase::free; });
   };
-  if (free() == slots_.end()) {
+  while (free() == slots_.end() && !isLost() && Clock::now() < deadline) {
     // Workers that have answered and stay: an honest one ends at once.
     for (std::uint32_t i = 0; i < slots_.size(); ++i) {
       if (slots_[i].phase == Slot::Phase::released) killSlot(i);
     }
-    readUntil(lock, deadlineAfter(killPatience), [&] { return free() != slots_.end(); });
+    readUntil(lock, std::min(deadlineAfter(killPatience), deadline),
+              [&] { return free() != slots_.end(); });
+    const Deadline longAgo = Clock::now() - killPatience;
+    const bool stuck = std::any_of(slots_.begin(), slots_.end(), [&](const Slot& slot) {
+      return slot.phase == Slot::Phase::released && slot.killed && !slot.confirmed &&
+             slot.since < longAgo;
+    });
+    if (stuck) destroy();
   }
   const auto slot = free();
-  // Not even a kill gave one back: the zygote does nothing any more.
-  if (slot == slots_.end()) destroy();
-  if (isLost()) return std::nullopt;
+  if (slot == slots_.end() || isLost()) return std::nullopt;
   *slot = Slot{.phase = Slot::Phase::running};
   return static_cast<std::uint32_t>(slot - slots_.begin());
 }
@@ -149,11 +162,21 @@ void ServiceProcess::killSlot(std::uint32_t slot) noexcept {
   // Not waited for: if the zygote does not even read, its launcher is killed before long.
   slots_[slot].killed = sendFrame(handles_.control.get(), makeFrame(ControlKind::kill, slot),
                                   noDescriptor, Clock::now());
+  slots_[slot].since = Clock::now();
 }
 
 void ServiceProcess::kill(std::uint32_t slot) noexcept {
   const std::lock_guard lock(mutex_);
   killSlot(slot);
+}
+
+bool ServiceProcess::awaitKill(std::uint32_t slot, Deadline deadline) {
+  Lock lock(mutex_);
+  const auto heard = [&] {
+    return slots_[slot].confirmed || slots_[slot].phase == Slot::Phase::ended;
+  };
+  readUntil(lock, deadline, heard);
+  return heard();
 }
 
 Optional<ServiceProcess::Exit> ServiceProcess::awaitExit(std::uint32_t slot, Deadline deadline) {
@@ -209,7 +232,7 @@ void ServiceProcess::readAll() noexcept {
       case Received::nothing:
         return;
       case Received::frame:
-        noteExit(frame);
+        note(frame);
         break;
       case Received::end:
         lose();
@@ -218,15 +241,21 @@ void ServiceProcess::readAll() noexcept {
   }
 }
 
-void ServiceProcess::noteExit(const ControlFrame& frame) noexcept {
+void ServiceProcess::note(const ControlFrame& frame) noexcept {
   // The slot comes from outside and is a number to be checked like any other.
-  const bool known = frame.kind == ControlKind::exit && frame.slot < slots_.size();
   Slot none;
-  Slot& slot = known ? slots_[frame.slot] : none;
-  if (slot.phase == Slot::Phase::free || slot.phase == Slot::Phase::ended) {
+  Slot& slot = frame.slot < slots_.size() ? slots_[frame.slot] : none;
+  const bool alive = slot.phase == Slot::Phase::running || slot.phase == Slot::Phase::released;
+  if (alive && frame.kind == ControlKind::exit) {
+    noteExit(slot, frame);
+  } else if (alive && frame.kind == ControlKind::killed && slot.killed && !slot.confirmed) {
+    slot.confirmed = true;
+  } else {
     lose();
-    return;
   }
+}
+
+void ServiceProcess::noteExit(Slot& slot, const ControlFrame& frame) noexcept {
   slot.exit = {.status = static_cast<int>(frame.numbers[0]), .neverStarted = frame.numbers[3] != 0};
   slot.phase = slot.phase == Slot::Phase::released ? Slot::Phase::free : Slot::Phase::ended;
   const int signal = WIFSIGNALED(slot.exit.status) ? WTERMSIG(slot.exit.status) : 0;
@@ -266,7 +295,7 @@ void ServiceProcess::end(milliseconds patience) noexcept {
     askToEnd(handles_.launcher);
     if (!hasEnded(patience.count() == 0 ? collectPatience : lastPatience)) {
       killLauncher(handles_.launcher);
-      hasEnded(patience.count() == 0 ? collectPatience : lastPatience / 4);
+      hasEnded(patience.count() == 0 ? killedPatience : lastPatience / 4);
     }
   }
   reapLauncher(handles_.launcher);

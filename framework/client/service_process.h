@@ -18,7 +18,7 @@
 
 namespace Keelgate {
 
-/// SIGKILL ends a process within this, unless the kernel itself is stuck.
+/// A zygote that is well has taken a frame within this.
 constexpr std::chrono::milliseconds killPatience{100};
 
 struct ServiceSettings {
@@ -51,10 +51,14 @@ class ServiceProcess {
     std::size_t heap;
   };
   /// Asks for a worker for messages of at most so many bytes, without waiting for it; nothing when
-  /// the service is lost. Throws StartFailure when no channel can be made.
+  /// the service is lost or all slots are taken until the deadline. Throws StartFailure when no
+  /// channel can be made.
   Optional<Forked> fork(std::uint64_t longestMessage, Deadline deadline);
   /// SIGKILL for the worker, if it still runs.
   void kill(std::uint32_t slot) noexcept;
+  /// Whether the zygote says in time that it has killed the worker, or that the worker has ended.
+  /// The end itself may take longer: the kernel takes back what memory it had, gigabytes perhaps.
+  bool awaitKill(std::uint32_t slot, Deadline deadline);
   /// How a worker ended.
   struct Exit {
     /// As waitpid gives it.
@@ -97,7 +101,9 @@ class ServiceProcess {
     Phase phase = Phase::free;
     /// By us: then a death by SIGKILL says nothing of the message.
     bool killed = false;
-    /// When it was released.
+    /// The zygote has said that it did.
+    bool confirmed = false;
+    /// When it was released, or was killed after that.
     Deadline since{};
     Exit exit{};
   };
@@ -105,19 +111,20 @@ class ServiceProcess {
 
   void shakeHands(const ServiceSettings& settings, Deadline deadline);
   [[noreturn]] static void failToStart(bool late);
-  Optional<std::uint32_t> claimSlot();
+  Optional<std::uint32_t> claimSlot(Deadline deadline);
   void killSlot(std::uint32_t slot) noexcept;
   /// Until the condition holds, the service is lost or the deadline has passed; the lock is given
   /// up meanwhile.
   template <class Condition>
   void readUntil(Lock& lock, Deadline deadline, Condition condition);
   void readAll() noexcept;
-  void noteExit(const Transport::ControlFrame& frame) noexcept;
+  void note(const Transport::ControlFrame& frame) noexcept;
+  void noteExit(Slot& slot, const Transport::ControlFrame& frame) noexcept;
   void lose() noexcept;
 
   DescriptorBook& book_;
   /// Constant between construction and end().
-  ServiceHandles handles_;
+  ServiceHandles handles_{};
   std::uint64_t layers_ = 0;
   std::uint64_t version_ = 0;
   std::atomic<State> state_ = State::running;

@@ -71,7 +71,7 @@ Optional<HostError> Worker::exchange(const ClientRequest& request, Deadline dead
   }
   service_->kill(slot_);
   // A zygote that does not even kill takes its whole service with it.
-  if (!service_->awaitExit(slot_, deadlineAfter(killPatience))) service_->destroy();
+  if (!service_->awaitKill(slot_, deadlineAfter(killPatience))) service_->destroy();
   return HostError(Reason::timedOut, "");
 }
 

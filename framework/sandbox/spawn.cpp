@@ -21,7 +21,7 @@ pid_t forkSelf(unsigned namespaces) {
 }
 
 void dieWithParent() {
-  if (prctl(PR_SET_PDEATHSIG, SIGKILL, 0, 0, 0) != 0) throw Refusal(Transport::Obstacle::process);
+  if (prctl(PR_SET_PDEATHSIG, SIGKILL, 0, 0, 0) != 0) throw Refusal(Transport::Obstacle::watch);
 }
 
 }  // namespace Keelgate::Sandbox

@@ -62,7 +62,7 @@ struct Tether {
 
 Tether makeTether() {
   int ends[2];
-  if (pipe(ends) != 0) throw Refusal(Obstacle::process);
+  if (pipe(ends) != 0) throw Refusal(Obstacle::watch);
   return {.zygoteEnd = ends[0], .launcherEnd = ends[1]};
 }
 

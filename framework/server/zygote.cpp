@@ -6,6 +6,7 @@
 #include "framework/sandbox/seal.h"
 #include "framework/sandbox/spawn.h"
 #include "framework/server/channel.h"
+#include "framework/transport/layers.h"
 
 #include <poll.h>
 #include <sys/resource.h>
@@ -29,9 +30,9 @@ int openDeathSignals() {
   sigset_t deaths;
   sigemptyset(&deaths);
   sigaddset(&deaths, SIGCHLD);
-  if (sigprocmask(SIG_BLOCK, &deaths, nullptr) != 0) throw Refusal(Obstacle::process);
+  if (sigprocmask(SIG_BLOCK, &deaths, nullptr) != 0) throw Refusal(Obstacle::watch);
   const int signals = signalfd(-1, &deaths, SFD_CLOEXEC);
-  if (signals < 0) throw Refusal(Obstacle::process);
+  if (signals < 0) throw Refusal(Obstacle::watch);
   return signals;
 }
 
@@ -87,7 +88,7 @@ void Zygote::greet(std::uint32_t layers) {
                .kind = ControlKind::ready,
                .slot = 0,
                .reserved = 0,
-               .numbers = {layers, KEELGATE_VERSION_NUMBER, 0, 0}});
+               .numbers = {layers, Transport::ownVersion(), 0, 0}});
 }
 
 bool Zygote::takeFrame() {
@@ -127,8 +128,15 @@ void Zygote::fork(std::uint32_t slot, int channel) {
 
 void Zygote::kill(std::uint32_t slot) const {
   for (const Child& child : children_) {
+    if (child.slot != slot) continue;
     // Not reaped yet, so the number is still this child's.
-    if (child.slot == slot) ::kill(child.process, SIGKILL);
+    ::kill(child.process, SIGKILL);
+    sendControl({.magic = {},
+                 .version = {},
+                 .kind = ControlKind::killed,
+                 .slot = slot,
+                 .reserved = 0,
+                 .numbers = {}});
   }
 }
 

@@ -8,10 +8,13 @@
 ///                               <-    ready{layers}            or refused{obstacle} and it exits
 ///     fork{slot, length} + descriptor ->                       a worker on that descriptor
 ///     kill{slot}                ->                             SIGKILL for that slot's worker
+///                               <-    killed{slot}           at once, where there was a worker
 ///                               <-    exit{slot, status, ...}  exactly one for every fork
 ///
 /// A slot is any number that no living worker has; it is free again with its exit. A kill for a
-/// slot without a worker is ignored: the worker may have ended meanwhile.
+/// slot without a worker is ignored: the worker may have ended meanwhile. A worker with gigabytes
+/// to give back takes its time to end, and `killed` tells the client that its zygote is well
+/// meanwhile.
 ///
 /// *Data* (client <-> one worker, SOCK_STREAM, half-duplex, one request in flight): a RequestHeader
 /// with the service identifier and the message behind it; then at most `maximumLogFrames` log
@@ -31,14 +34,14 @@ namespace Keelgate::Transport {
 /// "KGAT". A frame that begins otherwise is no frame, and nothing of it is looked at.
 constexpr std::uint32_t magic = 0x4b47'4154;
 /// To be raised with any change of what travels: two builds that differ must refuse each other.
-constexpr std::uint16_t protocolVersion = 2;
+constexpr std::uint16_t protocolVersion = 3;
 
 /// The channel's number in every process of the service. The first behind the standard ones, which
 /// a service has not got.
 constexpr int serviceDescriptor = 3;
 
 /// From 1, here and below, so that a frame of zeros is none.
-enum class ControlKind : std::uint16_t { hello = 1, ready, fork, kill, exit, refused };
+enum class ControlKind : std::uint16_t { hello = 1, ready, fork, kill, killed, exit, refused };
 
 /// The walls around a worker. layers.h names them. A report is the sum of its bits.
 enum Layer : std::uint32_t {
@@ -68,6 +71,7 @@ enum class Obstacle : std::uint64_t {
   badFrame = 1,
   descriptors,
   process,
+  watch,
   noNewPrivileges,
   capabilities,
   dumpable,
@@ -89,7 +93,7 @@ struct ControlFrame {
   std::uint32_t magic;
   std::uint16_t version;
   ControlKind kind;
-  /// Of fork, kill and exit; 0 in the others.
+  /// Of fork, kill, killed and exit; 0 in the others.
   std::uint32_t slot;
   std::uint32_t reserved;
   std::uint64_t numbers[4];

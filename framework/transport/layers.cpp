@@ -20,6 +20,10 @@ std::string_view explain(Obstacle obstacle) {
     case Obstacle::process:
       return "The service could not start its processes: raise the process limit (ulimit -u, or "
              "pids.max of the control group)";
+    case Obstacle::watch:
+      return "The service could not watch its processes: allow prctl(PR_SET_PDEATHSIG), signalfd4 "
+             "and pipe2 in the profile that it is started under, or raise the limit of open files "
+             "(ulimit -n)";
     case Obstacle::noNewPrivileges:
       return "The service could not renounce new privileges: allow prctl(PR_SET_NO_NEW_PRIVS) in "
              "the profile that it is started under";
@@ -59,6 +63,10 @@ std::string missingLayersLine(std::uint64_t layers) {
     line += row.name;
   }
   return line;
+}
+
+std::uint64_t ownVersion() noexcept {
+  return KEELGATE_VERSION_NUMBER;
 }
 
 std::string versionText(std::uint64_t version) {

@@ -49,7 +49,9 @@ constexpr std::size_t secondWalls = 9;
 /// missing. It ends without a full stop, so that a sentence can go on from it.
 std::string missingLayersLine(std::uint64_t layers);
 
-/// "1.2.3", from what a ready frame carries.
+/// Of this build, as a ready frame carries it: 16 bits each for major, minor and patch.
+std::uint64_t ownVersion() noexcept;
+/// "1.2.3" from such a number.
 std::string versionText(std::uint64_t version);
 
 /// A sentence that says what a service could not have and how to get it. `error` is the errno that

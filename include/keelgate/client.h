@@ -97,8 +97,8 @@ class KEELGATE_API Client {
   requires(!std::same_as<R, VespClientMessageResult>) R unpack(Bytes message);
 
   /// The same for a client message, which comes with the command and the service that it arrived
-  /// under. Throws VespClientMessageUnpackingError too. The identifier must be UTF-8 and may have
-  /// 64 KiB; above that HostError (messageTooLarge).
+  /// under. Throws VespClientMessageUnpackingError too. The identifier may have 64 KiB; above that
+  /// HostError (messageTooLarge).
   VespClientMessageResult unpackClientMessage(Bytes message,
                                               const VespClientMessageContext& context);
 

@@ -11,6 +11,7 @@
 #include <linux/sched.h>
 #include <linux/seccomp.h>
 #include <sched.h>
+#include <sys/mount.h>
 #include <sys/prctl.h>
 #include <sys/resource.h>
 #include <sys/syscall.h>
@@ -19,7 +20,6 @@
 #include <cerrno>
 #include <csignal>
 #include <cstddef>
-#include <cstring>
 #include <filesystem>
 
 namespace Keelgate::Test {
@@ -65,6 +65,26 @@ void becomeUser(const std::vector<gid_t>& with) {
   }
 }
 
+/// What an environment takes for granted of the machine; of a container, perhaps, it is not so.
+enum class Needs {
+  nothing,
+  /// For root.
+  userNamespaces,
+  /// For others, with the rights that they bring: security modules take these away.
+  usersNamespaces,
+  /// To make namespaces without a user namespace.
+  privilege
+};
+
+/// Whether a child in which `trial` runs exits with 0.
+bool succeeds(const std::function<bool()>& trial) {
+  const pid_t child = fork();
+  if (child == 0) _exit(trial() ? 0 : 1);
+  int status = -1;
+  waitpid(child, &status, 0);
+  return status == 0;
+}
+
 /// Goes on in a new process namespace, whose list of processes nobody has mounted.
 void becomeFirstProcess() {
   if (unshare(CLONE_NEWPID) != 0) _exit(126);
@@ -94,11 +114,36 @@ struct Environment {
   Optional<std::vector<gid_t>> user = {};
   std::function<void()> before = [] {
   };
-  /// Without one this environment is another.
-  bool needsUserNamespace = false;
+  /// Without it this environment is another.
+  Needs needs = Needs::nothing;
 };
 
 const std::vector<gid_t> groups{1000, 27};
+
+/// Holds a copy of the service where a user may read it, and inside the chroot. No mount point, or
+/// the chroot would be like any other root.
+const std::string& folder() {
+  struct Folder {
+    std::string path = "/var/tmp/keelgate-" + std::to_string(getpid());
+    pid_t owner = getpid();
+    Folder() {
+      using std::filesystem::perms;
+      std::filesystem::remove_all(path);
+      std::filesystem::create_directory(path);
+      std::filesystem::copy_file(OBEDIENT_SERVICE, path + "/service");
+      for (const std::string& made : {path, path + "/service"}) {
+        std::filesystem::permissions(made, perms(0755));
+      }
+    }
+    ~Folder() {
+      if (getpid() == owner) std::filesystem::remove_all(path);
+    }
+    Folder(const Folder&) = delete;
+    Folder& operator=(const Folder&) = delete;
+  };
+  static const Folder made;
+  return made.path;
+}
 
 const std::vector<Environment> environments{
     {.name = "nothing taken away"},
@@ -112,29 +157,32 @@ const std::vector<Environment> environments{
      .refused = {{SYS_clone, EPERM, allNamespaceFlags}, {SYS_unshare, EPERM}},
      .missing = namespaces | layerNoSupplementaryGroups,
      .user = groups},
-    {.name = "a user", .user = std::vector<gid_t>(), .needsUserNamespace = true},
+    {.name = "a user", .user = std::vector<gid_t>(), .needs = Needs::usersNamespaces},
     {.name = "a user with his groups",
      .missing = layerNoSupplementaryGroups,
      .user = groups,
-     .needsUserNamespace = true},
+     .needs = Needs::usersNamespaces},
     {.name = "user namespaces switched off, as root",
      .refused = {{SYS_clone, ENOSPC, CLONE_NEWUSER}},
-     .missing = layerUserNamespace},
+     .missing = layerUserNamespace,
+     .needs = Needs::privilege},
     {.name = "user namespaces switched off, as a user",
      .refused = {{SYS_clone, EPERM, CLONE_NEWUSER}},
      .missing = namespaces,
      .user = std::vector<gid_t>()},
     {.name = "maps refused, as root",
      .refused = {{SYS_openat, EACCES}},
-     .missing = layerUserNamespace},
+     .missing = layerUserNamespace,
+     .needs = Needs::privilege},
     {.name = "maps refused, as a user",
      .refused = {{SYS_openat, EACCES}},
      .missing = layerUserNamespace,
      .user = std::vector<gid_t>(),
-     .needsUserNamespace = true},
+     .needs = Needs::usersNamespaces},
     {.name = "the process list of another process namespace",
      .missing = layerUserNamespace,
-     .before = becomeFirstProcess},
+     .before = becomeFirstProcess,
+     .needs = Needs::privilege},
     {.name = "no process namespace",
      .refused = {{SYS_clone, EINVAL, CLONE_NEWPID}},
      .missing = layerPidNamespace},
@@ -162,8 +210,9 @@ const std::vector<Environment> environments{
      .missing = layerUserNamespace | layerEmptyRoot,
      .before =
          [] {
-           if (chroot("/var") != 0 || chdir("/") != 0) _exit(126);
-         }},
+           if (chroot(folder().c_str()) != 0 || chdir("/") != 0) _exit(126);
+         },
+     .needs = Needs::privilege},
     {.name = "signals ignored by the one who starts it",
      .before =
          [] {
@@ -171,11 +220,11 @@ const std::vector<Environment> environments{
          }},
     {.name = "seccomp refused", .refused = {{SYS_seccomp, EPERM}}, .refusal = "allow seccomp"},
     {.name = "limits refused", .refused = {{SYS_prlimit64, EPERM}}, .refusal = "resource limits"},
-    {.name = "prctl refused", .refused = {{SYS_prctl, EPERM}}, .refusal = "The service could not"},
+    {.name = "prctl refused", .refused = {{SYS_prctl, EPERM}}, .refusal = "allow prctl"},
     {.name = "capabilities kept",
      .refused = {{SYS_capset, EPERM}},
      .refusal = "capset",
-     .needsUserNamespace = true},
+     .needs = Needs::userNamespaces},
     {.name = "no process to be had", .refused = {{SYS_clone, EAGAIN}}, .refusal = "ulimit -u"},
     {.name = "too little stack",
      .refusal = "ulimit -H -s",
@@ -230,9 +279,26 @@ class EnvironmentTest : public testing::TestWithParam<Environment> {
     GTEST_SKIP() << "this build has no seal";
 #endif
     if (geteuid() != 0) GTEST_SKIP() << "only root can imitate every environment";
-    if (GetParam().needsUserNamespace && (whole() & layerUserNamespace) == 0) {
-      GTEST_SKIP() << "this machine gives no user namespaces (a chroot never does)";
+    if (!has(GetParam().needs)) GTEST_SKIP() << "this machine does not give what it takes away";
+    folder();
+  }
+
+  static bool has(Needs needs) {
+    switch (needs) {
+      case Needs::userNamespaces:
+        return (whole() & layerUserNamespace) != 0;
+      case Needs::usersNamespaces:
+        return succeeds([] {
+          becomeUser({});
+          return unshare(CLONE_NEWUSER | CLONE_NEWNS) == 0 &&
+                 mount("", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) == 0;
+        });
+      case Needs::privilege:
+        return succeeds([] { return unshare(CLONE_NEWNS | CLONE_NEWPID) == 0; });
+      case Needs::nothing:
+        break;
     }
+    return true;
   }
 
   static std::uint64_t whole() {
@@ -265,20 +331,51 @@ TEST_P(EnvironmentTest, RunsAndReportsOrRefusesWithReason) {
   EXPECT_EQ(service.stop(), 0);
 }
 
+TEST(C11, OneDescriptorIsTrueWithoutCloseRange) {
+#ifdef KEELGATE_UNSEALED
+  GTEST_SKIP() << "this build has no seal";
+#endif
+  RawOptions options;
+  options.before = [] {
+    for (const int left : {9, 100, 200}) dup2(STDERR_FILENO, left);
+    refuseCalls({{SYS_close_range, ENOSYS}});
+  };
+  RawClient service(OBEDIENT_SERVICE, options);
+  ASSERT_TRUE(service.ready()) << service.refusal();
+  const int channel = service.fork(1);
+  const auto open = [](pid_t process) {
+    std::vector<std::string> names;
+    const auto list = "/proc/" + std::to_string(process) + "/fd";
+    for (const auto& entry : std::filesystem::directory_iterator(list)) {
+      names.push_back(entry.path().filename());
+    }
+    return names;
+  };
+  std::vector<pid_t> workers;
+  while (workers.empty()) workers = service.workers();
+  try {
+    for (int i = 0; i < 500 && open(workers[0]).size() > 1; ++i) usleep(10'000);
+    EXPECT_EQ(open(workers[0]), std::vector<std::string>{"3"});
+    // The channel, the tether, and the deaths of its workers.
+    EXPECT_EQ(open(service.zygote()).size(), 3u);
+  } catch (const std::filesystem::filesystem_error& error) {
+    GTEST_SKIP() << error.what();
+  }
+  close(channel);
+}
+
 /// A whole application in that environment, its client included.
 TEST_P(EnvironmentTest, IsReportedByTheClient) {
   const Environment& environment = GetParam();
-  // Where a user may read it, and inside the chroot.
-  const std::string service = "/var/tmp/keelgate-" + std::to_string(getpid());
-  std::filesystem::copy_file(OBEDIENT_SERVICE, service);
   int ends[2];
   ASSERT_EQ(pipe(ends), 0);
   const pid_t application = fork();
   if (application == 0) {
     close(ends[0]);
     enter(environment);
-    const std::string seen = seenByClient(
-        access(service.c_str(), X_OK) == 0 ? service : service.substr(std::strlen("/var")));
+    const std::string service = folder() + "/service";
+    const std::string seen =
+        seenByClient(access(service.c_str(), X_OK) == 0 ? service : "/service");
     _exit(write(ends[1], seen.data(), seen.size()) < 0 ? 1 : 0);
   }
   close(ends[1]);
@@ -286,7 +383,6 @@ TEST_P(EnvironmentTest, IsReportedByTheClient) {
   for (char byte = 0; read(ends[0], &byte, 1) == 1;) seen += byte;
   close(ends[0]);
   waitpid(application, nullptr, 0);
-  std::filesystem::remove(service);
   std::string expected;
   for (const std::string_view name : namesOf(whole() & ~std::uint64_t{environment.missing})) {
     expected += std::string(name) + '\n';

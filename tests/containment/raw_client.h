@@ -10,6 +10,7 @@
 #include <sys/types.h>
 #include <functional>
 #include <map>
+#include <set>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -18,6 +19,8 @@ namespace Keelgate::Test {
 
 /// The end of a worker, as its exit frame has it.
 struct WorkerEnd {
+  /// A killed frame came before.
+  bool killed;
   int status;
   std::uint64_t peakBytes;
   std::uint64_t cpuMicroseconds;
@@ -82,6 +85,7 @@ class RawClient {
   pid_t launcher_ = -1;
   int control_ = -1;
   Transport::ControlFrame first_{};
+  std::set<std::uint32_t> killed_;
   std::map<std::uint32_t, WorkerEnd> ended_;
 };
 

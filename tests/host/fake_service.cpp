@@ -2,6 +2,7 @@
 // A service without seal and without manners. Its workers do what the message says, step by step;
 // how it starts follows from the name that it was started under (fake_service.mute and so on).
 #include "framework/client/control_frames.h"
+#include "framework/transport/layers.h"
 #include "tests/host/script.h"
 
 #include <fcntl.h>
@@ -112,7 +113,10 @@ bool receive(ControlFrame& frame, int& descriptor) {
 class Zygote {
  public:
   Zygote(std::uint64_t messages, std::string_view manner)
-      : messages_(messages), early_(manner == "early"), barren_(manner == "barren") {}
+      : messages_(messages),
+        early_(manner == "early"),
+        barren_(manner == "barren"),
+        slow_(manner == "slow") {}
 
   void serve() {
     sigset_t child;
@@ -164,7 +168,10 @@ class Zygote {
   }
   void kill(std::uint32_t slot) {
     for (const auto& [pid, its] : slots_) {
-      if (its == slot) ::kill(pid, SIGKILL);
+      if (its != slot) continue;
+      if (!slow_) ::kill(pid, SIGKILL);
+      const ControlFrame frame = makeFrame(ControlKind::killed, slot);
+      send(channel, &frame, sizeof frame, MSG_NOSIGNAL);
     }
   }
   void reportExits() {
@@ -180,6 +187,8 @@ class Zygote {
   std::uint64_t messages_;
   bool early_;
   bool barren_;
+  /// As if the kernel took its time to end whom it killed.
+  bool slow_;
   std::map<pid_t, std::uint32_t> slots_;
 };
 
@@ -193,6 +202,7 @@ int main(int, char** arguments) {
   if (!receive(hello, none) || manner == "dies") return 0;
   ControlFrame ready = makeFrame(ControlKind::ready, 0);
   ready.numbers[0] = manner == "bare" ? 0x3f : ~std::uint64_t{0};
+  ready.numbers[1] = ownVersion() + (manner == "newer" ? 1 : 0);
   if (manner == "refuses") {
     ready.kind = ControlKind::refused;
     ready.numbers[0] = static_cast<std::uint64_t>(Obstacle::filter);

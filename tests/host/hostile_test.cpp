@@ -116,20 +116,25 @@ TEST(C8, EachAttackHasItsOutcomeAndTheNextMessageIsServed) {
 
 TEST(C5, OneThatKeepsTheClientWaitingIsGivenUp) {
   Client::Options options = fakeOptions();
-  options.timeLimit = milliseconds(150);
+  options.timeLimit = milliseconds(300);
   Client client(options);
   const Data good = recordNumbered(7);
   Script dribble;
-  for (int i = 0; i < 3; ++i) dribble.write(Bytes(good).first(1)).then(Op::pause, 100);
+  for (int i = 0; i < 3; ++i) dribble.write(Bytes(good).first(1)).then(Op::pause, 200);
   const Script waits[] = {
       Script().then(Op::pause, 60'000), dribble, Script().then(Op::raise, SIGSTOP),
       withHeader([](auto& h) { h.bodyLength = 1u << 20; }).then(Op::pause, 60'000)};
+  int kept = 0;
   for (const Script& script : waits) {
+    const std::set<int> before = children();
     const auto start = Clock::now();
     EXPECT_EQ(outcomeOf(client, script), "timedOut");
     EXPECT_GE(Clock::now() - start, options.timeLimit);
     EXPECT_LT(Clock::now() - start, options.timeLimit + milliseconds(1000));
+    if (children() == before) ++kept;
   }
+  // The worker alone has to end; of a zygote that stalls just then more may be lost.
+  EXPECT_GT(kept, 0);
   // The same when the message does not even fit into the channel.
   const Data large(8u << 20);
   const auto outcome = [&](UInt64 command) {
@@ -194,8 +199,13 @@ TEST(C6, AWorkerSeesOneMessageUnlessMoreAreAllowed) {
 
 TEST(C8, WorkersThatSpeakBeforeTheyAreAskedAreNotBelieved) {
   Client client(fakeOptions("early"));
-  usleep(100'000);
-  EXPECT_EQ(outcomeOf(client, Script().answer(recordNumbered(7))), "protocolViolation");
+  String outcome;
+  // What comes after the message can't be told from its answer: a worker must be early.
+  for (int i = 0; i < 20 && outcome != "protocolViolation"; ++i) {
+    usleep(100'000);
+    outcome = outcomeOf(client, Script().answer(recordNumbered(7)));
+  }
+  EXPECT_EQ(outcome, "protocolViolation");
 }
 
 /// So many payloads, each the only element of the list before it.
@@ -234,8 +244,22 @@ TEST(C8, NestingEndsBeforeTheStackOfTheClientDoes) {
 }
 
 template <class R>
-void readRecord(Bytes body) {
-  Transport::decodeRecord<R>(body);
+Data recordAgain(Bytes body) {
+  return Transport::encodeRecord(Transport::decodeRecord<R>(body));
+}
+
+using Unpacking = VespKeelgateService::VespClientMessageUnpackingError;
+
+Data errorAgain(Bytes body) {
+  try {
+    Transport::throwError(body);
+  } catch (const DecodingError& error) {
+    return Transport::encodeError(error);
+  } catch (const Breach& error) {
+    return Transport::encodeError(error);
+  } catch (const Unpacking& error) {
+    return Transport::encodeError(error);
+  }
 }
 
 /// What the real service answers to a message of the examples.
@@ -251,30 +275,29 @@ Data replyTo(Client& service, const char* file, const VespClientMessageContext& 
   }
 }
 
-/// Every reply with any one byte changed is a record, an error, or known to be a lie.
+/// Every reply with any one byte changed is known to be a lie, or is the one spelling of another
+/// record or error.
 TEST(C8, NoChangedByteOfAReplyDoesMore) {
   Client::Options options = fakeOptions();
   options.servicePath = KEELGATE_SERVICE;
   Client service(options);
-  using Unpacking = VespKeelgateService::VespClientMessageUnpackingError;
-  const std::pair<void (*)(Bytes), Data> replies[] = {
-      {readRecord<VespCommandResponse>,
+  const std::pair<Data (*)(Bytes), Data> replies[] = {
+      {recordAgain<VespCommandResponse>,
        replyTo<VespCommandResponse>(service, "command-response.xml")},
-      {readRecord<VespInvitation>, replyTo<VespInvitation>(service, "invitation-home.xml")},
-      {readRecord<VespCommandWebTunnelResponse>,
+      {recordAgain<VespInvitation>, replyTo<VespInvitation>(service, "invitation-home.xml")},
+      {recordAgain<VespCommandWebTunnelResponse>,
        replyTo<VespCommandWebTunnelResponse>(service, "web-tunnel-response.xml")},
-      {readRecord<PulseUserPayload>, replyTo<PulseUserPayload>(service, "push-payload.xml")},
-      {readRecord<VespClientMessageResult>,
+      {recordAgain<PulseUserPayload>, replyTo<PulseUserPayload>(service, "push-payload.xml")},
+      {recordAgain<VespClientMessageResult>,
        replyTo<VespClientMessageResult>(
            service, "session-accept.xml",
            {.command = 233, .service = "com.tessen.private.braid.viso.audio"})},
-      {Transport::throwError,
-       Transport::encodeError(DecodingError(DecodingError::Kind::keyNotFound, "k",
-                                            {String("a"), std::size_t{1}}, "missing"))},
-      {Transport::throwError, Transport::encodeError(Breach("domain", "type", "path"))},
-      {Transport::throwError,
+      {errorAgain, Transport::encodeError(DecodingError(DecodingError::Kind::keyNotFound, "k",
+                                                        {String("a"), std::size_t{1}}, "missing"))},
+      {errorAgain, Transport::encodeError(Breach("domain", "type", "path"))},
+      {errorAgain,
        Transport::encodeError(Unpacking::unimplementedCommand(*CommandType::fromRawValue(232)))},
-      {Transport::throwError, Transport::encodeError(Unpacking::noUnpackerForService("s"))}};
+      {errorAgain, Transport::encodeError(Unpacking::noUnpackerForService("s"))}};
   for (const auto& [read, reply] : replies) {
     ASSERT_FALSE(reply.empty());
     Data other = reply;
@@ -283,9 +306,8 @@ TEST(C8, NoChangedByteOfAReplyDoesMore) {
       for (int change = 1; change < 256; change += reply.size() < 400 ? 1 : change) {
         other[i] = reply[i] ^ static_cast<std::byte>(change);
         try {
-          read(other);
+          EXPECT_EQ(read(other), other) << i << ": " << change;
         } catch (const MalformedReply&) {
-        } catch (const Error&) {
         }
       }
       other[i] = reply[i];

@@ -13,7 +13,7 @@ namespace {
 using std::chrono::milliseconds;
 using std::chrono::steady_clock;
 
-constexpr milliseconds limit(200);
+constexpr milliseconds limit(400);
 constexpr int strikes[] = {SIGKILL, SIGSEGV, SIGSTOP};
 
 Client::Options limited() {
