@@ -8,6 +8,7 @@
 #include "tests/host/host_testing.h"
 
 #include <sys/prctl.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <atomic>
@@ -21,8 +22,15 @@ namespace {
 struct Holdings {
   std::size_t descriptors = openDescriptors();
   std::size_t children = Host::children().size();
-  std::ptrdiff_t threads =
-      std::distance(std::filesystem::directory_iterator("/proc/self/task"), {});
+  std::ptrdiff_t threads = [] {
+    std::ptrdiff_t count = 0;
+    // One that was joined may be listed for a moment more.
+    for (int i = 0; i < 100 && count != 1; ++i) {
+      if (i > 0) usleep(10'000);
+      count = std::distance(std::filesystem::directory_iterator("/proc/self/task"), {});
+    }
+    return count;
+  }();
   // statm counts roughly where there are many processors.
   std::size_t residentKiB = [] {
     std::ifstream rollup("/proc/self/smaps_rollup");
