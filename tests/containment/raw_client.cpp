@@ -13,6 +13,7 @@
 #include <array>
 #include <csignal>
 #include <cstring>
+#include <filesystem>
 #include <fstream>
 #include <stdexcept>
 
@@ -144,6 +145,15 @@ std::pair<RawReply, WorkerEnd> RawClient::obey(std::string_view order) {
   RawReply reply = receiveReply(channel);
   close(channel);
   return {std::move(reply), end(0)};
+}
+
+std::set<std::string> descriptorsOf(pid_t process) {
+  std::set<std::string> names;
+  const auto list = "/proc/" + std::to_string(process) + "/fd";
+  for (const auto& entry : std::filesystem::directory_iterator(list)) {
+    names.insert(entry.path().filename());
+  }
+  return names;
 }
 
 void sendOrder(int channel, std::string_view order, std::uint32_t sequence) {

@@ -89,6 +89,9 @@ class RawClient {
   std::map<std::uint32_t, WorkerEnd> ended_;
 };
 
+/// The open descriptors of a process. Throws std::filesystem::filesystem_error.
+std::set<std::string> descriptorsOf(pid_t process);
+
 /// Sends a message as a request for a record.
 void sendMessage(int channel, std::size_t record, std::string_view message,
                  std::uint32_t sequence = 0);
