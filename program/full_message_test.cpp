@@ -58,58 +58,36 @@ class Filler {
 };
 
 /// What a record is expected to hold of the schema's fields.
-using Expect = Fields (*)(Fields schema);
+using Expect = std::function<Fields(const Fields& schema)>;
 
-Fields unchanged(Fields fields) {
+Fields unchanged(const Fields& fields) {
   return fields;
 }
 
-std::string replaced(std::string text, std::string_view from, std::string_view to) {
-  if (text.starts_with(from)) text.replace(0, from.size(), to);
-  return text;
-}
-
-Fields homeInvitation(Fields fields) {
-  Fields expected;
-  for (const std::string& field : fields) {
-    // The one field that goes nowhere.
-    if (field.starts_with(".invitationShareURL=")) continue;
-    std::string to = replaced(field, ".invitationExpiryDate=", ".inviteExpiryDate=");
-    to = replaced(to, ".suppressInvite", ".homeSuppressInvite");
-    to = replaced(to, ".invitationShareToken=", ".invitationShareToken.tokenData=");
-    expected.push_back(std::move(to));
-  }
-  if (expected.empty()) return {"={}"};
-  return expected;
-}
-
-Fields cofferInvitation(Fields fields) {
-  Fields expected;
-  for (const std::string& field : fields) {
-    if (field.starts_with(".shareURL=")) continue;
-    expected.push_back(replaced(field, ".invitationToken=", ".invitationToken.tokenData="));
-  }
-  return expected;
-}
-
-Fields vitalsInvitation(Fields fields) {
-  return {replaced(fields.at(0), ".protobufData=", ".untrustedData=")};
-}
-
-Fields strideInvitation(Fields fields) {
-  return {replaced(fields.at(0), ".protobufItem=", ".item="),
-          replaced(fields.at(1), ".protobufPayload=", ".untrustedData=")};
+/// Fields that begin with the first of a pair begin with the second instead, and go nowhere when
+/// that is empty.
+Expect moved(std::vector<std::pair<std::string, std::string>> moves) {
+  return [moves = std::move(moves)](const Fields& fields) {
+    Fields expected;
+    for (std::string field : fields) {
+      for (const auto& [from, to] : moves) {
+        if (field.starts_with(from)) field.replace(0, to.empty() ? field.size() : from.size(), to);
+      }
+      if (!field.empty()) expected.push_back(field);
+    }
+    return expected.empty() ? Fields{"={}"} : expected;
+  };
 }
 
 /// Numbered fields move into their group; codes that no enumeration knows become its default.
-Fields checkIn(Fields fields) {
+Fields groupsFolded(const Fields& fields) {
   Fields expected;
   std::map<int, std::map<std::string, std::string>> groups;
   for (const std::string& field : fields) {
     const std::size_t equals = field.find('=');
     const std::string name = field.substr(1, equals - 1);
     const std::size_t digits = name.find_last_not_of("0123456789") + 1;
-    const std::string code = replaced(field, "." + name + "=", "");
+    const std::string code = field.substr(equals + 1);
     if (digits < name.size()) {
       groups[std::stoi(name.substr(digits))][name.substr(0, digits)] = code;
       continue;
@@ -136,40 +114,31 @@ struct Kind {
   Target target;
   /// Where the schema's own fields begin in the record.
   std::string prefix;
-  Expect expect;
+  Expect expect = unchanged;
   /// A schema inside the envelope of an invitation is chosen by this.
-  std::string invitationSchema;
+  std::string invitationSchema = "";
 };
-
-std::string outcomeInEnvelope(const Kind& kind, PropertyList::Tree message) {
-  if (kind.invitationSchema.empty()) return outcome(kind.target, message);
-  using PropertyList::Dictionary;
-  return outcome(
-      kind.target,
-      Dictionary{
-          {"c", Dictionary{{"cS", kind.invitationSchema}, {"cT", 1}, {"cD", std::move(message)}}},
-          {"s", 1},
-          {"uID", "identifier"}});
-}
 
 template <class S>
 void expectToArrive(const Kind& kind, const S& schema, std::string_view what) {
-  std::string got = outcomeInEnvelope(kind, mirror(schema));
-  if (!kind.invitationSchema.empty()) {
-    // What surrounds the kind in the envelope.
-    got =
-        replaced(got, ".context.schema=" + kind.invitationSchema + " .context.contextType=1 ", "");
-    got = got.substr(0, got.rfind(" .state=1 .identifier=identifier"));
+  using PropertyList::Dictionary;
+  Fields expected = kind.expect(flatten(schema));
+  for (std::string& field : expected) field.insert(0, kind.prefix);
+  PropertyList::Tree message = mirror(schema);
+  const std::string& chosenBy = kind.invitationSchema;
+  if (!chosenBy.empty()) {
+    message = Dictionary{{"c", Dictionary{{"cS", chosenBy}, {"cT", 1}, {"cD", std::move(message)}}},
+                         {"s", 1},
+                         {"uID", "u"}};
+    expected.insert(expected.begin(), {".context.schema=" + chosenBy, ".context.contextType=1"});
+    expected.insert(expected.end(), {".state=1", ".identifier=u"});
   }
-  std::string expected;
-  for (const std::string& field : kind.expect(flatten(schema))) {
-    expected += (expected.empty() ? "" : " ") + kind.prefix + field;
-  }
-  EXPECT_EQ(got, expected) << Keelgate::typeName<S>() << ": " << what;
+  EXPECT_EQ(outcome(kind.target, message), joined(expected))
+      << Keelgate::typeName<S>() << ": " << what;
 }
 
 template <class S>
-void expectEveryFieldToArrive(const Kind& kind) {
+void expectEveryField(const Kind& kind) {
   S full{};
   Filler().fill(full);
   expectToArrive(kind, full, "all fields");
@@ -189,46 +158,39 @@ void expectEveryFieldToArrive(const Kind& kind) {
   });
 }
 
-const std::string context = ".context.context.dictionary.";
-
 TEST(FullMessage, EveryFieldArrivesUnderItsOwnLabel) {
-  expectEveryFieldToArrive<VespSampleMessageSchema>(
-      {{"com.tessen.private.braid.rtcengine.rtctester", 1},
-       ".result.vespSampleMessage",
-       unchanged,
-       ""});
-  expectEveryFieldToArrive<VespSessionInvitationSchema>(
-      {{video, 232}, ".result.sessionInvitation", unchanged, ""});
-  expectEveryFieldToArrive<VespSessionAcceptSchema>(
-      {{video, 233}, ".result.sessionAccept", unchanged, ""});
-  expectEveryFieldToArrive<VespSessionDeclineSchema>(
-      {{video, 234}, ".result.sessionDecline", unchanged, ""});
-  expectEveryFieldToArrive<VespSessionDeclineSchema>(
-      {{video, 237}, ".result.sessionDecline", unchanged, ""});
-  expectEveryFieldToArrive<VespSessionCancelSchema>(
-      {{video, 235}, ".result.sessionCancel", unchanged, ""});
-  expectEveryFieldToArrive<VespSessionReinitiateSchema>(
-      {{video, 238}, ".result.sessionReinitiate", unchanged, ""});
-  expectEveryFieldToArrive<VespOstrelProtocolPayload>({{"PulseUserPayload"}, "", unchanged, ""});
-  expectEveryFieldToArrive<VespCommandResponseSchema>({{"VespCommandResponse"}, "", unchanged, ""});
-  expectEveryFieldToArrive<VespCommandWebTunnelResponseSchema>(
-      {{"VespCommandWebTunnelResponse"}, "", unchanged, ""});
-  expectEveryFieldToArrive<WaymarkSchema>(
-      {{"com.tessen.private.braid.waymark", 3}, ".result.waymarkMessage", checkIn, ""});
+  expectEveryField<VespSampleMessageSchema>({sample, ".result.vespSampleMessage"});
+  expectEveryField<VespSessionInvitationSchema>({{video, 232}, ".result.sessionInvitation"});
+  expectEveryField<VespSessionAcceptSchema>({{video, 233}, ".result.sessionAccept"});
+  expectEveryField<VespSessionDeclineSchema>({{video, 234}, ".result.sessionDecline"});
+  expectEveryField<VespSessionDeclineSchema>({{video, 237}, ".result.sessionDecline"});
+  expectEveryField<VespSessionCancelSchema>({{video, 235}, ".result.sessionCancel"});
+  expectEveryField<VespSessionReinitiateSchema>({{video, 238}, ".result.sessionReinitiate"});
+  expectEveryField<VespOstrelProtocolPayload>({payload, ""});
+  expectEveryField<VespCommandResponseSchema>({response, ""});
+  expectEveryField<VespCommandWebTunnelResponseSchema>({tunnel, ""});
+  expectEveryField<WaymarkSchema>({checkIn, ".result.waymarkMessage", groupsFolded});
 
-  const Target invitation{"VespInvitation"};
-  expectEveryFieldToArrive<VespSampleInvitationSchema>({invitation,
-                                                        context + "vespSampleInvitation", unchanged,
-                                                        "com.tessen.Vesp.schema.invitation"});
-  expectEveryFieldToArrive<VespHearthInvitationSchema>(
-      {invitation, context + "vespHearthInvitation", homeInvitation, "ht-invite-v1"});
-  expectEveryFieldToArrive<VespCofferSharingInvitationSchema>(
-      {invitation, context + "vespCofferSharingInvitation", cofferInvitation,
+  const std::string context = ".context.context.dictionary.";
+  expectEveryField<VespSampleInvitationSchema>({invitation, context + "vespSampleInvitation",
+                                                unchanged, "com.tessen.Vesp.schema.invitation"});
+  expectEveryField<VespHearthInvitationSchema>(
+      {invitation, context + "vespHearthInvitation",
+       moved({{".invitationShareURL=", ""},
+              {".invitationExpiryDate=", ".inviteExpiryDate="},
+              {".suppressInvite", ".homeSuppressInvite"},
+              {".invitationShareToken=", ".invitationShareToken.tokenData="}}),
+       "ht-invite-v1"});
+  expectEveryField<VespCofferSharingInvitationSchema>(
+      {invitation, context + "vespCofferSharingInvitation",
+       moved({{".shareURL=", ""}, {".invitationToken=", ".invitationToken.tokenData="}}),
        "com.tessen.coffersharingmessagingd"});
-  expectEveryFieldToArrive<VespVitalsInvitationSchema>(
-      {invitation, context + "vespVitalsInvitation", vitalsInvitation, "1"});
-  expectEveryFieldToArrive<VespStrideSharingInvitationSchema>(
-      {invitation, context + "vespStrideSharingInvitation", strideInvitation,
+  expectEveryField<VespVitalsInvitationSchema>({invitation, context + "vespVitalsInvitation",
+                                                moved({{".protobufData=", ".untrustedData="}}),
+                                                "1"});
+  expectEveryField<VespStrideSharingInvitationSchema>(
+      {invitation, context + "vespStrideSharingInvitation",
+       moved({{".protobufItem=", ".item="}, {".protobufPayload=", ".untrustedData="}}),
        "stride-sharing-invite"});
 }
 
