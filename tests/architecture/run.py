@@ -24,8 +24,9 @@ def sources(folder):
             and "test_" not in path.name]
 
 
-def includes(path):
-    return re.findall(r'^#include ["<]([^">]+)[">]', path.read_text(), re.M)
+def included(folder):
+    return [(path, name) for path in sources(folder)
+            for name in re.findall(r'^#include ["<]([^">]+)[">]', path.read_text(), re.M)]
 
 
 # A folder, and what its files may include beside the standard library. The service's own folder is
@@ -44,25 +45,21 @@ arrows = {
     "framework/transport": ["keelgate/", "framework/contracts/", "framework/transport/"],
 }
 for folder, allowed in arrows.items():
-    for path in sources(folder):
-        for name in includes(path):
-            check(standard.match(name) or any(name.startswith(a) for a in allowed),
-                  f"{path.relative_to(root)} includes {name}")
+    for path, name in included(folder):
+        check(standard.match(name) or name.startswith(tuple(allowed)),
+              f"{path.relative_to(root)} includes {name}")
 for folder, forbidden in {"framework": ["program/", "plist/", "cli/"],
                           "framework/client": ["framework/server/", "framework/sandbox/"],
                           "cli": ["plist/", "framework/server/", "framework/sandbox/"]}.items():
-    for path in sources(folder):
-        for name in includes(path):
-            check(not any(name.startswith(f) for f in forbidden),
-                  f"{path.relative_to(root)} includes {name}")
+    for path, name in included(folder):
+        check(not name.startswith(tuple(forbidden)), f"{path.relative_to(root)} includes {name}")
 
 # Schemas are data, so that what prints them links no decoder.
-for path in sources("program"):
+for path, name in included("program"):
     if re.search(r"schemas?\.h$|protocol_payload\.h$", path.name):
-        for name in includes(path):
-            check(standard.match(name) or name.startswith("keelgate/")
-                  or re.search(r"schemas?\.h$|schema/values\.h$", name),
-                  f"{path.relative_to(root)} is no data alone: it includes {name}")
+        check(standard.match(name) or name.startswith("keelgate/")
+              or re.search(r"schemas?\.h$|schema/values\.h$", name),
+              f"{path.relative_to(root)} is no data alone: it includes {name}")
 
 # No process that holds privileges has a parser of the network's formats in it.
 for program in ("bin/keelgate", "lib/libkeelgate.so"):

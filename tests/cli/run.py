@@ -225,27 +225,16 @@ def described():
     everything = json.loads(run("describe", "--json")[1])
     check(list(everything) == ["messageUnpackers", "services", "commands", "schemas", "records",
                                "enumerations"], "sections")
-    keys = lambda rows: {tuple(row) for row in rows}
-    tables = lambda section: [row for table in everything[section].values() for row in table]
-    check(keys(everything["messageUnpackers"]) == {("record", "unpacker", "schema")},
-          "messageUnpackers")
-    check(keys(everything["services"]) == {("service", "unpacker", "commands")}, "services")
-    check(keys(row for service in everything["services"] for row in service["commands"])
-          == {("schema", "case"), ("command", "case"),
-              ("command", "schema", "case")}, "commands of services")
-    check(keys(everything["commands"]) == {("rawValue", "name")}, "commands")
-    check(keys(case for table in everything["enumerations"].values() for case in table["cases"])
-          == {("name", "rawValue")}, "cases")
-    check(keys(tables("schemas")) == {("field", "key", "type", "required")}, "schemas")
-    check(keys(tables("records")) == {("field", "type", "optional")}, "records")
-    scalars = {"string", "int", "uint", "int64", "uint64", "double", "bool", "data", "date", "uuid"}
-    for section in ("schemas", "records"):
-        known = scalars | set(everything[section]) | set(everything["enumerations"])
-        loose = {row["type"] for row in tables(section) if row["type"].strip("[]") not in known}
-        check(not loose, f"types that are described nowhere: {loose}")
-    schemas = everything["schemas"]
-    check((len(schemas["VespOstrelProtocolPayload"]), len(schemas["WaymarkSchema"])) == (156, 153),
-          "the long schemas")
+    tables = [table for section in ("schemas", "records") for table in everything[section].values()]
+    tables += [service["commands"] for service in everything["services"]]
+    tables += [enumeration["cases"] for enumeration in everything["enumerations"].values()]
+    tables += [everything[section] for section in ("messageUnpackers", "services", "commands")]
+    # Which table has which columns, and what they hold, docs/wire-format.md pins.
+    check({tuple(row) for table in tables for row in table}
+          == {("record", "unpacker", "schema"), ("service", "unpacker", "commands"),
+              ("command", "schema", "case"), ("schema", "case"), ("command", "case"),
+              ("rawValue", "name"), ("name", "rawValue"), ("field", "key", "type", "required"),
+              ("field", "type", "optional")}, "columns of tables")
     for section in everything:
         for name in everything[section] if isinstance(everything[section], dict) else ():
             one = json.loads(run("describe", name, "--json")[1])
