@@ -178,8 +178,8 @@ TEST(Stack, TheDeepestMessageFits) {
   ASSERT_TRUE(service.ready()) << service.refusal();
   std::string message = "<dict><key>c</key><integer>1</integer></dict>";
   for (int level = 0; level < 255; ++level) {
-    message =
-        "<dict><key>c</key><integer>1</integer><key>mml</key><array>" + message + "</array></dict>";
+    message.insert(0, "<dict><key>c</key><integer>1</integer><key>mml</key><array>");
+    message += "</array></dict>";
   }
   const int channel = service.fork(0);
   sendMessage(channel, recordNumber<PulseUserPayload>, "<plist>" + message + "</plist>");
