@@ -190,6 +190,7 @@ TEST(Unpackers, AreUsedFromManyThreadsAtOnce) {
   const auto message = PropertyList::writeBinary(sampleMessage);
   const std::string expected = outcome(sample, Keelgate::Bytes(message));
   std::vector<std::thread> threads;
+  threads.reserve(8);
   std::atomic<int> wrong = 0;
   for (int i = 0; i < 8; ++i) {
     threads.emplace_back([&] {
