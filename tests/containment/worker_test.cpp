@@ -3,7 +3,6 @@
 #include "framework/transport/layers.h"
 #include "tests/containment/raw_client.h"
 
-#include <dirent.h>
 #include <gtest/gtest.h>
 #include <keelgate/records.h>
 #include <sys/resource.h>
