@@ -3,7 +3,7 @@
 
 include(GNUInstallDirs)
 
-if(NOT CMAKE_BUILD_TYPE)
+if(NOT CMAKE_BUILD_TYPE AND PROJECT_IS_TOP_LEVEL)
   set(CMAKE_BUILD_TYPE Release CACHE STRING "" FORCE)
 endif()
 
@@ -13,11 +13,12 @@ set(CMAKE_CXX_EXTENSIONS OFF)
 set(CMAKE_POSITION_INDEPENDENT_CODE ON)
 set(CMAKE_CXX_VISIBILITY_PRESET hidden)
 set(CMAKE_VISIBILITY_INLINES_HIDDEN ON)
-set(CMAKE_RUNTIME_OUTPUT_DIRECTORY ${CMAKE_BINARY_DIR}/bin)
-set(CMAKE_LIBRARY_OUTPUT_DIRECTORY ${CMAKE_BINARY_DIR}/lib)
-set(CMAKE_ARCHIVE_OUTPUT_DIRECTORY ${CMAKE_BINARY_DIR}/lib)
+set(CMAKE_RUNTIME_OUTPUT_DIRECTORY ${PROJECT_BINARY_DIR}/bin)
+set(CMAKE_LIBRARY_OUTPUT_DIRECTORY ${PROJECT_BINARY_DIR}/lib)
+set(CMAKE_ARCHIVE_OUTPUT_DIRECTORY ${PROJECT_BINARY_DIR}/lib)
 
-add_compile_options(-Wall -Wextra -Wpedantic -Wconversion -Werror)
+# Whether a warning is an error is for the presets to say (CMAKE_COMPILE_WARNING_AS_ERROR).
+add_compile_options(-Wall -Wextra -Wpedantic -Wconversion)
 add_compile_options(-fno-omit-frame-pointer -fstack-protector-strong)
 if(CMAKE_CXX_COMPILER_ID STREQUAL "GNU")
   add_compile_options(-Werror=missing-field-initializers)
@@ -31,7 +32,11 @@ if(CMAKE_BUILD_TYPE STREQUAL "Debug")
 else()
   # Bounds checks of the standard library stay on where hostile bytes are read: they cost little
   # beside what an unchecked index can cost.
-  add_compile_definitions(_GLIBCXX_ASSERTIONS _FORTIFY_SOURCE=2)
+  add_compile_definitions(_GLIBCXX_ASSERTIONS)
+  # A distribution has its own level.
+  if(NOT CMAKE_CXX_FLAGS MATCHES "_FORTIFY_SOURCE")
+    add_compile_definitions(_FORTIFY_SOURCE=2)
+  endif()
 endif()
 
 if(KEELGATE_SANITIZE)
@@ -51,12 +56,16 @@ if(KEELGATE_TESTS)
 endif()
 
 # keelgate_library(NAME SOURCES ... [PUBLIC libs...] [PRIVATE libs...])
-# A module of the tree. Headers are included by their path from the root.
+# A module of the tree: the target keelgate_NAME, which others link as Keelgate::NAME. Headers are
+# included by their path from the root; the architecture test fails where a file includes from a
+# module that its target does not link, and where a link is not used.
 function(keelgate_library name)
   cmake_parse_arguments(arg "" "" "SOURCES;PUBLIC;PRIVATE" ${ARGN})
-  add_library(${name} STATIC ${arg_SOURCES})
-  target_include_directories(${name} PUBLIC ${PROJECT_SOURCE_DIR} ${PROJECT_SOURCE_DIR}/include)
-  target_link_libraries(${name} PUBLIC ${arg_PUBLIC} PRIVATE ${arg_PRIVATE})
+  add_library(keelgate_${name} STATIC ${arg_SOURCES})
+  add_library(Keelgate::${name} ALIAS keelgate_${name})
+  target_include_directories(keelgate_${name}
+    PUBLIC ${PROJECT_SOURCE_DIR} ${PROJECT_SOURCE_DIR}/include)
+  target_link_libraries(keelgate_${name} PUBLIC ${arg_PUBLIC} PRIVATE ${arg_PRIVATE})
 endfunction()
 
 # keelgate_test(NAME SOURCES ... LIBRARIES ...): one test program for a module.
@@ -75,7 +84,7 @@ function(keelgate_test name)
     # g++ 12 takes the temporaries of a table of rows for uninitialised when it optimises.
     target_compile_options(${name} PRIVATE -Wno-maybe-uninitialized)
   endif()
-  set_target_properties(${name} PROPERTIES RUNTIME_OUTPUT_DIRECTORY ${CMAKE_BINARY_DIR}/tests)
+  set_target_properties(${name} PROPERTIES RUNTIME_OUTPUT_DIRECTORY ${PROJECT_BINARY_DIR}/tests)
   add_test(NAME ${name} COMMAND ${name})
   set_tests_properties(${name} PROPERTIES TIMEOUT ${arg_TIMEOUT})
 endfunction()
