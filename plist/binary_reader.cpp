@@ -15,6 +15,7 @@
 #include "plist/long_keys.h"
 #include "plist/store.h"
 #include "plist/unicode.h"
+#include "text/utf8.h"
 
 namespace PropertyList {
 namespace {
@@ -251,7 +252,8 @@ void BinaryReader::readDate(Node& node, Cursor& object, std::uint8_t width, std:
 void BinaryReader::readBytes(Node& node, Type type, Cursor& object, std::uint64_t length) {
   const std::size_t start = object.position();
   const Bytes bytes = claim(object, length);
-  if (type == Type::string && !isAscii(bytes)) throw Damage(Problem::notAscii, start);
+  if (type == Type::string && !Text::isAscii(Cursor::textAt(store_.message, start, bytes.size())))
+    throw Damage(Problem::notAscii, start);
   node.type = type;
   node.bits = start;
   node.count = static_cast<std::uint32_t>(length);

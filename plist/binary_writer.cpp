@@ -3,11 +3,12 @@
 #include <bit>
 #include <cmath>
 #include <limits>
+#include <span>
 #include <stdexcept>
 #include <unordered_map>
 
-#include "plist/unicode.h"
 #include "plist/writer.h"
+#include "text/utf8.h"
 
 namespace PropertyList {
 namespace {
@@ -52,12 +53,12 @@ std::string encodedHead(unsigned marker, std::size_t count) {
 
 // As ASCII where it is, since that takes half the bytes.
 std::string encodedString(std::string_view text) {
-  if (isAscii(std::as_bytes(std::span(text)))) {
+  if (Text::isAscii(text)) {
     return encodedHead(0x50, text.size()).append(text);
   }
   std::string units;
   while (!text.empty()) {
-    const Character next = firstCharacter(text);
+    const Text::Character next = Text::firstCharacter(text);
     if (next.length == 0) throw std::invalid_argument("A string is not valid UTF-8");
     text.remove_prefix(next.length);
     if (next.codePoint >= 0x10000) {

@@ -5,7 +5,11 @@
 #include <cstddef>
 #include <span>
 
+namespace Keelgate::Text {}
+
 namespace PropertyList {
+
+namespace Text = Keelgate::Text;
 
 using Bytes = std::span<const std::byte>;
 

@@ -18,13 +18,9 @@
 #include "plist/block.h"
 #include "plist/bytes.h"
 #include "plist/damage.h"
+#include "text/ascii.h"
 
 namespace PropertyList {
-
-// White space as XML and base64 know it.
-constexpr bool isSpace(char c) noexcept {
-  return c == ' ' || c == '\n' || c == '\t' || c == '\r';
-}
 
 // Cheap to copy: a copy is how a reader looks ahead, or goes back.
 class Cursor {
@@ -115,7 +111,7 @@ class Cursor {
   // Moves past white space as XML knows it; says whether there was any.
   bool skipSpace() noexcept {
     const std::byte* const start = here_;
-    while (here_ != end_ && isSpace(std::to_integer<char>(*here_))) ++here_;
+    while (here_ != end_ && Text::isSpace(std::to_integer<char>(*here_))) ++here_;
     return here_ != start;
   }
   // Moves to the next byte that text gives a meaning to or forbids: '<', '&', ']', a carriage

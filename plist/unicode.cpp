@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
-// Character by character where it must be, in blocks where a message is plain.
 #include "plist/unicode.h"
+
+#include "text/utf8.h"
 
 #include <algorithm>
 #include <array>
@@ -32,74 +33,7 @@ constexpr bool isIn(char32_t c, char32_t first, char32_t last) noexcept {
   return c >= first && c <= last;
 }
 
-constexpr bool isSurrogate(char32_t c) noexcept {
-  return isIn(c, 0xD800, 0xDFFF);
-}
-
 }  // namespace
-
-Character firstCharacter(std::string_view text) noexcept {
-  constexpr Character malformed{0, 0};
-  const auto lead = static_cast<unsigned char>(text[0]);
-  if (lead < 0x80) return {lead, 1};
-  if (lead < 0xC2 || lead > 0xF4) return malformed;
-  // 0xC0 and 0xC1 could begin overlong forms only, 0xF5 and above what lies beyond U+10FFFF.
-  const std::size_t length = lead < 0xE0 ? 2 : lead < 0xF0 ? 3 : 4;
-  if (text.size() < length) return malformed;
-  char32_t codePoint = lead & (0x7Fu >> length);
-  for (std::size_t i = 1; i < length; ++i) {
-    const auto next = static_cast<unsigned char>(text[i]);
-    if ((next & 0xC0u) != 0x80) return malformed;
-    codePoint = (codePoint << 6) | (next & 0x3Fu);
-  }
-  // By length: what could have been written shorter is not well-formed.
-  constexpr std::array<char32_t, 5> smallest = {0, 0, 0x80, 0x800, 0x10000};
-  if (codePoint < smallest[length] || codePoint > 0x10FFFF || isSurrogate(codePoint)) {
-    return malformed;
-  }
-  return {codePoint, length};
-}
-
-// Never asked for a surrogate: both callers have checked.
-std::size_t encodeUtf8(char32_t c, char* out) noexcept {
-  const auto tail = [c](unsigned shift) {
-    return static_cast<char>(0x80 | ((c >> shift) & 0x3F));
-  };
-  if (c < 0x80) {
-    out[0] = static_cast<char>(c);
-    return 1;
-  }
-  if (c < 0x800) {
-    out[0] = static_cast<char>(0xC0 | (c >> 6));
-    out[1] = tail(0);
-    return 2;
-  }
-  if (c < 0x10000) {
-    out[0] = static_cast<char>(0xE0 | (c >> 12));
-    out[1] = tail(6);
-    out[2] = tail(0);
-    return 3;
-  }
-  out[0] = static_cast<char>(0xF0 | (c >> 18));
-  out[1] = tail(12);
-  out[2] = tail(6);
-  out[3] = tail(0);
-  return 4;
-}
-
-bool isAscii(Bytes bytes) noexcept {
-  constexpr std::size_t block = 64;
-  while (bytes.size() >= block) {
-    // Blocks without an exit inside become vector code.
-    std::byte seen{};
-    for (const std::byte c : bytes.first<block>()) seen |= c;
-    if ((seen & std::byte{0x80}) != std::byte{}) return false;
-    bytes = bytes.subspan(block);
-  }
-  std::byte seen{};
-  for (const std::byte c : bytes) seen |= c;
-  return (seen & std::byte{0x80}) == std::byte{};
-}
 
 std::size_t utf8FromUtf16(Bytes units, char* out) noexcept {
   const auto unit = [units](std::size_t at) {
@@ -109,7 +43,7 @@ std::size_t utf8FromUtf16(Bytes units, char* out) noexcept {
   std::size_t written = 0;
   for (std::size_t at = 0; at < units.size(); at += 2) {
     char32_t c = unit(at);
-    if (isSurrogate(c)) {
+    if (Text::isSurrogate(c)) {
       if (c > 0xDBFF || at + 2 >= units.size() || !isIn(unit(at + 2), 0xDC00, 0xDFFF)) {
         return failed;
       }
@@ -117,7 +51,7 @@ std::size_t utf8FromUtf16(Bytes units, char* out) noexcept {
       // Ten bits from each half. A pair takes two units and four bytes, so three a unit are enough.
       c = 0x10000 + ((c & 0x3FF) << 10) + (unit(at) & 0x3FF);
     }
-    written += encodeUtf8(c, out + written);
+    written += Text::encodeUtf8(c, out + written);
   }
   return written;
 }
@@ -125,7 +59,7 @@ std::size_t utf8FromUtf16(Bytes units, char* out) noexcept {
 bool isXmlCharacter(char32_t c) noexcept {
   // What XML excludes it excludes as a character reference too.
   if (c < 0x20) return c == '\t' || c == '\n' || c == '\r';
-  return c <= 0x10FFFF && !isSurrogate(c) && c != 0xFFFE && c != 0xFFFF;
+  return c <= 0x10FFFF && !Text::isSurrogate(c) && c != 0xFFFE && c != 0xFFFF;
 }
 
 bool isXmlNameStart(char32_t c) noexcept {

@@ -10,6 +10,7 @@
 #include <string>
 #include <vector>
 
+#include "plist/bytes.h"
 #include "plist/tree.h"
 
 namespace PropertyList {

@@ -15,7 +15,7 @@ constexpr bool isOneOf(char c, std::string_view characters) noexcept {
 }
 
 constexpr bool isLetterOrDigit(char c) noexcept {
-  return (c >= '0' && c <= '9') || ((c | 0x20) >= 'a' && (c | 0x20) <= 'z');
+  return Text::isLetter(c) || Text::isDigit(c);
 }
 
 // Which characters a public identifier may have.

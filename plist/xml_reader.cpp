@@ -14,6 +14,7 @@
 #include "plist/xml_elements.h"
 #include "plist/xml_scalars.h"
 #include "plist/xml_scanner.h"
+#include "text/base64.h"
 
 namespace PropertyList {
 namespace {
@@ -49,13 +50,11 @@ class XmlReader {
   void openContainer(Type type, bool isEmpty);
   void closeContainer();
   void checkKeys(std::uint32_t dictionary);
-  XmlScanner::Text content(Element element, bool isEmpty);
-  void addText(const XmlScanner::Text& text);
+  XmlScanner::Content content(Element element, bool isEmpty);
+  void addText(const XmlScanner::Content& text);
   void addData(bool isEmpty);
-  void decodeAhead();
-  void decodeRest(const XmlScanner::Text& text);
   void addNumber(Element element, bool isEmpty);
-  std::string_view view(const XmlScanner::Text& text) const;
+  std::string_view view(const XmlScanner::Content& text) const;
   Node& add(Type type, std::uint64_t bits, std::uint32_t count = 0);
   [[gnu::noinline]] void growNodes();
 
@@ -226,56 +225,32 @@ void XmlReader::checkKeys(std::uint32_t dictionary) {
 }
 
 // The text of an element and its end tag; nothing where the start tag was all.
-XmlScanner::Text XmlReader::content(Element element, bool isEmpty) {
+XmlScanner::Content XmlReader::content(Element element, bool isEmpty) {
   if (isEmpty) return {cursor().position(), 0, false};
   return scanner_.text(spellingOf(element));
 }
 
-void XmlReader::addText(const XmlScanner::Text& text) {
+void XmlReader::addText(const XmlScanner::Content& text) {
   Node& node = add(Type::string, text.offset, static_cast<std::uint32_t>(text.length));
   if (text.inSide) node.set(Node::inSide);
 }
 
-// Decodes where the text stands, piece by piece because its length is not known yet. Base64 has no
-// character that means anything to XML, so what decodes has been checked as text too.
-void XmlReader::decodeAhead() {
-  // As much as the side buffer takes without growing.
-  constexpr std::size_t pieceLength = 512;
-  bool isCut = false;
-  do {
-    const std::string_view piece = cursor().rest().substr(0, pieceLength);
-    const std::size_t start = store_.side.size();
-    store_.side.resize(start + piece.size() / 4 * 3 + 3);
-    const Base64Run run = decodeBase64Run(piece, store_.side.data() + start);
-    store_.side.resize(start + run.written);
-    cursor().skip(run.read);
-    // Less than a group is left only where the piece's end cut it in two.
-    isCut = run.read > 0 && piece.size() - run.read < 4;
-  } while (isCut);
-}
-
-void XmlReader::addData(bool isEmpty) {
-  const std::size_t start = store_.side.size();
-  if (!isEmpty) decodeAhead();
-  const XmlScanner::Text rest = content(Element::data, isEmpty);
-  if (rest.length > 0) decodeRest(rest);
-  const auto count = static_cast<std::uint32_t>(store_.side.size() - start);
-  add(Type::data, start, count).set(Node::inSide);
-}
-
 // Assembled text is decoded where it stands: what comes out is shorter than what went in.
-void XmlReader::decodeRest(const XmlScanner::Text& text) {
+void XmlReader::addData(bool isEmpty) {
+  const XmlScanner::Content text = content(Element::data, isEmpty);
   const std::size_t start = text.inSide ? text.offset : store_.side.size();
-  if (!text.inSide) store_.side.resize(start + text.length / 4 * 3 + 3);
-  const auto length = decodeBase64(view(text), store_.side.data() + start);
+  store_.side.resize(start + Text::base64Room(text.length));
+  const auto length =
+      Text::decodeBase64(view(text), store_.side.data() + start, Text::Base64::spaced);
   if (!length) scanner_.fail(Problem::badBase64);
   // The buffer gives back what the encoding, white space and padding took.
   store_.side.resize(start + *length);
+  add(Type::data, start, static_cast<std::uint32_t>(*length)).set(Node::inSide);
 }
 
 void XmlReader::addNumber(Element element, bool isEmpty) {
   const std::size_t side = store_.side.size();
-  const XmlScanner::Text text = content(element, isEmpty);
+  const XmlScanner::Content text = content(element, isEmpty);
   if (element == Element::integer) {
     const auto integer = parseInteger(view(text));
     if (!integer) scanner_.fail(Problem::badInteger);
@@ -292,7 +267,7 @@ void XmlReader::addNumber(Element element, bool isEmpty) {
   store_.side.resize(side);
 }
 
-std::string_view XmlReader::view(const XmlScanner::Text& text) const {
+std::string_view XmlReader::view(const XmlScanner::Content& text) const {
   if (text.inSide) return {store_.side.data() + text.offset, text.length};
   return Cursor::textAt(store_.message, text.offset, text.length);
 }

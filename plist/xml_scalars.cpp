@@ -6,27 +6,23 @@
 #include <charconv>
 #include <limits>
 
-#include "plist/cursor.h"
+#include "text/ascii.h"
+#include "text/date_time.h"
 
 namespace PropertyList {
 namespace {
 
-constexpr bool isDigit(char c) noexcept {
-  return c >= '0' && c <= '9';
-}
-
-constexpr char lower(char c) noexcept {
-  return c >= 'A' && c <= 'Z' ? static_cast<char>(c | 0x20) : c;
-}
+using Text::isDigit;
+using Text::lowerCase;
 
 // Letters of ASCII alone: in some locales I is not the capital of i.
 bool isWord(std::string_view text, std::string_view word) noexcept {
-  return std::ranges::equal(text, word, {}, lower);
+  return std::ranges::equal(text, word, {}, lowerCase);
 }
 
 std::string_view trimmed(std::string_view text) noexcept {
-  while (!text.empty() && isSpace(text.front())) text.remove_prefix(1);
-  while (!text.empty() && isSpace(text.back())) text.remove_suffix(1);
+  while (!text.empty() && Text::isSpace(text.front())) text.remove_prefix(1);
+  while (!text.empty() && Text::isSpace(text.back())) text.remove_suffix(1);
   return text;
 }
 
@@ -75,24 +71,9 @@ bool isDecimal(std::string_view text) noexcept {
   }
   if (mantissa == 0) return false;
   if (text.empty()) return true;
-  if (lower(text[0]) != 'e') return false;
+  if (lowerCase(text[0]) != 'e') return false;
   text = unsignedPart(text.substr(1));
   return digits() > 0 && text.empty();
-}
-
-// Days from 2001-01-01 in the Gregorian calendar, for years from 1.
-constexpr int daysSince2001(int year, int month, int day) noexcept {
-  constexpr int beforeMonth[] = {0, 31, 59, 90, 120, 151, 181, 212, 243, 273, 304, 334};
-  const bool isLeap = year % 4 == 0 && (year % 100 != 0 || year % 400 == 0);
-  const int past = year - 1;
-  const int leapDays = past / 4 - past / 100 + past / 400;
-  constexpr int leapDaysBefore2001 = 500 - 20 + 5;
-  return (year - 2001) * 365 + leapDays - leapDaysBefore2001 + beforeMonth[month - 1] + day - 1 +
-         (isLeap && month > 2 ? 1 : 0);
-}
-
-constexpr int daysInMonth(int year, int month) noexcept {
-  return month == 12 ? 31 : daysSince2001(year, month + 1, 1) - daysSince2001(year, month, 1);
 }
 
 }  // namespace
@@ -136,29 +117,7 @@ std::optional<double> parseReal(std::string_view text) noexcept {
 }
 
 std::optional<double> parseDate(std::string_view text) noexcept {
-  text = trimmed(text);
-  constexpr std::string_view form = "0000-00-00T00:00:00Z";
-  // Every place, so that what follows reads digits and nothing else.
-  const bool fits = std::ranges::equal(
-      text, form, [](char c, char model) { return model == '0' ? isDigit(c) : c == model; });
-  if (!fits) return std::nullopt;
-  const auto number = [text](std::size_t at, std::size_t length) {
-    int value = 0;
-    for (const char digit : text.substr(at, length)) value = value * 10 + (digit - '0');
-    return value;
-  };
-  const int year = number(0, 4);
-  const int month = number(5, 2);
-  const int day = number(8, 2);
-  const int hour = number(11, 2);
-  const int minute = number(14, 2);
-  const int second = number(17, 2);
-  // Deliberate: no second 60. A leap second has no place in seconds counted without them.
-  if (year < 1 || month < 1 || month > 12 || day < 1 || day > daysInMonth(year, month) ||
-      hour > 23 || minute > 59 || second > 59) {
-    return std::nullopt;
-  }
-  return 86400.0 * daysSince2001(year, month, day) + (hour * 60 + minute) * 60 + second;
+  return Text::parseDateTime(trimmed(text));
 }
 
 }  // namespace PropertyList

@@ -23,18 +23,4 @@ std::optional<double> parseReal(std::string_view text) noexcept;
 // seconds. In seconds since 2001-01-01T00:00:00Z.
 std::optional<double> parseDate(std::string_view text) noexcept;
 
-// Base64 with full padding and white space anywhere. `out` has room for 3 bytes per 4 characters
-// and for 3 more, or is where the text is: no byte is written before its characters are read.
-// Returns how many bytes were written.
-std::optional<std::size_t> decodeBase64(std::string_view text, char* out) noexcept;
-
-// Decodes what the text begins with, up to the first group that needs care: one with padding, with
-// white space inside or with anything that is not base64. What is left can be decoded by itself.
-// `out` as above.
-struct Base64Run {
-  std::size_t read;     // characters
-  std::size_t written;  // bytes
-};
-Base64Run decodeBase64Run(std::string_view text, char* out) noexcept;
-
 }  // namespace PropertyList

@@ -7,6 +7,7 @@
 
 #include "plist/duplicates.h"
 #include "plist/unicode.h"
+#include "text/utf8.h"
 
 namespace PropertyList {
 
@@ -52,7 +53,7 @@ char32_t XmlScanner::character() {
   }
   if (cursor_.atEnd()) fail(Problem::truncated);
   // One decoder for all text: what one place takes for a character no other sees as bytes.
-  const Character next = firstCharacter(cursor_.rest());
+  const Text::Character next = Text::firstCharacter(cursor_.rest());
   if (next.length == 0) fail(Problem::badUtf8);
   if (!isXmlCharacter(next.codePoint)) fail(Problem::forbiddenCharacter);
   cursor_.skip(next.length);
@@ -63,7 +64,7 @@ char32_t XmlScanner::character() {
 std::string_view XmlScanner::name(Problem problem) {
   const std::size_t start = cursor_.position();
   while (!cursor_.atEnd()) {
-    const Character next = firstCharacter(cursor_.rest());
+    const Text::Character next = Text::firstCharacter(cursor_.rest());
     const bool isFirst = cursor_.position() == start;
     if (next.length == 0) fail(Problem::badUtf8);
     if (!(isFirst ? isXmlNameStart(next.codePoint) : isXmlNameCharacter(next.codePoint))) break;
@@ -169,7 +170,7 @@ void XmlScanner::plainText() {
 }
 
 // Most text stands in the message as it is meant, and stays there.
-XmlScanner::Text XmlScanner::unusualText(const Spelling& element, std::size_t start) {
+XmlScanner::Content XmlScanner::unusualText(const Spelling& element, std::size_t start) {
   plainText();
   if (cursor_.peek() == '<' && cursor_.peek(1) == '/') {
     const std::size_t length = cursor_.position() - start;
@@ -187,7 +188,7 @@ void XmlScanner::assemble(std::size_t start) {
   while (!cursor_.rest().starts_with("</")) {
     if (cursor_.skipIf("&")) {
       std::array<char, 4> bytes{};
-      side_.append(bytes.data(), encodeUtf8(reference(), bytes.data()));
+      side_.append(bytes.data(), Text::encodeUtf8(reference(), bytes.data()));
     } else if (cursor_.peek() == '\r') {
       newline();
     } else if (cursor_.skipIf("<![CDATA[")) {

@@ -45,12 +45,12 @@ class XmlScanner {
 
   // The text that stands here, up to the end tag of `element`, which is passed. An offset and no
   // view, because assembling the next text may move the side buffer.
-  struct Text {
+  struct Content {
     std::size_t offset;  // in the message or in the side buffer
     std::size_t length;
     bool inSide;
   };
-  Text text(const Spelling& element) {
+  Content text(const Spelling& element) {
     const std::size_t start = cursor_.position();
     cursor_.skipPlain();
     const std::size_t end = cursor_.position();
@@ -70,7 +70,7 @@ class XmlScanner {
     return true;
   }
   void unusualEndTag(std::string_view name);
-  Text unusualText(const Spelling& element, std::size_t start);
+  Content unusualText(const Spelling& element, std::size_t start);
   // Each passes one construct whole, and fails with the problem of its name.
   void declaration();
   bool pseudoAttribute(std::string_view name, std::string_view& value);

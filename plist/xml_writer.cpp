@@ -3,21 +3,21 @@
 #include <array>
 #include <charconv>
 #include <cmath>
-#include <cstdio>
 #include <stdexcept>
 
 #include "plist/unicode.h"
 #include "plist/writer.h"
+#include "text/base64.h"
+#include "text/date_time.h"
+#include "text/utf8.h"
 
 namespace PropertyList {
 namespace {
 
-constexpr double secondsPerDay = 86400;
-
 // All three that could be taken for markup, also where XML would let '>' stand.
 void appendEscaped(std::string& out, std::string_view text) {
   while (!text.empty()) {
-    const Character next = firstCharacter(text);
+    const Text::Character next = Text::firstCharacter(text);
     if (next.length == 0 || !isXmlCharacter(next.codePoint)) {
       throw std::invalid_argument("A string holds what XML cannot");
     }
@@ -42,24 +42,6 @@ void appendEscaped(std::string& out, std::string_view text) {
   }
 }
 
-// Apart from the reader's tables, so that a fault in those shows when the two meet in a test.
-std::string base64(const Data& data) {
-  constexpr std::string_view alphabet =
-      "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";
-  std::string out;
-  for (std::size_t i = 0; i < data.size(); i += 3) {
-    const auto at = [&](std::size_t j) {
-      return j < data.size() ? std::to_integer<std::size_t>(data[j]) : 0;
-    };
-    const std::size_t group = at(i) << 16 | at(i + 1) << 8 | at(i + 2);
-    out += alphabet[group >> 18];
-    out += alphabet[group >> 12 & 63];
-    out += i + 1 < data.size() ? alphabet[group >> 6 & 63] : '=';
-    out += i + 2 < data.size() ? alphabet[group & 63] : '=';
-  }
-  return out;
-}
-
 // The shortest spelling that reads back as the same double.
 std::string spelt(double number) {
   if (std::isnan(number)) return "nan";
@@ -68,33 +50,12 @@ std::string spelt(double number) {
   return {text.data(), end};
 }
 
-// The calendar date so many days after 2001-01-01, found by going from years to days.
 std::string spelt(Date date) {
-  // Down, also before 2001: the time of day is counted forwards from midnight.
-  const double day = std::floor(date.seconds / secondsPerDay);
-  constexpr double firstDay = -730'485;  // 0001-01-01
-  constexpr double lastDay = 2'921'573;  // 9999-12-31
-  if (!(day >= firstDay && day <= lastDay) || date.seconds != std::floor(date.seconds)) {
+  const auto text = Text::dateTimeText(date.seconds);
+  if (!text || date.seconds != std::floor(date.seconds)) {
     throw std::invalid_argument("XML has no spelling for this date");
   }
-  const auto isLeap = [](int year) {
-    return year % 4 == 0 && (year % 100 != 0 || year % 400 == 0);
-  };
-  // Whole cycles of 400 years first, all of which have the same length, then single years.
-  int left = static_cast<int>(day - firstDay);
-  int year = 1 + 400 * (left / 146'097);
-  left %= 146'097;
-  for (; left >= (isLeap(year) ? 366 : 365); ++year) left -= isLeap(year) ? 366 : 365;
-  const std::array<int, 12> lengths = {
-      31, isLeap(year) ? 29 : 28, 31, 30, 31, 30, 31, 31, 30, 31, 30, 31};
-  std::size_t month = 0;
-  for (; left >= lengths[month]; ++month) left -= lengths[month];
-  const int second = static_cast<int>(date.seconds - day * secondsPerDay);
-  std::array<char, 32> text{};
-  const int length = std::snprintf(text.data(), text.size(), "%04d-%02d-%02dT%02d:%02d:%02dZ", year,
-                                   static_cast<int>(month) + 1, left + 1, second / 3600,
-                                   second / 60 % 60, second % 60);
-  return {text.data(), static_cast<std::size_t>(length)};
+  return *text;
 }
 
 class XmlWriter {
@@ -111,7 +72,7 @@ class XmlWriter {
   void operator()(double number) { element("real", spelt(number)); }
   void operator()(Date date) { element("date", spelt(date)); }
   void operator()(const std::string& text) { element("string", text); }
-  void operator()(const Data& data) { element("data", base64(data)); }
+  void operator()(const Data& data) { element("data", Text::encodeBase64(data)); }
   void operator()(const Array& elements) { open({&elements, nullptr, 0}); }
   void operator()(const Dictionary& entries) { open({nullptr, &entries, 0}); }
 

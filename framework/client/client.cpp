@@ -8,6 +8,7 @@
 #include "framework/transport/layers.h"
 #include "framework/transport/record_coding.h"
 #include "framework/transport/wire.h"
+#include "text/utf8.h"
 
 #include <algorithm>
 #include <atomic>
@@ -62,7 +63,7 @@ class Client::Implementation {
     checkSize("the message", message.size(), options_.largestMessage);
     checkSize("the service identifier", context.service.size(), Transport::maximumServiceLength);
     // What is not UTF-8 could not travel, and the table of services has none such.
-    if (!Transport::isUtf8(context.service)) {
+    if (!Text::isUtf8(context.service)) {
       throw VespClientMessageUnpackingError::noUnpackerForService(context.service);
     }
     Optional<R> record;

@@ -3,7 +3,7 @@
 /// function; callable from any thread.
 #include "framework/client/log_line.h"
 
-#include "framework/transport/wire.h"
+#include "text/utf8.h"
 
 #include <poll.h>
 #include <unistd.h>
@@ -19,7 +19,7 @@ namespace {
 /// The length of the character at the front; 0 if there is none.
 std::size_t characterLength(std::string_view text) noexcept {
   for (std::size_t n = 1; n <= 4 && n <= text.size(); ++n) {
-    if (Transport::isUtf8(text.substr(0, n))) return n;
+    if (Text::isUtf8(text.substr(0, n))) return n;
   }
   return 0;
 }

@@ -106,7 +106,4 @@ class Reader {
   std::size_t memory_;
 };
 
-/// Whether the text is UTF-8 in its shortest form, without surrogates.
-bool isUtf8(std::string_view text) noexcept;
-
 }  // namespace Keelgate::Transport

@@ -3,6 +3,8 @@
 /// message said.
 #include "program/schema/scalars.h"
 
+#include "text/uuid.h"
+
 #include <cmath>
 
 namespace VespKeelgateService::Scalars {
@@ -22,18 +24,6 @@ namespace {
 
 void expect(Type type, const Value& value, const CodingPath& path, std::string_view expected) {
   if (value.type() != type) throw Errors::typeMismatch(path, expected, value.type());
-}
-
-/// The value of a hexadecimal digit, or -1.
-int digitValue(char c) {
-  if (c >= '0' && c <= '9') return c - '0';
-  if (c >= 'a' && c <= 'f') return c - 'a' + 10;
-  if (c >= 'A' && c <= 'F') return c - 'A' + 10;
-  return -1;
-}
-
-bool isDashPlace(std::size_t at) {
-  return at == 8 || at == 13 || at == 18 || at == 23;
 }
 
 }  // namespace
@@ -99,20 +89,9 @@ void decode(ExpansionBudget&, const Value& value, const CodingPath& path, Date& 
 
 void decode(ExpansionBudget&, const Value& value, const CodingPath& path, UUID& into) {
   expect(Type::string, value, path, "UUID");
-  const std::string_view text = value.string();
-  // 32 digits and 4 dashes. No braces, no prefix, no white space: one spelling but for the case.
-  if (text.size() != 36) throw Errors::invalidUUID(path);
-  std::size_t digits = 0;
-  for (std::size_t at = 0; at < text.size(); ++at) {
-    if (isDashPlace(at)) {
-      if (text[at] != '-') throw Errors::invalidUUID(path);
-      continue;
-    }
-    const int digit = digitValue(text[at]);
-    if (digit < 0) throw Errors::invalidUUID(path);
-    std::uint8_t& octet = into.octets[digits++ / 2];
-    octet = static_cast<std::uint8_t>(octet << 4 | digit);
-  }
+  const auto octets = Keelgate::Text::parseUuid(value.string());
+  if (!octets) throw Errors::invalidUUID(path);
+  into.octets = *octets;
 }
 
 }  // namespace VespKeelgateService::Scalars

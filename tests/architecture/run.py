@@ -34,15 +34,16 @@ def included(folder):
 # seal that need the operating system see its headers.
 standard = re.compile(r"^[a-z_]+$")
 arrows = {
-    "plist": ["plist/"],
+    "text": ["text/"],
+    "plist": ["text/", "plist/"],
     "include": ["keelgate/"],
-    "program/schema": ["plist/", "keelgate/", "program/schema/"],
+    "program/schema": ["text/", "plist/", "keelgate/", "program/schema/"],
     **{f"program/{folder}": ["keelgate/", "framework/contracts/", "program/schema/",
                              "program/service/vesp_service_unpacker.h", f"program/{folder}/"]
        for folder in ("session", "payload", "invitation", "waymark")},
     "program/service": ["keelgate/", "framework/contracts/", "framework/server/", "program/"],
     "framework/contracts": ["keelgate/", "framework/contracts/"],
-    "framework/transport": ["keelgate/", "framework/contracts/", "framework/transport/"],
+    "framework/transport": ["text/", "keelgate/", "framework/contracts/", "framework/transport/"],
 }
 for folder, allowed in arrows.items():
     for path, name in included(folder):
@@ -82,7 +83,7 @@ leaked = names & {"FIELD", "FIELD_FAMILY", "CODING_KEYS", "LABELS", "CASES", "EN
                   "NESTED_ENUMERATION", "DEFAULTING_ENUMERATION"}
 check(names and not leaked, f"client.h leaks {sorted(leaked)}")
 
-for folder in ("include", "plist", "program", "framework", "cli", "tests", "fuzz", "bench",
+for folder in ("include", "text", "plist", "program", "framework", "cli", "tests", "fuzz", "bench",
                "examples"):
     for path in (root / folder).rglob("*"):
         if path.suffix in (".h", ".cpp"):
