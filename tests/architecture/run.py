@@ -9,6 +9,8 @@ import re
 import subprocess
 import sys
 
+import links
+
 root, build, compiler = pathlib.Path(sys.argv[1]), pathlib.Path(sys.argv[2]), sys.argv[3]
 failures = []
 
@@ -29,36 +31,31 @@ def included(folder):
             for name in re.findall(r'^#include ["<]([^">]+)[">]', path.read_text(), re.M)]
 
 
-# A folder, and what its files may include beside the standard library. The service's own folder is
-# the one place that knows the server; the framework knows no unpacker; only the two sides of the
-# seal that need the operating system see its headers.
-standard = re.compile(r"^[a-z_]+$")
-arrows = {
-    "text": ["text/"],
-    "plist": ["text/", "plist/"],
-    "include": ["keelgate/"],
-    "program/schema": ["text/", "plist/", "keelgate/", "program/schema/"],
-    **{f"program/{folder}": ["keelgate/", "framework/contracts/", "program/schema/",
-                             "program/service/vesp_service_unpacker.h", f"program/{folder}/"]
-       for folder in ("session", "payload", "invitation", "waymark")},
-    "program/service": ["keelgate/", "framework/contracts/", "framework/server/", "program/"],
-    "framework/contracts": ["keelgate/", "framework/contracts/"],
-    "framework/transport": ["text/", "keelgate/", "framework/contracts/", "framework/transport/"],
-}
-for folder, allowed in arrows.items():
+# Who may include from whom: the link lines say it.
+failures += links.Tree(root, (build / "targets.txt").read_text().splitlines()).check()
+
+# What they must not say: the privileged side reads no format of the network, the parser knows no
+# schema and no record, the framework no unpacker, and only `service/` the server.
+for folder, forbidden in {"plist": ["include", "program", "framework", "fuzz", "tests"],
+                          "text": ["include", "plist", "program", "framework"],
+                          "framework": ["program", "plist", "cli"],
+                          "framework/client": ["framework/server", "framework/sandbox"],
+                          "framework/sandbox": ["framework/server", "framework/client"],
+                          "framework/transport": ["framework/server", "framework/sandbox"],
+                          "program": ["framework/transport", "framework/sandbox",
+                                      "framework/client", "cli"],
+                          **{f"program/{room}": ["framework/server"] for room in
+                             ("schema", "session", "payload", "invitation", "waymark")},
+                          "cli": ["plist", "framework/server", "framework/sandbox"]}.items():
     for path, name in included(folder):
-        check(standard.match(name) or name.startswith(tuple(allowed)),
+        where = "include" if name.startswith("keelgate/") else name
+        check(not any(f"{where}/".startswith(f"{other}/") for other in forbidden),
               f"{path.relative_to(root)} includes {name}")
-for folder, forbidden in {"framework": ["program/", "plist/", "cli/"],
-                          "framework/client": ["framework/server/", "framework/sandbox/"],
-                          "cli": ["plist/", "framework/server/", "framework/sandbox/"]}.items():
-    for path, name in included(folder):
-        check(not name.startswith(tuple(forbidden)), f"{path.relative_to(root)} includes {name}")
 
 # Schemas are data, so that what prints them links no decoder.
 for path, name in included("program"):
     if re.search(r"schemas?\.h$|protocol_payload\.h$", path.name):
-        check(standard.match(name) or name.startswith("keelgate/")
+        check(re.fullmatch("[a-z_]+", name) or name.startswith("keelgate/")
               or re.search(r"schemas?\.h$|schema/values\.h$", name),
               f"{path.relative_to(root)} is no data alone: it includes {name}")
 
