@@ -3,7 +3,8 @@
 // the same run for the least that could be done: a fork that exits and is waited for, and a round
 // trip of the same bytes over a socket to a process that is already there.
 #include "framework/client/worker.h"
-#include "framework/transport/frames.h"
+#include "framework/contracts/memory_budget.h"
+#include "framework/protocol/frames.h"
 #include "framework/transport/record_coding.h"
 
 #include <keelgate/client.h>
@@ -79,8 +80,8 @@ double bareFork() {
 /// A child answers what it gets with as many bytes as a service would.
 double bareRoundTrip() {
   static const double result = [] {
-    const Data request(sizeof(Transport::RequestHeader) + message().size());
-    const Data reply(sizeof(Transport::ReplyHeader) + replyLength());
+    const Data request(sizeof(Protocol::RequestHeader) + message().size());
+    const Data reply(sizeof(Protocol::ReplyHeader) + replyLength());
     int ends[2];
     if (socketpair(AF_UNIX, SOCK_STREAM, 0, ends) != 0) std::abort();
     const pid_t pid = fork();
@@ -152,7 +153,7 @@ void freshWorkerWithoutSpare(benchmark::State& state) {
   const Data bytes = message();
   measure(state, std::chrono::milliseconds(2), [&] {
     const Deadline deadline = deadlineAfter(std::chrono::seconds(5));
-    Worker worker(service, *service->fork(Transport::shortMessage, deadline));
+    Worker worker(service, *service->fork(shortMessage, deadline));
     ReceivedReply reply;
     if (worker.exchange({.record = recordNumber<VespCommandResponse>,
                          .command = 0,

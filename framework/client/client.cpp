@@ -4,8 +4,9 @@
 #include <keelgate/client.h>
 
 #include "framework/client/pool.h"
+#include "framework/contracts/layers.h"
+#include "framework/protocol/control_frames.h"
 #include "framework/transport/error_coding.h"
-#include "framework/transport/layers.h"
 #include "framework/transport/record_coding.h"
 #include "framework/transport/wire.h"
 #include "text/utf8.h"
@@ -61,7 +62,7 @@ class Client::Implementation {
     // First of all, so that nothing that follows goes uncounted.
     const Deadline deadline = deadlineAfter(options_.timeLimit);
     checkSize("the message", message.size(), options_.largestMessage);
-    checkSize("the service identifier", context.service.size(), Transport::maximumServiceLength);
+    checkSize("the service identifier", context.service.size(), Protocol::maximumServiceLength);
     // What is not UTF-8 could not travel, and the table of services has none such.
     if (!Text::isUtf8(context.service)) {
       throw VespClientMessageUnpackingError::noUnpackerForService(context.service);
@@ -72,19 +73,19 @@ class Client::Implementation {
                      .service = context.service,
                      .message = message},
                     deadline, [&](const ReceivedReply& reply) {
-                      if (reply.kind == Transport::ReplyKind::error) {
-                        Transport::throwError(reply.body());
+                      if (reply.kind == Protocol::ReplyKind::error) {
+                        Transport::throwError(reply.body);
                       }
                       // Within the call, so that a reply that turns out to be none ends its worker.
-                      record = Transport::decodeRecord<R>(reply.body(), reply.memory);
+                      record = Transport::decodeRecord<R>(reply.body, reply.memory);
                     });
     return std::move(*record);
   }
 
   ServiceReport report() {
     const auto [version, layers] = ours().report(deadlineAfter(options_.timeLimit));
-    ServiceReport report{.version = Transport::versionText(version), .layers = {}};
-    for (const Transport::NamedLayer& row : Transport::namedLayers) {
+    ServiceReport report{.version = Protocol::versionText(version), .layers = {}};
+    for (const NamedLayer& row : namedLayers) {
       report.layers.push_back({.name = String(row.name), .present = (layers & row.layer) != 0});
     }
     return report;

@@ -8,13 +8,8 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <cstring>
 
 namespace Keelgate {
-
-using Transport::ReplyHeader;
-using Transport::ReplyKind;
-using Transport::RequestHeader;
 
 namespace {
 
@@ -67,13 +62,8 @@ Ending DataChannel::exchange(const ClientRequest& request, Deadline deadline,
 }
 
 Ending DataChannel::send(const ClientRequest& request, Deadline deadline) const {
-  const RequestHeader header{.magic = Transport::magic,
-                             .version = Transport::protocolVersion,
-                             .record = request.record,
-                             .sequence = sequence_,
-                             .serviceLength = static_cast<std::uint32_t>(request.service.size()),
-                             .bodyLength = request.message.size(),
-                             .command = request.command};
+  const Protocol::RequestHeader header = Protocol::makeRequestHeader(
+      request.record, request.command, request.service.size(), request.message.size(), sequence_);
   // Three pieces and one call: the message, which may be large, is copied by the kernel alone.
   Pieces pieces{pieceOf(&header, sizeof header),
                 pieceOf(request.service.data(), request.service.size()),
@@ -114,63 +104,37 @@ Ending DataChannel::waitToSend(Deadline deadline) const noexcept {
 Ending DataChannel::receive(std::uint64_t allowance, Deadline deadline, ReceivedReply& reply) {
   filled_ = 0;
   reply.buffer.resize(firstBuffer);
-  for (std::size_t at = 0;;) {
-    ReplyHeader header;
-    if (const Ending e = await(at + sizeof header, deadline, reply); e != Ending::answered) {
-      return e;
+  Protocol::ReplyParser parser(sequence_, allowance);
+  for (;;) {
+    const Bytes received = Bytes(reply.buffer).first(filled_);
+    const auto state = parser.parse(received);
+    reply.log = parser.log();
+    if (state == Protocol::ReplyParser::State::malformed) return Ending::violation;
+    if (state == Protocol::ReplyParser::State::complete) {
+      reply.kind = parser.kind();
+      reply.body = parser.body(received);
+      return Ending::answered;
     }
-    std::memcpy(&header, &reply.buffer[at], sizeof header);
-    // Before the length is used for anything.
-    if (!isHonest(header, reply.log.size(), allowance)) return Ending::violation;
-    at += sizeof header;
-    if (const Ending e = await(at + header.bodyLength, deadline, reply); e != Ending::answered) {
-      return e;
-    }
-    reply.kind = header.kind;
-    reply.offset = at;
-    reply.length = header.bodyLength;
-    at += header.bodyLength;
-    if (header.kind != ReplyKind::log) {
-      // What lies behind the answer would be taken for the beginning of the next one.
-      return filled_ == at ? Ending::answered : Ending::violation;
-    }
-    const Bytes line = reply.body();
-    reply.log.emplace_back(reinterpret_cast<const char*>(line.data()), line.size());
+    const Ending more = receiveMore(parser.needed(), deadline, reply);
+    if (more != Ending::answered) return more;
   }
 }
 
 /// Until the buffer holds so many bytes. It grows when it is full of bytes that have arrived, and
 /// never because a length was announced.
-Ending DataChannel::await(std::size_t size, Deadline deadline, ReceivedReply& reply) {
-  while (filled_ < size) {
-    // One byte more than is wanted, so that bytes which are none of the answer show.
-    if (filled_ == reply.buffer.size()) reply.buffer.resize(std::min(2 * filled_, size + 1));
+Ending DataChannel::receiveMore(std::size_t needed, Deadline deadline, ReceivedReply& reply) {
+  while (filled_ < needed) {
+    // One byte more than is wanted, so that bytes behind the answer show.
+    if (filled_ == reply.buffer.size()) reply.buffer.resize(std::min(2 * filled_, needed + 1));
     if (waitFor(channel_.get(), POLLIN, deadline) == 0) return Ending::late;
     const ssize_t n = recv(channel_.get(), reply.buffer.data() + filled_,
                            reply.buffer.size() - filled_, MSG_DONTWAIT);
     if (n == 0 || (n < 0 && !wouldBlock())) return Ending::died;
     if (n > 0) filled_ += static_cast<std::size_t>(n);
     // A worker that never stops writing would never be waited for.
-    if (filled_ < size && Clock::now() >= deadline) return Ending::late;
+    if (filled_ < needed && Clock::now() >= deadline) return Ending::late;
   }
   return Ending::answered;
-}
-
-bool DataChannel::isHonest(const ReplyHeader& header, std::size_t logLines,
-                           std::uint64_t allowance) const noexcept {
-  if (header.magic != Transport::magic || header.version != Transport::protocolVersion ||
-      header.sequence != sequence_ || header.reserved != 0) {
-    return false;
-  }
-  switch (header.kind) {
-    case ReplyKind::log:
-      return logLines < Transport::maximumLogFrames &&
-             header.bodyLength <= Transport::maximumLogLength;
-    case ReplyKind::record:
-    case ReplyKind::error:
-      return header.bodyLength <= allowance;
-  }
-  return false;
 }
 
 }  // namespace Keelgate

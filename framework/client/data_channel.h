@@ -7,7 +7,7 @@
 
 #include "framework/client/deadline.h"
 #include "framework/client/descriptor.h"
-#include "framework/transport/frames.h"
+#include "framework/protocol/data_frames.h"
 
 #include <keelgate/values.h>
 
@@ -31,17 +31,14 @@ struct ClientRequest {
 
 /// The bytes of a reply, not decoded.
 struct ReceivedReply {
-  Transport::ReplyKind kind{};
-  /// All that has arrived, headers and log lines too; the body is a part of it, and no copy.
+  Protocol::ReplyKind kind{};
+  /// All that has arrived, headers and log lines too; the body is a part of it.
   Data buffer;
-  std::size_t offset = 0;
-  std::size_t length = 0;
+  Bytes body;
   /// Bytes that its record may take in memory: it had to fit into the worker's heap.
   std::size_t memory = 0;
   /// As the worker sent them: not to be shown before escapeLogLine.
   Array<String> log;
-
-  [[nodiscard]] Bytes body() const { return Bytes(buffer).subspan(offset, length); }
 };
 
 /// How an exchange ended.
@@ -88,9 +85,7 @@ class DataChannel {
   Ending send(const ClientRequest& request, Deadline deadline) const;
   Ending waitToSend(Deadline deadline) const noexcept;
   Ending receive(std::uint64_t allowance, Deadline deadline, ReceivedReply& reply);
-  Ending await(std::size_t size, Deadline deadline, ReceivedReply& reply);
-  [[nodiscard]] bool isHonest(const Transport::ReplyHeader& header, std::size_t logLines,
-                              std::uint64_t allowance) const noexcept;
+  Ending receiveMore(std::size_t needed, Deadline deadline, ReceivedReply& reply);
 
   Descriptor channel_;
   std::size_t heap_;

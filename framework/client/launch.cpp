@@ -3,7 +3,7 @@
 /// however large, and run in a copy of it whose locks nobody will release.
 #include "framework/client/launch.h"
 
-#include "framework/transport/frames.h"
+#include "framework/contracts/process.h"
 
 #include <spawn.h>
 #include <sys/socket.h>
@@ -80,12 +80,12 @@ class SpawnPlan {
   explicit SpawnPlan(int control) {
     posix_spawn_file_actions_init(&actions_);
     // Also where it is 3 already: the duplicate is the one that stays open across the execution.
-    posix_spawn_file_actions_adddup2(&actions_, control, Transport::serviceDescriptor);
-    for (int fd = 0; fd < Transport::serviceDescriptor; ++fd) {
+    posix_spawn_file_actions_adddup2(&actions_, control, serviceDescriptor);
+    for (int fd = 0; fd < serviceDescriptor; ++fd) {
       posix_spawn_file_actions_addclose(&actions_, fd);
     }
     // Whatever the application forgot to mark: an open file would be a way out of the sandbox.
-    posix_spawn_file_actions_addclosefrom_np(&actions_, Transport::serviceDescriptor + 1);
+    posix_spawn_file_actions_addclosefrom_np(&actions_, serviceDescriptor + 1);
     posix_spawnattr_init(&attributes_);
     sigset_t signals;
     sigemptyset(&signals);

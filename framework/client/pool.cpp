@@ -1,7 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "framework/client/pool.h"
 
-#include "framework/transport/layers.h"
+#include "framework/contracts/layers.h"
+#include "framework/contracts/memory_budget.h"
 #include "framework/transport/wire.h"
 
 #include <unistd.h>
@@ -86,7 +87,7 @@ Pool::Pool(const Client::Options& options, std::size_t processes)
     : owner_(getpid()),
       settings_(settingsFor(options, processes)),
       // The seal is for good, so a worker that is used again must be ready for the largest.
-      foreseen_(options.messagesPerProcess > 1 ? options.largestMessage : Transport::shortMessage),
+      foreseen_(options.messagesPerProcess > 1 ? options.largestMessage : shortMessage),
       log_(options.log),
       // Each worker's channel twice while it is forked, and the two ends of each service, of which
       // every call may hold an old one.
@@ -268,7 +269,7 @@ void Pool::start(Lock& lock, Deadline deadline) {
 }
 
 void Pool::tellLayers(const ServiceProcess& service) {
-  const String missing = Transport::missingLayersLine(service.layers());
+  const String missing = missingLayersLine(service.layers());
   if (std::exchange(layersTold_, true) || missing.empty()) return;
   try {
     logLine(log_, missing);

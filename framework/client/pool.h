@@ -50,8 +50,8 @@ class Pool {
   /// Gives the message to a worker, and the reply to `accept`. Throws HostError.
   void exchange(const ClientRequest& request, Deadline deadline, const Accept& accept);
 
-  /// What the running service said of itself: Transport::versionText takes the one, and bits of
-  /// Transport::Layer are the other.
+  /// What the running service said of itself: Protocol::versionText takes the one, and bits of
+  /// Layer are the other.
   struct Report {
     std::uint64_t version;
     std::uint64_t layers;

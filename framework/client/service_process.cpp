@@ -3,8 +3,10 @@
 /// frame that it should not have sent makes the service a lost one.
 #include "framework/client/service_process.h"
 
-#include "framework/client/control_frames.h"
-#include "framework/transport/layers.h"
+#include "framework/contracts/layers.h"
+#include "framework/contracts/memory_budget.h"
+#include "framework/contracts/start_step.h"
+#include "framework/protocol/control_frames.h"
 
 #include <poll.h>
 #include <sys/socket.h>
@@ -16,9 +18,12 @@
 
 namespace Keelgate {
 
+using Protocol::ControlFrame;
+using Protocol::ControlKind;
+using Protocol::makeControlFrame;
+using Protocol::noDescriptor;
+using Protocol::Transfer;
 using std::chrono::milliseconds;
-using Transport::ControlFrame;
-using Transport::ControlKind;
 
 namespace {
 
@@ -32,14 +37,14 @@ constexpr milliseconds lastPatience{80};
 /// One that was killed is gone when the kernel says so.
 constexpr milliseconds killedPatience{100};
 
-#ifndef KEELGATE_UNSEALED
-/// What a sealed service always reports; anything less is not the program that was meant.
-constexpr std::uint64_t firstWalls = [] {
-  std::uint64_t walls = 0;
-  for (std::size_t i = 0; i < Transport::firstWalls; ++i) walls |= Transport::namedLayers[i].layer;
-  return walls;
-}();
-#endif
+/// Sends a frame of a service that may have too little room for it, as long as the deadline allows.
+bool sendFrame(int control, const ControlFrame& frame, int descriptor, Deadline deadline) noexcept {
+  for (;;) {
+    const Transfer sent = Protocol::sendControl(control, frame, descriptor, Protocol::Waiting::no);
+    if (sent != Transfer::wouldBlock) return sent == Transfer::complete;
+    if (waitFor(control, POLLOUT, deadline) == 0) return false;
+  }
+}
 
 }  // namespace
 
@@ -61,39 +66,40 @@ ServiceProcess::~ServiceProcess() {
 }
 
 void ServiceProcess::shakeHands(const ServiceSettings& settings, Deadline deadline) {
-  ControlFrame hello = makeFrame(ControlKind::hello, 0);
   // Said once and for all workers: what bounds a worker is fixed before any message is known.
-  hello.numbers[0] = settings.messagesPerWorker;
-  hello.numbers[1] = settings.cpuSecondsPerWorker;
+  const ControlFrame hello = makeControlFrame(
+      ControlKind::hello, 0, {settings.messagesPerWorker, settings.cpuSecondsPerWorker});
   ControlFrame answer;
   const int control = handles_.control.get();
   // A service that has already refused takes no hello, and its reason is waiting to be read.
   static_cast<void>(sendFrame(control, hello, noDescriptor, deadline));
   if (waitFor(control, POLLIN, deadline) == 0) failToStart(true);
-  if (receiveFrame(control, answer) != Received::frame) failToStart(false);
+  if (Protocol::receiveControl(control, answer, Protocol::Waiting::no) != Transfer::complete) {
+    failToStart(false);
+  }
   if (answer.kind == ControlKind::refused) {
-    throw StartFailure(Transport::sentence(Transport::Obstacle{answer.numbers[0]},
-                                           static_cast<int>(answer.numbers[1])),
-                       false);
+    throw StartFailure(
+        startFailureSentence(StartStep{answer.numbers[0]}, static_cast<int>(answer.numbers[1])),
+        false);
   }
   if (answer.kind != ControlKind::ready) failToStart(false);
   layers_ = answer.numbers[0];
   version_ = answer.numbers[1];
   // Records travel as they stand in the schema of one build: another's would be misread.
-  if (version_ != Transport::ownVersion()) {
-    throw StartFailure("The service is of version " + Transport::versionText(version_) +
-                           " and its client of " + Transport::versionText(Transport::ownVersion()) +
+  if (version_ != Protocol::ownVersion()) {
+    throw StartFailure("The service is of version " + Protocol::versionText(version_) +
+                           " and its client of " + Protocol::versionText(Protocol::ownVersion()) +
                            ": install both from one build",
                        false);
   }
 #ifndef KEELGATE_UNSEALED
   // A service that was built for a sanitizer has no seal, and says so.
-  if ((layers_ & firstWalls) != firstWalls) {
+  if ((layers_ & requiredLayers) != requiredLayers) {
     throw StartFailure("The service was built without its seal: install a release build of it",
                        false);
   }
 #endif
-  const String missing = Transport::missingLayersLine(layers_);
+  const String missing = missingLayersLine(layers_);
   if (settings.requireLayers && !missing.empty()) {
     throw StartFailure(missing +
                            ", and all layers are required: run it where the kernel and the "
@@ -120,15 +126,13 @@ Optional<ServiceProcess::Forked> ServiceProcess::fork(std::uint64_t longestMessa
   const Descriptor theirs(book_, ends[1]);
   const Optional<std::uint32_t> slot = claimSlot(deadline);
   if (!slot) return std::nullopt;
-  ControlFrame frame = makeFrame(ControlKind::fork, *slot);
-  frame.numbers[0] = longestMessage;
+  const ControlFrame frame = makeControlFrame(ControlKind::fork, *slot, {longestMessage});
   // A zygote that takes no frame for so long forks for nobody else either.
   if (!sendFrame(handles_.control.get(), frame, theirs.get(), deadline)) {
     lose();
     return std::nullopt;
   }
-  return Forked{
-      .slot = *slot, .channel = std::move(ours), .heap = Transport::heapFor(longestMessage)};
+  return Forked{.slot = *slot, .channel = std::move(ours), .heap = memoryBudget(longestMessage)};
 }
 
 Optional<std::uint32_t> ServiceProcess::claimSlot(Deadline deadline) {
@@ -160,7 +164,7 @@ Optional<std::uint32_t> ServiceProcess::claimSlot(Deadline deadline) {
 void ServiceProcess::killSlot(std::uint32_t slot) noexcept {
   if (slots_[slot].phase == Slot::Phase::ended || slots_[slot].killed) return;
   // Not waited for: if the zygote does not even read, its launcher is killed before long.
-  slots_[slot].killed = sendFrame(handles_.control.get(), makeFrame(ControlKind::kill, slot),
+  slots_[slot].killed = sendFrame(handles_.control.get(), makeControlFrame(ControlKind::kill, slot),
                                   noDescriptor, Clock::now());
   slots_[slot].since = Clock::now();
 }
@@ -228,13 +232,14 @@ void ServiceProcess::readUntil(Lock& lock, Deadline deadline, Condition conditio
 
 void ServiceProcess::readAll() noexcept {
   for (ControlFrame frame; !isLost();) {
-    switch (receiveFrame(handles_.control.get(), frame)) {
-      case Received::nothing:
+    switch (Protocol::receiveControl(handles_.control.get(), frame, Protocol::Waiting::no)) {
+      case Transfer::wouldBlock:
         return;
-      case Received::frame:
+      case Transfer::complete:
         note(frame);
         break;
-      case Received::end:
+      case Transfer::ended:
+      case Transfer::malformed:
         lose();
         break;
     }

@@ -7,7 +7,7 @@
 #pragma once
 
 #include "framework/client/launch.h"
-#include "framework/transport/frames.h"
+#include "framework/protocol/frames.h"
 
 #include <keelgate/client.h>
 #include <keelgate/values.h>
@@ -86,7 +86,7 @@ class ServiceProcess {
   /// Closes the channel, waits for the end so long, and then uses SIGKILL.
   void end(std::chrono::milliseconds patience) noexcept;
 
-  /// The walls that it has, as bits of Transport::Layer.
+  /// The walls that it has, as bits of Layer.
   [[nodiscard]] std::uint64_t layers() const noexcept { return layers_; }
   /// Its version, as Transport::packVersion has it.
   [[nodiscard]] std::uint64_t version() const noexcept { return version_; }
@@ -118,8 +118,8 @@ class ServiceProcess {
   template <class Condition>
   void readUntil(Lock& lock, Deadline deadline, Condition condition);
   void readAll() noexcept;
-  void note(const Transport::ControlFrame& frame) noexcept;
-  void noteExit(Slot& slot, const Transport::ControlFrame& frame) noexcept;
+  void note(const Protocol::ControlFrame& frame) noexcept;
+  void noteExit(Slot& slot, const Protocol::ControlFrame& frame) noexcept;
   void lose() noexcept;
 
   DescriptorBook& book_;

@@ -2,7 +2,7 @@
 /// What became of a worker, as the reasons that the application is given.
 #include "framework/client/worker.h"
 
-#include "framework/transport/layers.h"
+#include "framework/contracts/start_step.h"
 
 #include <sys/wait.h>
 
@@ -23,14 +23,14 @@ constexpr milliseconds exitPatience{500};
 /// claim so is one of the host's errors, for the message that it was sent.
 HostError explain(const ServiceProcess::Exit& exit) {
   if (exit.neverStarted) {
-    return {Reason::startFailed, Transport::sentence(Transport::Obstacle::process, 0)};
+    return {Reason::startFailed, startFailureSentence(StartStep::startProcesses, 0)};
   }
   const int status = exit.status;
-  if (WIFEXITED(status) && WEXITSTATUS(status) == Transport::resourceExitStatus) {
+  if (WIFEXITED(status) && WEXITSTATUS(status) == Protocol::resourceExitStatus) {
     return {Reason::resourcesExhausted, ""};
   }
   // What it could not have is memory: the zygote had all the rest.
-  if (WIFEXITED(status) && WEXITSTATUS(status) == Transport::refusedExitStatus) {
+  if (WIFEXITED(status) && WEXITSTATUS(status) == Protocol::refusedExitStatus) {
     return {Reason::resourcesExhausted, "the machine has no memory for its worker"};
   }
   if (WIFEXITED(status)) {

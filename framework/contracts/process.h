@@ -1,8 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
-/// What a service process does before it touches its server. Called on the main thread, once.
+/// What is true of every service process, and what it does before it touches its server. The
+/// functions are called on the main thread, once.
 #pragma once
 
 namespace Keelgate {
+
+/// The number of the channel in every process of the service: the first behind the standard
+/// descriptors, which a service does not have.
+constexpr int serviceDescriptor = 3;
 
 /// Binds what the language's runtime calls back in this process: a fault that nobody catches ends
 /// the process on the spot. The runtime's own handler would first write to a standard error that a

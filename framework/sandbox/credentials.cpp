@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "framework/sandbox/credentials.h"
 
+#include "framework/contracts/start_step.h"
 #include "framework/sandbox/namespaces.h"
-#include "framework/sandbox/refusal.h"
 
 #include <grp.h>
 #include <linux/capability.h>
@@ -16,10 +16,9 @@
 
 namespace Keelgate::Sandbox {
 
-using Transport::Obstacle;
-
 void renounceNewPrivileges() {
-  if (prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) != 0) throw Refusal(Obstacle::noNewPrivileges);
+  if (prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) != 0)
+    throw StartError(StartStep::renounceNewPrivileges);
 }
 
 bool leaveGroups() {
@@ -47,17 +46,17 @@ void dropCapabilities() {
   __user_cap_header_struct header{.version = _LINUX_CAPABILITY_VERSION_3, .pid = 0};
   std::array<__user_cap_data_struct, _LINUX_CAPABILITY_U32S_3> sets{};
   syscall(SYS_capset, &header, sets.data());
-  if (syscall(SYS_capget, &header, sets.data()) != 0) throw Refusal(Obstacle::capabilities);
+  if (syscall(SYS_capget, &header, sets.data()) != 0) throw StartError(StartStep::dropCapabilities);
   for (const __user_cap_data_struct& half : sets) {
     if ((half.effective | half.permitted | half.inheritable) != 0) {
-      throw Refusal(Obstacle::capabilities, 0);
+      throw StartError(StartStep::dropCapabilities, 0);
     }
   }
 }
 
 void becomeUndumpable() {
   if (prctl(PR_SET_DUMPABLE, 0, 0, 0, 0) != 0 || prctl(PR_GET_DUMPABLE, 0, 0, 0, 0) != 0) {
-    throw Refusal(Obstacle::dumpable);
+    throw StartError(StartStep::becomeUndumpable);
   }
 }
 

@@ -8,7 +8,7 @@
 
 namespace Keelgate::Sandbox {
 
-/// Gives up what can be gained by executing a file. Throws Refusal.
+/// Gives up what can be gained by executing a file. Throws StartError.
 void renounceNewPrivileges();
 
 /// Leaves all supplementary groups, which needs privilege and is impossible in a user namespace
@@ -20,10 +20,10 @@ bool becomeNobody();
 
 /// Empties the capability sets, and closes the ways to refill them. The bounding set and the secure
 /// bits need a capability to change; a process that never had it cannot use what they allow, thanks
-/// to no_new_privs. Throws Refusal when a set that counts is not empty afterwards.
+/// to no_new_privs. Throws StartError when a set that counts is not empty afterwards.
 void dropCapabilities();
 
-/// Closes /proc/PID/mem and ptrace to others of the same user, and core dumps. Throws Refusal.
+/// Closes /proc/PID/mem and ptrace to others of the same user, and core dumps. Throws StartError.
 void becomeUndumpable();
 
 }  // namespace Keelgate::Sandbox

@@ -7,7 +7,7 @@
 namespace Keelgate::Sandbox {
 
 /// Closes every descriptor of the process but `kept`, and makes it the service's descriptor.
-/// Throws Refusal when it cannot.
+/// Throws StartError when it cannot.
 void keepOnly(int kept);
 
 }  // namespace Keelgate::Sandbox

@@ -1,7 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "framework/sandbox/filter.h"
 
-#include "framework/sandbox/refusal.h"
+#include "framework/contracts/process.h"
+#include "framework/contracts/start_step.h"
 
 #include <linux/audit.h>
 #include <linux/seccomp.h>
@@ -20,7 +21,7 @@ namespace Keelgate::Sandbox {
 
 namespace {
 
-constexpr unsigned channel = Transport::serviceDescriptor;
+constexpr unsigned channel = serviceDescriptor;
 
 constexpr Rule worker[] = {
     {SYS_read, Verdict::allowWithFirst, channel},
@@ -120,7 +121,7 @@ void enforce(std::span<const sock_filter> program) {
                           // The kernel only reads it.
                           .filter = const_cast<sock_filter*>(program.data())};
   if (syscall(SYS_seccomp, SECCOMP_SET_MODE_FILTER, 0, &handed) != 0) {
-    throw Refusal(Transport::Obstacle::filter);
+    throw StartError(StartStep::loadFilter);
   }
 #else
   static_cast<void>(program);

@@ -5,8 +5,6 @@
 /// calling convention. Everything here is single-threaded; a compiled filter may be shared.
 #pragma once
 
-#include "framework/transport/frames.h"
-
 #include <linux/filter.h>
 #include <span>
 #include <vector>
@@ -38,7 +36,7 @@ std::span<const Rule> zygoteRules() noexcept;
 std::vector<sock_filter> compile(std::span<const Rule> rules);
 
 /// Puts the calling thread under a program, in addition to those that it is under, for good;
-/// no_new_privs must be set. Throws Refusal.
+/// no_new_privs must be set. Throws StartError.
 void enforce(std::span<const sock_filter> program);
 
 }  // namespace Keelgate::Sandbox

@@ -1,7 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "framework/sandbox/heap.h"
 
-#include "framework/sandbox/refusal.h"
+#include "framework/contracts/memory_budget.h"
+#include "framework/contracts/start_step.h"
 
 #include <malloc.h>
 #include <algorithm>
@@ -15,8 +16,8 @@ bool growHeap(std::size_t bytes) noexcept {
     void* volatile area = std::malloc(bytes);
     std::free(area);
     if (area != nullptr) return true;
-    if (bytes <= Transport::heapBase) return false;
-    bytes = std::max(bytes / 2, Transport::heapBase);
+    if (bytes <= budgetBase) return false;
+    bytes = std::max(bytes / 2, budgetBase);
   }
 }
 
@@ -26,11 +27,11 @@ void prepareHeap() {
   mallopt(M_ARENA_MAX, 1);
   // -1 is "never": a freed area stays ours, so that a freed message leaves room for the next one.
   mallopt(M_TRIM_THRESHOLD, -1);
-  if (!growHeap(Transport::heapFor(0))) throw Refusal(Transport::Obstacle::heap);
+  if (!growHeap(memoryBudget(0))) throw StartError(StartStep::reserveHeap);
 #endif
   try {
-    throw Refusal(Transport::Obstacle::heap, 0);
-  } catch (const Refusal&) {
+    throw StartError(StartStep::reserveHeap, 0);
+  } catch (const StartError&) {
     return;
   }
 }

@@ -8,7 +8,7 @@ namespace Keelgate::Sandbox {
 
 /// Makes the allocator live on one growing area that never shrinks, grows it as far as a short
 /// message needs, and has the exception runtime do its one-time work, whose system call a sealed
-/// worker could not make. Throws Refusal. Single-threaded callers only.
+/// worker could not make. Throws StartError. Single-threaded callers only.
 void prepareHeap();
 
 /// Grows the free part of the heap to `bytes`, or to the half, a quarter and so on, and at the

@@ -1,7 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "framework/sandbox/limits.h"
 
-#include "framework/sandbox/refusal.h"
+#include "framework/contracts/process.h"
+#include "framework/contracts/start_step.h"
 
 #include <algorithm>
 
@@ -13,10 +14,10 @@ void limit(__rlimit_resource resource, rlim_t soft, rlim_t hard) {
 #ifndef KEELGATE_UNSEALED
   // Never up: the one who started the service may have set a lower one.
   rlimit now{};
-  if (getrlimit(resource, &now) != 0) throw Refusal(Transport::Obstacle::limits);
+  if (getrlimit(resource, &now) != 0) throw StartError(StartStep::lowerLimits);
   const rlimit lowered{.rlim_cur = std::min(soft, now.rlim_max),
                        .rlim_max = std::min(hard, now.rlim_max)};
-  if (setrlimit(resource, &lowered) != 0) throw Refusal(Transport::Obstacle::limits);
+  if (setrlimit(resource, &lowered) != 0) throw StartError(StartStep::lowerLimits);
 #else
   static_cast<void>(resource), static_cast<void>(soft), static_cast<void>(hard);
 #endif
@@ -34,7 +35,7 @@ void limitZygote() {
   // With less an honest message would die of its depth, as if it were an attack.
   rlimit stack{};
   if (getrlimit(RLIMIT_STACK, &stack) != 0 || stack.rlim_cur < stackLimit) {
-    throw Refusal(Transport::Obstacle::stack, 0);
+    throw StartError(StartStep::checkStack, 0);
   }
 #endif
   limit(RLIMIT_NOFILE, zygoteDescriptors, zygoteDescriptors);
@@ -42,7 +43,7 @@ void limitZygote() {
 
 void limitWorker(std::uint64_t cpuSeconds) {
   limit(RLIMIT_NPROC, 0, 0);
-  limit(RLIMIT_NOFILE, Transport::serviceDescriptor + 1, Transport::serviceDescriptor + 1);
+  limit(RLIMIT_NOFILE, serviceDescriptor + 1, serviceDescriptor + 1);
   // The kernel takes 0 for 1. The second more lets the readable signal come first.
   limit(RLIMIT_CPU, cpuSeconds, cpuSeconds + 1);
 }

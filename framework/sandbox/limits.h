@@ -17,12 +17,12 @@ constexpr rlim_t stackLimit = rlim_t{8} << 20;
 constexpr rlim_t zygoteDescriptors = 16;
 
 /// For the zygote and all that it forks: no core, no file, no locked memory, no message queue; a
-/// bounded stack. Throws Refusal.
+/// bounded stack. Throws StartError.
 void limitZygote();
 
 /// For a worker: no further process, no further descriptor, and `cpuSeconds` of processor time, at
 /// the end of which it gets SIGXCPU. Behind the client's deadline, for a client that was stopped.
-/// Throws Refusal.
+/// Throws StartError.
 void limitWorker(std::uint64_t cpuSeconds);
 
 }  // namespace Keelgate::Sandbox

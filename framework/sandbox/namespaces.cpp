@@ -1,7 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "framework/sandbox/namespaces.h"
 
-#include "framework/sandbox/refusal.h"
+#include "framework/contracts/layers.h"
+#include "framework/contracts/start_step.h"
 #include "framework/sandbox/spawn.h"
 
 #include <fcntl.h>
@@ -18,14 +19,14 @@ namespace {
 
 struct NamespaceRow {
   int flag;
-  Transport::Layer layer;
+  Layer layer;
 };
 constexpr std::array namespaceRows{
-    NamespaceRow{CLONE_NEWNS, Transport::layerMountNamespace},
-    NamespaceRow{CLONE_NEWNET, Transport::layerNetworkNamespace},
-    NamespaceRow{CLONE_NEWIPC, Transport::layerIpcNamespace},
-    NamespaceRow{CLONE_NEWUTS, Transport::layerUtsNamespace},
-    NamespaceRow{CLONE_NEWCGROUP, Transport::layerCgroupNamespace},
+    NamespaceRow{CLONE_NEWNS, layerMountNamespace},
+    NamespaceRow{CLONE_NEWNET, layerNetworkNamespace},
+    NamespaceRow{CLONE_NEWIPC, layerIpcNamespace},
+    NamespaceRow{CLONE_NEWUTS, layerUtsNamespace},
+    NamespaceRow{CLONE_NEWCGROUP, layerCgroupNamespace},
 };
 
 bool writeTo(const std::string& path, const std::string& text) {
@@ -62,7 +63,7 @@ Birth forkIntoNamespaces(bool userNamespace) {
             .newUserNamespace = (flags & CLONE_NEWUSER) != 0,
             .newPidNamespace = (flags & CLONE_NEWPID) != 0};
   }
-  throw Refusal(Transport::Obstacle::process);
+  throw StartError(StartStep::startProcesses);
 }
 
 std::uint32_t mapIdentifiers(pid_t child) {
@@ -76,7 +77,7 @@ std::uint32_t mapIdentifiers(pid_t child) {
   const long user = mapOne(process + "/uid_map", geteuid());
   if (group < 0 || user < 0) return 0;
   const bool root = group == 0 || user == 0;
-  return Transport::layerUserNamespace | (root ? 0U : Transport::layerNotRoot);
+  return layerUserNamespace | (root ? 0U : layerNotRoot);
 }
 
 std::uint32_t unshareNamespaces() {

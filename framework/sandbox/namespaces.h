@@ -24,8 +24,8 @@ struct Birth {
 };
 
 /// Forks a child into a new user and a new process namespace, or into as many of the two as the
-/// machine gives; without `userNamespace` none of that kind. Throws Refusal when not even a plain
-/// fork succeeds. Single-threaded callers only.
+/// machine gives; without `userNamespace` none of that kind. Throws StartError when not even a
+/// plain fork succeeds. Single-threaded callers only.
 Birth forkIntoNamespaces(bool userNamespace);
 
 /// Maps `nobody` of the child's user namespace to an unprivileged user outside: where the caller is

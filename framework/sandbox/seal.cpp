@@ -1,6 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "framework/sandbox/seal.h"
 
+#include "framework/contracts/layers.h"
+#include "framework/contracts/memory_budget.h"
+#include "framework/contracts/process.h"
 #include "framework/sandbox/credentials.h"
 #include "framework/sandbox/descriptors.h"
 #include "framework/sandbox/empty_root.h"
@@ -10,7 +13,6 @@
 #include "framework/sandbox/limits.h"
 #include "framework/sandbox/namespaces.h"
 #include "framework/sandbox/pages.h"
-#include "framework/sandbox/refusal.h"
 #include "framework/sandbox/self_check.h"
 #include "framework/sandbox/spawn.h"
 
@@ -34,8 +36,6 @@ void sealWorker(const WorkerSeal& seal) {
 }
 
 #else
-
-using namespace Transport;
 
 namespace {
 
@@ -95,7 +95,7 @@ void sealWorker(const WorkerSeal& seal) {
   if (getppid() != seal.parent) _exit(0);
   limitWorker(seal.cpuSeconds);
   // Where there is no more to be had, the zygote's is enough for most messages.
-  if (seal.longestMessage > shortMessage) growHeap(heapFor(seal.longestMessage));
+  if (seal.longestMessage > shortMessage) growHeap(memoryBudget(seal.longestMessage));
   if (!isAwaited()) touchPages();
   enforce(seal.filter);
 }

@@ -5,7 +5,7 @@
 /// credentials. What must differ from worker to worker is done by each: its descriptor, its limits,
 /// its heap, its filter. A build for a sanitizer has no seal and reports no layers.
 ///
-/// Both are for single-threaded processes and throw Refusal.
+/// Both are for single-threaded processes and throw StartError.
 #pragma once
 
 #include <linux/filter.h>
@@ -17,7 +17,7 @@ namespace Keelgate::Sandbox {
 
 /// What sealZygote achieved, and what it prepared for the workers.
 struct ZygoteSeal {
-  /// Transport::Layer.
+  /// Layer.
   std::uint32_t layers;
   std::vector<sock_filter> workerFilter;
 };

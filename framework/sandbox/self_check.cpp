@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "framework/sandbox/self_check.h"
 
+#include "framework/contracts/start_step.h"
 #include "framework/sandbox/filter.h"
-#include "framework/sandbox/refusal.h"
 #include "framework/sandbox/spawn.h"
 
 #include <sys/wait.h>
@@ -17,7 +17,7 @@ namespace {
   try {
     enforce(workerFilter);
     getppid();
-  } catch (const Refusal&) {
+  } catch (const StartError&) {
     _exit(1);
   }
   _exit(0);
@@ -27,13 +27,13 @@ namespace {
 
 void proveFilter(std::span<const sock_filter> workerFilter) {
   const pid_t child = forkSelf(0);
-  if (child < 0) throw Refusal(Transport::Obstacle::process);
+  if (child < 0) throw StartError(StartStep::startProcesses);
   if (child == 0) makeForbiddenCall(workerFilter);
   int status = 0;
-  if (wait4(child, &status, 0, nullptr) != child) throw Refusal(Transport::Obstacle::process);
-  if (WIFEXITED(status) && WEXITSTATUS(status) == 1) throw Refusal(Transport::Obstacle::filter, 0);
+  if (wait4(child, &status, 0, nullptr) != child) throw StartError(StartStep::startProcesses);
+  if (WIFEXITED(status) && WEXITSTATUS(status) == 1) throw StartError(StartStep::loadFilter, 0);
   if (!WIFSIGNALED(status) || WTERMSIG(status) != SIGSYS) {
-    throw Refusal(Transport::Obstacle::selfCheck, 0);
+    throw StartError(StartStep::proveFilter, 0);
   }
 }
 

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "framework/sandbox/spawn.h"
 
-#include "framework/sandbox/refusal.h"
+#include "framework/contracts/start_step.h"
 
 #include <sys/prctl.h>
 #include <sys/syscall.h>
@@ -21,7 +21,7 @@ pid_t forkSelf(unsigned namespaces) {
 }
 
 void dieWithParent() {
-  if (prctl(PR_SET_PDEATHSIG, SIGKILL, 0, 0, 0) != 0) throw Refusal(Transport::Obstacle::watch);
+  if (prctl(PR_SET_PDEATHSIG, SIGKILL, 0, 0, 0) != 0) throw StartError(StartStep::watchProcesses);
 }
 
 }  // namespace Keelgate::Sandbox

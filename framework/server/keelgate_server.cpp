@@ -7,7 +7,7 @@
 
 namespace Keelgate {
 
-using Transport::ReplyKind;
+using Protocol::ReplyKind;
 using VespKeelgateService::VespClientMessageUnpackingError;
 
 KeelgateServer& KeelgateServer::service() {

@@ -6,7 +6,7 @@
 #pragma once
 
 #include "framework/contracts/unpacker.h"
-#include "framework/transport/frames.h"
+#include "framework/protocol/frames.h"
 #include "framework/transport/record_coding.h"
 
 #include <array>
@@ -30,7 +30,7 @@ struct Request {
 /// The one answer to a request: the body of a record frame or of an error frame, and what was
 /// logged on the way.
 struct Reply {
-  Transport::ReplyKind kind;
+  Protocol::ReplyKind kind;
   Data body;
   Array<String> log;
 };

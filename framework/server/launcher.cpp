@@ -2,12 +2,14 @@
 /// Where the program hands over for good. The launcher makes the zygote and outlives it by nothing:
 /// it exists because somebody outside has to write the maps of a user namespace, and because the
 /// client needs a child of its own to watch and to kill.
+#include "framework/contracts/layers.h"
+#include "framework/contracts/process.h"
+#include "framework/contracts/start_step.h"
+#include "framework/protocol/control_frames.h"
 #include "framework/sandbox/credentials.h"
 #include "framework/sandbox/descriptors.h"
 #include "framework/sandbox/namespaces.h"
-#include "framework/sandbox/refusal.h"
 #include "framework/sandbox/spawn.h"
-#include "framework/server/channel.h"
 #include "framework/server/zygote.h"
 
 #include <sys/prctl.h>
@@ -20,9 +22,6 @@
 namespace Keelgate {
 
 namespace {
-
-using Sandbox::Refusal;
-using Transport::Obstacle;
 
 /// The one who starts us may ignore or block signals, and both are inherited: with SIGCHLD ignored
 /// no child could be waited for.
@@ -38,20 +37,25 @@ void resetSignals() {
 bool startedByClient() {
   int type = 0;
   socklen_t size = sizeof type;
-  return getsockopt(Transport::serviceDescriptor, SOL_SOCKET, SO_TYPE, &type, &size) == 0 &&
+  return getsockopt(serviceDescriptor, SOL_SOCKET, SO_TYPE, &type, &size) == 0 &&
          type == SOCK_SEQPACKET;
 }
 
 /// The client shows the reason as a sentence with what to do about it, so it must arrive.
-[[noreturn]] void refuse(const Refusal& why) {
-  endControl({.magic = {},
-              .version = {},
-              .kind = Transport::ControlKind::refused,
-              .slot = 0,
-              .reserved = 0,
-              .numbers = {static_cast<std::uint64_t>(why.obstacle()),
-                          static_cast<std::uint64_t>(why.error()), 0, 0}});
-  _exit(Transport::refusedExitStatus);
+[[noreturn]] void refuse(const StartError& why) {
+  const auto last = Protocol::makeControlFrame(
+      Protocol::ControlKind::refused, 0,
+      {static_cast<std::uint64_t>(why.step), static_cast<std::uint64_t>(why.error)});
+  static_cast<void>(Protocol::sendControl(serviceDescriptor, last, Protocol::noDescriptor,
+                                          Protocol::Waiting::yes));
+  // Whoever closes a channel with unread packets in it resets it, and the client would see the
+  // reset in place of the last frame. So none may come any more, and those that came are read.
+  shutdown(serviceDescriptor, SHUT_RD);
+  msghdr discarded{};
+  while (recvmsg(serviceDescriptor, &discarded, 0) > 0 || (discarded.msg_flags & MSG_TRUNC) != 0) {
+    discarded = {};
+  }
+  _exit(Protocol::refusedExitStatus);
 }
 
 /// A pipe of which the launcher holds the one end as long as it lives, and the zygote the other.
@@ -62,7 +66,7 @@ struct Tether {
 
 Tether makeTether() {
   int ends[2];
-  if (pipe(ends) != 0) throw Refusal(Obstacle::watch);
+  if (pipe(ends) != 0) throw StartError(StartStep::watchProcesses);
   return {.zygoteEnd = ends[0], .launcherEnd = ends[1]};
 }
 
@@ -86,7 +90,7 @@ sigset_t awaitedSignals() {
   Zygote(server, tether.zygoteEnd, layers).serve();
   // Its workers go with it.
   _exit(0);
-} catch (const Refusal& why) {
+} catch (const StartError& why) {
   refuse(why);
 }
 
@@ -94,9 +98,9 @@ sigset_t awaitedSignals() {
 std::uint32_t giveLayers(const Sandbox::Birth& birth, bool groupsLeft) {
   std::uint32_t layers = birth.newUserNamespace ? Sandbox::mapIdentifiers(birth.child) : 0;
   const bool root = geteuid() == 0 || getegid() == 0;
-  if ((layers & Transport::layerUserNamespace) == 0 && !root) layers |= Transport::layerNotRoot;
-  if (birth.newPidNamespace) layers |= Transport::layerPidNamespace;
-  if (groupsLeft) layers |= Transport::layerNoSupplementaryGroups;
+  if ((layers & layerUserNamespace) == 0 && !root) layers |= layerNotRoot;
+  if (birth.newPidNamespace) layers |= layerPidNamespace;
+  if (groupsLeft) layers |= layerNoSupplementaryGroups;
   return layers;
 }
 
@@ -139,19 +143,19 @@ Start startZygote(const KeelgateServer& server, const Tether& tether, bool group
     const Sandbox::Birth birth = Sandbox::forkIntoNamespaces(userNamespace);
     if (birth.child == 0) beZygote(server, tether);
     const std::uint32_t layers = giveLayers(birth, groupsLeft);
-    const bool unmapped = birth.newUserNamespace && (layers & Transport::layerUserNamespace) == 0;
+    const bool unmapped = birth.newUserNamespace && (layers & layerUserNamespace) == 0;
     // In a namespace without maps root can become nobody else: it is better off without.
     if (!unmapped || geteuid() != 0) return {.zygote = birth.child, .layers = layers};
     kill(birth.child, SIGKILL);
     waitpid(birth.child, nullptr, 0);
   }
-  throw Refusal(Obstacle::process, 0);
+  throw StartError(StartStep::startProcesses, 0);
 }
 
 [[noreturn]] void launch(const KeelgateServer& server) try {
   resetSignals();
   // Before anything is made: what the one who starts us left open must not reach a worker.
-  Sandbox::keepOnly(Transport::serviceDescriptor);
+  Sandbox::keepOnly(serviceDescriptor);
   const bool groupsLeft = Sandbox::leaveGroups();
   const sigset_t awaited = awaitedSignals();
   sigprocmask(SIG_BLOCK, &awaited, nullptr);
@@ -161,14 +165,14 @@ Start startZygote(const KeelgateServer& server, const Tether& tether, bool group
   const Start start = startZygote(server, tether, groupsLeft);
   close(tether.zygoteEnd);
   // The zygote's alone from now on, so that its end is the channel's end.
-  close(Transport::serviceDescriptor);
+  close(serviceDescriptor);
   // One that has already refused does not listen, and its own status says why.
   std::signal(SIGPIPE, SIG_IGN);
   if (write(tether.launcherEnd, &start.layers, sizeof start.layers) < 0 && errno != EPIPE) {
-    _exit(Transport::refusedExitStatus);
+    _exit(Protocol::refusedExitStatus);
   }
   outlive(start.zygote);
-} catch (const Refusal& why) {
+} catch (const StartError& why) {
   refuse(why);
 }
 
@@ -181,7 +185,7 @@ void KeelgateServer::resume(Optional<SandboxID> sandboxID) {
         "VespKeelgateService is started by its client, with a channel as descriptor 3; "
         "run keelgate instead.\n",
         stderr);
-    _exit(Transport::refusedExitStatus);
+    _exit(Protocol::refusedExitStatus);
   }
   launch(*this);
 }

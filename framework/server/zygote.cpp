@@ -2,11 +2,11 @@
 /// One loop over three descriptors: the client's frames, the workers' deaths, the launcher's.
 #include "framework/server/zygote.h"
 
-#include "framework/sandbox/refusal.h"
+#include "framework/contracts/process.h"
+#include "framework/contracts/start_step.h"
+#include "framework/protocol/control_frames.h"
 #include "framework/sandbox/seal.h"
 #include "framework/sandbox/spawn.h"
-#include "framework/server/channel.h"
-#include "framework/transport/layers.h"
 
 #include <poll.h>
 #include <sys/resource.h>
@@ -18,10 +18,8 @@
 
 namespace Keelgate {
 
-using Sandbox::Refusal;
-using Transport::ControlFrame;
-using Transport::ControlKind;
-using Transport::Obstacle;
+using Protocol::ControlFrame;
+using Protocol::ControlKind;
 
 namespace {
 
@@ -30,9 +28,9 @@ int openDeathSignals() {
   sigset_t deaths;
   sigemptyset(&deaths);
   sigaddset(&deaths, SIGCHLD);
-  if (sigprocmask(SIG_BLOCK, &deaths, nullptr) != 0) throw Refusal(Obstacle::watch);
+  if (sigprocmask(SIG_BLOCK, &deaths, nullptr) != 0) throw StartError(StartStep::watchProcesses);
   const int signals = signalfd(-1, &deaths, SFD_CLOEXEC);
-  if (signals < 0) throw Refusal(Obstacle::watch);
+  if (signals < 0) throw StartError(StartStep::watchProcesses);
   return signals;
 }
 
@@ -41,15 +39,17 @@ ControlFrame exitFrame(std::uint32_t slot, int status, const rusage& used) {
     return static_cast<std::uint64_t>(time.tv_sec) * 1'000'000 +
            static_cast<std::uint64_t>(time.tv_usec);
   };
-  return {.magic = {},
-          .version = {},
-          .kind = ControlKind::exit,
-          .slot = slot,
-          .reserved = 0,
-          .numbers = {static_cast<std::uint64_t>(status),
-                      // The kernel counts in KiB.
-                      static_cast<std::uint64_t>(used.ru_maxrss) * 1024,
-                      microseconds(used.ru_utime) + microseconds(used.ru_stime), 0}};
+  // The kernel counts in KiB.
+  const auto peakBytes = static_cast<std::uint64_t>(used.ru_maxrss) * 1024;
+  return Protocol::makeControlFrame(ControlKind::exit, slot,
+                                    {static_cast<std::uint64_t>(status), peakBytes,
+                                     microseconds(used.ru_utime) + microseconds(used.ru_stime), 0});
+}
+
+/// A client that has gone is not an error here: the next receive tells.
+void send(const ControlFrame& frame) {
+  static_cast<void>(Protocol::sendControl(serviceDescriptor, frame, Protocol::noDescriptor,
+                                          Protocol::Waiting::yes));
 }
 
 }  // namespace
@@ -62,7 +62,7 @@ void Zygote::serve() {
   Sandbox::ZygoteSeal seal = Sandbox::sealZygote(given_);
   options_.filter = std::move(seal.workerFilter);
   greet(seal.layers);
-  pollfd channels[]{{.fd = Transport::serviceDescriptor, .events = POLLIN, .revents = 0},
+  pollfd channels[]{{.fd = serviceDescriptor, .events = POLLIN, .revents = 0},
                     {.fd = deaths, .events = POLLIN, .revents = 0},
                     {.fd = tether_, .events = 0, .revents = 0}};
   for (;;) {
@@ -78,21 +78,32 @@ void Zygote::serve() {
 }
 
 void Zygote::greet(std::uint32_t layers) {
-  const Optional<ReceivedControl> hello = receiveControl();
+  const Optional<Received> hello = receive();
   if (!hello) _exit(0);
-  if (hello->frame.kind != ControlKind::hello) throw Refusal(Obstacle::badFrame, 0);
+  if (hello->frame.kind != ControlKind::hello) throw StartError(StartStep::readFrame, 0);
   options_.messages = hello->frame.numbers[0];
   options_.cpuSeconds = hello->frame.numbers[1];
-  sendControl({.magic = {},
-               .version = {},
-               .kind = ControlKind::ready,
-               .slot = 0,
-               .reserved = 0,
-               .numbers = {layers, Transport::ownVersion(), 0, 0}});
+  send(Protocol::makeControlFrame(ControlKind::ready, 0, {layers, Protocol::ownVersion()}));
+}
+
+Optional<Zygote::Received> Zygote::receive() {
+  Received received{};
+  switch (Protocol::receiveControl(serviceDescriptor, received.frame, received.descriptor,
+                                   Protocol::Waiting::yes)) {
+    case Protocol::Transfer::complete:
+      return received;
+    case Protocol::Transfer::malformed:
+      // The client is trusted, and still fatal: every worker inherits the state of this process.
+      throw StartError(StartStep::readFrame, 0);
+    case Protocol::Transfer::wouldBlock:
+    case Protocol::Transfer::ended:
+      break;
+  }
+  return std::nullopt;
 }
 
 bool Zygote::takeFrame() {
-  const Optional<ReceivedControl> received = receiveControl();
+  const Optional<Received> received = receive();
   if (!received) return false;
   switch (received->frame.kind) {
     case ControlKind::fork:
@@ -103,7 +114,7 @@ bool Zygote::takeFrame() {
       kill(received->frame.slot);
       return true;
     default:
-      throw Refusal(Obstacle::badFrame, 0);
+      throw StartError(StartStep::readFrame, 0);
   }
 }
 
@@ -111,7 +122,7 @@ void Zygote::fork(std::uint32_t slot, int channel) {
   const bool taken = std::any_of(children_.begin(), children_.end(),
                                  [slot](const Child& child) { return child.slot == slot; });
   // Two workers on one slot: an exit could be told of the wrong one.
-  if (taken) throw Refusal(Obstacle::badFrame, 0);
+  if (taken) throw StartError(StartStep::readFrame, 0);
   const pid_t process = Sandbox::forkSelf(0);
   // What was forked never comes back here.
   if (process == 0) work(server_, options_, channel);
@@ -122,7 +133,7 @@ void Zygote::fork(std::uint32_t slot, int channel) {
     // Every fork gets its exit, also one that came to nothing: nobody waits for a worker in vain.
     ControlFrame none = exitFrame(slot, 0, rusage{});
     none.numbers[3] = 1;
-    sendControl(none);
+    send(none);
   }
 }
 
@@ -131,12 +142,7 @@ void Zygote::kill(std::uint32_t slot) const {
     if (child.slot != slot) continue;
     // Not reaped yet, so the number is still this child's.
     ::kill(child.process, SIGKILL);
-    sendControl({.magic = {},
-                 .version = {},
-                 .kind = ControlKind::killed,
-                 .slot = slot,
-                 .reserved = 0,
-                 .numbers = {}});
+    send(Protocol::makeControlFrame(ControlKind::killed, slot));
   }
 }
 
@@ -150,7 +156,7 @@ void Zygote::reap() {
                                     [process](const Child& c) { return c.process == process; });
     // The first process of a namespace inherits its orphans; nobody asked for those.
     if (child == children_.end()) continue;
-    sendControl(exitFrame(child->slot, status, used));
+    send(exitFrame(child->slot, status, used));
     children_.erase(child);
   }
 }

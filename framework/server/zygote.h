@@ -3,6 +3,7 @@
 /// message itself, so that it stays worth forking.
 #pragma once
 
+#include "framework/protocol/frames.h"
 #include "framework/server/keelgate_server.h"
 #include "framework/server/worker.h"
 
@@ -16,13 +17,13 @@ namespace Keelgate {
 /// held locked would stay locked in every worker.
 class Zygote {
  public:
-  /// `tether` hangs up when the launcher dies. `given` are the layers (Transport::Layer) that the
+  /// `tether` hangs up when the launcher dies. `given` are the layers (Layer) that the
   /// launcher gave this process.
   Zygote(const KeelgateServer& server, int tether, std::uint32_t given)
       : server_(server), tether_(tether), given_(given) {}
 
   /// Seals this process, says that it is ready, and serves until the client or the launcher goes.
-  /// Throws Sandbox::Refusal when the seal is incomplete or the client breaks the protocol. Only
+  /// Throws StartError when the seal is incomplete or the client breaks the protocol. Only
   /// for a process with one thread.
   void serve();
 
@@ -33,7 +34,15 @@ class Zygote {
     pid_t process;
   };
 
+  struct Received {
+    Protocol::ControlFrame frame;
+    /// Ours to close, or Protocol::noDescriptor.
+    int descriptor;
+  };
+
   void greet(std::uint32_t layers);
+  /// The next frame, or nothing when the client has gone.
+  static Optional<Received> receive();
   /// False when the client has gone.
   bool takeFrame();
   void fork(std::uint32_t slot, int channel);

@@ -9,7 +9,7 @@
 #pragma once
 
 #include "framework/contracts/construct.h"
-#include "framework/transport/frames.h"
+#include "framework/contracts/memory_budget.h"
 #include "framework/transport/wire.h"
 
 #include <keelgate/describe.h>
@@ -155,7 +155,7 @@ Data encodeRecord(const T& record) {
 /// For the client. What it gives is a record that an honest service might have sent: whether this
 /// one did is not to be known.
 template <Record T>
-T decodeRecord(Bytes body, std::size_t memory = heapFor(0)) {
+T decodeRecord(Bytes body, std::size_t memory = memoryBudget(0)) {
   Reader from(body, memory);
   T record{};
   read(from, record, 0);

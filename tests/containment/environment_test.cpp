@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 /// C11: the service under machines and profiles that lack something, each imitated by a filter that
 /// refuses a call, or by taking a right away, before the service is executed.
-#include "framework/transport/layers.h"
+#include "framework/contracts/layers.h"
 #include "tests/containment/raw_client.h"
 
 #include <grp.h>
@@ -24,8 +24,6 @@
 
 namespace Keelgate::Test {
 namespace {
-
-using namespace Transport;
 
 /// `call` fails with `error` when its first argument has one of the bits, or always.
 struct Refused {

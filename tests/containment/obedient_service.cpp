@@ -74,7 +74,7 @@ void say(const std::string& hex, bool slowly) {
   for (std::size_t at = 0; at + 1 < hex.size(); at += 2) {
     unsigned char byte = 0;
     std::from_chars(hex.data() + at, hex.data() + at + 2, byte, 16);
-    if (write(Transport::serviceDescriptor, &byte, 1) != 1) return;
+    if (write(serviceDescriptor, &byte, 1) != 1) return;
     if (slowly) passSecond();
   }
 }

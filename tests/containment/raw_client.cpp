@@ -1,8 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "tests/containment/raw_client.h"
 
-#include "framework/client/control_frames.h"
-#include "framework/transport/layers.h"
+#include "framework/contracts/process.h"
+#include "framework/contracts/start_step.h"
+#include "framework/protocol/control_frames.h"
+#include "framework/protocol/data_frames.h"
 #include "framework/transport/record_coding.h"
 
 #include <fcntl.h>
@@ -19,6 +21,7 @@
 
 namespace Keelgate::Test {
 
+using namespace Protocol;
 using namespace Transport;
 
 namespace {
@@ -37,10 +40,6 @@ std::array<int, 2> makePair(int type) {
     throw std::runtime_error("socketpair");
   }
   return ends;
-}
-
-bool receiveAll(int channel, void* to, std::size_t size) {
-  return size == 0 || recv(channel, to, size, MSG_WAITALL) == static_cast<ssize_t>(size);
 }
 
 }  // namespace
@@ -91,7 +90,8 @@ int RawClient::waitForLauncher() {
 
 std::string RawClient::refusal() const {
   if (first_.kind != ControlKind::refused) return "";
-  return sentence(static_cast<Obstacle>(first_.numbers[0]), static_cast<int>(first_.numbers[1]));
+  return startFailureSentence(static_cast<StartStep>(first_.numbers[0]),
+                              static_cast<int>(first_.numbers[1]));
 }
 
 pid_t RawClient::zygote() const {
@@ -103,15 +103,15 @@ std::vector<pid_t> RawClient::workers() const {
 
 void RawClient::sendFrame(ControlKind kind, std::uint32_t slot, std::vector<std::uint64_t> numbers,
                           int descriptor, std::uint32_t magic) {
-  ControlFrame frame = makeFrame(kind, slot);
+  ControlFrame frame = makeControlFrame(kind, slot);
   frame.magic = magic;
-  std::copy(numbers.begin(), numbers.end(), std::begin(frame.numbers));
-  Keelgate::sendFrame(control_, frame, descriptor, deadlineAfter(std::chrono::seconds(1)));
+  std::copy(numbers.begin(), numbers.end(), frame.numbers.begin());
+  static_cast<void>(sendControl(control_, frame, descriptor, Waiting::yes));
 }
 
 ControlFrame RawClient::receiveFrame() {
   ControlFrame frame{};
-  if (recv(control_, &frame, sizeof frame, 0) != sizeof frame) return {};
+  static_cast<void>(receiveControl(control_, frame, Waiting::yes));
   return frame;
 }
 
@@ -162,31 +162,22 @@ void sendOrder(int channel, std::string_view order, std::uint32_t sequence) {
 
 void sendMessage(int channel, std::size_t record, std::string_view message,
                  std::uint32_t sequence) {
-  const RequestHeader header{.magic = magic,
-                             .version = protocolVersion,
-                             .record = static_cast<std::uint16_t>(record),
-                             .sequence = sequence,
-                             .serviceLength = 0,
-                             .bodyLength = message.size(),
-                             .command = 0};
+  const RequestHeader header =
+      makeRequestHeader(static_cast<std::uint16_t>(record), 0, 0, message.size(), sequence);
   send(channel, &header, sizeof header, MSG_NOSIGNAL);
   send(channel, message.data(), message.size(), MSG_NOSIGNAL);
 }
 
-RawReply receiveReply(int channel) {
-  RawReply reply{};
-  ReplyHeader header{};
-  while (!reply.kind && receiveAll(channel, &header, sizeof header)) {
-    Data body(header.bodyLength);
-    if (!receiveAll(channel, body.data(), body.size())) break;
-    if (header.kind == ReplyKind::log) {
-      reply.log.emplace_back(reinterpret_cast<const char*>(body.data()), body.size());
-    } else {
-      reply.kind = header.kind;
-      reply.body = std::move(body);
-    }
+RawReply receiveReply(int channel, std::uint32_t sequence) {
+  ReplyParser parser(sequence, ~std::uint64_t{0});
+  Data received;
+  for (std::size_t filled = 0; parser.parse(received) == ReplyParser::State::incomplete;) {
+    received.resize(parser.needed());
+    if (!readAll(channel, std::span(received).subspan(filled))) return {parser.log(), {}, {}};
+    filled = received.size();
   }
-  return reply;
+  const Bytes body = parser.body(received);
+  return {parser.log(), parser.kind(), Data(body.begin(), body.end())};
 }
 
 Optional<Int64> resultOf(const RawReply& reply) {

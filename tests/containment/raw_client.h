@@ -4,7 +4,8 @@
 /// For one thread.
 #pragma once
 
-#include "framework/transport/frames.h"
+#include "framework/contracts/memory_budget.h"
+#include "framework/protocol/frames.h"
 
 #include <keelgate/values.h>
 #include <sys/types.h>
@@ -33,7 +34,7 @@ struct WorkerEnd {
 /// The frames of a reply, up to the end of the channel.
 struct RawReply {
   std::vector<std::string> log;
-  Optional<Transport::ReplyKind> kind;
+  Optional<Protocol::ReplyKind> kind;
   Data body;
 };
 
@@ -52,7 +53,7 @@ class RawClient {
   RawClient(const RawClient&) = delete;
   RawClient& operator=(const RawClient&) = delete;
 
-  [[nodiscard]] bool ready() const { return first_.kind == Transport::ControlKind::ready; }
+  [[nodiscard]] bool ready() const { return first_.kind == Protocol::ControlKind::ready; }
   [[nodiscard]] std::uint64_t layers() const { return first_.numbers[0]; }
   [[nodiscard]] std::string refusal() const;
   [[nodiscard]] pid_t launcher() const { return launcher_; }
@@ -66,15 +67,14 @@ class RawClient {
   int waitForLauncher();
 
   /// Sends any control frame, with or without a descriptor, which stays the caller's.
-  void sendFrame(Transport::ControlKind kind, std::uint32_t slot,
-                 std::vector<std::uint64_t> numbers, int descriptor = -1,
-                 std::uint32_t magic = Transport::magic);
+  void sendFrame(Protocol::ControlKind kind, std::uint32_t slot, std::vector<std::uint64_t> numbers,
+                 int descriptor = -1, std::uint32_t magic = Protocol::magic);
   /// The next control frame; a frame of zeros when the service has gone.
-  Transport::ControlFrame receiveFrame();
+  Protocol::ControlFrame receiveFrame();
 
   /// Asks for a worker for messages of so many bytes; returns the channel to it, which is the
   /// caller's to close.
-  int fork(std::uint32_t slot, std::uint64_t longestMessage = Transport::shortMessage);
+  int fork(std::uint32_t slot, std::uint64_t longestMessage = shortMessage);
   void kill(std::uint32_t slot);
   /// Waits for the end of a slot's worker.
   WorkerEnd end(std::uint32_t slot);
@@ -84,7 +84,7 @@ class RawClient {
  private:
   pid_t launcher_ = -1;
   int control_ = -1;
-  Transport::ControlFrame first_{};
+  Protocol::ControlFrame first_{};
   std::set<std::uint32_t> killed_;
   std::map<std::uint32_t, WorkerEnd> ended_;
 };
@@ -97,8 +97,8 @@ void sendMessage(int channel, std::size_t record, std::string_view message,
                  std::uint32_t sequence = 0);
 /// Sends an order as a request for the record that the obedient service answers.
 void sendOrder(int channel, std::string_view order, std::uint32_t sequence = 0);
-/// Reads frames until an answer or the end of the channel.
-RawReply receiveReply(int channel);
+/// Reads frames until an answer or the end of the channel; of a malformed reply nothing is left.
+RawReply receiveReply(int channel, std::uint32_t sequence = 0);
 /// The messageId of the answer, which is what a call gave back.
 Optional<Int64> resultOf(const RawReply& reply);
 

@@ -1,6 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 /// What one worker can do to the others, to the machine and to the protocol.
-#include "framework/transport/layers.h"
+#include "framework/contracts/layers.h"
+#include "framework/contracts/memory_budget.h"
+#include "framework/contracts/start_step.h"
+#include "framework/protocol/data_frames.h"
 #include "tests/containment/raw_client.h"
 
 #include <gtest/gtest.h>
@@ -85,7 +88,7 @@ void expectSealed(pid_t process) {
 TEST_F(Worker, C3SeenFromOutside) {
   NEEDS_SEAL();
   if (geteuid() != 0) GTEST_SKIP() << "only root may look into an undumpable process";
-  for (const Transport::NamedLayer& row : Transport::namedLayers) {
+  for (const NamedLayer& row : namedLayers) {
     // A chroot never gives the user namespace, nor with it the right to the others.
     if ((service_.layers() & row.layer) == 0) GTEST_SKIP() << "this machine gives no " << row.name;
   }
@@ -133,14 +136,14 @@ TEST_F(Worker, C3SeenFromOutside) {
 
 TEST_F(Worker, C4MemoryIsFixedBeforeTheMessageIsRead) {
   NEEDS_SEAL();
-  constexpr std::size_t base = Transport::heapFor(0);
+  constexpr std::size_t base = memoryBudget(0);
   constexpr std::size_t length = 1 << 20;
   const auto eat = [&](std::size_t bytes, std::size_t messageLength) {
     std::string order = "eat " + std::to_string(bytes);
     order.resize(std::max(order.size(), messageLength), ' ');
     return service_.obey(order);
   };
-  constexpr std::size_t worth = Transport::heapFor(length);
+  constexpr std::size_t worth = memoryBudget(length);
   constexpr std::size_t slack = 8 << 20;
   EXPECT_EQ(resultOf(eat(base - slack, 0).first), 0);
   EXPECT_EQ(resultOf(eat(worth - slack, length).first), 0);
@@ -149,7 +152,7 @@ TEST_F(Worker, C4MemoryIsFixedBeforeTheMessageIsRead) {
                                              {std::size_t{1} << 40, length}}) {
     const auto [reply, end] = eat(bytes, messageLength);
     EXPECT_FALSE(reply.kind);
-    EXPECT_EQ(end.exitStatus(), Transport::resourceExitStatus);
+    EXPECT_EQ(end.exitStatus(), Protocol::resourceExitStatus);
     EXPECT_LT(end.peakBytes, worth + slack);
   }
 }
@@ -182,7 +185,7 @@ TEST(Stack, TheDeepestMessageFits) {
   }
   const int channel = service.fork(0);
   sendMessage(channel, recordNumber<PulseUserPayload>, "<plist>" + message + "</plist>");
-  EXPECT_EQ(receiveReply(channel).kind, Transport::ReplyKind::record);
+  EXPECT_EQ(receiveReply(channel).kind, Protocol::ReplyKind::record);
   close(channel);
   EXPECT_EQ(service.end(0).exitStatus(), 0);
 }
@@ -219,36 +222,30 @@ TEST_F(Worker, EveryFaultEndsOneWorkerAlone) {
 TEST_F(Worker, LogIsCutInNumberAndLength) {
   EXPECT_EQ(service_.obey("log 2 5").first.log, std::vector<std::string>(2, "xxxxx"));
   EXPECT_EQ(service_.obey("log 9 513").first.log,
-            std::vector<std::string>(Transport::maximumLogFrames,
-                                     std::string(Transport::maximumLogLength, 'x')));
+            std::vector<std::string>(Protocol::maximumLogFrames,
+                                     std::string(Protocol::maximumLogLength, 'x')));
 }
 
 TEST_F(Worker, WrongHeadersEndIt) {
-  using Transport::RequestHeader;
-  const RequestHeader right{.magic = Transport::magic,
-                            .version = Transport::protocolVersion,
-                            .record = 0,
-                            .sequence = 0,
-                            .serviceLength = 0,
-                            .bodyLength = 0,
-                            .command = 0};
+  using Protocol::RequestHeader;
+  const RequestHeader right = Protocol::makeRequestHeader(0, 0, 0, 0, 0);
   std::vector<RequestHeader> wrong(5, right);
   wrong[0].magic ^= 1;
   wrong[1].version += 1;
   wrong[2].sequence = 1;
-  wrong[3].serviceLength = Transport::maximumServiceLength + 1;
-  wrong[4].bodyLength = Transport::shortMessage + 1;
+  wrong[3].serviceLength = Protocol::maximumServiceLength + 1;
+  wrong[4].bodyLength = shortMessage + 1;
   const auto exitStatusAfter = [&](const void* bytes, std::size_t size) {
     const int channel = service_.fork(0);
     send(channel, bytes, size, MSG_NOSIGNAL);
     shutdown(channel, SHUT_WR);
     const RawReply reply = receiveReply(channel);
-    EXPECT_TRUE(!reply.kind || *reply.kind == Transport::ReplyKind::error);
+    EXPECT_TRUE(!reply.kind || *reply.kind == Protocol::ReplyKind::error);
     close(channel);
     return service_.end(0).exitStatus();
   };
   for (const RequestHeader& header : wrong) {
-    EXPECT_EQ(exitStatusAfter(&header, sizeof header), Transport::protocolExitStatus);
+    EXPECT_EQ(exitStatusAfter(&header, sizeof header), Protocol::protocolExitStatus);
   }
   for (std::size_t size = 0; size <= sizeof right; ++size) {
     EXPECT_EQ(exitStatusAfter(&right, size), 0) << size;
@@ -256,7 +253,7 @@ TEST_F(Worker, WrongHeadersEndIt) {
 }
 
 TEST(Zygote, RefusesEveryFrameThatIsNotExactlyRight) {
-  using Transport::ControlKind;
+  using Protocol::ControlKind;
   const std::vector<std::function<void(RawClient&)>> wrongs{
       [](RawClient& service) { service.sendFrame(ControlKind::hello, 0, {}); },
       [](RawClient& service) { service.sendFrame(ControlKind::exit, 0, {}); },
@@ -273,11 +270,11 @@ TEST(Zygote, RefusesEveryFrameThatIsNotExactlyRight) {
     const int held = service.fork(3);
     service.kill(12345);
     wrongs[i](service);
-    Transport::ControlFrame frame = service.receiveFrame();
+    Protocol::ControlFrame frame = service.receiveFrame();
     while (frame.kind == ControlKind::exit) frame = service.receiveFrame();
     EXPECT_EQ(frame.kind, ControlKind::refused) << i;
-    EXPECT_EQ(frame.numbers[0], static_cast<std::uint64_t>(Transport::Obstacle::badFrame)) << i;
-    EXPECT_EQ(service.stop(), Transport::refusedExitStatus) << i;
+    EXPECT_EQ(frame.numbers[0], static_cast<std::uint64_t>(StartStep::readFrame)) << i;
+    EXPECT_EQ(service.stop(), Protocol::refusedExitStatus) << i;
     close(held);
   }
 }

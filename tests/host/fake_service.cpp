@@ -1,8 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
 // A service without seal and without manners. Its workers do what the message says, step by step;
 // how it starts follows from the name that it was started under (fake_service.mute and so on).
-#include "framework/client/control_frames.h"
-#include "framework/transport/layers.h"
+#include "framework/contracts/process.h"
+#include "framework/contracts/start_step.h"
+#include "framework/protocol/control_frames.h"
+#include "framework/protocol/data_frames.h"
 #include "tests/host/script.h"
 
 #include <fcntl.h>
@@ -20,33 +22,24 @@
 
 using namespace Keelgate;
 using namespace Keelgate::Host;
-using namespace Keelgate::Transport;
+using namespace Keelgate::Protocol;
 
 namespace {
 
 constexpr int channel = serviceDescriptor;
 
-void readAll(void* to, std::size_t size) {
-  for (auto* at = static_cast<char*>(to); size > 0;) {
-    const ssize_t n = read(channel, at, size);
-    if (n <= 0) _exit(0);
-    at += n;
-    size -= static_cast<std::size_t>(n);
-  }
+void read(std::span<std::byte> bytes) {
+  if (!readAll(channel, bytes)) _exit(0);
 }
 
-void writeAll(Bytes bytes) {
-  while (!bytes.empty()) {
-    const ssize_t n = send(channel, bytes.data(), bytes.size(), 0);
-    if (n <= 0) _exit(0);
-    bytes = bytes.subspan(static_cast<std::size_t>(n));
-  }
+void write(Bytes bytes) {
+  if (!writeAll(channel, bytes)) _exit(0);
 }
 
 void writeFrame(std::uint32_t sequence, Bytes body, ReplyKind kind = ReplyKind::record) {
-  const ReplyHeader header{magic, protocolVersion, kind, sequence, 0, body.size()};
-  writeAll(std::as_bytes(std::span(&header, 1)));
-  writeAll(body);
+  Data frame;
+  appendReplyFrame(frame, sequence, kind, body);
+  write(frame);
 }
 
 /// A sanitizer's runtime would make an ordinary exit of it.
@@ -63,7 +56,7 @@ void obey(Bytes script, std::uint32_t sequence) {
     const bool hasBytes = step.op <= Op::log;
     const Bytes bytes = script.first(hasBytes ? step.amount : 0);
     script = script.subspan(bytes.size());
-    if (step.op == Op::write) writeAll(bytes);
+    if (step.op == Op::write) write(bytes);
     if (step.op == Op::answer) writeFrame(sequence, bytes);
     if (step.op == Op::log) writeFrame(sequence, bytes, ReplyKind::log);
     if (step.op == Op::pause) usleep(step.amount * 1000);
@@ -71,7 +64,7 @@ void obey(Bytes script, std::uint32_t sequence) {
     if (step.op == Op::raiseIfUsed && sequence > 0) die(static_cast<int>(step.amount));
     if (step.op == Op::hitZygote) kill(getppid(), static_cast<int>(step.amount));
     if (step.op == Op::exit) _exit(static_cast<int>(step.amount));
-    while (step.op == Op::endless) writeAll(std::array<std::byte, 4096>());
+    while (step.op == Op::endless) write(std::array<std::byte, 4096>());
   }
 }
 
@@ -79,35 +72,24 @@ void obey(Bytes script, std::uint32_t sequence) {
   if (early) writeFrame(0, {});
   for (std::uint64_t i = 0; i < messages; ++i) {
     RequestHeader header;
-    readAll(&header, sizeof header);
+    read(std::as_writable_bytes(std::span(&header, 1)));
     const std::uint64_t signal = header.command - raiseAfterHeader;
     if (signal > 0 && signal < NSIG) die(static_cast<int>(signal));
     if (header.command == answerBeforeBody) writeFrame(header.sequence, {});
     while (header.command == ignoreBody || header.command == answerBeforeBody) pause();
-    String service(header.serviceLength, ' ');
-    readAll(service.data(), service.size());
-    Data script(header.bodyLength);
-    readAll(script.data(), script.size());
-    obey(script, header.sequence);
+    Data script(header.serviceLength + header.bodyLength);
+    read(script);
+    obey(Bytes(script).subspan(header.serviceLength), header.sequence);
   }
   _exit(0);
 }
 
-/// The next control frame, with the descriptor that came along or -1.
 bool receive(ControlFrame& frame, int& descriptor) {
-  iovec piece{&frame, sizeof frame};
-  alignas(cmsghdr) std::array<char, CMSG_SPACE(sizeof descriptor)> extra{};
-  msghdr packet{};
-  packet.msg_iov = &piece;
-  packet.msg_iovlen = 1;
-  packet.msg_control = extra.data();
-  packet.msg_controllen = extra.size();
-  if (recvmsg(channel, &packet, 0) != sizeof frame) return false;
-  descriptor = -1;
-  if (const cmsghdr* header = CMSG_FIRSTHDR(&packet)) {
-    std::memcpy(&descriptor, CMSG_DATA(header), sizeof descriptor);
-  }
-  return true;
+  return receiveControl(channel, frame, descriptor, Waiting::yes) == Transfer::complete;
+}
+
+void send(const ControlFrame& frame) {
+  static_cast<void>(sendControl(channel, frame, noDescriptor, Waiting::yes));
 }
 
 class Zygote {
@@ -128,7 +110,7 @@ class Zygote {
     for (;;) {
       poll(entries, 2, -1);
       signalfd_siginfo signal;
-      if (read(entries[1].fd, &signal, sizeof signal) > 0) {
+      if (::read(entries[1].fd, &signal, sizeof signal) > 0) {
         if (signal.ssi_signo == SIGTERM) end();
         reportExits();
       }
@@ -151,9 +133,7 @@ class Zygote {
   void fork(std::uint32_t slot, int descriptor) {
     if (barren_) {
       close(descriptor);
-      ControlFrame frame = makeFrame(ControlKind::exit, slot);
-      frame.numbers[3] = 1;
-      send(channel, &frame, sizeof frame, MSG_NOSIGNAL);
+      send(makeControlFrame(ControlKind::exit, slot, {0, 0, 0, 1}));
       return;
     }
     const pid_t pid = ::fork();
@@ -170,17 +150,14 @@ class Zygote {
     for (const auto& [pid, its] : slots_) {
       if (its != slot) continue;
       if (!slow_) ::kill(pid, SIGKILL);
-      const ControlFrame frame = makeFrame(ControlKind::killed, slot);
-      send(channel, &frame, sizeof frame, MSG_NOSIGNAL);
+      send(makeControlFrame(ControlKind::killed, slot));
     }
   }
   void reportExits() {
     int status;
     for (pid_t pid; (pid = waitpid(-1, &status, WNOHANG)) > 0;) {
-      ControlFrame frame = makeFrame(ControlKind::exit, slots_[pid]);
-      frame.numbers[0] = static_cast<std::uint64_t>(status);
+      send(makeControlFrame(ControlKind::exit, slots_[pid], {static_cast<std::uint64_t>(status)}));
       slots_.erase(pid);
-      send(channel, &frame, sizeof frame, MSG_NOSIGNAL);
     }
   }
 
@@ -200,15 +177,15 @@ int main(int, char** arguments) {
   ControlFrame hello;
   int none;
   if (!receive(hello, none) || manner == "dies") return 0;
-  ControlFrame ready = makeFrame(ControlKind::ready, 0);
+  ControlFrame ready = makeControlFrame(ControlKind::ready);
   ready.numbers[0] = manner == "bare" ? 0x3f : ~std::uint64_t{0};
   ready.numbers[1] = ownVersion() + (manner == "newer" ? 1 : 0);
   if (manner == "refuses") {
     ready.kind = ControlKind::refused;
-    ready.numbers[0] = static_cast<std::uint64_t>(Obstacle::filter);
+    ready.numbers[0] = static_cast<std::uint64_t>(StartStep::loadFilter);
   }
   if (manner == "babbles") ready.magic = 0;
-  if (manner != "mute") send(channel, &ready, sizeof ready, MSG_NOSIGNAL);
+  if (manner != "mute") send(ready);
   while (manner == "mute" || manner == "stuck") pause();
   Zygote(hello.numbers[0], manner).serve();
 }

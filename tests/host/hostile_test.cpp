@@ -17,13 +17,13 @@
 namespace Keelgate::Host {
 namespace {
 
+using Protocol::ReplyHeader;
+using Protocol::ReplyKind;
 using std::chrono::milliseconds;
 using Transport::MalformedReply;
-using Transport::ReplyHeader;
-using Transport::ReplyKind;
 
 ReplyHeader headerFor(Bytes body, ReplyKind kind = ReplyKind::record) {
-  return {Transport::magic, Transport::protocolVersion, kind, 0, 0, body.size()};
+  return {Protocol::magic, Protocol::protocolVersion, kind, 0, 0, body.size()};
 }
 
 /// An answer with one thing wrong in its header.
@@ -98,7 +98,7 @@ std::vector<Attack> attacks() {
       {"text beyond the end", withBody(changed(good, textLength, 0xff)), "protocolViolation"},
       {"no UTF-8", withBody(changed(good, text, 0xff)), "protocolViolation"},
       {"bytes left over", withBody(longer), "protocolViolation"},
-      {"out of memory", Script().then(Op::exit, Transport::resourceExitStatus),
+      {"out of memory", Script().then(Op::exit, Protocol::resourceExitStatus),
        "resourcesExhausted"},
       {"leaves", Script().then(Op::exit, 0), "crashed"},
       {"SIGSYS after half an answer",

@@ -45,9 +45,8 @@ bool settles(Client& client, Bytes message, const String& record) {
 /// What a worker does until the signal comes; the last has answered.
 std::vector<Script> steps() {
   const Data body = recordNumbered(7);
-  const Transport::ReplyHeader header{
-      Transport::magic, Transport::protocolVersion, Transport::ReplyKind::record, 0, 0,
-      body.size()};
+  const Protocol::ReplyHeader header{
+      Protocol::magic, Protocol::protocolVersion, Protocol::ReplyKind::record, 0, 0, body.size()};
   const Bytes head = std::as_bytes(std::span(&header, 1));
   return {Script(),
           Script().log("a line"),

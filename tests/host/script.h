@@ -2,7 +2,7 @@
 /// What a worker of the fake service is told to do: the message that it is sent.
 #pragma once
 
-#include "framework/transport/frames.h"
+#include "framework/protocol/frames.h"
 
 #include <keelgate/values.h>
 
@@ -51,7 +51,7 @@ class Script {
     put(Step{.op = op, .amount = amount});
     return *this;
   }
-  Script& frame(Transport::ReplyHeader header, Bytes body) {
+  Script& frame(Protocol::ReplyHeader header, Bytes body) {
     const Bytes head = std::as_bytes(std::span(&header, 1));
     Data whole(head.begin(), head.end());
     whole.insert(whole.end(), body.begin(), body.end());
