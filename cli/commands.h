@@ -4,18 +4,17 @@
 #pragma once
 
 #include "cli/console.h"
-#include "cli/json.h"
-#include "cli/reply.h"
+#include "framework/json/reply.h"
 
 #include <keelgate/client.h>
 
 namespace Keelgate::CLI {
 
 struct UnpackOptions {
-  Subject subject;
+  JSON::Subject subject;
   /// Paths; "-" is standard input, and so is no path at all.
   Array<String> files;
-  Layout layout = Layout::compact;
+  JSON::Layout layout = JSON::Layout::compact;
 };
 
 /// Unpacks every file, several at a time, and prints the replies in the order of the files. A file

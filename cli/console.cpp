@@ -5,7 +5,7 @@
 #include "cli/console.h"
 
 #include "cli/files.h"
-#include "cli/json_text.h"
+#include "framework/json/writer.h"
 
 #include <fcntl.h>
 #include <fmt/format.h>
@@ -17,6 +17,7 @@
 #include <csignal>
 #include <cstdlib>
 #include <system_error>
+#include <utility>
 
 namespace Keelgate::CLI {
 
@@ -32,7 +33,7 @@ String escaped(std::string_view text) {
   String all;
   for (;;) {
     const std::size_t plain = text.find_first_of("\"\\");
-    const String json = jsonString(text.substr(0, plain));
+    const String json = JSON::quote(text.substr(0, plain));
     all.append(json, 1, json.size() - 2);
     if (plain == std::string_view::npos) return all;
     all += text[plain];
@@ -58,6 +59,17 @@ Console::Console() {
 }
 
 Bool Console::print(std::string_view text) {
+  if (text.size() > buffer_.size() - buffered_ && !flush()) return false;
+  if (text.size() > buffer_.size()) return write(text);
+  buffered_ += text.copy(buffer_.data() + buffered_, text.size());
+  return true;
+}
+
+Bool Console::flush() {
+  return buffered_ == 0 || write({buffer_.data(), std::exchange(buffered_, 0)});
+}
+
+Bool Console::write(std::string_view text) {
   clearProgress();
   try {
     return writeAll(STDOUT_FILENO, text);
@@ -92,7 +104,7 @@ void Console::progress(std::size_t done, std::size_t total) {
   // Without a newline: the next thing that is said takes its place.
   const String line = fmt::format("\r{} of {} messages", done, total);
   // Best effort: what cannot be shown is not remembered as shown.
-  progressShown_ = write(STDERR_FILENO, line.data(), line.size()) > 0;
+  progressShown_ = ::write(STDERR_FILENO, line.data(), line.size()) > 0;
 }
 
 void Console::clearProgress() {
@@ -100,7 +112,7 @@ void Console::clearProgress() {
   if (!progressShown_) return;
   constexpr std::string_view clear = "\r\033[K";
   // Where it could not be cleared it still stands there.
-  progressShown_ = write(STDERR_FILENO, clear.data(), clear.size()) < 0;
+  progressShown_ = ::write(STDERR_FILENO, clear.data(), clear.size()) < 0;
 }
 
 void Console::note(Status status) {

@@ -4,6 +4,7 @@
 
 #include <keelgate/values.h>
 
+#include <array>
 #include <cstddef>
 #include <mutex>
 #include <string_view>
@@ -20,16 +21,18 @@ enum class Status : std::uint8_t {
   serviceLost = 3,
 };
 
-/// All members may be called from many threads at once.
+/// Where nothing else is said, members may be called from many threads at once.
 class Console {
  public:
   /// Makes sure that the three standard descriptors are taken, so that no file of ours becomes one,
-  /// and that a reader that goes away is an error and no signal.
+  /// and that a reader that goes away is an error and not a signal.
   Console();
 
-  /// Writes a result. False when nobody reads it any more, which is no fault, or when it could not
-  /// be written, which is said and remembered.
+  /// Prints a part of a result, at the latest with the next `flush`. For one thread at a time.
+  /// False when nobody reads it any more, which is not a fault, or when it could not be written,
+  /// which is said and remembered.
   Bool print(std::string_view text);
+  Bool flush();
 
   /// One sentence about what went wrong. Untrusted parts may stand in it: characters that drive a
   /// terminal are escaped.
@@ -46,8 +49,13 @@ class Console {
   [[nodiscard]] Status status() const;
 
  private:
+  Bool write(std::string_view text);
   void sayLine(std::string_view line);
   void clearProgress();
+
+  /// What is printed and not written yet. Never grows, so that printing needs no memory.
+  std::array<char, std::size_t{64} << 10> buffer_;
+  std::size_t buffered_ = 0;
 
   /// Guards the two below, and keeps lines on standard error whole.
   mutable std::mutex mutex_;

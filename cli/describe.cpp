@@ -4,6 +4,7 @@
 #include "cli/commands.h"
 #include "cli/description.h"
 #include "cli/table.h"
+#include "framework/json/values.h"
 
 #include <fmt/format.h>
 
@@ -13,88 +14,82 @@ namespace {
 
 // ------------------------------------------------------------------------------------- JSON
 
-/// The texts are names from the program's own tables; they are escaped all the same.
-template <class Out>
-void writeText(Out& out, std::string_view key, std::string_view value) {
-  writeKey(out, key);
-  writeString(out, value);
-}
+using JSON::writeField;
+using JSON::Writer;
 
 /// A member that is an array with an object for each row.
-template <class Out, class Rows, class WriteMembers>
-void writeRows(Out& out, std::string_view key, const Rows& rows, WriteMembers writeMembers) {
-  writeKey(out, key);
-  out.StartArray();
+template <class Rows, class WriteMembers>
+void writeRows(Writer& out, std::string_view key, const Rows& rows, WriteMembers writeMembers) {
+  out.key(key);
+  out.beginArray();
   for (const auto& row : rows) {
-    out.StartObject();
+    out.beginObject();
     writeMembers(row);
-    out.EndObject();
+    out.endObject();
   }
-  out.EndArray();
+  out.endArray();
 }
 
-template <class Out>
-void writeServices(Out& out, const Description& what) {
+void writeServices(Writer& out, const Description& what) {
   writeRows(out, "services", what.services, [&](const ServiceRow& service) {
-    writeText(out, "service", service.service);
-    writeText(out, "unpacker", service.unpacker);
+    writeField(out, "service", service.service);
+    writeField(out, "unpacker", service.unpacker);
     writeRows(out, "commands", service.commands, [&](const CommandRow& row) {
       writeField(out, "command", row.command);
-      if (row.schema) writeText(out, "schema", *row.schema);
-      writeText(out, "case", row.caseName);
+      writeField(out, "schema", row.schema);
+      writeField(out, "case", row.caseName);
     });
   });
 }
 
 /// Schemas say what a message must have, records what they may lack: one table, two ways to ask.
-template <class Out>
-void writeTables(Out& out, std::string_view key, const Array<StructTable>& tables, Bool schemas) {
-  writeKey(out, key);
-  out.StartObject();
+void writeTables(Writer& out, std::string_view key, const Array<StructTable>& tables,
+                 Bool schemas) {
+  out.key(key);
+  out.beginObject();
   for (const StructTable& table : tables) {
     writeRows(out, table.name, table.fields, [&](const FieldRow& field) {
-      writeText(out, "field", field.name);
-      if (schemas) writeText(out, "key", field.key);
-      writeText(out, "type", field.type);
+      writeField(out, "field", field.name);
+      if (schemas) writeField(out, "key", field.key);
+      writeField(out, "type", field.type);
       writeField(out, schemas ? "required" : "optional", field.required == schemas);
     });
   }
-  out.EndObject();
+  out.endObject();
 }
 
-template <class Out>
-void writeEnumerations(Out& out, const Description& what) {
-  writeKey(out, "enumerations");
-  out.StartObject();
+void writeEnumerations(Writer& out, const Description& what) {
+  out.key("enumerations");
+  out.beginObject();
   for (const EnumerationTable& table : what.enumerations) {
-    writeKey(out, table.name);
-    out.StartObject();
+    out.key(table.name);
+    out.beginObject();
     writeRows(out, "cases", table.cases, [&](const EnumerationCase& entry) {
-      writeText(out, "name", entry.name);
+      writeField(out, "name", entry.name);
       writeField(out, "rawValue", entry.rawValue);
     });
-    if (table.fallback) writeText(out, "default", *table.fallback);
-    out.EndObject();
+    writeField(out, "default", table.fallback);
+    out.endObject();
   }
-  out.EndObject();
+  out.endObject();
 }
 
-String jsonText(const Description& what) {
-  return jsonObject(Layout::pretty, [&](auto& out) {
-    writeRows(out, "messageUnpackers", what.messageUnpackers, [&](const MessageUnpackerRow& row) {
-      writeText(out, "record", row.record);
-      writeText(out, "unpacker", row.unpacker);
-      writeText(out, "schema", row.schema);
-    });
-    writeServices(out, what);
-    writeRows(out, "commands", what.commands, [&](const EnumerationCase& command) {
-      writeField(out, "rawValue", command.rawValue);
-      writeText(out, "name", command.name);
-    });
-    writeTables(out, "schemas", what.schemas, true);
-    writeTables(out, "records", what.records, false);
-    writeEnumerations(out, what);
+void writeDescription(Writer& out, const Description& what) {
+  out.beginObject();
+  writeRows(out, "messageUnpackers", what.messageUnpackers, [&](const MessageUnpackerRow& row) {
+    writeField(out, "record", row.record);
+    writeField(out, "unpacker", row.unpacker);
+    writeField(out, "schema", row.schema);
   });
+  writeServices(out, what);
+  writeRows(out, "commands", what.commands, [&](const EnumerationCase& command) {
+    writeField(out, "rawValue", command.rawValue);
+    writeField(out, "name", command.name);
+  });
+  writeTables(out, "schemas", what.schemas, true);
+  writeTables(out, "records", what.records, false);
+  writeEnumerations(out, what);
+  out.endObject();
 }
 
 // ----------------------------------------------------------------------------------- tables
@@ -237,7 +232,13 @@ void describe(const Optional<String>& name, Bool json, Console& console) {
     console.note(Status::unusable);
     return;
   }
-  console.print(json ? jsonText(what) : pageText(what, !name));
+  if (!json) {
+    console.print(pageText(what, !name));
+    return;
+  }
+  Writer out(JSON::Layout::pretty);
+  writeDescription(out, what);
+  for (const String& piece : std::move(out).take()) console.print(piece);
 }
 
 }  // namespace Keelgate::CLI

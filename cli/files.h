@@ -1,13 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
-/// Reading and writing descriptors: whole messages, lines, and text to a pipe whose other end may
-/// be gone.
+/// Reading and writing descriptors: whole messages, and text to a pipe whose other end may be gone.
 #pragma once
 
 #include <keelgate/values.h>
 
 #include <cstddef>
+#include <cstdlib>
+#include <memory>
 #include <string_view>
-#include <utility>
 
 namespace Keelgate::CLI {
 
@@ -15,32 +15,27 @@ namespace Keelgate::CLI {
 /// std::system_error on any other failure. Expects SIGPIPE to be ignored.
 Bool writeAll(int descriptor, std::string_view text);
 
-/// The file at `path`, or standard input for "-", but never more than `limit` bytes of it. Throws
-/// std::system_error.
-Data readFile(const String& path, std::size_t limit);
+/// At least one byte, or 0 at the end. Waits for descriptors that somebody else made non-blocking.
+/// Throws std::system_error.
+std::size_t readSome(int descriptor, void* to, std::size_t size);
 
-/// Lines of any length from a descriptor that it does not own. For one thread.
-class LineReader {
+/// What a file holds, in no more memory than that: it grows by moving pages, not bytes.
+class FileContent {
  public:
-  /// The input ends also as soon as `ended` becomes readable, or `output` has lost its reader: a
-  /// filter whose result nobody takes must not wait for input that may never come.
-  LineReader(int input, int output, int ended) : input_(input), output_(output), ended_(ended) {}
+  /// Reads the file at `path`, or standard input for "-", but never more than `limit` bytes.
+  /// Throws std::system_error and std::bad_alloc.
+  FileContent(const String& path, std::size_t limit);
 
-  /// The next line without its newline; a last line may lack one. Nothing at the end. Throws
-  /// std::system_error.
-  Optional<String> next();
+  [[nodiscard]] Bytes bytes() const { return {bytes_.get(), size_}; }
 
  private:
-  Bool fill();
-  Bool wait() const;
+  void resize(std::size_t room);
 
-  int input_;
-  int output_;
-  int ended_;
-  String buffer_;
-  /// Where the next line begins, and up to where it has been searched for its end.
-  std::size_t begin_ = 0;
-  std::size_t searched_ = 0;
+  struct Free {
+    void operator()(std::byte* bytes) const { std::free(bytes); }
+  };
+  std::unique_ptr<std::byte, Free> bytes_;
+  std::size_t size_ = 0;
 };
 
 }  // namespace Keelgate::CLI

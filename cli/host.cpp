@@ -6,41 +6,78 @@
 #include <fmt/format.h>
 
 #include <algorithm>
+#include <new>
 #include <thread>
 #include <utility>
 
 namespace Keelgate::CLI {
 
-Client::Options loggingTo(Console& console, Client::Options options) {
+namespace {
+
+Client::Options completed(Client::Options options, Console& console, std::size_t mostMessages) {
   options.log = [&console](std::string_view line) {
     console.log(line);
   };
+  if (options.processes == 0) {
+    options.processes = std::max(1U, std::thread::hardware_concurrency());
+  }
+  // No more processes than messages: the others would be started for nothing.
+  options.processes = static_cast<unsigned>(std::min<std::size_t>(options.processes, mostMessages));
   return options;
 }
 
-std::size_t threadsFor(const Client::Options& options) {
-  if (options.processes > 0) return options.processes;
-  return std::max(1U, std::thread::hardware_concurrency());
+/// The names and numbers of the two go together.
+constexpr Status statusOf(JSON::Outcome outcome) {
+  return static_cast<Status>(outcome);
+}
+static_assert(statusOf(JSON::Outcome::record) == Status::done);
+static_assert(statusOf(JSON::Outcome::rejected) == Status::rejected);
+static_assert(statusOf(JSON::Outcome::unusable) == Status::unusable);
+static_assert(statusOf(JSON::Outcome::serviceLost) == Status::serviceLost);
+
+}  // namespace
+
+Host::Host(Client::Options options, Console& console, std::size_t mostMessages)
+    : options_(completed(std::move(options), console, mostMessages)), client_(options_) {}
+
+JSON::Reply Host::answer(const JSON::Subject& subject, Bytes message,
+                         const JSON::Form& form) const {
+  return JSON::answer(client_, options_.timeLimit, subject, message, form);
 }
 
-Status statusOf(Verdict verdict) {
-  switch (verdict) {
-    case Verdict::record:
-      return Status::done;
-    case Verdict::rejected:
-      return Status::rejected;
-    case Verdict::unusable:
-      return Status::unusable;
-    case Verdict::serviceLost:
-      break;
+Bool Delivery::take(const std::vector<JSON::Reply>& due) noexcept {
+  try {
+    Bool goOn = true;
+    for (const JSON::Reply& reply : due) {
+      ++taken_;
+      for (const String& piece : reply.json) goOn = goOn && console_.print(piece);
+      say(reply);
+      goOn = goOn && reply.outcome != JSON::Outcome::serviceLost;
+      if (!goOn) break;
+    }
+    return console_.flush() && goOn;
+  } catch (const std::bad_alloc&) {
+    console_.note(Status::serviceLost);
+    return false;
   }
-  // Also for a verdict that is none, which only a cast can make: the worst is the safest.
-  return Status::serviceLost;
+}
+
+void Delivery::say(const JSON::Reply& reply) {
+  const Bool lost = reply.outcome == JSON::Outcome::serviceLost;
+  // In a stream a reply says it all, and a rejected message is a normal one.
+  if (kind_ == Kind::files || reply.outcome != JSON::Outcome::rejected) {
+    console_.note(statusOf(reply.outcome));
+  }
+  if (!reply.problem.empty() && (kind_ == Kind::files || lost)) {
+    // The object before the sentence: at a terminal the sentence comments on it.
+    console_.flush();
+    console_.complain(reply.problem);
+  }
+  if (taken_ < total_) console_.progress(taken_, total_);
 }
 
 void reportVersions(std::string_view version, const Client::Options& options, Console& console) {
-  Client client(loggingTo(console, options));
-  const ServiceReport report = client.report();
+  const ServiceReport report = Host(options, console).report();
   String text =
       fmt::format("keelgate {}\nservice  {}\n\nSandbox layers:\n", version, report.version);
   for (const SandboxLayer& layer : report.layers) {

@@ -2,11 +2,11 @@
 // The command line of keelgate. The only file that includes its parser, which is heavy.
 #include "cli/commands.h"
 #include "cli/request_line.h"
+#include "text/utf8.h"
 
 #include <keelgate/client.h>
 
 #include <fmt/format.h>
-#include <sodium.h>
 #include <unistd.h>
 #include <CLI/CLI.hpp>
 
@@ -49,7 +49,7 @@ template <class N>
     const Optional<UInt64> number = decimal(text);
     if (!number || *number < least || *number > most) {
       throw ::CLI::ValidationError(
-          fmt::format("{} is no whole number from {} to {}", jsonString(text), least, most));
+          fmt::format("{} is no whole number from {} to {}", JSON::quote(text), least, most));
     }
     to = static_cast<N>(*number);
   };
@@ -68,7 +68,7 @@ void addSeconds(::CLI::App& app, const std::string& names, std::chrono::millisec
     const double seconds = std::strtod(text.c_str(), &end);
     if (!plain || text.empty() || *end != '\0' || !(seconds > 0) || seconds > longest) {
       throw ::CLI::ValidationError(
-          fmt::format("{} is no number of seconds above 0", jsonString(text)));
+          fmt::format("{} is no number of seconds above 0", JSON::quote(text)));
     }
     to = std::chrono::milliseconds(static_cast<Int>(std::ceil(seconds * 1000)));
   };
@@ -106,9 +106,10 @@ void addUnpack(::CLI::App& app, Arguments& arguments) {
   auto* record = unpack.add_option("--record", arguments.record, "What the messages are")
                      ->type_name("TYPE")
                      ->check([](const std::string& name) {
-                       return isRecordName(name) ? std::string()
-                                                 : fmt::format("{} is none of {}", jsonString(name),
-                                                               fmt::join(recordNames(), ", "));
+                       return JSON::isRecordName(name)
+                                  ? std::string()
+                                  : fmt::format("{} is none of {}", JSON::quote(name),
+                                                fmt::join(JSON::recordNames(), ", "));
                      });
   auto* service =
       unpack.add_option("--service", arguments.service, "The service that they arrived under")
@@ -120,7 +121,7 @@ void addUnpack(::CLI::App& app, Arguments& arguments) {
                       ->needs(service);
   // A service's name goes back in the error: bytes that are no text could not.
   service->needs(command)->check([](const std::string& id) {
-    return isUtf8(id) ? std::string() : "the identifier is not UTF-8";
+    return Text::isUtf8(id) ? std::string() : "the identifier is not UTF-8";
   });
   auto* pretty = unpack.add_flag("--pretty", arguments.pretty, "Indent, as on a terminal");
   unpack.add_flag("--compact", arguments.compact, "One line for each, as in a pipe")
@@ -137,7 +138,7 @@ void addUnpack(::CLI::App& app, Arguments& arguments) {
       "\n"
       "Exit status: 0 all gave a record, 1 some were rejected, 2 wrong usage or an\n"
       "unreadable file, 3 no service. The largest that applies counts.",
-      fmt::join(recordNames(), "\n  ")));
+      fmt::join(JSON::recordNames(), "\n  ")));
 }
 
 void addStream(::CLI::App& app, Arguments& arguments) {
@@ -183,17 +184,18 @@ void checkUsage(const ::CLI::App& app, const Arguments& arguments) {
 
 /// Deliberate: the layout follows standard output alone, wherever the input comes from.
 UnpackOptions unpackOptions(const ::CLI::App& unpack, const Arguments& arguments) {
-  UnpackOptions options{.subject = arguments.record,
-                        .files = arguments.files,
-                        .layout = isTerminal(STDOUT_FILENO) ? Layout::pretty : Layout::compact};
+  UnpackOptions options{
+      .subject = arguments.record,
+      .files = arguments.files,
+      .layout = isTerminal(STDOUT_FILENO) ? JSON::Layout::pretty : JSON::Layout::compact};
   if (unpack.count("--service") > 0) {
     options.subject =
         VespClientMessageContext{.command = arguments.command, .service = arguments.service};
   }
   // As filters do: a pipe needs no file to be named.
   if (options.files.empty()) options.files.emplace_back("-");
-  if (arguments.pretty) options.layout = Layout::pretty;
-  if (arguments.compact) options.layout = Layout::compact;
+  if (arguments.pretty) options.layout = JSON::Layout::pretty;
+  if (arguments.compact) options.layout = JSON::Layout::compact;
   return options;
 }
 
@@ -283,8 +285,7 @@ void keelgate(Array<String> words, Console& console) {
 
 int main(int count, char** words) {
   Keelgate::CLI::Console console;
-  // base64 is all that is used of it, yet it has to be initialised before any of it.
-  if (sodium_init() < 0) return static_cast<int>(Keelgate::CLI::Status::serviceLost);
   Keelgate::CLI::keelgate({words + 1, words + count}, console);
+  console.flush();
   return static_cast<int>(console.status());
 }

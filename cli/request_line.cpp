@@ -1,14 +1,21 @@
 // SPDX-License-Identifier: Apache-2.0
 /// Read as events and never as a tree: a line is as large as its message, and a tree of a hostile
-/// id would be many times as large.
+/// id would be many times as large. Strings are decoded where they stand, so a message of any
+/// length is never copied.
 #include "cli/request_line.h"
 
+#include "text/base64.h"
+#include "text/utf8.h"
+
 #include <fmt/format.h>
+// Sixteen characters of a string at a time, which every x86-64 can.
+#define RAPIDJSON_SSE2
 #include <rapidjson/error/en.h>
-#include <rapidjson/memorystream.h>
 #include <rapidjson/reader.h>
 
+#include <array>
 #include <charconv>
+#include <utility>
 
 namespace Keelgate::CLI {
 
@@ -16,121 +23,113 @@ namespace {
 
 using rapidjson::SizeType;
 
-struct Members {
-  Optional<String> record;
-  Optional<String> service;
-  /// The number as it was written.
-  Optional<String> command;
-  Optional<String> message;
-  Optional<String> id;
-};
+enum Member : std::size_t { record, service, command, message, id, none };
 
-struct Member {
+struct Rule {
   std::string_view key;
-  Optional<String> Members::*value;
-  /// The type that it must have; kNullType stands for any.
+  /// The type that the value must have; kNullType stands for any.
   rapidjson::Type type;
   std::string_view demand;
 };
 
 /// What a request may have, and nothing else.
-constexpr Member memberTable[] = {
-    {"record", &Members::record, rapidjson::kStringType, "a string"},
-    {"service", &Members::service, rapidjson::kStringType, "a string"},
-    {"command", &Members::command, rapidjson::kNumberType, "a number"},
-    {"message", &Members::message, rapidjson::kStringType, "a string"},
-    {"id", &Members::id, rapidjson::kNullType, "any value"},
-};
+constexpr std::array<Rule, none> rules = {{
+    {"record", rapidjson::kStringType, "a string"},
+    {"service", rapidjson::kStringType, "a string"},
+    {"command", rapidjson::kNumberType, "a number"},
+    {"message", rapidjson::kStringType, "a string"},
+    {"id", rapidjson::kNullType, "any value"},
+}};
+
+/// Each value in the memory of the line: a string without its quotes, a number as it was written.
+using Members = std::array<Optional<std::string_view>, none>;
 
 /// Takes the reader's events: notes the members, copies the id, remembers the first thing wrong
 /// and goes on, so that an id further down is still found.
 class RequestReader : public rapidjson::BaseReaderHandler<rapidjson::UTF8<>, RequestReader> {
  public:
-  bool Null() { return scalar("null", "null", rapidjson::kNullType); }
-  bool Bool(bool value) {
-    const std::string_view text = value ? "true" : "false";
-    return scalar(text, text, rapidjson::kTrueType);
-  }
+  bool Null() { return scalar("null", rapidjson::kNullType); }
+  bool Bool(bool value) { return scalar(value ? "true" : "false", rapidjson::kTrueType); }
   // Digit by digit as it was written: a double in between would change a command above 2^53.
   bool RawNumber(const char* text, SizeType size, bool) {
-    return scalar({text, size}, {text, size}, rapidjson::kNumberType);
+    return scalar({text, size}, rapidjson::kNumberType);
   }
   bool String(const char* text, SizeType size, bool) {
-    const std::string_view value(text, size);
-    if (!isText(value)) return false;
-    // A message is as long as the line, and no copy of it in quotes is needed.
-    const std::string_view json = inId() ? std::string_view(quotedText_ = jsonString(value)) : "";
-    return scalar(value, json, rapidjson::kStringType);
+    return isText({text, size}) && scalar({text, size}, rapidjson::kStringType);
   }
   bool StartObject() {
-    // The request itself. Anything else at this depth is no object.
+    // The request itself. Anything else at this depth is not an object.
     if (depth_ == 0) return ++depth_ == 1;
-    if (inId()) id_.StartObject();
+    if (member_ == id) id_.beginObject();
     return open();
   }
   bool StartArray() {
-    if (inId()) id_.StartArray();
+    if (member_ == id) id_.beginArray();
     return open();
   }
   bool EndObject(SizeType) {
-    if (inId()) id_.EndObject();
-    return close();
+    if (member_ == id && depth_ > 1) id_.endObject();
+    return close(rapidjson::kObjectType);
   }
   bool EndArray(SizeType) {
-    if (inId()) id_.EndArray();
-    return close();
+    if (member_ == id) id_.endArray();
+    return close(rapidjson::kArrayType);
   }
   bool Key(const char* text, SizeType size, bool) {
     const std::string_view key(text, size);
     if (!isText(key)) return false;
     if (depth_ == 1) {
       select(key);
-    } else if (inId()) {
-      writeString(id_, key);
+    } else if (member_ == id) {
+      id_.key(key);
     }
     return true;
   }
 
   [[nodiscard]] const Members& members() const { return members_; }
   [[nodiscard]] const Keelgate::String& problem() const { return problem_; }
-  [[nodiscard]] Optional<Keelgate::String> id() const {
-    return idIsAmbiguous_ ? std::nullopt : members_.id;
+  /// Of no more use than once.
+  [[nodiscard]] Optional<Keelgate::String> takeId() {
+    if (idIsAmbiguous_ || !members_[id]) return std::nullopt;
+    Keelgate::String all;
+    for (const Keelgate::String& piece : std::move(id_).take()) all += piece;
+    all.pop_back();
+    return all;
   }
 
  private:
-  [[nodiscard]] bool inId() const { return member_ != nullptr && member_->key == "id"; }
-
   void wrong(Keelgate::String problem) {
     // The first is the one that explains the others.
     if (problem_.empty()) problem_ = std::move(problem);
   }
 
   /// The reader lets an escaped half of a surrogate pair pass. Such a text, and so such an id,
-  /// could not be written back.
+  /// could not be written back. Base64 is checked by its own decoder.
   bool isText(std::string_view text) {
-    if (isUtf8(text)) return true;
+    if (member_ == message || Text::isUtf8(text)) return true;
     wrong("a string holds half of a surrogate pair");
     return false;
   }
 
   void select(std::string_view key) {
-    member_ = nullptr;
-    for (const Member& member : memberTable) {
-      if (member.key == key) member_ = &member;
-    }
-    if (member_ == nullptr) {
-      wrong(fmt::format("unknown key {}", jsonString(key)));
-    } else if (members_.*member_->value) {
+    std::size_t i = 0;
+    while (i < rules.size() && rules[i].key != key) ++i;
+    member_ = static_cast<Member>(i);
+    if (member_ == none) {
+      wrong(fmt::format("unknown key {}", JSON::quote(key)));
+    } else if (members_[member_]) {
       wrong(fmt::format("the key \"{}\" stands twice", key));
       // To echo either would be a guess, and the caller would take the reply for another's.
-      if (inId()) idIsAmbiguous_ = true;
-      member_ = nullptr;
+      if (member_ == id) idIsAmbiguous_ = true;
+      member_ = none;
     }
   }
 
-  bool scalar(std::string_view value, std::string_view json, rapidjson::Type type) {
+  bool scalar(std::string_view value, rapidjson::Type type) {
     if (depth_ == 0) return notAnObject();
-    if (inId()) writeRaw(id_, json);
+    if (member_ == id) {
+      type == rapidjson::kStringType ? id_.string(value) : id_.raw(value);
+    }
     if (depth_ == 1) finish(value, type);
     return true;
   }
@@ -141,23 +140,20 @@ class RequestReader : public rapidjson::BaseReaderHandler<rapidjson::UTF8<>, Req
     return true;
   }
 
-  bool close() {
-    if (--depth_ == 1) finish({}, rapidjson::kObjectType);
+  bool close(rapidjson::Type type) {
+    if (--depth_ == 1) finish({}, type);
     return true;
   }
 
   /// A whole value of the request itself has been read.
   void finish(std::string_view value, rapidjson::Type type) {
-    if (member_ == nullptr) return;
-    if (inId()) {
-      // Of any type: it is the caller's, and is handed back unread.
-      members_.id = Keelgate::String(idText_.GetString(), idText_.GetSize());
-    } else if (member_->type == type) {
-      members_.*member_->value = Keelgate::String(value);
+    const Member member = std::exchange(member_, none);
+    if (member == none) return;
+    if (rules[member].type == type || rules[member].type == rapidjson::kNullType) {
+      members_[member] = value;
     } else {
-      wrong(fmt::format("\"{}\" must be {}", member_->key, member_->demand));
+      wrong(fmt::format("\"{}\" must be {}", rules[member].key, rules[member].demand));
     }
-    member_ = nullptr;
   }
 
   bool notAnObject() {
@@ -166,16 +162,22 @@ class RequestReader : public rapidjson::BaseReaderHandler<rapidjson::UTF8<>, Req
   }
 
   Members members_;
-  const Member* member_ = nullptr;
+  Member member_ = none;
   std::size_t depth_ = 0;
-  rapidjson::StringBuffer idText_;
-  rapidjson::Writer<rapidjson::StringBuffer> id_{idText_};
-  Keelgate::String quotedText_;
+  JSON::Writer id_{JSON::Layout::compact};
   Keelgate::String problem_;
   bool idIsAmbiguous_ = false;
 };
 
-/// Thrown and caught in this file: why a line is no request.
+/// The reader compares with 0x19 where it should with 0x1f, and lets some control characters pass.
+bool hasForbiddenControl(std::string_view line) {
+  bool has = false;
+  // Without an early end, so that the compiler takes many characters at a time.
+  for (const char c : line) has |= c >= 0x1a && c <= 0x1f;
+  return has;
+}
+
+/// Thrown and caught in this file: why a line is not a request.
 struct Invalid {
   String why;
 };
@@ -184,29 +186,33 @@ void demand(bool holds, std::string_view otherwise) {
   if (!holds) throw Invalid{String(otherwise)};
 }
 
-Subject subjectOf(const Members& members) {
-  if (members.record) {
-    demand(!members.service && !members.command, "\"record\" excludes \"service\" and \"command\"");
-    demand(isRecordName(*members.record),
-           fmt::format("unknown record {}: one of {}", jsonString(*members.record),
-                       fmt::join(recordNames(), ", ")));
-    return *members.record;
+JSON::Subject subjectOf(const Members& members) {
+  if (members[record]) {
+    demand(!members[service] && !members[command],
+           "\"record\" excludes \"service\" and \"command\"");
+    if (!JSON::isRecordName(*members[record])) {
+      throw Invalid{fmt::format("unknown record {}: one of {}", JSON::quote(*members[record]),
+                                fmt::join(JSON::recordNames(), ", "))};
+    }
+    return String(*members[record]);
   }
-  demand(members.service || members.command, "neither \"record\" nor \"service\" is given");
-  demand(members.service.has_value(), "\"command\" needs \"service\"");
-  demand(members.command.has_value(), "\"service\" needs \"command\"");
+  demand(members[service] || members[command], "neither \"record\" nor \"service\" is given");
+  demand(members[service].has_value(), "\"command\" needs \"service\"");
+  demand(members[command].has_value(), "\"service\" needs \"command\"");
   // JSON also has -1, 1.5 and 1e3, which are numbers and no commands.
-  const Optional<UInt64> command = decimal(*members.command);
-  demand(command.has_value(), "\"command\" must be an integer from 0 to 18446744073709551615");
-  return VespClientMessageContext{.command = *command, .service = *members.service};
+  const Optional<UInt64> number = decimal(*members[command]);
+  demand(number.has_value(), "\"command\" must be an integer from 0 to 18446744073709551615");
+  return VespClientMessageContext{.command = *number, .service = String(*members[service])};
 }
 
-Request requestOf(const Members& members) {
-  Subject subject = subjectOf(members);
-  demand(members.message.has_value(), "\"message\" is missing");
-  Optional<Data> message = fromBase64(*members.message);
-  demand(message.has_value(), "\"message\" is no base64 with padding");
-  return {.subject = std::move(subject), .message = std::move(*message)};
+Request requestOf(const Members& members, String& line) {
+  JSON::Subject subject = subjectOf(members);
+  demand(members[message].has_value(), "\"message\" is missing");
+  char* begin = line.data() + (members[message]->data() - line.data());
+  const Optional<std::size_t> size =
+      Text::decodeBase64(*members[message], begin, Text::Base64::strict);
+  demand(size.has_value(), "\"message\" is not base64 with padding");
+  return {.subject = std::move(subject), .message = std::as_bytes(std::span(begin, *size))};
 }
 
 }  // namespace
@@ -215,32 +221,37 @@ Optional<UInt64> decimal(std::string_view text) {
   UInt64 number = 0;
   const char* end = text.data() + text.size();
   const auto [rest, error] = std::from_chars(text.data(), end, number);
-  // All of the text or none: "12a" is no 12.
+  // All of the text or none: "12a" is not 12.
   if (error != std::errc() || rest != end) return std::nullopt;
   return number;
 }
 
-RequestLine readRequestLine(std::string_view line) {
+RequestLine readRequestLine(String& line) {
   // Iterative, because recursion would let a nested id choose the depth of the stack.
-  constexpr unsigned flags = rapidjson::kParseNumbersAsStringsFlag |
-                             rapidjson::kParseValidateEncodingFlag | rapidjson::kParseIterativeFlag;
-  rapidjson::MemoryStream stream(line.data(), line.size());
-  rapidjson::Reader reader;
-  RequestReader request;
-  const rapidjson::ParseResult result = reader.Parse<flags>(stream, request);
+  constexpr unsigned flags = rapidjson::kParseNumbersAsStringsFlag | rapidjson::kParseInsituFlag |
+                             rapidjson::kParseIterativeFlag;
   RequestLine read;
   try {
+    demand(Text::isUtf8(line), "not readable as JSON: not UTF-8");
+    demand(!hasForbiddenControl(line), "not readable as JSON: a control character");
+    // The reader looks at whole blocks of this size, the last one included.
+    line.reserve(line.size() + sizeof(__m128i));
+    rapidjson::InsituStringStream stream(line.data());
+    rapidjson::Reader reader;
+    RequestReader request;
+    const rapidjson::ParseResult result = reader.Parse<flags>(stream, request);
     if (result.IsError() && result.Code() != rapidjson::kParseErrorTermination) {
-      demand(false, fmt::format("not readable as JSON: {} (at byte {})",
-                                rapidjson::GetParseError_En(result.Code()), result.Offset()));
+      throw Invalid{fmt::format("not readable as JSON: {} (at byte {})",
+                                rapidjson::GetParseError_En(result.Code()), result.Offset())};
     }
-    // The reader takes a null character for the end.
-    if (!result.IsError())
+    if (!result.IsError()) {
+      // The reader takes a null character for the end.
       demand(stream.Tell() == line.size(), "not readable as JSON: a null character");
-    // Only from a line that was read to its end: half an id is another one.
-    if (!result.IsError()) read.id = request.id();
+      // Only from a line that was read to its end: half an id is another one.
+      read.id = request.takeId();
+    }
     demand(request.problem().empty(), request.problem());
-    read.content = requestOf(request.members());
+    read.content = requestOf(request.members(), line);
   } catch (Invalid& invalid) {
     read.content = std::move(invalid.why);
   }

@@ -9,7 +9,7 @@
 /// base64 without its padding, invalid UTF-8 are all refused.
 #pragma once
 
-#include "cli/reply.h"
+#include "framework/json/reply.h"
 
 #include <keelgate/values.h>
 
@@ -19,23 +19,25 @@
 namespace Keelgate::CLI {
 
 struct Request {
-  Subject subject;
-  Data message;
+  JSON::Subject subject;
+  /// In the memory of the line.
+  Bytes message;
 };
 
 struct RequestLine {
   /// The request's id as compact JSON, with its numbers as they were written. Present with an
   /// invalid request too, as long as the line is JSON and has one id.
   Optional<String> id;
-  /// The request, or why the line is none.
+  /// The request, or why the line is not one.
   std::variant<Request, String> content;
 };
 
-/// Reads one line, without its newline. Callable from any thread. A nesting of any depth in the id
-/// takes heap and no stack. Throws nothing but std::bad_alloc.
-RequestLine readRequestLine(std::string_view line);
+/// Reads one line, without its newline, in its own memory, which holds the message then. Callable
+/// from any thread. A nesting of any depth in the id takes heap and no stack. Throws nothing but
+/// std::bad_alloc.
+RequestLine readRequestLine(String& line);
 
-/// A decimal number without a sign; nothing when it is none or does not fit.
+/// A decimal number without a sign; nothing when it is not one or does not fit.
 Optional<UInt64> decimal(std::string_view text);
 
 }  // namespace Keelgate::CLI

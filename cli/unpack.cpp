@@ -7,7 +7,6 @@
 
 #include <fmt/format.h>
 
-#include <algorithm>
 #include <system_error>
 
 namespace Keelgate::CLI {
@@ -16,75 +15,50 @@ namespace {
 
 constexpr std::string_view standardInput = "-";
 
-/// The files of one call, each unpacked in the same way. Unpacking is for many threads at once.
-class Batch {
- public:
-  Batch(Client& client, const UnpackOptions& what, std::size_t largestMessage)
-      : client_(client), what_(what), largestMessage_(largestMessage) {}
-
-  [[nodiscard]] Reply unpackFile(const String& path) const {
-    Reply reply;
-    try {
-      reply = replyTo(path);
-    } catch (const std::system_error& error) {
-      reply = {.json = {}, .verdict = Verdict::unusable, .problem = error.code().message()};
-    }
-    if (!reply.problem.empty()) {
-      const String name = path == standardInput ? "standard input" : path;
-      reply.problem = fmt::format("{}: {}", name, reply.problem);
-    }
-    return reply;
+JSON::Reply replyTo(const Host& host, const UnpackOptions& what, const String& path) {
+  JSON::Form form{.layout = what.layout};
+  if (what.files.size() > 1) {
+    form.prefaceKey = "file";
+    form.preface = JSON::quote(path);
   }
-
- private:
-  [[nodiscard]] Reply replyTo(const String& path) const {
-    // A file without end is read no further than it takes to see that it is too large.
-    const Data message = readFile(path, largestMessage_ + 1);
-    if (message.size() <= largestMessage_) {
-      return answer(client_, what_.subject, message, prefaceOf(path), what_.layout);
-    }
-    const HostError tooLarge(HostError::Reason::messageTooLarge,
-                             fmt::format("more than {} bytes", largestMessage_));
-    return givenUp(tooLarge, prefaceOf(path), what_.layout);
+  // A file without end is read no further than it takes to see that it is too large.
+  const FileContent message(path, host.largestMessage() + 1);
+  if (message.bytes().size() <= host.largestMessage()) {
+    return host.answer(what.subject, message.bytes(), form);
   }
+  const HostError tooLarge(HostError::Reason::messageTooLarge,
+                           fmt::format("more than {} bytes", host.largestMessage()));
+  return JSON::givenUp(tooLarge, form);
+}
 
-  [[nodiscard]] Preface prefaceOf(const String& path) const {
-    if (what_.files.size() < 2) return {};
-    return {.key = "file", .value = jsonString(path)};
+JSON::Reply unpackFile(const Host& host, const UnpackOptions& what, const String& path) {
+  JSON::Reply reply;
+  try {
+    reply = replyTo(host, what, path);
+  } catch (const std::system_error& error) {
+    reply = {.outcome = JSON::Outcome::unusable, .problem = error.code().message()};
   }
-
-  Client& client_;
-  const UnpackOptions& what_;
-  std::size_t largestMessage_;
-};
+  if (!reply.problem.empty()) {
+    reply.problem =
+        fmt::format("{}: {}", path == standardInput ? "standard input" : path, reply.problem);
+  }
+  return reply;
+}
 
 }  // namespace
 
 void unpack(Client::Options options, const UnpackOptions& what, Console& console) {
   const std::size_t total = what.files.size();
-  const std::size_t threads = std::min(threadsFor(options), total);
-  // No more processes than messages: the others would be started for nothing.
-  options.processes = static_cast<unsigned>(threads);
-  const std::size_t largestMessage = options.largestMessage;
-  Client client(loggingTo(console, std::move(options)));
-  const Batch batch(client, what, largestMessage);
-
-  std::size_t done = 0;
-  OrderedWork work(threads, [&](const Reply& reply) {
-    ++done;
-    console.note(statusOf(reply.verdict));
-    // The object before the sentence: at a terminal the sentence comments on it.
-    if (!console.print(reply.json)) return false;
-    if (!reply.problem.empty()) console.complain(reply.problem);
-    if (done < total) console.progress(done, total);
-    return reply.verdict != Verdict::serviceLost;
-  });
+  const Host host(std::move(options), console, total);
+  Delivery delivery(console, Delivery::Kind::files, total);
+  OrderedWork work(host.threads(), [&](const auto& due) { return delivery.take(due); });
   for (const String& path : what.files) {
-    if (!work.add([&batch, &path] { return batch.unpackFile(path); }, 0)) break;
+    if (!work.add([&, path] { return unpackFile(host, what, path); }, 0)) break;
   }
   work.finish();
-  if (console.status() == Status::serviceLost && done < total) {
-    console.complain(fmt::format("{} of {} messages were not unpacked", total - done, total));
+  if (console.status() == Status::serviceLost && delivery.taken() < total) {
+    console.complain(
+        fmt::format("{} of {} messages were not unpacked", total - delivery.taken(), total));
   }
 }
 

@@ -27,7 +27,7 @@ struct LineCase {
   Optional<String> id;
 };
 
-TEST(RequestLine, isReadStrictly) {
+TEST(RequestLine, IsReadStrictly) {
   constexpr auto absent = std::nullopt;
   using namespace std::string_view_literals;
   const LineCase table[] = {
@@ -51,7 +51,7 @@ TEST(RequestLine, isReadStrictly) {
       {R"({"service":"s","command":1.0,"message":""})", "must be an integer", absent},
       {R"({"service":"s","command":1e0,"message":""})", "must be an integer", absent},
       {R"({"service":"s","command":18446744073709551616,"message":""})", "integer", absent},
-      {R"({"record":"VespInvitation","message":"Zg"})", "no base64", absent},
+      {R"({"record":"VespInvitation","message":"Zg"})", "not base64", absent},
       {R"({"record":"VespInvitation","message":"","extra":[{"id":7}],"id":[]})", "unknown key",
        "[]"},
       {R"({"record":"VespInvitation","record":"VespInvitation","message":"","id":1})",
@@ -70,31 +70,67 @@ TEST(RequestLine, isReadStrictly) {
       {R"({"id":1,})", "not readable", absent},
   };
   for (const LineCase& entry : table) {
-    const RequestLine line = readRequestLine(entry.line);
+    String text(entry.line);
+    const RequestLine line = readRequestLine(text);
     EXPECT_NE(problemOf(line).find(entry.problem), String::npos) << entry.line << problemOf(line);
     EXPECT_EQ(line.id, entry.id) << entry.line;
   }
 }
 
-TEST(RequestLine, nestingOfAnyDepthTakesNoStack) {
+TEST(RequestLine, ControlCharactersAreRefusedWhereverTheyStand) {
+  for (std::size_t at = 0; at < 40; ++at) {
+    for (char c = 1; c < 0x20; ++c) {
+      String id(40, 'a');
+      id[at] = c;
+      String line = R"({"record":"VespInvitation","message":"","id":")" + id + "\"}";
+      EXPECT_NE(problemOf(readRequestLine(line)), "ok") << at << ' ' << int{c};
+    }
+  }
+}
+
+TEST(RequestLine, MessagesOfEveryLengthAndSpellingAreDecoded) {
+  const std::pair<const char*, std::string_view> table[] = {
+      {"", ""}, {"Zg==", "f"}, {"Zm8=", "fo"}, {"Zm9v", "foo"}, {R"(+\/\u0038=)", "\xfb\xff"}};
+  for (const auto& [spelling, octets] : table) {
+    String line = R"({"id":"\u0041","message":")" + String(spelling) +
+                  R"(","command":245,"service":"com.\u0065xample"})";
+    const RequestLine read = readRequestLine(line);
+    ASSERT_EQ(problemOf(read), "ok") << spelling;
+    EXPECT_EQ(read.id, "\"A\"");
+    const auto& [subject, message] = std::get<Request>(read.content);
+    EXPECT_TRUE(std::ranges::equal(message, std::as_bytes(std::span(octets)))) << spelling;
+    const auto& context = std::get<VespClientMessageContext>(subject);
+    EXPECT_EQ(context.service, "com.example");
+    EXPECT_EQ(context.command, 245U);
+  }
+  for (const char* wrong :
+       {"Z", "Zg", "Zg=", "Zg===", "Zh==", "Zm9v ", "Zm-_", "Zg==Zg==", "===="}) {
+    String line = R"({"record":"VespInvitation","message":")" + String(wrong) + "\"}";
+    EXPECT_NE(problemOf(readRequestLine(line)).find("base64"), String::npos) << wrong;
+  }
+}
+
+TEST(RequestLine, NestingOfAnyDepthTakesNoStack) {
   const String nest = String(1'000'000, '[') + String(1'000'000, ']');
-  const RequestLine line =
-      readRequestLine(R"({"record":"VespInvitation","message":"","id":)" + nest + "}");
+  String text = R"({"record":"VespInvitation","message":"","id":)" + nest + "}";
+  const RequestLine line = readRequestLine(text);
   EXPECT_EQ(problemOf(line), "ok");
   EXPECT_TRUE(line.id == nest);
 }
 
-Reply numbered(int number) {
-  return {.json = std::to_string(number), .verdict = Verdict::record, .problem = {}};
+JSON::Reply numbered(int number) {
+  return {.json = {std::to_string(number)}};
 }
 
-TEST(OrderedWork, repliesComeInOrderHoweverJobsEnd) {
+using Due = std::vector<JSON::Reply>;
+
+TEST(OrderedWork, RepliesComeInOrderHoweverJobsEnd) {
   constexpr int jobs = 500, threads = 8;
   Array<String> out;
   std::latch others(threads - 1);
   {
-    OrderedWork work(threads, [&](const Reply& reply) {
-      out.push_back(reply.json);
+    OrderedWork work(threads, [&](const Due& due) {
+      for (const JSON::Reply& reply : due) out.push_back(reply.json.front());
       return true;
     });
     for (int i = 0; i < jobs; ++i) {
@@ -112,13 +148,20 @@ TEST(OrderedWork, repliesComeInOrderHoweverJobsEnd) {
   for (int i = 0; i < jobs; ++i) EXPECT_EQ(out[static_cast<std::size_t>(i)], std::to_string(i));
 }
 
-TEST(OrderedWork, whatWaitsIsBounded) {
-  constexpr std::size_t large = std::size_t{48} << 20;
+constexpr std::size_t large = std::size_t{48} << 20;
+
+/// Gives other threads so many turns that they get as far as they can.
+void letOthersRun() {
+  for (int turn = 0; turn < 10'000; ++turn) std::this_thread::yield();
+}
+
+TEST(OrderedWork, WhatWaitsIsBoundedInBytesAndGivenBack) {
   std::binary_semaphore go(0);
   std::atomic<int> started = 0, added = 0;
-  OrderedWork work(4, [](const Reply&) { return true; });
+  OrderedWork work(4, [](const Due&) { return true; });
   std::thread adding([&] {
-    for (int i = 0; i < 3; ++i) {
+    // Many windows full, one after another.
+    for (int i = 0; i < 20; ++i) {
       const auto job = [&] {
         ++started;
         go.acquire();
@@ -130,19 +173,51 @@ TEST(OrderedWork, whatWaitsIsBounded) {
     }
   });
   while (started == 0) std::this_thread::yield();
-  // Two of them are more than may wait, so the second is not taken while the first is in work,
-  // however often the other thread gets its turn.
-  for (int turn = 0; turn < 10'000; ++turn) std::this_thread::yield();
+  // Two of them are more than may wait, so the second is not taken while the first is in work.
+  letOthersRun();
   EXPECT_LE(added, 1);
   go.release();
   adding.join();
   work.finish();
-  EXPECT_EQ(started, 3);
+  EXPECT_EQ(started, 20);
 }
 
-TEST(OrderedWork, endsWithItsReader) {
+TEST(OrderedWork, LongRepliesBehindASlowMessageKeepOthersFromBeginning) {
+  constexpr int threads = 3, jobs = 8;
+  std::binary_semaphore go(0);
+  std::atomic<int> begun = 0;
+  std::size_t bytes = 0;
+  OrderedWork work(threads, [&](const Due& due) {
+    for (const JSON::Reply& reply : due) bytes += JSON::sizeOf(reply.json);
+    return true;
+  });
+  work.add([&] { return go.acquire(), numbered(0); }, 1);
+  for (int i = 1; i < jobs; ++i) {
+    work.add([&] { return ++begun, JSON::Reply{.json = {String(large, 'x')}}; }, 1);
+  }
+  letOthersRun();
+  // Two of them fill the window, and each of the other threads may be in the middle of one.
+  EXPECT_LE(begun, threads);
+  go.release();
+  work.finish();
+  EXPECT_EQ(begun, jobs - 1);
+  EXPECT_EQ(bytes, 1 + large * (jobs - 1));
+}
+
+TEST(OrderedWork, AJobWithoutMemoryEndsTheWorkAndNotTheProgram) {
+  JSON::Outcome worst = JSON::Outcome::record;
+  OrderedWork work(2, [&](const Due& due) {
+    for (const JSON::Reply& reply : due) worst = std::max(worst, reply.outcome);
+    return worst != JSON::Outcome::serviceLost;
+  });
+  work.add([]() -> JSON::Reply { throw std::bad_alloc(); }, 1);
+  work.finish();
+  EXPECT_EQ(worst, JSON::Outcome::serviceLost);
+}
+
+TEST(OrderedWork, EndsWithItsReader) {
   int seen = 0;
-  OrderedWork work(3, [&](const Reply&) { return ++seen < 10; });
+  OrderedWork work(3, [&](const Due&) { return ++seen < 10; });
   int added = 0;
   while (work.add([] { return numbered(0); }, 1)) ++added;
   work.finish();
@@ -150,7 +225,7 @@ TEST(OrderedWork, endsWithItsReader) {
   EXPECT_GE(added, 10);
 }
 
-TEST(Table, fitsAnyWidthAndLosesNothing) {
+TEST(Table, FitsAnyWidthAndLosesNothing) {
   const Array<String> cells = {"averylongnamewithoutanyspace", "several words that can be broken",
                                "short"};
   for (std::size_t width = 30; width < 100; ++width) {

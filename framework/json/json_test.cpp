@@ -1,0 +1,158 @@
+// SPDX-License-Identifier: Apache-2.0
+// Values as JSON text, and what it may cost. Whole records are compared by the examples' test.
+#include "framework/json/values.h"
+
+#include <keelgate/errors.h>
+
+#include <gtest/gtest.h>
+
+#include <cmath>
+#include <limits>
+
+namespace Keelgate::JSON {
+namespace {
+
+String joined(const Pieces& pieces) {
+  String all;
+  for (const String& piece : pieces) all += piece;
+  return all;
+}
+
+template <class T>
+String compact(const T& value) {
+  Writer out(Layout::compact);
+  write(out, value);
+  const String line = joined(std::move(out).take());
+  EXPECT_EQ(line.back(), '\n');
+  return line.substr(0, line.size() - 1);
+}
+
+Data dataOf(std::string_view text) {
+  const Bytes bytes = std::as_bytes(std::span(text));
+  return {bytes.begin(), bytes.end()};
+}
+
+TEST(JSON, DatesAreTextWithinTheCalendarAndNumbersOutside) {
+  constexpr double yearOne = -63113904000, yearTenThousand = 252423993600;
+  const std::pair<double, const char*> table[] = {
+      {0, "\"2001-01-01T00:00:00Z\""},
+      {0.1, "\"2001-01-01T00:00:00.1Z\""},
+      {-0.5, "\"2000-12-31T23:59:59.5Z\""},
+      {yearOne, "\"0001-01-01T00:00:00Z\""},
+      {yearOne - 1, "-63113904001.0"},
+      {std::nextafter(yearTenThousand, 0), "\"9999-12-31T23:59:59.999969Z\""},
+      {yearTenThousand, "252423993600.0"},
+      {-1e300, "-1e+300"},
+  };
+  for (const auto& [seconds, text] : table) EXPECT_EQ(compact(Date{seconds}), text) << seconds;
+}
+
+TEST(JSON, NumbersAreExactAndTellTheirKind) {
+  const std::pair<double, const char*> table[] = {
+      {3, "3.0"},
+      {-0.0, "-0.0"},
+      {0.1, "0.1"},
+      {1e15, "1000000000000000.0"},
+      {1e16, "1e+16"},
+      {1e-5, "0.00001"},
+      {9e-6, "9e-06"},
+      {5e-324, "5e-324"},
+      {NAN, "\"nan\""},
+      {INFINITY, "\"inf\""},
+      {-INFINITY, "\"-inf\""},
+  };
+  for (const auto& [number, text] : table) EXPECT_EQ(compact(number), text);
+  EXPECT_EQ(compact(std::numeric_limits<Int>::min()), "-9223372036854775808");
+  EXPECT_EQ(compact(std::numeric_limits<UInt64>::max()), "18446744073709551615");
+  EXPECT_EQ(compact(Array<Bool>{true, false}), "[true,false]");
+}
+
+TEST(JSON, EveryPowerOfTwoAndItsNeighboursReadBack) {
+  for (int exponent = -1074; exponent <= 1023; ++exponent) {
+    const double power = std::ldexp(1, exponent);
+    for (double number : {std::nextafter(power, 0), power, -std::nextafter(power, INFINITY)}) {
+      const String text = compact(number);
+      EXPECT_EQ(std::strtod(text.c_str(), nullptr), number) << text;
+      EXPECT_NE(text.find_first_of(".e"), String::npos) << text;
+    }
+  }
+}
+
+TEST(JSON, StringsCanNeitherEndNorDriveATerminal) {
+  const std::pair<std::string_view, const char*> table[] = {
+      {"", R"("")"},
+      {"a\"b\\c/", R"("a\"b\\c/")"},
+      {std::string_view("\0\x1f\n\r\t ~", 7), R"("\u0000\u001f\n\r\t ~")"},
+      // What a terminal obeys in eight bits too.
+      {"\x1b[2J\x7f\u0080\u009f", R"("\u001b[2J\u007f\u0080\u009f")"},
+      // What ends a line for readers that know Unicode.
+      {"a\u2028b\u2029", R"("a\u2028b\u2029")"},
+      {"\u00a0\u00e9\u2027\u202a\u20ac\U0001f600", "\"\u00a0\u00e9\u2027\u202a\u20ac\U0001f600\""},
+      // Bytes of a path that are not UTF-8: alone, cut off, overlong, half a surrogate pair.
+      {"a\xff\xe2\x82"
+       "b",
+       R"("a\udcff\udce2\udc82b")"},
+      {"\xc0\x80\xed\xa0\x80", R"("\udcc0\udc80\udced\udca0\udc80")"},
+  };
+  for (const auto& [value, text] : table) {
+    EXPECT_EQ(compact(String(value)), text);
+    EXPECT_EQ(quote(value), text);
+  }
+}
+
+TEST(JSON, LongValuesAreWholeWhateverPiecesTheyAreMadeIn) {
+  const std::size_t piece = std::size_t{64} << 10;
+  for (std::size_t size : {piece - 1, piece, piece + 1, 3 * piece / 4, 3 * piece + 2}) {
+    const String text(size, 'x');
+    EXPECT_TRUE(compact(text) == '"' + text + '"') << size;
+    // Seven bits of each character, so that every group of four is the same.
+    String encoded(size / 3 * 4, 'A');
+    if (size % 3 != 0) encoded += size % 3 == 1 ? "AA==" : "AAA=";
+    EXPECT_TRUE(compact(Data(size)) == '"' + encoded + '"') << size;
+  }
+  EXPECT_EQ(compact(dataOf("\xfb\xff")), "\"+/8=\"");
+}
+
+TEST(JSON, LayoutsDifferInWhiteSpaceAlone) {
+  const auto text = [](Layout layout) {
+    Writer out(layout);
+    out.beginObject();
+    writeField(out, "a", Array<Int>{1, -2});
+    writeField(out, "none", Optional<Int>());
+    writeField(out, "empty", Array<Int>());
+    out.key("b");
+    out.beginObject();
+    out.endObject();
+    out.endObject();
+    return joined(std::move(out).take());
+  };
+  EXPECT_EQ(text(Layout::compact), "{\"a\":[1,-2],\"empty\":[],\"b\":{}}\n");
+  EXPECT_EQ(text(Layout::pretty),
+            "{\n  \"a\": [\n    1,\n    -2\n  ],\n  \"empty\": [],\n  \"b\": {}\n}\n");
+  EXPECT_EQ(text(Layout::discarded), "");
+}
+
+TEST(JSON, TheBudgetIsKeptToTheByte) {
+  using Reason = HostError::Reason;
+  const auto outcome = [](Layout layout, std::size_t values, Budget budget) -> Optional<Reason> {
+    try {
+      Writer out(layout, budget);
+      for (std::size_t i = 0; i < values; ++i) out.integer(UInt64{7});
+      static_cast<void>(std::move(out).take());
+      return std::nullopt;
+    } catch (const HostError& error) {
+      return error.reason;
+    }
+  };
+  const auto passed = std::chrono::steady_clock::now() - std::chrono::seconds(1);
+  for (Layout layout : {Layout::compact, Layout::discarded}) {
+    for (std::size_t size : {std::size_t{1}, std::size_t{1} << 16, std::size_t{1'000'000}}) {
+      EXPECT_EQ(outcome(layout, size, {.bytes = size + 1}), std::nullopt);
+      EXPECT_EQ(outcome(layout, size, {.bytes = size}), Reason::resourcesExhausted);
+    }
+    EXPECT_EQ(outcome(layout, 1, {.deadline = passed}), Reason::timedOut);
+  }
+}
+
+}  // namespace
+}  // namespace Keelgate::JSON

@@ -1,0 +1,240 @@
+// SPDX-License-Identifier: Apache-2.0
+/// From what the client gives or throws to the text that is printed. The names of kinds and reasons
+/// are promised to scripts; the sentences are for people and may change.
+#include "framework/json/reply.h"
+
+#include "framework/json/values.h"
+
+#include <keelgate/type_name.h>
+
+#include <algorithm>
+#include <new>
+#include <type_traits>
+
+namespace Keelgate::JSON {
+
+namespace {
+
+using std::chrono::steady_clock;
+using VespKeelgateService::VespClientMessageUnpackingError;
+
+/// What a record may have of JSON: some room for any message, and what the worst honest spelling
+/// makes of a byte, several times over.
+constexpr std::size_t anyMessage = std::size_t{16} << 20;
+constexpr std::size_t perByte = 64;
+
+std::string_view nameOf(DecodingError::Kind kind) {
+  switch (kind) {
+    case DecodingError::Kind::keyNotFound:
+      return "keyNotFound";
+    case DecodingError::Kind::typeMismatch:
+      return "typeMismatch";
+    case DecodingError::Kind::valueNotFound:
+      return "valueNotFound";
+    case DecodingError::Kind::dataCorrupted:
+      return "dataCorrupted";
+  }
+  return {};
+}
+
+std::string_view nameOf(HostError::Reason reason) {
+  switch (reason) {
+    case HostError::Reason::crashed:
+      return "crashed";
+    case HostError::Reason::timedOut:
+      return "timedOut";
+    case HostError::Reason::messageTooLarge:
+      return "messageTooLarge";
+    case HostError::Reason::resourcesExhausted:
+      return "resourcesExhausted";
+    case HostError::Reason::protocolViolation:
+      return "protocolViolation";
+    case HostError::Reason::startFailed:
+      return "startFailed";
+  }
+  return {};
+}
+
+std::string_view nameOf(VespClientMessageUnpackingError::Case which) {
+  switch (which) {
+    case VespClientMessageUnpackingError::Case::unimplementedCommand:
+      return "unimplementedCommand";
+    case VespClientMessageUnpackingError::Case::noUnpackerForService:
+      return "noUnpackerForService";
+  }
+  return {};
+}
+
+/// What the user can do about it, where there is something.
+std::string_view advice(HostError::Reason reason) {
+  switch (reason) {
+    case HostError::Reason::timedOut:
+      return "; --time-limit SECONDS gives it longer";
+    case HostError::Reason::messageTooLarge:
+      return "; --max-message BYTES sets the limit";
+    default:
+      return "";
+  }
+}
+
+/// Keys as strings and positions as numbers: a dictionary with the key "1" is not an array.
+void writeError(Writer& out, const DecodingError& error) {
+  writeField(out, "kind", nameOf(error.kind));
+  writeField(out, "key", error.key);
+  out.key("codingPath");
+  out.beginArray();
+  for (const CodingKey& step : error.codingPath) {
+    std::visit([&](const auto& keyOrIndex) { write(out, keyOrIndex); }, step);
+  }
+  out.endArray();
+  writeField(out, "description", error.debugDescription);
+}
+
+void writeError(Writer& out, const Breach& error) {
+  writeField(out, "kind", "breach");
+  writeField(out, "domain", error.domain);
+  writeField(out, "errorType", error.errorType);
+  writeField(out, "keyPath", error.keyPath);
+}
+
+void writeError(Writer& out, const VespClientMessageUnpackingError& error) {
+  writeField(out, "kind", "unpacking");
+  writeField(out, "domain", VespClientMessageUnpackingError::domain);
+  writeField(out, "code", Int{error.code()});
+  writeField(out, "case", nameOf(error.which));
+  if (error.command) writeField(out, "command", error.command->rawValue());
+  writeField(out, "service", error.service);
+}
+
+void writeError(Writer& out, const HostError& error) {
+  writeField(out, "kind", "host");
+  writeField(out, "reason", nameOf(error.reason));
+  writeField(out, "description", error.description);
+}
+
+/// The whole object, around what `members` writes.
+template <class Members>
+Pieces object(const Form& form, Budget budget, const Members& members) {
+  Writer out(form.layout, budget);
+  out.beginObject();
+  if (!form.prefaceKey.empty()) {
+    out.key(form.prefaceKey);
+    out.raw(form.preface);
+  }
+  members(out);
+  out.endObject();
+  return std::move(out).take();
+}
+
+/// Errors are as long as the message's keys and no longer, and have no budget: an answer there must
+/// be.
+template <class E>
+Reply rejection(const E& error, const Form& form) {
+  const auto members = [&](Writer& out) {
+    out.key("error");
+    out.beginObject();
+    writeError(out, error);
+    out.endObject();
+  };
+  return {.json = object(form, {}, members), .outcome = Outcome::rejected, .problem = error.what()};
+}
+
+class Answer {
+ public:
+  Answer(Client& client, steady_clock::time_point deadline, Bytes message, const Form& form)
+      : client_(client), deadline_(deadline), message_(message), form_(form) {}
+
+  Pieces to(const String& name) {
+    Pieces json;
+    // Only here does a name become a type: behind it everything is checked by the compiler.
+    OutputRecords::each([&]<class R>(std::type_identity<R>) {
+      if constexpr (!std::is_same_v<R, VespClientMessageResult>) {
+        if (typeName<R>() == name) json = object(client_.unpack<R>(message_));
+      }
+    });
+    return json;
+  }
+
+  Pieces to(const VespClientMessageContext& context) {
+    return object(client_.unpackClientMessage(message_, context));
+  }
+
+ private:
+  template <class R>
+  Pieces object(const R& record) const {
+    const Budget budget{.bytes = anyMessage + perByte * message_.size() + form_.preface.size(),
+                        .deadline = deadline_};
+    return JSON::object(form_, budget, [&](Writer& out) {
+      writeField(out, "record", typeName<R>());
+      writeField(out, "value", record);
+    });
+  }
+
+  Client& client_;
+  steady_clock::time_point deadline_;
+  Bytes message_;
+  const Form& form_;
+};
+
+}  // namespace
+
+const Array<std::string_view>& recordNames() {
+  // Made once, which the language keeps safe from any thread.
+  static const Array<std::string_view> names = [] {
+    Array<std::string_view> all;
+    OutputRecords::each([&]<class R>(std::type_identity<R>) {
+      // It comes with a context, and is not asked for by name.
+      if (!std::is_same_v<R, VespClientMessageResult>) all.push_back(typeName<R>());
+    });
+    return all;
+  }();
+  return names;
+}
+
+Bool isRecordName(std::string_view name) {
+  return std::ranges::find(recordNames(), name) != recordNames().end();
+}
+
+Reply answer(Client& client, std::chrono::milliseconds timeLimit, const Subject& subject,
+             Bytes message, const Form& form) {
+  Answer answer(client, steady_clock::now() + timeLimit, message, form);
+  try {
+    return {.json = std::visit([&](const auto& what) { return answer.to(what); }, subject)};
+  } catch (const DecodingError& error) {
+    return rejection(error, form);
+  } catch (const Breach& error) {
+    return rejection(error, form);
+  } catch (const VespClientMessageUnpackingError& error) {
+    return rejection(error, form);
+  } catch (const HostError& error) {
+    return givenUp(error, form);
+  } catch (const std::bad_alloc&) {
+    // The record and its text are gone by now, and their memory is free for this.
+    return givenUp(HostError(HostError::Reason::resourcesExhausted,
+                             "there is not enough memory for the record"),
+                   form);
+  }
+}
+
+Reply givenUp(const HostError& error, const Form& form) {
+  Reply reply = rejection(error, form);
+  reply.reason = error.reason;
+  reply.problem += advice(error.reason);
+  if (error.reason == HostError::Reason::startFailed) reply.outcome = Outcome::serviceLost;
+  return reply;
+}
+
+Reply requestError(std::string_view description, const Form& form) {
+  const auto members = [&](Writer& out) {
+    out.key("error");
+    out.beginObject();
+    writeField(out, "kind", "request");
+    writeField(out, "description", description);
+    out.endObject();
+  };
+  return {.json = object(form, {}, members),
+          .outcome = Outcome::unusable,
+          .problem = String(description)};
+}
+
+}  // namespace Keelgate::JSON
