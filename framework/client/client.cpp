@@ -74,10 +74,12 @@ class Client::Implementation {
                      .message = message},
                     deadline, [&](const ReceivedReply& reply) {
                       if (reply.kind == Protocol::ReplyKind::error) {
-                        Transport::throwError(reply.body);
+                        Transport::throwError(reply.body,
+                                              {.memory = reply.memory, .deadline = deadline});
                       }
                       // Within the call, so that a reply that turns out to be none ends its worker.
-                      record = Transport::decodeRecord<R>(reply.body, reply.memory);
+                      record = Transport::decodeRecord<R>(
+                          reply.body, {.memory = reply.memory, .deadline = deadline});
                     });
     return std::move(*record);
   }

@@ -3,6 +3,8 @@
 /// a worker that reads slowly, or sends a byte a second, costs the time limit and no more.
 #include "framework/client/data_channel.h"
 
+#include "framework/contracts/memory_budget.h"
+
 #include <poll.h>
 #include <sys/socket.h>
 
@@ -51,8 +53,7 @@ DataChannel::Look DataChannel::look() const noexcept {
 Ending DataChannel::exchange(const ClientRequest& request, Deadline deadline,
                              ReceivedReply& reply) {
   if (const Ending sent = send(request, deadline); sent != Ending::answered) return sent;
-  // 64 bits hold it for the largest message that there is.
-  reply.memory = heap_;
+  reply.memory = memoryBudget(request.message.size());
   // The worker had the body twice at the end, by itself and framed.
   const std::uint64_t allowance = std::min<std::uint64_t>(
       replyBase + request.service.size() + replyFactor * request.message.size(), heap_ / 2);

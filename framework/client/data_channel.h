@@ -35,7 +35,7 @@ struct ReceivedReply {
   /// All that has arrived, headers and log lines too; the body is a part of it.
   Data buffer;
   Bytes body;
-  /// Bytes that its record may take in memory: it had to fit into the worker's heap.
+  /// Bytes that its record may take in memory.
   std::size_t memory = 0;
   /// As the worker sent them: not to be shown before escapeLogLine.
   Array<String> log;

@@ -142,6 +142,11 @@ Optional<HostError> Pool::attempt(Worker worker, const ClientRequest& request, D
     accept(reply);
   } catch (const Transport::MalformedReply&) {
     return lie();
+  } catch (const Transport::ReadLimitReached& reached) {
+    if (reached.limit == Transport::ReadLimitReached::Limit::time) {
+      return HostError(Reason::timedOut, "");
+    }
+    return HostError(Reason::resourcesExhausted, "");
   } catch (...) {
     keep(std::move(worker), spent);
     throw;

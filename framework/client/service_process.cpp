@@ -132,7 +132,9 @@ Optional<ServiceProcess::Forked> ServiceProcess::fork(std::uint64_t longestMessa
     lose();
     return std::nullopt;
   }
-  return Forked{.slot = *slot, .channel = std::move(ours), .heap = memoryBudget(longestMessage)};
+  return Forked{.slot = *slot,
+                .channel = std::move(ours),
+                .heap = memoryBudget(std::max(longestMessage, shortMessage))};
 }
 
 Optional<std::uint32_t> ServiceProcess::claimSlot(Deadline deadline) {

@@ -3,7 +3,6 @@
 /// replies by it, so that neither can be made to take more than the message's length justifies.
 #pragma once
 
-#include <algorithm>
 #include <cstddef>
 #include <cstdint>
 
@@ -23,10 +22,9 @@ constexpr std::size_t budgetBase = std::size_t{128} << 20;
 /// any more, and to grant its factor would let 64 MiB of message ask for the whole machine.
 constexpr std::size_t budgetPerByte = 64;
 
-/// Bytes of memory that a message of `length` bytes is worth. Short ones all get the same, which is
-/// there in the zygote already.
+/// Bytes of memory that a message of `length` bytes is worth.
 constexpr std::size_t memoryBudget(std::uint64_t length) {
-  return budgetBase + budgetPerByte * static_cast<std::size_t>(std::max(length, shortMessage));
+  return budgetBase + budgetPerByte * static_cast<std::size_t>(length);
 }
 
 }  // namespace Keelgate

@@ -27,7 +27,7 @@ void prepareHeap() {
   mallopt(M_ARENA_MAX, 1);
   // -1 is "never": a freed area stays ours, so that a freed message leaves room for the next one.
   mallopt(M_TRIM_THRESHOLD, -1);
-  if (!growHeap(memoryBudget(0))) throw StartError(StartStep::reserveHeap);
+  if (!growHeap(memoryBudget(shortMessage))) throw StartError(StartStep::reserveHeap);
 #endif
   try {
     throw StartError(StartStep::reserveHeap, 0);

@@ -2,8 +2,6 @@
 /// An error travels as its kind and its fields; the sentence is made anew on the other side.
 #include "framework/transport/error_coding.h"
 
-#include "framework/transport/wire.h"
-
 namespace Keelgate::Transport {
 
 using VespKeelgateService::VespClientMessageUnpackingError;
@@ -16,6 +14,8 @@ enum class ErrorKind : std::uint8_t { decoding, breach, unpacking };
 
 /// A path leads through at most 512 nested containers, one step for each.
 constexpr std::size_t maximumPathLength = 512;
+/// Its kind, and a number or the length of a key.
+constexpr std::size_t smallestStep = 1 + sizeof(std::uint64_t);
 
 Writer begin(ErrorKind kind) {
   Writer to;
@@ -30,12 +30,12 @@ void writeOptional(Writer& to, const Optional<String>& text) {
 
 Optional<String> readOptional(Reader& from) {
   if (!from.flag()) return std::nullopt;
-  return String(from.text());
+  return from.text();
 }
 
 CodingKey readCodingKey(Reader& from) {
   if (from.flag()) return static_cast<std::size_t>(from.word());
-  return String(from.text());
+  return from.text();
 }
 
 DecodingError readDecodingError(Reader& from) {
@@ -46,23 +46,25 @@ DecodingError readDecodingError(Reader& from) {
   if (key.has_value() != (DecodingError::Kind{kind} == DecodingError::Kind::keyNotFound)) {
     throw MalformedReply();
   }
-  const std::size_t steps = from.count();
+  const std::size_t steps = from.count(smallestStep);
   // An honest path is never longer. A longer one would only have the client build it.
   if (steps > maximumPathLength) throw MalformedReply();
   Array<CodingKey> path;
+  if (steps > 0) from.charge(steps * sizeof(CodingKey));
+  path.reserve(steps);
   for (std::size_t i = 0; i < steps; ++i) path.push_back(readCodingKey(from));
-  return {DecodingError::Kind{kind}, std::move(key), std::move(path), String(from.text())};
+  return {DecodingError::Kind{kind}, std::move(key), std::move(path), from.text()};
 }
 
 Breach readBreach(Reader& from) {
-  String domain(from.text());
-  String errorType(from.text());
+  String domain = from.text();
+  String errorType = from.text();
   return {std::move(domain), std::move(errorType), readOptional(from)};
 }
 
 VespClientMessageUnpackingError readUnpackingError(Reader& from) {
   if (from.flag()) {
-    return VespClientMessageUnpackingError::noUnpackerForService(String(from.text()));
+    return VespClientMessageUnpackingError::noUnpackerForService(from.text());
   }
   // An unknown number has no place in the error, whatever the other side says.
   const Optional<CommandType> command = CommandType::fromRawValue(from.word());
@@ -110,9 +112,8 @@ Data encodeError(const VespClientMessageUnpackingError& error) {
   return std::move(to).take();
 }
 
-void throwError(Bytes body) {
-  // A path is short, and the rest of an error is its bytes.
-  Reader from(body, body.size());
+void throwError(Bytes body, const ReadLimits& limits) {
+  Reader from(body, limits);
   switch (ErrorKind{from.byte()}) {
     case ErrorKind::decoding:
       throwRead(from, readDecodingError);

@@ -5,6 +5,8 @@
 /// Pure functions; callable from any thread.
 #pragma once
 
+#include "framework/transport/wire.h"
+
 #include <keelgate/errors.h>
 
 namespace Keelgate::Transport {
@@ -14,8 +16,9 @@ Data encodeError(const DecodingError& error);
 Data encodeError(const Breach& error);
 Data encodeError(const VespKeelgateService::VespClientMessageUnpackingError& error);
 
-/// Throws the error that a body holds, or MalformedReply when it holds none. The bytes may be a
-/// lie: of the error's fields only those that go together are taken, and of its texts only UTF-8.
-[[noreturn]] void throwError(Bytes body);
+/// Throws the error that a body holds, MalformedReply when it does not hold one, ReadLimitReached
+/// or std::bad_alloc. The bytes may be a lie: of the error's fields only those that go together are
+/// taken, and of its texts only UTF-8.
+[[noreturn]] void throwError(Bytes body, const ReadLimits& limits = {});
 
 }  // namespace Keelgate::Transport

@@ -9,7 +9,6 @@
 #pragma once
 
 #include "framework/contracts/construct.h"
-#include "framework/contracts/memory_budget.h"
 #include "framework/transport/wire.h"
 
 #include <keelgate/describe.h>
@@ -73,6 +72,22 @@ void write(Writer& to, const T& value) {
 /// client's stack than an honest one.
 constexpr int maximumDepth = 257;
 
+/// The fewest bytes that a value is written as: a count is held against them before room is made.
+template <class T>
+constexpr std::size_t smallestSize() {
+  if constexpr (std::same_as<T, Bool> || isOptional<T> || CaseKeyed<T>) {
+    return 1;
+  } else if constexpr (std::same_as<T, UUID>) {
+    return sizeof(T);
+  } else if constexpr (Record<T>) {
+    std::size_t sum = 0;
+    FieldsOf<T>::each([&]<class S, class Value>(Field<S, Value>) { sum += smallestSize<Value>(); });
+    return sum;
+  } else {
+    return sizeof(std::uint64_t);
+  }
+}
+
 template <class T>
 void read(Reader& from, T& value, int depth);
 
@@ -83,13 +98,14 @@ void read(Reader& from, Optional<T>& value, int depth) {
 
 template <class T>
 requires(isArray<Array<T>>) void read(Reader& from, Array<T>& values, int depth) {
-  // Grown with the elements that arrive and not by the count: a record may be hundreds of times as
-  // large as the shortest bytes that claim to be one. Made in place: a temporary payload takes 5 KB
-  // of stack at every level of nesting, and the application may call from a thread with little.
-  for (std::size_t rest = from.count(); rest > 0; --rest) {
-    from.charge(sizeof(T));
-    read(from, values.emplace_back(), depth);
-  }
+  const std::size_t count = from.count(smallestSize<T>());
+  if (count == 0) return;
+  // In one block, which is charged before it is there: a list that grows holds two of them.
+  from.charge(count * sizeof(T));
+  values.reserve(count);
+  // Made in place: a temporary payload takes 4 KB of stack at every level of nesting, and the
+  // application may call from a thread with little.
+  for (std::size_t i = 0; i < count; ++i) read(from, values.emplace_back(), depth);
 }
 
 /// The case that the byte names; a byte that names none is a lie.
@@ -133,8 +149,7 @@ void read(Reader& from, T& value, int depth) {
   } else if constexpr (std::same_as<T, String>) {
     value = from.text();
   } else if constexpr (std::same_as<T, Data>) {
-    const Bytes bytes = from.octets();
-    value.assign(bytes.begin(), bytes.end());
+    value = from.octets();
   } else if constexpr (CaseKeyed<T>) {
     readCase(from, value, depth,
              std::make_index_sequence<std::variant_size_v<typename T::variant>>());
@@ -151,12 +166,13 @@ Data encodeRecord(const T& record) {
   return std::move(to).take();
 }
 
-/// The record that a body holds. Throws MalformedReply, or what the record's constructor throws.
+/// The record that a body holds. Throws MalformedReply, ReadLimitReached, std::bad_alloc, or what
+/// the record's constructor throws.
 /// For the client. What it gives is a record that an honest service might have sent: whether this
 /// one did is not to be known.
 template <Record T>
-T decodeRecord(Bytes body, std::size_t memory = memoryBudget(0)) {
-  Reader from(body, memory);
+T decodeRecord(Bytes body, const ReadLimits& limits = {}) {
+  Reader from(body, limits);
   T record{};
   read(from, record, 0);
   // Bytes behind the record: then it was not written by an honest service.

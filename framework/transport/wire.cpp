@@ -5,11 +5,65 @@
 
 namespace Keelgate::Transport {
 
-std::string_view Reader::text() {
-  const Bytes bytes = octets();
+namespace {
+
+/// What the allocator keeps beside each block, and what it rounds up to.
+constexpr std::size_t blockHeader = 8;
+constexpr std::size_t blockStep = 16;
+constexpr std::size_t smallestBlock = 32;
+
+constexpr unsigned readsPerClock = 1024;
+
+}  // namespace
+
+Data Reader::octets() {
+  const Bytes bytes = take(word());
+  if (!bytes.empty()) charge(bytes.size());
+  return {bytes.begin(), bytes.end()};
+}
+
+String Reader::text() {
+  const Bytes bytes = take(word());
   const std::string_view text(reinterpret_cast<const char*>(bytes.data()), bytes.size());
   if (!Text::isUtf8(text)) throw MalformedReply();
-  return text;
+  // A short one lies within its String.
+  if (text.size() > String().capacity()) charge(text.size() + 1);
+  return String(text);
+}
+
+std::size_t Reader::count(std::size_t smallestElement) {
+  const std::uint64_t value = word();
+  if (value > rest_.size() / smallestElement) throw MalformedReply();
+  return value;
+}
+
+void Reader::charge(std::size_t size) {
+  // Compared before it is rounded up, so that nothing can wrap.
+  if (size <= limits_.memory) {
+    const std::size_t block = (size + blockHeader + blockStep - 1) / blockStep * blockStep;
+    const std::size_t cost = std::max(block, smallestBlock);
+    if (cost <= limits_.memory) {
+      limits_.memory -= cost;
+      return;
+    }
+  }
+  throw ReadLimitReached(ReadLimitReached::Limit::memory);
+}
+
+Bytes Reader::take(std::uint64_t size) {
+  // Compared, not added to a position: no length that a liar announces can wrap.
+  if (size > rest_.size()) throw MalformedReply();
+  if (untilClock_-- == 0) checkTime();
+  const Bytes taken = rest_.first(size);
+  rest_ = rest_.subspan(size);
+  return taken;
+}
+
+void Reader::checkTime() {
+  untilClock_ = readsPerClock;
+  if (std::chrono::steady_clock::now() >= limits_.deadline) {
+    throw ReadLimitReached(ReadLimitReached::Limit::time);
+  }
 }
 
 }  // namespace Keelgate::Transport

@@ -2,13 +2,17 @@
 /// The bytes of a reply's body: how values are written down, and the strict reader of them.
 ///
 /// The reader faces a process that may be taken over. It accepts exactly one spelling of every
-/// value, checks before it allocates, and allocates only what bytes at hand justify.
+/// value, checks before it allocates, allocates only what bytes at hand justify, and keeps within
+/// the memory and the time that the message is worth.
 ///
 /// Values; one thread at a time.
 #pragma once
 
+#include "framework/contracts/memory_budget.h"
+
 #include <keelgate/values.h>
 
+#include <chrono>
 #include <cstddef>
 #include <cstring>
 #include <exception>
@@ -16,10 +20,28 @@
 
 namespace Keelgate::Transport {
 
-/// Thrown by Reader: the bytes are none that an honest service writes.
+/// Thrown by Reader: no honest service writes these bytes.
 class MalformedReply : public std::exception {
  public:
   [[nodiscard]] const char* what() const noexcept override { return "malformed reply"; }
+};
+
+/// Thrown by Reader: the reply is well-formed so far, and to go on would cost more than is allowed.
+class ReadLimitReached : public std::exception {
+ public:
+  enum class Limit { memory, time };
+  explicit ReadLimitReached(Limit which) : limit(which) {}
+  [[nodiscard]] const char* what() const noexcept override { return "reading costs too much"; }
+
+  Limit limit;
+};
+
+/// What reading a reply may cost.
+struct ReadLimits {
+  /// Bytes that the values may take in all: every block that is allocated for them is charged.
+  std::size_t memory = memoryBudget(0);
+  /// Looked at while reading: a reply can be made to take long to read.
+  std::chrono::steady_clock::time_point deadline = std::chrono::steady_clock::time_point::max();
 };
 
 /// Throws std::bad_alloc. Trusts its caller: it runs in the service, and the reader checks in the
@@ -50,12 +72,11 @@ class Writer {
   Data out_;
 };
 
-/// Every function that takes something throws MalformedReply where there is not that much. Views
-/// that it gives point into the reply and live as long.
+/// Every function that takes something throws MalformedReply where there is not that much, and
+/// ReadLimitReached. Views that it gives point into the reply and live as long.
 class Reader {
  public:
-  /// `memory`: what the values that are read may take in all, in bytes.
-  Reader(Bytes reply, std::size_t memory) : rest_(reply), memory_(memory) {}
+  Reader(Bytes reply, const ReadLimits& limits) : rest_(reply), limits_(limits) {}
 
   std::uint8_t byte() { return static_cast<std::uint8_t>(take(1)[0]); }
   /// In the machine's order: both sides are on one machine.
@@ -70,40 +91,30 @@ class Reader {
     if (value > 1) throw MalformedReply();
     return value == 1;
   }
-  /// A view into the reply.
-  Bytes octets() { return take(word()); }
+  /// A copy of what follows its length, charged.
+  Data octets();
   /// The same, checked to be UTF-8.
-  std::string_view text();
-  /// How many elements follow; each takes one byte at least. So a count never makes more be set
+  String text();
+  /// How many elements follow, each of at least so many bytes. So a count never makes more be set
   /// aside than has arrived.
-  std::size_t count() {
-    const std::uint64_t value = word();
-    if (value > rest_.size()) throw MalformedReply();
-    return value;
-  }
-  /// Accounts for so much memory that is taken for a value. A record may be twenty times as large
-  /// as the shortest bytes that claim to be one.
-  void charge(std::size_t size) {
-    if (size > memory_) throw MalformedReply();
-    memory_ -= size;
-  }
+  std::size_t count(std::size_t smallestElement);
+  /// Accounts for a block of so many bytes that is about to be allocated. A record may be twenty
+  /// times as large as the shortest bytes that claim to be one.
+  void charge(std::size_t size);
   /// An honest reply ends where its record ends.
   void end() const {
     if (!rest_.empty()) throw MalformedReply();
   }
 
  private:
-  // Everything that is read comes through here.
-  Bytes take(std::uint64_t size) {
-    // Compared, not added to a position: no length that a liar announces can wrap.
-    if (size > rest_.size()) throw MalformedReply();
-    const Bytes taken = rest_.first(size);
-    rest_ = rest_.subspan(size);
-    return taken;
-  }
+  /// Everything that is read comes through here.
+  Bytes take(std::uint64_t size);
+  void checkTime();
 
   Bytes rest_;
-  std::size_t memory_;
+  ReadLimits limits_;
+  /// Until the clock is looked at again, which costs as much as reading some twenty values.
+  unsigned untilClock_ = 0;
 };
 
 }  // namespace Keelgate::Transport

@@ -136,7 +136,7 @@ TEST_F(Worker, C3SeenFromOutside) {
 
 TEST_F(Worker, C4MemoryIsFixedBeforeTheMessageIsRead) {
   NEEDS_SEAL();
-  constexpr std::size_t base = memoryBudget(0);
+  constexpr std::size_t base = memoryBudget(shortMessage);
   constexpr std::size_t length = 1 << 20;
   const auto eat = [&](std::size_t bytes, std::size_t messageLength) {
     std::string order = "eat " + std::to_string(bytes);

@@ -208,41 +208,6 @@ TEST(C8, WorkersThatSpeakBeforeTheyAreAskedAreNotBelieved) {
   EXPECT_EQ(outcome, "protocolViolation");
 }
 
-/// So many payloads, each the only element of the list before it.
-Data nestedPayloads(std::size_t depth) {
-  PulseUserPayload payload{};
-  const Data flat = Transport::encodeRecord(payload);
-  payload.ostrelMessageList.emplace_back(PulseUserPayload{});
-  const Data one = Transport::encodeRecord(payload);
-  const auto count = std::mismatch(flat.begin(), flat.end(), one.begin()).first - flat.begin();
-  Data all;
-  for (std::size_t i = 1; i < depth; ++i) {
-    all.insert(all.end(), one.begin(), one.begin() + count + 8);
-  }
-  all.insert(all.end(), flat.begin(), flat.end());
-  for (std::size_t i = 1; i < depth; ++i)
-    all.insert(all.end(), flat.begin() + count + 8, flat.end());
-  return all;
-}
-
-/// A payload takes twenty times the memory of the shortest bytes that claim to be one.
-TEST(C8, TheElementsOfARecordAreHeldToItsMemory) {
-  PulseUserPayload payload{};
-  payload.ostrelMessageList.resize(1000);
-  const Data body = Transport::encodeRecord(payload);
-  EXPECT_LT(body.size(), 250'000u);
-  constexpr std::size_t memory = 1000 * sizeof(PulseUserPayload);
-  EXPECT_NO_THROW(Transport::decodeRecord<PulseUserPayload>(body, memory));
-  EXPECT_THROW(Transport::decodeRecord<PulseUserPayload>(body, memory - 1), MalformedReply);
-}
-
-TEST(C8, NestingEndsBeforeTheStackOfTheClientDoes) {
-  constexpr std::size_t most = Transport::maximumDepth;
-  EXPECT_NO_THROW(Transport::decodeRecord<PulseUserPayload>(nestedPayloads(most)));
-  EXPECT_THROW(Transport::decodeRecord<PulseUserPayload>(nestedPayloads(most + 1)), MalformedReply);
-  EXPECT_THROW(Transport::decodeRecord<PulseUserPayload>(nestedPayloads(50'000)), MalformedReply);
-}
-
 template <class R>
 Data recordAgain(Bytes body) {
   return Transport::encodeRecord(Transport::decodeRecord<R>(body));
