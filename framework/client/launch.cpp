@@ -3,8 +3,10 @@
 /// however large, and run in a copy of it whose locks nobody will release.
 #include "framework/client/launch.h"
 
+#include "framework/client/service_location.h"
 #include "framework/contracts/process.h"
 
+#include <fcntl.h>
 #include <spawn.h>
 #include <sys/socket.h>
 #include <sys/syscall.h>
@@ -13,7 +15,6 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <array>
 #include <cerrno>
 #include <csignal>
 #include <cstring>
@@ -23,9 +24,7 @@ namespace Keelgate {
 
 namespace {
 
-constexpr const char* serviceName = "VespKeelgateService";
 constexpr const char* noChannel = "No channel for the service could be made";
-constexpr const char* installedFolder = KEELGATE_SERVICE_FOLDER;
 
 String errorText(int error) {
   return std::generic_category().message(error);
@@ -48,40 +47,20 @@ const char* remedyFor(int error) {
   }
 }
 
-/// Empty where /proc is not mounted: then the folder that was configured is left.
-String ownFolder() {
-  std::array<char, 4096> path;
-  const ssize_t n = readlink("/proc/self/exe", path.data(), path.size());
-  if (n <= 0) return {};
-  const String whole(path.data(), static_cast<std::size_t>(n));
-  return whole.substr(0, whole.rfind('/'));
-}
-
-/// Beside the program, as a build has it; where an install has it, wherever that was moved to;
-/// where this build was configured to be installed, and where its package is.
-String findService() {
-  const String folders[] = {ownFolder(), ownFolder() + "/../libexec/keelgate", installedFolder,
-                            "/usr/libexec/keelgate"};
-  String looked;
-  for (const String& folder : folders) {
-    String path = folder + '/' + serviceName;
-    if (access(path.c_str(), X_OK) == 0) return path;
-    looked += (looked.empty() ? "" : ", ") + path;
-  }
-  throw StartFailure("There is no " + String(serviceName) + " at " + looked +
-                         ": install it there, or say where it is (servicePath, --service-path)",
-                     false);
-}
-
 /// What a fresh process is given: descriptor 3, default signals, and no terminal. In a session of
 /// its own neither an interrupt at the terminal ends it, nor can it type there.
 class SpawnPlan {
  public:
-  explicit SpawnPlan(int control) {
+  SpawnPlan(int control, const TrustedProgram& program) : program_(program) {
     posix_spawn_file_actions_init(&actions_);
+    // First, since its number may be one that is taken below. As the lowest free number it stays
+    // marked to be closed by the execution.
+    const String file = "/proc/self/fd/" + std::to_string(program.file.get());
+    posix_spawn_file_actions_addclose(&actions_, 0);
+    posix_spawn_file_actions_addopen(&actions_, 0, file.c_str(), O_PATH | O_CLOEXEC, 0);
     // Also where it is 3 already: the duplicate is the one that stays open across the execution.
     posix_spawn_file_actions_adddup2(&actions_, control, serviceDescriptor);
-    for (int fd = 0; fd < serviceDescriptor; ++fd) {
+    for (int fd = 1; fd < serviceDescriptor; ++fd) {
       posix_spawn_file_actions_addclose(&actions_, fd);
     }
     // Whatever the application forgot to mark: an open file would be a way out of the sandbox.
@@ -103,27 +82,35 @@ class SpawnPlan {
   SpawnPlan(const SpawnPlan&) = delete;
   SpawnPlan& operator=(const SpawnPlan&) = delete;
 
-  pid_t run(const String& path) const {
-    String name = path;
+  pid_t run() const {
+    String name = program_.path;
     char* const arguments[] = {name.data(), nullptr};
     // Environments hold secrets, and variables that change what a program does.
     char* const environment[] = {nullptr};
     pid_t pid = -1;
     const int error =
-        posix_spawn(&pid, path.c_str(), &actions_, &attributes_, arguments, environment);
+        posix_spawn(&pid, "/proc/self/fd/0", &actions_, &attributes_, arguments, environment);
     // These pass with the load on the machine; the others don't.
     if (error == EAGAIN || error == ENOMEM) {
       throw shortage("The service could not be started", error);
     }
+    const String file = "/proc/self/fd/" + std::to_string(program_.file.get());
+    if (error == ENOENT && access(file.c_str(), F_OK) != 0) {
+      throw StartFailure("The service " + program_.path +
+                             " could not be started: the file that was checked is executed through "
+                             "/proc/self/fd, and /proc is not mounted, or is another namespace's",
+                         false);
+    }
     if (error != 0) {
-      throw StartFailure("The service " + path + " could not be started: " + errorText(error) +
-                             "; it must be an executable file for this machine",
+      throw StartFailure("The service " + program_.path + " could not be started: " +
+                             errorText(error) + "; it must be an executable file for this machine",
                          false);
     }
     return pid;
   }
 
  private:
+  const TrustedProgram& program_;
   posix_spawn_file_actions_t actions_;
   posix_spawnattr_t attributes_;
 };
@@ -135,7 +122,7 @@ StartFailure shortage(std::string_view what, int error) {
 }
 
 ServiceHandles launchService(const String& path, DescriptorBook& book) {
-  const String program = path.empty() ? findService() : path;
+  const TrustedProgram program = locateService(path, book);
   int ends[2];
   // Packets keep their bounds: nobody can leave half a frame in the way of the next.
   if (socketpair(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0, ends) != 0) {
@@ -143,7 +130,7 @@ ServiceHandles launchService(const String& path, DescriptorBook& book) {
   }
   ServiceHandles handles{.control = Descriptor(book, ends[0]), .launcher = {}};
   const Descriptor theirs(book, ends[1]);
-  const pid_t pid = SpawnPlan(theirs.get()).run(program);
+  const pid_t pid = SpawnPlan(theirs.get(), program).run();
   handles.launcher = Descriptor(book, static_cast<int>(syscall(SYS_pidfd_open, pid, 0)));
   // Where the application ignores SIGCHLD the process may be gone already: then the handshake
   // finds the channel closed, and there is nothing to signal.

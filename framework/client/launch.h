@@ -39,8 +39,7 @@ struct ServiceHandles {
   Descriptor launcher;
 };
 
-/// Starts the program, or where `path` is empty the VespKeelgateService beside the running program
-/// or in the installed libexec folder. It gets an empty environment, its own session and nothing
+/// Starts the program that locateService finds. It gets an empty environment, its own session and nothing
 /// but descriptor 3. Throws StartFailure. Callable from any thread. Not waited for: whether it
 /// works is for the handshake to tell.
 ServiceHandles launchService(const String& path, DescriptorBook& book);

@@ -154,6 +154,8 @@ Start startZygote(const KeelgateServer& server, const Tether& tether, bool group
 
 [[noreturn]] void launch(const KeelgateServer& server) try {
   resetSignals();
+  // Executed by its descriptor it would be called after that.
+  prctl(PR_SET_NAME, "VespKeelgateService");
   // Before anything is made: what the one who starts us left open must not reach a worker.
   Sandbox::keepOnly(serviceDescriptor);
   const bool groupsLeft = Sandbox::leaveGroups();

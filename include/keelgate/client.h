@@ -68,7 +68,8 @@ class KEELGATE_API Client {
     /// Refuse to run where namespaces or Landlock are missing. Without it a missing wall is one
     /// line of the log, once for each client.
     bool requireLayers = false;
-    /// The VespKeelgateService to start; empty: the installed one, or the one beside the command.
+    /// The VespKeelgateService to start; empty: the one of the tree that this library is in. Its
+    /// file and all folders above must belong to root or the caller and be writable by nobody else.
     String servicePath;
     /// The socket of an activated service, which is used in place of a started one. A path; it goes
     /// before `servicePath`.

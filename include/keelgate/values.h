@@ -6,6 +6,10 @@
 /// std::bad_alloc.
 #pragma once
 
+#if __cplusplus < 202002L
+#error "Keelgate's headers need C++20: compile with -std=c++20 or later"
+#endif
+
 #include <array>
 #include <compare>
 #include <cstddef>

@@ -1,0 +1,119 @@
+// SPDX-License-Identifier: Apache-2.0
+// C15: a program that somebody else than root or the caller can replace is never executed.
+#include "framework/client/service_location.h"
+#include "framework/client/launch.h"
+
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <filesystem>
+#include <fstream>
+#include <functional>
+#include <vector>
+
+namespace Keelgate {
+namespace {
+
+namespace fs = std::filesystem;
+
+constexpr uid_t stranger = 12'345;
+
+/// /tmp/…/{outer/inner/service, link -> outer}, all of it the caller's alone.
+class ServiceLocation : public testing::Test {
+ protected:
+  ServiceLocation() {
+    fs::create_directories(root_ / "outer/inner");
+    write("outer/inner/service", "the right one");
+    fs::create_symlink("outer", root_ / "link");
+    for (const char* made : {"", "outer", "outer/inner", "outer/inner/service"}) {
+      chmod((root_ / made).c_str(), 0755);
+    }
+  }
+  ~ServiceLocation() override { fs::remove_all(root_); }
+
+  void write(const char* name, const char* text) const { std::ofstream(root_ / name) << text; }
+
+  /// "found", or the sentence.
+  String outcome(const char* name = "outer/inner/service") {
+    try {
+      return locateService(root_ / name, book_).file ? "found" : "nothing";
+    } catch (const StartFailure& failure) {
+      return failure.sentence;
+    }
+  }
+
+  DescriptorBook book_{16};
+  fs::path root_ = fs::temp_directory_path() / ("keelgate-located-" + std::to_string(getpid()));
+};
+
+TEST_F(ServiceLocation, FollowsLinksDotsAndRelativePaths) {
+  fs::create_symlink("../outer/./inner", root_ / "outer/again");
+  fs::create_symlink(root_ / "outer/inner", root_ / "whole");
+  fs::create_symlink("round", root_ / "round");
+  for (const char* path : {"outer/inner/service", "link/inner/service", "outer/again/service",
+                           "whole/../inner//./service"}) {
+    EXPECT_EQ(outcome(path), "found") << path;
+  }
+  EXPECT_NE(outcome("round").find("Too many levels of symbolic links"), String::npos);
+  EXPECT_NE(outcome("outer/inner/service/more").find("Not a directory"), String::npos);
+  const fs::path here = fs::current_path();
+  fs::current_path(root_ / "outer");
+  EXPECT_TRUE(locateService("inner/service", book_).file);
+  EXPECT_TRUE(locateService("../link/inner/service", book_).file);
+  fs::current_path(here);
+}
+
+TEST_F(ServiceLocation, RefusesWhatOthersCanReplaceAndSaysWhere) {
+  struct Row {
+    const char* what;
+    const char* place;
+    mode_t mode;
+    uid_t owner;
+    const char* sentence;
+  };
+  const uid_t self = geteuid();
+  const Row rows[] = {
+      {"a file for its group", "outer/inner/service", 0775, self, "/inner/service may be written"},
+      {"a file for all", "outer/inner/service", 0757, self, "/inner/service may be written"},
+      {"its folder", "outer/inner", 0777, self, "/inner may be written by others"},
+      {"a folder above", "outer", 0775, self, "outer may be written by others"},
+      {"a sticky folder", "outer", 01777, self, "found"},
+      {"a stranger's file", "outer/inner/service", 0755, stranger, "belongs to user 12345"},
+      {"a stranger's folder", "outer/inner", 0755, stranger, "/inner belongs to user 12345"},
+      {"a stranger's folder above", "outer", 0755, stranger, "outer belongs to user 12345"},
+      {"a stranger's sticky folder", "outer", 01777, stranger, "outer belongs to user 12345"},
+  };
+  for (const Row& row : rows) {
+    if (row.owner != self && self != 0) continue;
+    const fs::path place = root_ / row.place;
+    ASSERT_EQ(chown(place.c_str(), row.owner, static_cast<gid_t>(-1)), 0);
+    ASSERT_EQ(chmod(place.c_str(), row.mode), 0);
+    for (const char* path : {"outer/inner/service", "link/inner/service"}) {
+      EXPECT_NE(outcome(path).find(row.sentence), String::npos) << row.what << outcome(path);
+    }
+    ASSERT_EQ(chown(place.c_str(), self, static_cast<gid_t>(-1)), 0);
+    ASSERT_EQ(chmod(place.c_str(), 0755), 0);
+  }
+}
+
+TEST_F(ServiceLocation, RefusesALinkThatAStrangerMade) {
+  if (geteuid() != 0) GTEST_SKIP() << "only root can give a link away";
+  ASSERT_EQ(lchown((root_ / "link").c_str(), stranger, stranger), 0);
+  EXPECT_NE(outcome("link/inner/service").find("link belongs to user 12345"), String::npos);
+}
+
+TEST_F(ServiceLocation, KeepsTheFileThatWasLookedAt) {
+  const fs::path service = root_ / "outer/inner/service";
+  struct stat before {};
+  ASSERT_EQ(stat(service.c_str(), &before), 0);
+  const TrustedProgram program = locateService(service, book_);
+  write("another", "another one");
+  fs::rename(root_ / "another", service);
+  struct stat held {};
+  ASSERT_EQ(fstat(program.file.get(), &held), 0);
+  EXPECT_EQ(held.st_ino, before.st_ino);
+}
+
+}  // namespace
+}  // namespace Keelgate
