@@ -51,13 +51,18 @@ const char* remedyFor(int error) {
 /// its own neither an interrupt at the terminal ends it, nor can it type there.
 class SpawnPlan {
  public:
-  SpawnPlan(int control, const TrustedProgram& program) : program_(program) {
+  SpawnPlan(int control, const TrustedProgram& program)
+      : program_(program), executed_("/proc/self/fd/" + std::to_string(program.file.get())) {
+    // In a chroot, say. Its path will do: only root and the caller can put another file there.
+    if (access(executed_.c_str(), F_OK) != 0) executed_ = program.path;
     posix_spawn_file_actions_init(&actions_);
-    // First, since its number may be one that is taken below. As the lowest free number it stays
-    // marked to be closed by the execution.
-    const String file = "/proc/self/fd/" + std::to_string(program.file.get());
     posix_spawn_file_actions_addclose(&actions_, 0);
-    posix_spawn_file_actions_addopen(&actions_, 0, file.c_str(), O_PATH | O_CLOEXEC, 0);
+    // Before the channel, which may take its number. As the lowest free number it stays marked to
+    // be closed by the execution.
+    if (executed_ != program.path) {
+      posix_spawn_file_actions_addopen(&actions_, 0, executed_.c_str(), O_PATH | O_CLOEXEC, 0);
+      executed_ = "/proc/self/fd/0";
+    }
     // Also where it is 3 already: the duplicate is the one that stays open across the execution.
     posix_spawn_file_actions_adddup2(&actions_, control, serviceDescriptor);
     for (int fd = 1; fd < serviceDescriptor; ++fd) {
@@ -89,17 +94,10 @@ class SpawnPlan {
     char* const environment[] = {nullptr};
     pid_t pid = -1;
     const int error =
-        posix_spawn(&pid, "/proc/self/fd/0", &actions_, &attributes_, arguments, environment);
+        posix_spawn(&pid, executed_.c_str(), &actions_, &attributes_, arguments, environment);
     // These pass with the load on the machine; the others don't.
     if (error == EAGAIN || error == ENOMEM) {
       throw shortage("The service could not be started", error);
-    }
-    const String file = "/proc/self/fd/" + std::to_string(program_.file.get());
-    if (error == ENOENT && access(file.c_str(), F_OK) != 0) {
-      throw StartFailure("The service " + program_.path +
-                             " could not be started: the file that was checked is executed through "
-                             "/proc/self/fd, and /proc is not mounted, or is another namespace's",
-                         false);
     }
     if (error != 0) {
       throw StartFailure("The service " + program_.path + " could not be started: " +
@@ -111,6 +109,8 @@ class SpawnPlan {
 
  private:
   const TrustedProgram& program_;
+  /// By descriptor, or by path where /proc is not to be had.
+  String executed_;
   posix_spawn_file_actions_t actions_;
   posix_spawnattr_t attributes_;
 };

@@ -4,6 +4,7 @@
 #include "framework/contracts/layers.h"
 #include "tests/containment/raw_client.h"
 
+#include <fcntl.h>
 #include <grp.h>
 #include <gtest/gtest.h>
 #include <keelgate/client.h>
@@ -25,11 +26,12 @@
 namespace Keelgate::Test {
 namespace {
 
-/// `call` fails with `error` when its first argument has one of the bits, or always.
+/// `call` fails with `error` when one of its arguments has one of the bits, or always.
 struct Refused {
   int call;
   unsigned error;
   unsigned bits = 0;
+  unsigned argument = 0;
 };
 
 void append(std::vector<sock_filter>& program, const Refused& row) {
@@ -38,7 +40,9 @@ void append(std::vector<sock_filter>& program, const Refused& row) {
   program.push_back(
       BPF_JUMP(BPF_JMP | BPF_JEQ | BPF_K, static_cast<unsigned>(row.call), 0, skipped));
   if (row.bits != 0) {
-    program.push_back(BPF_STMT(BPF_LD | BPF_W | BPF_ABS, offsetof(seccomp_data, args)));
+    program.push_back(
+        BPF_STMT(BPF_LD | BPF_W | BPF_ABS,
+                 static_cast<unsigned>(offsetof(seccomp_data, args) + 8 * row.argument)));
     program.push_back(BPF_JUMP(BPF_JMP | BPF_JSET | BPF_K, row.bits, 0, 1));
   }
   program.push_back(BPF_STMT(BPF_RET | BPF_K, SECCOMP_RET_ERRNO | row.error));
@@ -169,11 +173,11 @@ const std::vector<Environment> environments{
      .missing = namespaces,
      .user = std::vector<gid_t>()},
     {.name = "maps refused, as root",
-     .refused = {{SYS_openat, EACCES}},
+     .refused = {{SYS_openat, EACCES, O_WRONLY, 2}},
      .missing = layerUserNamespace,
      .needs = Needs::privilege},
     {.name = "maps refused, as a user",
-     .refused = {{SYS_openat, EACCES}},
+     .refused = {{SYS_openat, EACCES, O_WRONLY, 2}},
      .missing = layerUserNamespace,
      .user = std::vector<gid_t>(),
      .needs = Needs::usersNamespaces},
