@@ -10,19 +10,28 @@
 
 #include <string_view>
 
-#include <keelgate/describe_begin.h>
-
 namespace Keelgate {
 
 /// A known command. There is no way to hold an unknown one. A client message is held against this
 /// list before a byte of it is looked at. The numbers travel, so a case is never renumbered.
 class CommandType {
  public:
-  NESTED_ENUMERATION(Case, UInt64, sampleMessage = 1, sampleReply = 2, checkInStart = 3,
-                     checkInUpdate = 4, checkInEnd = 5, sessionPrepare = 231,
-                     sessionInvitation = 232, sessionAccept = 233, sessionDecline = 234,
-                     sessionCancel = 235, sessionMessage = 236, sessionDeclineElsewhere = 237,
-                     sessionReinitiate = 238, sessionEnd = 239, livePhoto = 245);
+  KEELGATE_NESTED_ENUMERATION(Case, UInt64,
+      (sampleMessage, 1),
+      (sampleReply, 2),
+      (checkInStart, 3),
+      (checkInUpdate, 4),
+      (checkInEnd, 5),
+      (sessionPrepare, 231),
+      (sessionInvitation, 232),
+      (sessionAccept, 233),
+      (sessionDecline, 234),
+      (sessionCancel, 235),
+      (sessionMessage, 236),
+      (sessionDeclineElsewhere, 237),
+      (sessionReinitiate, 238),
+      (sessionEnd, 239),
+      (livePhoto, 245));
 
   /// The command with this number, or nothing when the framework does not know it.
   static constexpr Optional<CommandType> fromRawValue(UInt64 rawValue) {
@@ -46,5 +55,3 @@ class CommandType {
 };
 
 }  // namespace Keelgate
-
-#include <keelgate/describe_end.h>

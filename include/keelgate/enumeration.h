@@ -1,82 +1,76 @@
 // SPDX-License-Identifier: Apache-2.0
-/// Enumerations that know the names and raw values of their cases.
+/// Enumerations that know the names and raw values of their cases, and enumerations whose cases
+/// carry a record.
 ///
-///     ENUMERATION(Colour, UInt, red = 1, green = 2);
-///     DEFAULTING_ENUMERATION(Shade, UInt, unknown, unknown = 0, dark = 1, light = 2);
+///     KEELGATE_ENUMERATION(Colour, UInt, (red, 1), (green, 2));
+///     KEELGATE_DEFAULTING_ENUMERATION(Shade, UInt, unknown, (unknown, 0), (dark, 1), (light, 2));
+///     KEELGATE_CASES(Shape, (Circle, circle), (Square, square));
 ///
 ///     rawValueOf(Colour::red); nameOf(Colour::red); fromRawValue<Colour>(7); defaulting<Shade>(7);
+///     Shape(Circle{}).index(); Shape::caseNames[0];
 ///
-/// The list is written once: it is the enumerators, and its text is read at compile time for the
-/// table. Every case states its raw value, because the values travel. NESTED_ENUMERATION is the
-/// form for an enumeration inside a struct. The macros exist only between
-/// <keelgate/describe_begin.h> and <keelgate/describe_end.h>.
+/// A list is written once, so the names in JSON and `describe` cannot disagree with the code. Every
+/// case of an enumeration states its raw value, because the values travel.
 ///
 /// Values and pure functions; callable from any thread. Nothing throws.
 #pragma once
 
+#include <keelgate/for_each.h>
 #include <keelgate/values.h>
 
 #include <array>
-#include <cstddef>
 #include <string_view>
 #include <type_traits>
+#include <variant>
+
+#define KEELGATE_ENUMERATION(Name_, Raw_, ...) KEELGATE_ENUMERATION_(, Name_, Raw_, __VA_ARGS__)
+
+/// The form inside a class, where only a friend is found by its argument alone.
+#define KEELGATE_NESTED_ENUMERATION(Name_, Raw_, ...) \
+  KEELGATE_ENUMERATION_(friend, Name_, Raw_, __VA_ARGS__)
+
+/// For codes that a newer sender may add to: an unknown number becomes `default_`.
+#define KEELGATE_DEFAULTING_ENUMERATION(Name_, Raw_, default_, ...) \
+  KEELGATE_ENUMERATION(Name_, Raw_, __VA_ARGS__);                   \
+  constexpr Name_ keelgateDefault(Name_) {                          \
+    return Name_::default_;                                         \
+  }                                                                 \
+  static_assert(true)
+
+/// A struct that derives from a std::variant of the records, in order, and knows the cases' names.
+#define KEELGATE_CASES(Name_, ...)                                                              \
+  struct Name_                                                                                  \
+      : ::Keelgate::Detail::Cases<void KEELGATE_FOR_EACH(KEELGATE_CASE_RECORD_, __VA_ARGS__)> { \
+    using variant::variant;                                                                     \
+    static constexpr std::array caseNames =                                                     \
+        std::to_array<std::string_view>({KEELGATE_FOR_EACH(KEELGATE_CASE_NAME_, __VA_ARGS__)}); \
+  }
+
+#define KEELGATE_ENUMERATION_(friend_, Name_, Raw_, ...)                            \
+  enum class Name_ : Raw_ { KEELGATE_FOR_EACH(KEELGATE_ENUMERATOR_, __VA_ARGS__) }; \
+  friend_ constexpr auto keelgateCases(Name_) {                                     \
+    return std::to_array<::Keelgate::EnumerationCase>(                              \
+        {KEELGATE_FOR_EACH(KEELGATE_ENUMERATION_CASE_, __VA_ARGS__)});              \
+  }                                                                                 \
+  static_assert(true)
+#define KEELGATE_ENUMERATOR_(name_, number_)       name_ = number_,
+#define KEELGATE_ENUMERATION_CASE_(name_, number_) {#name_, number_},
+#define KEELGATE_CASE_RECORD_(Record_, name_)      , Record_
+#define KEELGATE_CASE_NAME_(Record_, name_)        #name_,
 
 namespace Keelgate {
 
-/// A case as `describe` and JSON show it. Never negative: the list takes decimal digits alone, so a
-/// negative number on the wire is an unknown one.
+/// A case as `describe` and JSON show it. Never negative, so that a negative number on the wire is
+/// an unknown one.
 struct EnumerationCase {
   std::string_view name;
   UInt64 rawValue;
 };
 
 namespace Detail {
-
-/// How many names stand in a list with commas, which no name can hold.
-constexpr std::size_t countNames(std::string_view list) {
-  std::size_t n = 1;
-  for (char c : list) n += c == ',' ? 1 : 0;
-  return n;
-}
-
-/// Of the spaces that the preprocessor leaves; it leaves no other white space.
-constexpr std::string_view trim(std::string_view text) {
-  while (!text.empty() && text.front() == ' ') text.remove_prefix(1);
-  while (!text.empty() && text.back() == ' ') text.remove_suffix(1);
-  return text;
-}
-
-/// "a = 1, b = 2" as its cases. A case without a number, or with anything but decimal digits for
-/// one, has no place in a table of raw values: reading it is no constant expression.
-template <std::size_t n>
-constexpr std::array<EnumerationCase, n> casesIn(std::string_view list) {
-  std::array<EnumerationCase, n> cases{};
-  for (EnumerationCase& entry : cases) {
-    const std::string_view item = list.substr(0, list.find(','));
-    list.remove_prefix(item.size() == list.size() ? item.size() : item.size() + 1);
-    const std::size_t equals = item.find('=');
-    entry.name = trim(item.substr(0, equals));
-    const std::string_view digits = trim(item.substr(equals + 1));
-    for (char c : digits) {
-      if (c < '0' || c > '9') throw "a raw value is a decimal number";
-      entry.rawValue = entry.rawValue * 10 + static_cast<UInt64>(c - '0');
-    }
-  }
-  return cases;
-}
-
-/// The same for a list of names alone, as the cases of a variant have it.
-template <std::size_t n>
-constexpr std::array<std::string_view, n> namesIn(std::string_view list) {
-  std::array<std::string_view, n> names{};
-  for (std::string_view& name : names) {
-    const std::string_view item = list.substr(0, list.find(','));
-    list.remove_prefix(item.size() == list.size() ? item.size() : item.size() + 1);
-    name = trim(item);
-  }
-  return names;
-}
-
+/// The void spares the list its first comma.
+template <class, class... Record>
+using Cases = std::variant<Record...>;
 }  // namespace Detail
 
 /// An enumeration that was declared by one of the macros; found by its argument, so that it may
@@ -90,6 +84,12 @@ concept Enumeration = std::is_enum_v<E> && requires(E value) {
 template <class E>
 concept Defaulting = Enumeration<E> && requires(E value) {
   keelgateDefault(value);
+};
+
+/// An enumeration whose cases each carry a record.
+template <class T>
+concept CaseKeyed = requires {
+  T::caseNames;
 };
 
 /// All cases in declaration order. A constant of the program: views of it never end.
@@ -112,7 +112,7 @@ constexpr Optional<E> fromRawValue(UInt64 rawValue) {
   return std::nullopt;
 }
 
-/// The name of a value's case. A value that is no case, which only a cast can make, has none.
+/// The name of a value's case. A value without a case, which only a cast can make, has none.
 template <Enumeration E>
 constexpr std::string_view nameOf(E value) {
   for (const EnumerationCase& entry : casesOf<E>) {
@@ -122,7 +122,7 @@ constexpr std::string_view nameOf(E value) {
 }
 
 /// The case with this raw value, or the enumeration's default. For the few codes for which an
-/// unknown number is no error.
+/// unknown number is not an error.
 template <Defaulting E>
 constexpr E defaulting(UInt64 rawValue) {
   return fromRawValue<E>(rawValue).value_or(keelgateDefault(E{}));

@@ -7,72 +7,63 @@
 
 #include <keelgate/describe.h>
 
-#include <keelgate/describe_begin.h>
-
 namespace VespKeelgateService {
 
 /// Both are required once the dictionary is there.
 struct VespHearthInvitationRequestedCapabilitiesSchema {
-  FIELD(Double, hearthdVersion, "kHearthdVersionKey");
-  FIELD(Array<Int64>, homeSupportedFeatures, "kHearthdSupportedFeaturesKey");
-
-  CODING_KEYS(VespHearthInvitationRequestedCapabilitiesSchema);
+  KEELGATE_SCHEMA(VespHearthInvitationRequestedCapabilitiesSchema,
+      (Double, hearthdVersion, "kHearthdVersionKey"),
+      (Array<Int64>, homeSupportedFeatures, "kHearthdSupportedFeaturesKey"));
 };
 
 /// Any numbers. A rule of an empty dictionary is a rule.
 struct VespHearthInviteeScheduleWeekDayRuleSchema {
-  FIELD(Optional<Int64>, startTime, "HRWeekDayScheduleRuleCodingKeyStartTime");
-  FIELD(Optional<Int64>, endTime, "HRWeekDayScheduleRuleCodingKeyEndTime");
-  FIELD(Optional<Int64>, daysOfTheWeek, "HRWeekDayScheduleRuleCodingKeyDaysOfTheWeek");
-
-  CODING_KEYS(VespHearthInviteeScheduleWeekDayRuleSchema);
+  KEELGATE_SCHEMA(VespHearthInviteeScheduleWeekDayRuleSchema,
+      (Optional<Int64>, startTime, "HRWeekDayScheduleRuleCodingKeyStartTime"),
+      (Optional<Int64>, endTime, "HRWeekDayScheduleRuleCodingKeyEndTime"),
+      (Optional<Int64>, daysOfTheWeek, "HRWeekDayScheduleRuleCodingKeyDaysOfTheWeek"));
 };
 
 struct VespHearthInviteeScheduleYearDayRuleSchema {
-  FIELD(Optional<Date>, startDate, "HRDStartDateKey");
-  FIELD(Optional<Date>, endDate, "HRDEndDateKey");
-
-  CODING_KEYS(VespHearthInviteeScheduleYearDayRuleSchema);
+  KEELGATE_SCHEMA(VespHearthInviteeScheduleYearDayRuleSchema,
+      (Optional<Date>, startDate, "HRDStartDateKey"),
+      (Optional<Date>, endDate, "HRDEndDateKey"));
 };
 
 /// A list is decoded whole or not at all: one mistyped rule fails the message. A schedule with a
 /// rule missing would be another schedule.
 struct VespHearthInviteeScheduleSchema {
-  FIELD(Optional<Array<VespHearthInviteeScheduleWeekDayRuleSchema>>, weekDayRules,
-        "HRWeekDayScheduleRules");
-  FIELD(Optional<Array<VespHearthInviteeScheduleYearDayRuleSchema>>, yearDayRules,
-        "HRYearDayScheduleRules");
-
-  CODING_KEYS(VespHearthInviteeScheduleSchema);
+  KEELGATE_SCHEMA(VespHearthInviteeScheduleSchema,
+      (Optional<Array<VespHearthInviteeScheduleWeekDayRuleSchema>>, weekDayRules,
+       "HRWeekDayScheduleRules"),
+      (Optional<Array<VespHearthInviteeScheduleYearDayRuleSchema>>, yearDayRules,
+       "HRYearDayScheduleRules"));
 };
 
 /// All of it is optional, so an empty dictionary is an invitation.
 struct VespHearthInvitationSchema {
-  FIELD(Optional<String>, homeName, "kHomeName");
-  FIELD(Optional<Date>, invitationExpiryDate, "kInvitationExpiryDateKey");
-  FIELD(Optional<VespHearthInvitationRequestedCapabilitiesSchema>, requestedCapabilities,
-        "kRequestedCapabilitiesKey");
-  FIELD(Optional<Bool>, suppressInviteNotification, "HRDHomeSuppressInviteNotificationKey");
-  FIELD(Optional<Int64>, inviteePrivilege, "HRHomeInviteePrivilegeCodingKey");
-  FIELD(Optional<Bool>, doesHomeHaveCameras, "HRIncomingInvitationHomeHasCamerasCodingKey");
-  FIELD(Optional<VespHearthInviteeScheduleSchema>, inviteeSchedule, "HR.RG.Schedule");
-  // Texts on the wire. One that is no UUID fails the message.
-  FIELD(Optional<UUID>, homeUUID, "kHomeUUID");
-  FIELD(Optional<Data>, controllerPublicKey, "kControllerPublicKey");
-  FIELD(Optional<String>, controllerPairingName, "kControllerPairingNameKey");
-  FIELD(Optional<UUID>, invitationIdentifier, "kInvitationIdentifierKey");
-  // Deliberate: its type is checked and it reaches no record.
-  FIELD(Optional<String>, invitationShareURL, "HRDHomeInvitationShareURLKey");
-  FIELD(Optional<Data>, invitationShareToken, "HRDHomeInvitationShareTokenKey");
-  FIELD(Optional<String>, userId, "kUserIDKey");
-  FIELD(Optional<Int64>, invitationState, "kInvitationStateKey");
-  FIELD(Optional<Int64>, presenceAuthorizationStatus, "kUserPresenceAuthorizationStatusKey");
-  FIELD(Optional<Data>, issuerPublicKeyExternalRepresentation,
-        "HRDIssuerPublicKeyExternalRepresentationKey");
-
-  CODING_KEYS(VespHearthInvitationSchema);
+  KEELGATE_SCHEMA(VespHearthInvitationSchema,
+      (Optional<String>, homeName, "kHomeName"),
+      (Optional<Date>, invitationExpiryDate, "kInvitationExpiryDateKey"),
+      (Optional<VespHearthInvitationRequestedCapabilitiesSchema>, requestedCapabilities,
+       "kRequestedCapabilitiesKey"),
+      (Optional<Bool>, suppressInviteNotification, "HRDHomeSuppressInviteNotificationKey"),
+      (Optional<Int64>, inviteePrivilege, "HRHomeInviteePrivilegeCodingKey"),
+      (Optional<Bool>, doesHomeHaveCameras, "HRIncomingInvitationHomeHasCamerasCodingKey"),
+      (Optional<VespHearthInviteeScheduleSchema>, inviteeSchedule, "HR.RG.Schedule"),
+      // Texts on the wire. One that is no UUID fails the message.
+      (Optional<UUID>, homeUUID, "kHomeUUID"),
+      (Optional<Data>, controllerPublicKey, "kControllerPublicKey"),
+      (Optional<String>, controllerPairingName, "kControllerPairingNameKey"),
+      (Optional<UUID>, invitationIdentifier, "kInvitationIdentifierKey"),
+      // Deliberate: its type is checked and it reaches no record.
+      (Optional<String>, invitationShareURL, "HRDHomeInvitationShareURLKey"),
+      (Optional<Data>, invitationShareToken, "HRDHomeInvitationShareTokenKey"),
+      (Optional<String>, userId, "kUserIDKey"),
+      (Optional<Int64>, invitationState, "kInvitationStateKey"),
+      (Optional<Int64>, presenceAuthorizationStatus, "kUserPresenceAuthorizationStatusKey"),
+      (Optional<Data>, issuerPublicKeyExternalRepresentation,
+       "HRDIssuerPublicKeyExternalRepresentationKey"));
 };
 
 }  // namespace VespKeelgateService
-
-#include <keelgate/describe_end.h>

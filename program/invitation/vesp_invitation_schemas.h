@@ -7,74 +7,65 @@
 #include "program/schema/values.h"
 
 #include <keelgate/describe.h>
-#include <variant>
-
-#include <keelgate/describe_begin.h>
 
 namespace VespKeelgateService {
 
 /// All of it is optional: an empty dictionary is such an invitation.
 struct VespSampleInvitationSchema {
-  FIELD(Optional<String>, title);
-  FIELD(Optional<Date>, date);
-  FIELD(Optional<String>, reason);
-
-  CODING_KEYS(VespSampleInvitationSchema);
+  KEELGATE_SCHEMA(VespSampleInvitationSchema,
+      (Optional<String>, title),
+      (Optional<Date>, date),
+      (Optional<String>, reason));
 };
 
 /// A group of stored credentials is shared.
 struct VespCofferSharingInvitationSchema {
-  FIELD(String, groupID);
-  FIELD(String, shareURL);
-  FIELD(Data, invitationToken);
-  FIELD(String, inviteeHandle);
-  FIELD(Optional<Date>, sentTime);
-  // Deliberate: the display name travels as the group's name.
-  FIELD(Optional<String>, displayName, "groupName");
-
-  CODING_KEYS(VespCofferSharingInvitationSchema);
+  KEELGATE_SCHEMA(VespCofferSharingInvitationSchema,
+      (String, groupID),
+      (String, shareURL),
+      (Data, invitationToken),
+      (String, inviteeHandle),
+      (Optional<Date>, sentTime),
+      // Deliberate: the display name travels as the group's name.
+      (Optional<String>, displayName, "groupName"));
 };
 
 /// An opaque serialised message. It is not looked into here.
 struct VespVitalsInvitationSchema {
-  FIELD(Data, protobufData, "ObjectDataKey");
-
-  CODING_KEYS(VespVitalsInvitationSchema);
+  KEELGATE_SCHEMA(VespVitalsInvitationSchema,
+      (Data, protobufData, "ObjectDataKey"));
 };
 
 /// An item number and an opaque serialised message. It is not looked into here.
 struct VespStrideSharingInvitationSchema {
-  FIELD(Int64, protobufItem, "item");
-  FIELD(Data, protobufPayload, "payload");
-
-  CODING_KEYS(VespStrideSharingInvitationSchema);
+  KEELGATE_SCHEMA(VespStrideSharingInvitationSchema,
+      (Int64, protobufItem, "item"),
+      (Data, protobufPayload, "payload"));
 };
 
 /// Not the framework's type of the same name: this one is the number on the wire. One way so far;
 /// another number is refused before the schema string is looked at.
-ENUMERATION(VespInvitationContextType, Int, dictionary = 1);
+KEELGATE_ENUMERATION(VespInvitationContextType, Int,
+    (dictionary, 1));
 
 /// In the order of the framework's cases.
-struct VespDictionaryContextClientSchema
-    : std::variant<VespSampleInvitationSchema, VespHearthInvitationSchema,
-                   VespCofferSharingInvitationSchema, VespVitalsInvitationSchema,
-                   VespStrideSharingInvitationSchema> {
-  CASES(VespDictionaryContextClientSchema, vespSampleInvitation, vespHearthInvitation,
-        vespCofferSharingInvitation, vespVitalsInvitation, vespStrideSharingInvitation);
-};
+KEELGATE_CASES(VespDictionaryContextClientSchema,
+    (VespSampleInvitationSchema, vespSampleInvitation),
+    (VespHearthInvitationSchema, vespHearthInvitation),
+    (VespCofferSharingInvitationSchema, vespCofferSharingInvitation),
+    (VespVitalsInvitationSchema, vespVitalsInvitation),
+    (VespStrideSharingInvitationSchema, vespStrideSharingInvitation));
 
 /// A level of naming: the framework's record has one too.
-struct VespDictionaryContextData : std::variant<VespDictionaryContextClientSchema> {
-  CASES(VespDictionaryContextData, dictionaryContext);
-};
+KEELGATE_CASES(VespDictionaryContextData,
+    (VespDictionaryContextClientSchema, dictionaryContext));
 
 /// The context names its kind by a schema string, which says how the data are decoded.
 struct VespInvitationContextSchema {
-  FIELD(String, schema, "cS");
-  FIELD(VespInvitationContextType, contextType, "cT");
-  FIELD(VespDictionaryContextData, contextData, "cD");
-
-  CODING_KEYS(VespInvitationContextSchema);
+  KEELGATE_SCHEMA(VespInvitationContextSchema,
+      (String, schema, "cS"),
+      (VespInvitationContextType, contextType, "cT"),
+      (VespDictionaryContextData, contextData, "cD"));
 
   /// Deliberate: reads the data as the dictionary of the kind itself, while the mirror encoding
   /// writes the case-keyed form. The two are not inverse.
@@ -83,14 +74,11 @@ struct VespInvitationContextSchema {
 
 /// `state` and `expiration` travel as they are: neither a range nor a clock is asked.
 struct VespInvitationSchema {
-  FIELD(VespInvitationContextSchema, context, "c");
-  FIELD(Int64, state, "s");
-  FIELD(Optional<Double>, expiration, "e");
-  FIELD(String, identifier, "uID");
-
-  CODING_KEYS(VespInvitationSchema);
+  KEELGATE_SCHEMA(VespInvitationSchema,
+      (VespInvitationContextSchema, context, "c"),
+      (Int64, state, "s"),
+      (Optional<Double>, expiration, "e"),
+      (String, identifier, "uID"));
 };
 
 }  // namespace VespKeelgateService
-
-#include <keelgate/describe_end.h>

@@ -6,29 +6,24 @@
 
 #include <keelgate/describe.h>
 
-#include <keelgate/describe_begin.h>
-
 namespace VespKeelgateService {
 
 /// Only the command is required.
 struct VespCommandResponseSchema {
-  FIELD(Int, command, "c");
-  FIELD(Optional<Int64>, messageId, "i");
-  FIELD(Optional<Data>, messageUUID, "U");
-  FIELD(Optional<Int>, responseStatus, "s");
-  FIELD(Optional<Int>, failReason, "fR");
-  FIELD(Optional<Data>, token, "t");
-  FIELD(Optional<Bool>, internalBuild, "x-internal");
-  FIELD(Optional<Bool>, loggingProfile, "x-logging");
-  FIELD(Optional<String>, applicationId, "qai");
-  FIELD(Optional<Int>, requestType, "qat");
-  FIELD(Optional<Data>, vespSessionId, "qvesp");
-  FIELD(Optional<Bool>, sharedSession, "hlss");
-  FIELD(Optional<Int>, protocolVersion, "qv");
-
-  CODING_KEYS(VespCommandResponseSchema);
+  KEELGATE_SCHEMA(VespCommandResponseSchema,
+      (Int, command, "c"),
+      (Optional<Int64>, messageId, "i"),
+      (Optional<Data>, messageUUID, "U"),
+      (Optional<Int>, responseStatus, "s"),
+      (Optional<Int>, failReason, "fR"),
+      (Optional<Data>, token, "t"),
+      (Optional<Bool>, internalBuild, "x-internal"),
+      (Optional<Bool>, loggingProfile, "x-logging"),
+      (Optional<String>, applicationId, "qai"),
+      (Optional<Int>, requestType, "qat"),
+      (Optional<Data>, vespSessionId, "qvesp"),
+      (Optional<Bool>, sharedSession, "hlss"),
+      (Optional<Int>, protocolVersion, "qv"));
 };
 
 }  // namespace VespKeelgateService
-
-#include <keelgate/describe_end.h>

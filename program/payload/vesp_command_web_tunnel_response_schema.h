@@ -8,29 +8,24 @@
 
 #include <keelgate/describe.h>
 
-#include <keelgate/describe_begin.h>
-
 namespace VespKeelgateService {
 
 /// Only the command is required. "h" is the dictionary of headers here as in a payload.
 struct VespCommandWebTunnelResponseSchema {
-  FIELD(Int, command, "c");
-  FIELD(Optional<Int>, messageId, "i");
-  FIELD(Optional<Data>, messageUUID, "U");
-  FIELD(Optional<Int>, responseStatus, "s");
-  FIELD(Optional<String>, contentType, "cT");
-  FIELD(Optional<Int64>, epochTimeNanos, "e");
-  FIELD(Optional<String>, httpUrl, "u");
-  FIELD(Optional<VespOstrelProtocolHttpHeaders>, httpHeaders, "h");
-  FIELD(Optional<Data>, httpBody, "b");
-  FIELD(Optional<String>, httpBodyUrl, "bu");
-  FIELD(Optional<Data>, httpBodyKey, "bk");
-  FIELD(Optional<Int>, httpResponseStatus, "hs");
-  FIELD(Optional<String>, httpErrorMsg, "hr");
-
-  CODING_KEYS(VespCommandWebTunnelResponseSchema);
+  KEELGATE_SCHEMA(VespCommandWebTunnelResponseSchema,
+      (Int, command, "c"),
+      (Optional<Int>, messageId, "i"),
+      (Optional<Data>, messageUUID, "U"),
+      (Optional<Int>, responseStatus, "s"),
+      (Optional<String>, contentType, "cT"),
+      (Optional<Int64>, epochTimeNanos, "e"),
+      (Optional<String>, httpUrl, "u"),
+      (Optional<VespOstrelProtocolHttpHeaders>, httpHeaders, "h"),
+      (Optional<Data>, httpBody, "b"),
+      (Optional<String>, httpBodyUrl, "bu"),
+      (Optional<Data>, httpBodyKey, "bk"),
+      (Optional<Int>, httpResponseStatus, "hs"),
+      (Optional<String>, httpErrorMsg, "hr"));
 };
 
 }  // namespace VespKeelgateService
-
-#include <keelgate/describe_end.h>

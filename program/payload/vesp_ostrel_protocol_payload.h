@@ -9,204 +9,199 @@
 
 #include <keelgate/describe.h>
 
-#include <keelgate/describe_begin.h>
-
 namespace VespKeelgateService {
 
 /// Values are decoded and never combined: no field decides whether another counts, and no list has
 /// a length that another must have.
 struct VespOstrelProtocolPayload {
-  // What the payload is: the one field that is always there.
-  FIELD(Int, command, "c");
-  FIELD(Optional<Int>, commandContext, "cc");
-  FIELD(Optional<Int>, version, "v");
-  // The content, encrypted by its sender, in one of several wrappings.
-  FIELD(Optional<Data>, payload, "P");
-  FIELD(Optional<Data>, bulkedPayload, "N");
-  FIELD(Optional<Data>, fanoutPayload, "fP");
-  FIELD(Optional<Data>, additionalPayload, "aP");
-  FIELD(Optional<Data>, payloadMetadata, "Pm");
-  // Deliberate: a string here, an integer in the answers to commands.
-  FIELD(Optional<String>, messageId, "i");
-  FIELD(Optional<Data>, messageUUID, "U");
-  FIELD(Optional<String>, queueId, "qI");
-  // Receipts: what the sender wants to hear of the delivery.
-  FIELD(Optional<Bool>, deliveryStatus, "D");
-  FIELD(Optional<VespOstrelProtocolDeliveryContext>, deliveryContext, "Dc");
-  FIELD(Optional<Int>, certifiedDeliveryVersion, "cdv");
-  FIELD(Optional<Data>, certifiedDeliveryRts, "cdr");
-  FIELD(Optional<Bool>, noResponseNeeded, "nr");
-  FIELD(Optional<Bool>, generateDeliveryReceipt, "gd");
-  // Who it is from and for. Tokens are opaque octets.
-  FIELD(Optional<Data>, sessionToken, "sT");
-  FIELD(Optional<Data>, hearthSessionToken, "hT");
-  FIELD(Optional<String>, destinationId, "tP");
-  FIELD(Optional<String>, userAgent, "ua");
-  // An attachment in the chunk store: owner, signature, length in octets, and where to fetch or
-  // put it. Its expiry is in nanoseconds, as the sender counts.
-  FIELD(Optional<String>, BCSOwnerId, "mO");
-  FIELD(Optional<Data>, BCSFileSignature, "mS");
-  FIELD(Optional<Int64>, BCSFileLength, "mL");
-  FIELD(Optional<String>, BCSAuthToken, "mA");
-  FIELD(Optional<String>, BCSAuthUrl, "mR");
-  FIELD(Optional<String>, BCSAuthId, "mU");
-  FIELD(Optional<Array<String>>, BCSDownloadAuthList, "dal");
-  FIELD(Optional<Array<String>>, BCSDownloadUrlList, "dul");
-  FIELD(Optional<String>, BCSDownloadUrl, "dR");
-  FIELD(Optional<String>, BCSUploadUrl, "uR");
-  FIELD(Optional<Int64>, BCSExpiryNanos, "mX");
-  // What surrounds the attachment.
-  FIELD(Optional<Int>, contentVersion, "cV");
-  FIELD(Optional<String>, contentHeaders, "cH");
-  FIELD(Optional<Data>, contentBody, "cB");
-  FIELD(Optional<Data>, contentReferenceSignature, "cR");
-  FIELD(Optional<Int>, attachmentSize, "mT");
-  // Addresses of the exchange.
-  FIELD(Optional<Data>, token, "t");
-  FIELD(Optional<String>, senderId, "sP");
-  FIELD(Optional<String>, senderOpaqueId, "sI");
-  FIELD(Optional<String>, mspId, "mP");
-  // How an exchange went. Times are in nanoseconds, as the sender counts them.
-  FIELD(Optional<Int>, responseStatus, "s");
-  FIELD(Optional<Int64>, epochTimeNanos, "e");
-  FIELD(Optional<Int64>, originalEpochTimeNanos, "oe");
-  // What failed, if something did.
-  FIELD(Optional<Int>, failReason, "fR");
-  FIELD(Optional<Data>, failMessageId, "fU");
-  FIELD(Optional<String>, failMessageIdString, "fM");
-  FIELD(Optional<Int>, failDownloadAttachmentSize, "fFS");
-  FIELD(Optional<Int>, failUploadAttachmentSize, "fS");
-  FIELD(Optional<String>, failReasonMessage, "fRM");
-  FIELD(Optional<Int64>, failTimeElapsed, "fTE");
-  // How to keep and treat the message.
-  FIELD(Optional<String>, encryptionType, "E");
-  FIELD(Optional<Int>, storageFlags, "H");
-  FIELD(Optional<Int>, priority, "pri");
-  // Deliberate: an integer and no boolean, like allowGDR.
-  FIELD(Optional<Int>, senderExpectsAck, "ack");
-  // Payloads inside this one: a copy for each destination, and a bulk of messages.
-  FIELD(Optional<Array<VespOstrelProtocolPayload>>, dstIdTokenList, "dtl");
-  FIELD(Optional<Array<VespOstrelProtocolPayload>>, ostrelMessageList, "mml");
-  // Limits and switches of the delivery.
-  FIELD(Optional<Int>, storageCheckVersion, "scv");
-  FIELD(Optional<Int64>, dateExpirationSeconds, "eX");
-  FIELD(Optional<Int>, ostrelProtocol, "xp");
-  FIELD(Optional<Bool>, internalBuild, "x-internal");
-  FIELD(Optional<Bool>, loggingProfile, "x-logging");
-  FIELD(Optional<Bool>, traceProfile, "x-trace");
-  FIELD(Optional<Bool>, groupMessage, "gm");
-  FIELD(Optional<String>, contentType, "cT");
-  // Deliberate: the six header values stand here and, independently, inside httpHeaders.
-  FIELD(Optional<String>, adhocServiceOverride, "aS");
-  FIELD(Optional<Data>, responseIdentifier, "rI");
-  FIELD(Optional<String>, responseIdentifierString, "ri");
-  FIELD(Optional<String>, strictTransportSecurity, "strict-transport-security");
-  FIELD(Optional<String>, traceId, "x-b3-traceid");
-  FIELD(Optional<String>, splunkHint, "sh");
-  FIELD(Optional<String>, asHttpHeader, "as");
-  // Reports, retries and the parts of a fan-out.
-  FIELD(Optional<Int>, hearthDeliveryStatus, "hD");
-  FIELD(Optional<String>, hearthReportId, "hI");
-  FIELD(Optional<Int>, retryCount, "rc");
-  FIELD(Optional<String>, testOptions, "x-test-opts");
-  FIELD(Optional<Int>, fanoutChunkNumber, "fcn");
-  FIELD(Optional<Bool>, fanoutLastChunk, "flc");
-  FIELD(Optional<String>, url);
-  FIELD(Optional<Int>, visoRetryCount, "frc");
-  // An HTTP exchange in a tunnel.
-  FIELD(Optional<Int>, webtunnelVersion, "wV");
-  FIELD(Optional<String>, httpUrl, "u");
-  FIELD(Optional<VespOstrelProtocolHttpHeaders>, httpHeaders, "h");
-  FIELD(Optional<Data>, httpBody, "b");
-  FIELD(Optional<String>, httpBodyUrl, "bu");
-  FIELD(Optional<Data>, httpBodyKey, "bk");
-  FIELD(Optional<Int>, httpResponseStatus, "hs");
-  FIELD(Optional<String>, httpErrorMsg, "hr");
-  // More switches of the delivery.
-  FIELD(Optional<Bool>, writeToSkyvault, "sv");
-  FIELD(Optional<Bool>, pessimisticCheck, "x-pessimistic");
-  FIELD(Optional<Bool>, unfilteredHeaders, "nH");
-  FIELD(Optional<Int>, deliveryStatusFlags, "O");
-  FIELD(Optional<String>, conferenceURI, "curi");
-  FIELD(Optional<Data>, selfSessionToken, "sst");
-  FIELD(Optional<Data>, queryHash, "qH");
-  FIELD(Optional<Int>, testDropPoint, "x-dp");
-  FIELD(Optional<Bool>, userPlusOne, "up1");
-  FIELD(Optional<Bool>, isInitiatorKey, "is-initiator-key");
-  // Media relays: who asks for which session, and why.
-  FIELD(Optional<Int>, hoplineUserType, "qtu");
-  FIELD(Optional<Int>, errorCode, "eC");
-  FIELD(Optional<Bool>, messageCheckpoint, "mc");
-  FIELD(Optional<Int>, conversationId, "ci");
-  FIELD(Optional<Int>, protocolVersion, "qv");
-  FIELD(Optional<String>, applicationId, "qai");
-  FIELD(Optional<Int>, reason, "hl");
-  // The relay that was used before, and the one in use.
-  FIELD(Optional<Int>, prevErrorCode, "qpec");
-  FIELD(Optional<Data>, prevAccessToken, "qpat");
-  FIELD(Optional<Data>, prevRelayIp, "qpip");
-  FIELD(Optional<Int>, prevTimestamp, "qpt");
-  FIELD(Optional<Data>, activeAccessToken, "qaat");
-  FIELD(Optional<Data>, activeRelayIp, "qaip");
-  FIELD(Optional<Int>, selfAllocTokenCountOld, "qsatc");
-  FIELD(Optional<Int>, selfAllocTokenCount, "qsats");
-  // Deliberate: the relay fields stand here and, independently, inside the relay records.
-  FIELD(Optional<Array<VespHoplinePluginRequest>>, pluginRequests, "qplr");
-  FIELD(Optional<String>, pluginName, "qpln");
-  FIELD(Optional<String>, pluginConfig, "qplc");
-  FIELD(Optional<Int>, pluginStream, "qpls");
-  FIELD(Optional<Bool>, pluginDevMode, "qpld");
-  // The relay session that is asked for.
-  FIELD(Optional<Bool>, hlNewSession, "qns");
-  FIELD(Optional<Int>, requestType, "qat");
-  FIELD(Optional<Data>, vespSessionId, "qvesp");
-  FIELD(Optional<Int>, relayProvider, "hlpr");
-  FIELD(Optional<Bool>, sharedSession, "hlss");
-  FIELD(Optional<String>, groupId, "qgid");
-  FIELD(Optional<Int>, groupMemberCount, "qgmc");
-  FIELD(Optional<Int>, allocateInfoAttribute, "qia");
-  // The relay that was given. Addresses are 4 or 16 octets as the sender has them.
-  FIELD(Optional<Data>, relayIp, "hlip");
-  FIELD(Optional<Data>, relayIpv6, "hlip6");
-  FIELD(Optional<Int>, relayPort, "hlp");
-  FIELD(Optional<Data>, relayAccessToken, "hlst");
-  FIELD(Optional<Data>, relaySessionKey, "hlsk");
-  FIELD(Optional<Data>, relaySessionId, "hlsi");
-  // Times are in milliseconds, as the sender counts them.
-  FIELD(Optional<Int64>, expiryEpochTimeMillis, "qe");
-  FIELD(Optional<Data>, initiatorIp, "qsi");
-  FIELD(Optional<UInt64>, participantId, "hli");
-  // What the relay is and how it is reached.
-  FIELD(Optional<Data>, softwareVersion, "qswv");
-  FIELD(Optional<String>, relayBuildVersion, "hlbv");
-  FIELD(Optional<Int>, relayHighPriorityPort, "hlhpp");
-  FIELD(Optional<Int>, ipFamilyPreference, "qipp");
-  FIELD(Optional<Int64>, allocationEpochTimeMillis, "qsat");
-  // What became of the allocation, for one participant and for each.
-  FIELD(Optional<Int>, allocationStatus, "hls");
-  FIELD(Optional<Array<VespHoplineAllocationStatus>>, allocationStatuses, "qal");
-  FIELD(Optional<Array<VespHoplineSelfAllocToken>>, selfAllocTokenList, "qsatv");
-  FIELD(Optional<Data>, relayReportingBlob, "hlep");
-  FIELD(Optional<Int>, relayServerType, "hlast");
-  FIELD(Optional<Array<VespHoplinePluginAllocation>>, pluginAllocations, "qpla");
-  // What an answer says of the command that it answers.
-  FIELD(Optional<Int>, hlErrorCode, "qec");
-  FIELD(Optional<Int>, originalCommand, "oC");
-  FIELD(Optional<Bool>, isBulkedPayload, "iB");
-  FIELD(Optional<Bool>, wantsAppAck, "wA");
-  FIELD(Optional<String>, errorDomain, "eD");
-  FIELD(Optional<Bool>, expectsPeerResponse, "eR");
-  FIELD(Optional<Int>, allowGDR, "gdr");
-  FIELD(Optional<Int>, sendMode, "sm");
-  // Whom the device knows the sender as.
-  FIELD(Optional<Bool>, isTrustedSender, "htu");
-  FIELD(Optional<Bool>, isUPlusOneKey, "is-u-plus-one-key");
-
-  CODING_KEYS(VespOstrelProtocolPayload);
+  KEELGATE_SCHEMA(VespOstrelProtocolPayload,
+      // What the payload is: the one field that is always there.
+      (Int, command, "c"),
+      (Optional<Int>, commandContext, "cc"),
+      (Optional<Int>, version, "v"),
+      // The content, encrypted by its sender, in one of several wrappings.
+      (Optional<Data>, payload, "P"),
+      (Optional<Data>, bulkedPayload, "N"),
+      (Optional<Data>, fanoutPayload, "fP"),
+      (Optional<Data>, additionalPayload, "aP"),
+      (Optional<Data>, payloadMetadata, "Pm"),
+      // Deliberate: a string here, an integer in the answers to commands.
+      (Optional<String>, messageId, "i"),
+      (Optional<Data>, messageUUID, "U"),
+      (Optional<String>, queueId, "qI"),
+      // Receipts: what the sender wants to hear of the delivery.
+      (Optional<Bool>, deliveryStatus, "D"),
+      (Optional<VespOstrelProtocolDeliveryContext>, deliveryContext, "Dc"),
+      (Optional<Int>, certifiedDeliveryVersion, "cdv"),
+      (Optional<Data>, certifiedDeliveryRts, "cdr"),
+      (Optional<Bool>, noResponseNeeded, "nr"),
+      (Optional<Bool>, generateDeliveryReceipt, "gd"),
+      // Who it is from and for. Tokens are opaque octets.
+      (Optional<Data>, sessionToken, "sT"),
+      (Optional<Data>, hearthSessionToken, "hT"),
+      (Optional<String>, destinationId, "tP"),
+      (Optional<String>, userAgent, "ua"),
+      // An attachment in the chunk store: owner, signature, length in octets, and where to fetch or
+      // put it. Its expiry is in nanoseconds, as the sender counts.
+      (Optional<String>, BCSOwnerId, "mO"),
+      (Optional<Data>, BCSFileSignature, "mS"),
+      (Optional<Int64>, BCSFileLength, "mL"),
+      (Optional<String>, BCSAuthToken, "mA"),
+      (Optional<String>, BCSAuthUrl, "mR"),
+      (Optional<String>, BCSAuthId, "mU"),
+      (Optional<Array<String>>, BCSDownloadAuthList, "dal"),
+      (Optional<Array<String>>, BCSDownloadUrlList, "dul"),
+      (Optional<String>, BCSDownloadUrl, "dR"),
+      (Optional<String>, BCSUploadUrl, "uR"),
+      (Optional<Int64>, BCSExpiryNanos, "mX"),
+      // What surrounds the attachment.
+      (Optional<Int>, contentVersion, "cV"),
+      (Optional<String>, contentHeaders, "cH"),
+      (Optional<Data>, contentBody, "cB"),
+      (Optional<Data>, contentReferenceSignature, "cR"),
+      (Optional<Int>, attachmentSize, "mT"),
+      // Addresses of the exchange.
+      (Optional<Data>, token, "t"),
+      (Optional<String>, senderId, "sP"),
+      (Optional<String>, senderOpaqueId, "sI"),
+      (Optional<String>, mspId, "mP"),
+      // How an exchange went. Times are in nanoseconds, as the sender counts them.
+      (Optional<Int>, responseStatus, "s"),
+      (Optional<Int64>, epochTimeNanos, "e"),
+      (Optional<Int64>, originalEpochTimeNanos, "oe"),
+      // What failed, if something did.
+      (Optional<Int>, failReason, "fR"),
+      (Optional<Data>, failMessageId, "fU"),
+      (Optional<String>, failMessageIdString, "fM"),
+      (Optional<Int>, failDownloadAttachmentSize, "fFS"),
+      (Optional<Int>, failUploadAttachmentSize, "fS"),
+      (Optional<String>, failReasonMessage, "fRM"),
+      (Optional<Int64>, failTimeElapsed, "fTE"),
+      // How to keep and treat the message.
+      (Optional<String>, encryptionType, "E"),
+      (Optional<Int>, storageFlags, "H"),
+      (Optional<Int>, priority, "pri"),
+      // Deliberate: an integer and no boolean, like allowGDR.
+      (Optional<Int>, senderExpectsAck, "ack"),
+      // Payloads inside this one: a copy for each destination, and a bulk of messages.
+      (Optional<Array<VespOstrelProtocolPayload>>, dstIdTokenList, "dtl"),
+      (Optional<Array<VespOstrelProtocolPayload>>, ostrelMessageList, "mml"),
+      // Limits and switches of the delivery.
+      (Optional<Int>, storageCheckVersion, "scv"),
+      (Optional<Int64>, dateExpirationSeconds, "eX"),
+      (Optional<Int>, ostrelProtocol, "xp"),
+      (Optional<Bool>, internalBuild, "x-internal"),
+      (Optional<Bool>, loggingProfile, "x-logging"),
+      (Optional<Bool>, traceProfile, "x-trace"),
+      (Optional<Bool>, groupMessage, "gm"),
+      (Optional<String>, contentType, "cT"),
+      // Deliberate: the six header values stand here and, independently, inside httpHeaders.
+      (Optional<String>, adhocServiceOverride, "aS"),
+      (Optional<Data>, responseIdentifier, "rI"),
+      (Optional<String>, responseIdentifierString, "ri"),
+      (Optional<String>, strictTransportSecurity, "strict-transport-security"),
+      (Optional<String>, traceId, "x-b3-traceid"),
+      (Optional<String>, splunkHint, "sh"),
+      (Optional<String>, asHttpHeader, "as"),
+      // Reports, retries and the parts of a fan-out.
+      (Optional<Int>, hearthDeliveryStatus, "hD"),
+      (Optional<String>, hearthReportId, "hI"),
+      (Optional<Int>, retryCount, "rc"),
+      (Optional<String>, testOptions, "x-test-opts"),
+      (Optional<Int>, fanoutChunkNumber, "fcn"),
+      (Optional<Bool>, fanoutLastChunk, "flc"),
+      (Optional<String>, url),
+      (Optional<Int>, visoRetryCount, "frc"),
+      // An HTTP exchange in a tunnel.
+      (Optional<Int>, webtunnelVersion, "wV"),
+      (Optional<String>, httpUrl, "u"),
+      (Optional<VespOstrelProtocolHttpHeaders>, httpHeaders, "h"),
+      (Optional<Data>, httpBody, "b"),
+      (Optional<String>, httpBodyUrl, "bu"),
+      (Optional<Data>, httpBodyKey, "bk"),
+      (Optional<Int>, httpResponseStatus, "hs"),
+      (Optional<String>, httpErrorMsg, "hr"),
+      // More switches of the delivery.
+      (Optional<Bool>, writeToSkyvault, "sv"),
+      (Optional<Bool>, pessimisticCheck, "x-pessimistic"),
+      (Optional<Bool>, unfilteredHeaders, "nH"),
+      (Optional<Int>, deliveryStatusFlags, "O"),
+      (Optional<String>, conferenceURI, "curi"),
+      (Optional<Data>, selfSessionToken, "sst"),
+      (Optional<Data>, queryHash, "qH"),
+      (Optional<Int>, testDropPoint, "x-dp"),
+      (Optional<Bool>, userPlusOne, "up1"),
+      (Optional<Bool>, isInitiatorKey, "is-initiator-key"),
+      // Media relays: who asks for which session, and why.
+      (Optional<Int>, hoplineUserType, "qtu"),
+      (Optional<Int>, errorCode, "eC"),
+      (Optional<Bool>, messageCheckpoint, "mc"),
+      (Optional<Int>, conversationId, "ci"),
+      (Optional<Int>, protocolVersion, "qv"),
+      (Optional<String>, applicationId, "qai"),
+      (Optional<Int>, reason, "hl"),
+      // The relay that was used before, and the one in use.
+      (Optional<Int>, prevErrorCode, "qpec"),
+      (Optional<Data>, prevAccessToken, "qpat"),
+      (Optional<Data>, prevRelayIp, "qpip"),
+      (Optional<Int>, prevTimestamp, "qpt"),
+      (Optional<Data>, activeAccessToken, "qaat"),
+      (Optional<Data>, activeRelayIp, "qaip"),
+      (Optional<Int>, selfAllocTokenCountOld, "qsatc"),
+      (Optional<Int>, selfAllocTokenCount, "qsats"),
+      // Deliberate: the relay fields stand here and, independently, inside the relay records.
+      (Optional<Array<VespHoplinePluginRequest>>, pluginRequests, "qplr"),
+      (Optional<String>, pluginName, "qpln"),
+      (Optional<String>, pluginConfig, "qplc"),
+      (Optional<Int>, pluginStream, "qpls"),
+      (Optional<Bool>, pluginDevMode, "qpld"),
+      // The relay session that is asked for.
+      (Optional<Bool>, hlNewSession, "qns"),
+      (Optional<Int>, requestType, "qat"),
+      (Optional<Data>, vespSessionId, "qvesp"),
+      (Optional<Int>, relayProvider, "hlpr"),
+      (Optional<Bool>, sharedSession, "hlss"),
+      (Optional<String>, groupId, "qgid"),
+      (Optional<Int>, groupMemberCount, "qgmc"),
+      (Optional<Int>, allocateInfoAttribute, "qia"),
+      // The relay that was given. Addresses are 4 or 16 octets as the sender has them.
+      (Optional<Data>, relayIp, "hlip"),
+      (Optional<Data>, relayIpv6, "hlip6"),
+      (Optional<Int>, relayPort, "hlp"),
+      (Optional<Data>, relayAccessToken, "hlst"),
+      (Optional<Data>, relaySessionKey, "hlsk"),
+      (Optional<Data>, relaySessionId, "hlsi"),
+      // Times are in milliseconds, as the sender counts them.
+      (Optional<Int64>, expiryEpochTimeMillis, "qe"),
+      (Optional<Data>, initiatorIp, "qsi"),
+      (Optional<UInt64>, participantId, "hli"),
+      // What the relay is and how it is reached.
+      (Optional<Data>, softwareVersion, "qswv"),
+      (Optional<String>, relayBuildVersion, "hlbv"),
+      (Optional<Int>, relayHighPriorityPort, "hlhpp"),
+      (Optional<Int>, ipFamilyPreference, "qipp"),
+      (Optional<Int64>, allocationEpochTimeMillis, "qsat"),
+      // What became of the allocation, for one participant and for each.
+      (Optional<Int>, allocationStatus, "hls"),
+      (Optional<Array<VespHoplineAllocationStatus>>, allocationStatuses, "qal"),
+      (Optional<Array<VespHoplineSelfAllocToken>>, selfAllocTokenList, "qsatv"),
+      (Optional<Data>, relayReportingBlob, "hlep"),
+      (Optional<Int>, relayServerType, "hlast"),
+      (Optional<Array<VespHoplinePluginAllocation>>, pluginAllocations, "qpla"),
+      // What an answer says of the command that it answers.
+      (Optional<Int>, hlErrorCode, "qec"),
+      (Optional<Int>, originalCommand, "oC"),
+      (Optional<Bool>, isBulkedPayload, "iB"),
+      (Optional<Bool>, wantsAppAck, "wA"),
+      (Optional<String>, errorDomain, "eD"),
+      (Optional<Bool>, expectsPeerResponse, "eR"),
+      (Optional<Int>, allowGDR, "gdr"),
+      (Optional<Int>, sendMode, "sm"),
+      // Whom the device knows the sender as.
+      (Optional<Bool>, isTrustedSender, "htu"),
+      (Optional<Bool>, isUPlusOneKey, "is-u-plus-one-key"));
 };
 
 static_assert(VespOstrelProtocolPayload::CodingKeys::size == 156);
 
 }  // namespace VespKeelgateService
-
-#include <keelgate/describe_end.h>

@@ -8,70 +8,60 @@
 
 #include <keelgate/describe.h>
 
-#include <keelgate/describe_begin.h>
-
 namespace VespKeelgateService {
 
 /// All of it is optional, here and below: an empty dictionary is a record of absent values.
 struct VespOstrelProtocolHttpHeaders {
-  FIELD(Optional<String>, adhocServiceOverride, "aS");
-  FIELD(Optional<String>, responseIdentifierString, "ri");
-  FIELD(Optional<String>, strictTransportSecurity, "strict-transport-security");
-  FIELD(Optional<String>, traceId, "x-b3-traceid");
-  FIELD(Optional<String>, splunkHint, "sh");
-  FIELD(Optional<String>, asHttpHeader, "as");
-
-  CODING_KEYS(VespOstrelProtocolHttpHeaders);
+  KEELGATE_SCHEMA(VespOstrelProtocolHttpHeaders,
+      (Optional<String>, adhocServiceOverride, "aS"),
+      (Optional<String>, responseIdentifierString, "ri"),
+      (Optional<String>, strictTransportSecurity, "strict-transport-security"),
+      (Optional<String>, traceId, "x-b3-traceid"),
+      (Optional<String>, splunkHint, "sh"),
+      (Optional<String>, asHttpHeader, "as"));
 };
 
 struct VespOstrelProtocolDeliveryContext {
-  FIELD(Optional<Int>, count, "c");
-
-  CODING_KEYS(VespOstrelProtocolDeliveryContext);
+  KEELGATE_SCHEMA(VespOstrelProtocolDeliveryContext,
+      (Optional<Int>, count, "c"));
 };
 
 struct VespHoplinePluginRequest {
-  FIELD(Optional<String>, pluginName, "qpln");
-  FIELD(Optional<String>, pluginConfig, "qplc");
-  FIELD(Optional<Int>, pluginStream, "qpls");
-  FIELD(Optional<Bool>, pluginDevMode, "qpld");
-
-  CODING_KEYS(VespHoplinePluginRequest);
+  KEELGATE_SCHEMA(VespHoplinePluginRequest,
+      (Optional<String>, pluginName, "qpln"),
+      (Optional<String>, pluginConfig, "qplc"),
+      (Optional<Int>, pluginStream, "qpls"),
+      (Optional<Bool>, pluginDevMode, "qpld"));
 };
 
 /// For one participant; "t" and "tP" are its token and its destination.
 struct VespHoplineAllocationStatus {
-  FIELD(Optional<UInt64>, participantId, "hli");
-  FIELD(Optional<Int>, allocationStatus, "hls");
-  FIELD(Optional<Data>, token, "t");
-  FIELD(Optional<String>, destinationId, "tP");
-
-  CODING_KEYS(VespHoplineAllocationStatus);
+  KEELGATE_SCHEMA(VespHoplineAllocationStatus,
+      (Optional<UInt64>, participantId, "hli"),
+      (Optional<Int>, allocationStatus, "hls"),
+      (Optional<Data>, token, "t"),
+      (Optional<String>, destinationId, "tP"));
 };
 
 /// The keys are those of the payload's own relay.
 struct VespHoplineSelfAllocToken {
-  FIELD(Optional<Data>, relayIp, "hlip");
-  FIELD(Optional<Data>, relayIpv6, "hlip6");
-  FIELD(Optional<Int>, relayPort, "hlp");
-  FIELD(Optional<Data>, relaySessionKey, "hlsk");
-  FIELD(Optional<Data>, relaySessionId, "hlsi");
-  FIELD(Optional<Data>, relayAccessToken, "hlst");
-  FIELD(Optional<Int>, relayProvider, "hlpr");
-
-  CODING_KEYS(VespHoplineSelfAllocToken);
+  KEELGATE_SCHEMA(VespHoplineSelfAllocToken,
+      (Optional<Data>, relayIp, "hlip"),
+      (Optional<Data>, relayIpv6, "hlip6"),
+      (Optional<Int>, relayPort, "hlp"),
+      (Optional<Data>, relaySessionKey, "hlsk"),
+      (Optional<Data>, relaySessionId, "hlsi"),
+      (Optional<Data>, relayAccessToken, "hlst"),
+      (Optional<Int>, relayProvider, "hlpr"));
 };
 
 struct VespHoplinePluginAllocation {
-  FIELD(Optional<String>, pluginName, "qpln");
-  FIELD(Optional<Int>, pluginStream, "qpls");
-  FIELD(Optional<UInt64>, participantId, "hli");
-  FIELD(Optional<Data>, relaySessionKey, "hlsk");
-  FIELD(Optional<Data>, relayAccessToken, "hlst");
-
-  CODING_KEYS(VespHoplinePluginAllocation);
+  KEELGATE_SCHEMA(VespHoplinePluginAllocation,
+      (Optional<String>, pluginName, "qpln"),
+      (Optional<Int>, pluginStream, "qpls"),
+      (Optional<UInt64>, participantId, "hli"),
+      (Optional<Data>, relaySessionKey, "hlsk"),
+      (Optional<Data>, relayAccessToken, "hlst"));
 };
 
 }  // namespace VespKeelgateService
-
-#include <keelgate/describe_end.h>

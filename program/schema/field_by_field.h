@@ -67,21 +67,27 @@ constexpr bool isSameMember(A one, B other) {
   }
 }
 
+/// Of each position, whether the two fields have one type.
+template <class S, class R>
+constexpr auto sameTypes() {
+  const auto from = typeTags<S>();
+  const auto to = typeTags<R>();
+  std::array<bool, Keelgate::FieldsOf<R>::size> same{};
+  for (std::size_t i = 0; i < same.size(); ++i) same[i] = from[i] == to[i];
+  return same;
+}
+
 /// Whether every field whose type changes has a label. A label may stand on a field whose type
 /// agrees, too: then it replaces the value.
 template <class S, class R, auto... members>
 consteval bool changesAreLabelled() {
-  std::array<bool, Keelgate::FieldsOf<R>::size> labelled{};
+  const auto same = sameTypes<S, R>();
+  bool all = true;
   std::size_t n = 0;
   Keelgate::FieldsOf<R>::each([&]([[maybe_unused]] auto field) {
-    labelled[n++] = (isSameMember(members, field.member) || ...);
+    all = all && (same[n++] || ... || isSameMember(members, field.member));
   });
-  const auto from = typeTags<S>();
-  const auto to = typeTags<R>();
-  for (std::size_t i = 0; i < n; ++i) {
-    if (from[i] != to[i] && !labelled[i]) return false;
-  }
-  return true;
+  return all;
 }
 
 }  // namespace Detail
@@ -105,11 +111,18 @@ R fieldByField(S&& schema, Detail::Labelled<members, V>... changes) {
     static_assert(Detail::changesAreLabelled<S, R, members...>(),
                   "fieldByField: a field changes its type on the way and has no label");
   }
+  // Where the schema's values are, by position. Only those whose type is the same on both sides are
+  // looked at again, as what they are.
+  std::array<void*, From::size> values{};
+  std::size_t n = 0;
+  From::each([&](auto field) { values[n++] = &(schema.*field.member); });
+  constexpr auto same = Detail::sameTypes<S, R>();
   R record{};
-  From::eachWith(To(), [&](auto from, auto to) {
-    if constexpr (std::same_as<typename decltype(from)::Value, typename decltype(to)::Value>) {
-      record.*to.member = std::move(schema.*from.member);
-    }
+  n = 0;
+  To::each([&](auto field) {
+    using Value = typename decltype(field)::Value;
+    if (same[n]) record.*field.member = std::move(*static_cast<Value*>(values[n]));
+    ++n;
   });
   ((record.*members = std::move(changes.value)), ...);
   return record;

@@ -8,6 +8,7 @@
 
 #include <keelgate/describe.h>
 
+#include <algorithm>
 #include <array>
 #include <bit>
 #include <cstddef>

@@ -6,20 +6,15 @@
 
 #include <keelgate/describe.h>
 
-#include <keelgate/describe_begin.h>
-
 namespace VespKeelgateService {
 
 /// Deliberate: the name travels as "client". A key "clientName" is an unknown one.
 struct VespSampleMessageSchema {
-  FIELD(Int, command);
-  FIELD(String, clientName, "client");
-  FIELD(Optional<Date>, date);
-  FIELD(Optional<Int>, version);
-
-  CODING_KEYS(VespSampleMessageSchema);
+  KEELGATE_SCHEMA(VespSampleMessageSchema,
+      (Int, command),
+      (String, clientName, "client"),
+      (Optional<Date>, date),
+      (Optional<Int>, version));
 };
 
 }  // namespace VespKeelgateService
-
-#include <keelgate/describe_end.h>

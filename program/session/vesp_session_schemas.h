@@ -8,79 +8,73 @@
 #include <keelgate/describe.h>
 #include <keelgate/records/vesp_session.h>
 
-#include <keelgate/describe_begin.h>
-
 namespace VespKeelgateService {
 
 /// The largest, and the only one that says how media travel.
 struct VespSessionInvitationSchema {
   using TransportType = Keelgate::VespSessionInvitation::TransportType;
 
-  FIELD(TransportType, transportType, "t");
-  FIELD(UInt, version, "v");
-  FIELD(Optional<UInt>, connectionCountHint, "ch");
-  FIELD(Optional<Bool>, disableEncryption, "de");
-  FIELD(Optional<Bool>, singleChannelDirectMode, "sd");
-  FIELD(Optional<Bool>, useStunMessageIntegrity, "mi");
-  FIELD(Optional<Bool>, useSecureHLControlMessage, "shl");
-  FIELD(Optional<Data>, blob, "b");
-  FIELD(Optional<Bool>, messageIsRealTime, "rt");
-  // Deliberate: spelt out, unlike its neighbours.
-  FIELD(Optional<Data>, unauthenticatedPublicKey, "unauthenticated-public-key");
-  FIELD(Optional<Bool>, assumeRemoteDeviceEncryption, "re");
-  FIELD(Optional<Data>, sessionMessageContext, "c");
-  FIELD(Optional<Bool>, usePhoneTetherLocalMessage, "pclm");
-  FIELD(String, participantID, "p");
-  // Deliberate: the one boolean that is required.
-  FIELD(Bool, declineOnNetworkError, "d");
-  FIELD(String, sessionID, "s");
-  FIELD(Optional<Bool>, needsToWaitForPreConnectionData, "pcd");
-  FIELD(Optional<Bool>, useCloudPairedControlChannel, "cc");
-
-  CODING_KEYS(VespSessionInvitationSchema);
+  KEELGATE_SCHEMA(VespSessionInvitationSchema,
+      (TransportType, transportType, "t"),
+      (UInt, version, "v"),
+      (Optional<UInt>, connectionCountHint, "ch"),
+      (Optional<Bool>, disableEncryption, "de"),
+      (Optional<Bool>, singleChannelDirectMode, "sd"),
+      (Optional<Bool>, useStunMessageIntegrity, "mi"),
+      (Optional<Bool>, useSecureHLControlMessage, "shl"),
+      (Optional<Data>, blob, "b"),
+      (Optional<Bool>, messageIsRealTime, "rt"),
+      // Deliberate: spelt out, unlike its neighbours.
+      (Optional<Data>, unauthenticatedPublicKey, "unauthenticated-public-key"),
+      (Optional<Bool>, assumeRemoteDeviceEncryption, "re"),
+      (Optional<Data>, sessionMessageContext, "c"),
+      (Optional<Bool>, usePhoneTetherLocalMessage, "pclm"),
+      (String, participantID, "p"),
+      // Deliberate: the one boolean that is required.
+      (Bool, declineOnNetworkError, "d"),
+      (String, sessionID, "s"),
+      (Optional<Bool>, needsToWaitForPreConnectionData, "pcd"),
+      (Optional<Bool>, useCloudPairedControlChannel, "cc"));
 };
 
 /// Keys that it shares with the invitation mean the same, but for "pclm".
 struct VespSessionAcceptSchema {
-  FIELD(UInt, version, "v");
-  FIELD(Optional<Data>, blob, "b");
-  FIELD(String, sessionID, "s");
-  FIELD(String, participantID, "p");
-  FIELD(Optional<Data>, sessionMessageContext, "c");
-  FIELD(Optional<Bool>, useCloudPairedControlChannel, "cc");
-  FIELD(Optional<Bool>, useStunMessageIntegrity, "mi");
-  FIELD(Optional<Bool>, useSecureHLControlMessage, "shl");
-  FIELD(Optional<Data>, unauthenticatedPublicKey, "unauthenticated-public-key");
-  // What the sender of the invitation calls its own is the other side's here.
-  FIELD(Optional<Bool>, remoteUsePhoneTetherLocalMessage, "pclm");
-  FIELD(Optional<Data>, remoteKeyMaterialData, "k");
-  // Deliberate: signed, unlike the version.
-  FIELD(Optional<Int>, remoteSSRC, "ss");
-  FIELD(Optional<Int>, remoteSecStart, "sq");
-
-  CODING_KEYS(VespSessionAcceptSchema);
+  KEELGATE_SCHEMA(VespSessionAcceptSchema,
+      (UInt, version, "v"),
+      (Optional<Data>, blob, "b"),
+      (String, sessionID, "s"),
+      (String, participantID, "p"),
+      (Optional<Data>, sessionMessageContext, "c"),
+      (Optional<Bool>, useCloudPairedControlChannel, "cc"),
+      (Optional<Bool>, useStunMessageIntegrity, "mi"),
+      (Optional<Bool>, useSecureHLControlMessage, "shl"),
+      (Optional<Data>, unauthenticatedPublicKey, "unauthenticated-public-key"),
+      // What the sender of the invitation calls its own is the other side's here.
+      (Optional<Bool>, remoteUsePhoneTetherLocalMessage, "pclm"),
+      (Optional<Data>, remoteKeyMaterialData, "k"),
+      // Deliberate: signed, unlike the version.
+      (Optional<Int>, remoteSSRC, "ss"),
+      (Optional<Int>, remoteSecStart, "sq"));
 };
 
 struct VespSessionDeclineSchema {
-  FIELD(UInt, version, "v");
-  FIELD(String, sessionID, "s");
-  FIELD(String, participantID, "p");
-  FIELD(Optional<Data>, sessionMessageContext, "c");
-
-  CODING_KEYS(VespSessionDeclineSchema);
+  KEELGATE_SCHEMA(VespSessionDeclineSchema,
+      (UInt, version, "v"),
+      (String, sessionID, "s"),
+      (String, participantID, "p"),
+      (Optional<Data>, sessionMessageContext, "c"));
 };
 
 /// The reason may be absent, but not unknown.
 struct VespSessionCancelSchema {
   using VespSessionEndedReason = Keelgate::VespSessionCancel::VespSessionEndedReason;
 
-  FIELD(UInt, version, "v");
-  FIELD(String, sessionID, "s");
-  FIELD(String, participantID, "p");
-  FIELD(Optional<VespSessionEndedReason>, remoteEndReason, "e");
-  FIELD(Optional<Data>, sessionMessageContext, "c");
-
-  CODING_KEYS(VespSessionCancelSchema);
+  KEELGATE_SCHEMA(VespSessionCancelSchema,
+      (UInt, version, "v"),
+      (String, sessionID, "s"),
+      (String, participantID, "p"),
+      (Optional<VespSessionEndedReason>, remoteEndReason, "e"),
+      (Optional<Data>, sessionMessageContext, "c"));
 };
 
 /// The subcommand is required, and no number stands for an unknown one.
@@ -88,14 +82,11 @@ struct VespSessionReinitiateSchema {
   using VespSessionReinitiateSubcommand =
       Keelgate::VespSessionReinitiate::VespSessionReinitiateSubcommand;
 
-  FIELD(UInt, version, "v");
-  FIELD(String, sessionID, "s");
-  FIELD(String, participantID, "p");
-  FIELD(VespSessionReinitiateSubcommand, sessionReinitiateSubcommand, "ri");
-
-  CODING_KEYS(VespSessionReinitiateSchema);
+  KEELGATE_SCHEMA(VespSessionReinitiateSchema,
+      (UInt, version, "v"),
+      (String, sessionID, "s"),
+      (String, participantID, "p"),
+      (VespSessionReinitiateSubcommand, sessionReinitiateSubcommand, "ri"));
 };
 
 }  // namespace VespKeelgateService
-
-#include <keelgate/describe_end.h>

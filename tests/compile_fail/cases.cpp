@@ -6,32 +6,30 @@
 #include "program/schema/key_table.h"
 #include "program/schema/values.h"
 
-#include <keelgate/describe_begin.h>
-
 namespace VespKeelgateService {
 
 struct Inner {
-  FIELD(Int, n);
-  CODING_KEYS(Inner);
+  KEELGATE_SCHEMA(Inner,
+      (Int, n));
 };
 
 struct InnerRecord {
-  FIELD(Int, n);
-  LABELS(InnerRecord);
+  KEELGATE_RECORD(InnerRecord,
+      (Int, n));
 };
 
 struct Schema {
-  FIELD(Int, one, "1");
-  FIELD(String, two, "2");
-  FIELD(Optional<Inner>, three);
-  CODING_KEYS(Schema);
+  KEELGATE_SCHEMA(Schema,
+      (Int, one, "1"),
+      (String, two, "2"),
+      (Optional<Inner>, three));
 };
 
 struct Record {
-  FIELD(Int, one);
-  FIELD(String, two);
-  FIELD(Optional<InnerRecord>, three);
-  LABELS(Record);
+  KEELGATE_RECORD(Record,
+      (Int, one),
+      (String, two),
+      (Optional<InnerRecord>, three));
 };
 
 static_assert(KeyTable<Schema>::find("1") == 0);

@@ -13,13 +13,13 @@ compiler, root = sys.argv[1:]
 
 # What stands there, the mistake in its place, and what the compiler must say.
 mistakes = [
-    ("CODING_KEYS(Schema);", 'FIELD(Int, four, "1");\n  CODING_KEYS(Schema);',
+    ("(Optional<Inner>, three)", '(Optional<Inner>, three), (Int, four, "1")',
      "two fields of a schema travel under one wire key"),
-    ("CODING_KEYS(Schema);", "Int four;\n  CODING_KEYS(Schema);",
+    ("(Optional<Inner>, three));", "(Optional<Inner>, three));\n  Int four;",
      "a member of the schema is not in its list of fields"),
-    ("CODING_KEYS(Schema);", "FIELD(Int, four);\n  CODING_KEYS(Schema);",
+    ("(Optional<Inner>, three)", "(Optional<Inner>, three), (Int, four)",
      "the schema and the record have different numbers of fields"),
-    ("FIELD(Int, one);\n  FIELD(String, two);", "FIELD(String, two);\n  FIELD(Int, one);",
+    ("(Int, one),\n      (String, two),", "(String, two), (Int, one),",
      "has another name than the schema's field"),
     (", label<&Record::three> = Optional<InnerRecord>()", "",
      "a field changes its type on the way and has no label"),

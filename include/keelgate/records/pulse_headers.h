@@ -6,23 +6,18 @@
 #include <keelgate/describe.h>
 #include <keelgate/values.h>
 
-#include <keelgate/describe_begin.h>
-
 namespace Keelgate {
 
 /// Every value is as it was received. Whoever sends them on checks them first: nothing here keeps a
 /// line end out of a value, and with it a header that somebody else wrote.
 struct PulseUserPayloadHttpHeaders {
-  FIELD(Optional<String>, adhocServiceOverride);
-  FIELD(Optional<String>, responseIdentifierString);
-  FIELD(Optional<String>, strictTransportSecurity);
-  FIELD(Optional<String>, traceId);
-  FIELD(Optional<String>, splunkHint);
-  FIELD(Optional<String>, asHttpHeader);
-
-  LABELS(PulseUserPayloadHttpHeaders);
+  KEELGATE_RECORD(PulseUserPayloadHttpHeaders,
+      (Optional<String>, adhocServiceOverride),
+      (Optional<String>, responseIdentifierString),
+      (Optional<String>, strictTransportSecurity),
+      (Optional<String>, traceId),
+      (Optional<String>, splunkHint),
+      (Optional<String>, asHttpHeader));
 };
 
 }  // namespace Keelgate
-
-#include <keelgate/describe_end.h>

@@ -8,30 +8,26 @@
 #include <keelgate/records/vesp_sample_message.h>
 #include <keelgate/records/vesp_session.h>
 #include <keelgate/records/waymark_message.h>
-#include <variant>
-
-#include <keelgate/describe_begin.h>
 
 namespace Keelgate {
 
 /// One case for each kind. A new kind of client message is one more alternative here. In a
 /// std::visit the compiler then shows every place that has to know it. The position of an
 /// alternative travels between service and client, which are always of one build.
-struct VespClientMessageType
-    : std::variant<VespSampleMessage, VespSessionInvitation, VespSessionAccept, VespSessionDecline,
-                   VespSessionCancel, VespSessionReinitiate, VespRestrictedMessage,
-                   WaymarkMessage> {
-  CASES(VespClientMessageType, vespSampleMessage, sessionInvitation, sessionAccept, sessionDecline,
-        sessionCancel, sessionReinitiate, messageTypeRestricted, waymarkMessage);
-};
+KEELGATE_CASES(VespClientMessageType,
+    (VespSampleMessage, vespSampleMessage),
+    (VespSessionInvitation, sessionInvitation),
+    (VespSessionAccept, sessionAccept),
+    (VespSessionDecline, sessionDecline),
+    (VespSessionCancel, sessionCancel),
+    (VespSessionReinitiate, sessionReinitiate),
+    (VespRestrictedMessage, messageTypeRestricted),
+    (WaymarkMessage, waymarkMessage));
 
 /// The one record whose JSON is not an object of its own, but its case.
 struct VespClientMessageResult {
-  FIELD(VespClientMessageType, result);
-
-  LABELS(VespClientMessageResult);
+  KEELGATE_RECORD(VespClientMessageResult,
+      (VespClientMessageType, result));
 };
 
 }  // namespace Keelgate
-
-#include <keelgate/describe_end.h>

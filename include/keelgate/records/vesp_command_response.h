@@ -6,35 +6,30 @@
 #include <keelgate/describe.h>
 #include <keelgate/values.h>
 
-#include <keelgate/describe_begin.h>
-
 namespace Keelgate {
 
 /// Only the command number is always there. Nothing ties the answer to a command that was asked:
 /// whoever sent that compares the numbers.
 struct VespCommandResponse {
-  FIELD(Int, command);
-  /// The message that is answered, by number or by identifier. Deliberate: a number here, a text in
-  /// payloads.
-  FIELD(Optional<Int64>, messageId);
-  FIELD(Optional<Data>, messageUUID);
-  /// How it went, in the delivery service's codes.
-  FIELD(Optional<Int>, responseStatus);
-  FIELD(Optional<Int>, failReason);
-  /// Opaque octets.
-  FIELD(Optional<Data>, token);
-  FIELD(Optional<Bool>, internalBuild);
-  FIELD(Optional<Bool>, loggingProfile);
-  /// The relay session that the command was about.
-  FIELD(Optional<String>, applicationId);
-  FIELD(Optional<Int>, requestType);
-  FIELD(Optional<Data>, vespSessionId);
-  FIELD(Optional<Bool>, sharedSession);
-  FIELD(Optional<Int>, protocolVersion);
-
-  LABELS(VespCommandResponse);
+  KEELGATE_RECORD(VespCommandResponse,
+      (Int, command),
+      /// The message that is answered, by number or by identifier. Deliberate: a number here, a
+      /// text in payloads.
+      (Optional<Int64>, messageId),
+      (Optional<Data>, messageUUID),
+      /// How it went, in the delivery service's codes.
+      (Optional<Int>, responseStatus),
+      (Optional<Int>, failReason),
+      /// Opaque octets.
+      (Optional<Data>, token),
+      (Optional<Bool>, internalBuild),
+      (Optional<Bool>, loggingProfile),
+      /// The relay session that the command was about.
+      (Optional<String>, applicationId),
+      (Optional<Int>, requestType),
+      (Optional<Data>, vespSessionId),
+      (Optional<Bool>, sharedSession),
+      (Optional<Int>, protocolVersion));
 };
 
 }  // namespace Keelgate
-
-#include <keelgate/describe_end.h>

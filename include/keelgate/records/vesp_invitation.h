@@ -7,63 +7,54 @@
 
 #include <keelgate/describe.h>
 #include <keelgate/values.h>
-#include <variant>
-
-#include <keelgate/describe_begin.h>
 
 namespace Keelgate {
 
 /// A cloud sharing token: opaque octets, never empty. Not parsed here: that it opens anything is
 /// for the cloud to say.
 struct SkyvaultSharingToken {
-  FIELD(Data, tokenData);
-
-  LABELS(SkyvaultSharingToken);
+  KEELGATE_RECORD(SkyvaultSharingToken,
+      (Data, tokenData));
 };
 
 /// The smallest kind; all of it may be absent.
 struct VespSampleInvitation {
-  FIELD(Optional<String>, title);
-  FIELD(Optional<Date>, date);
-  FIELD(Optional<String>, reason);
-
-  LABELS(VespSampleInvitation);
+  KEELGATE_RECORD(VespSampleInvitation,
+      (Optional<String>, title),
+      (Optional<Date>, date),
+      (Optional<String>, reason));
 };
 
 /// The least version of the home's hub, and the features that it must have. Both are always there
 /// once the message has the dictionary; the features are codes.
 struct VespHearthInvitationRequestedCapabilities {
-  FIELD(Double, hearthdVersion);
-  FIELD(Array<Int>, homeSupportedFeatures);
-
-  LABELS(VespHearthInvitationRequestedCapabilities);
+  KEELGATE_RECORD(VespHearthInvitationRequestedCapabilities,
+      (Double, hearthdVersion),
+      (Array<Int>, homeSupportedFeatures));
 };
 
 /// The times are as the sender counts them; neither they nor the day mask are checked. A rule with
 /// nothing in it is kept as one.
 struct VespHearthInviteeScheduleWeekDayRule {
-  FIELD(Optional<Int>, startTime);
-  FIELD(Optional<Int>, endTime);
-  FIELD(Optional<Int>, daysOfTheWeek);
-
-  LABELS(VespHearthInviteeScheduleWeekDayRule);
+  KEELGATE_RECORD(VespHearthInviteeScheduleWeekDayRule,
+      (Optional<Int>, startTime),
+      (Optional<Int>, endTime),
+      (Optional<Int>, daysOfTheWeek));
 };
 
 /// Days on which the invited person may come in. The end may lie before the start.
 struct VespHearthInviteeScheduleYearDayRule {
-  FIELD(Optional<Date>, startDate);
-  FIELD(Optional<Date>, endDate);
-
-  LABELS(VespHearthInviteeScheduleYearDayRule);
+  KEELGATE_RECORD(VespHearthInviteeScheduleYearDayRule,
+      (Optional<Date>, startDate),
+      (Optional<Date>, endDate));
 };
 
 /// When the invited person may come in. Both lists are always present, and empty where the message
 /// has none; no schedule at all is an absent VespHearthInviteeSchedule.
 struct VespHearthInviteeSchedule {
-  FIELD(Optional<Array<VespHearthInviteeScheduleWeekDayRule>>, weekDayRules);
-  FIELD(Optional<Array<VespHearthInviteeScheduleYearDayRule>>, yearDayRules);
-
-  LABELS(VespHearthInviteeSchedule);
+  KEELGATE_RECORD(VespHearthInviteeSchedule,
+      (Optional<Array<VespHearthInviteeScheduleWeekDayRule>>, weekDayRules),
+      (Optional<Array<VespHearthInviteeScheduleYearDayRule>>, yearDayRules));
 };
 
 /// An invitation to join a home. Every field may be absent. Deliberate: it has no share URL: the
@@ -72,29 +63,28 @@ struct VespHearthInvitation {
   /// Keeps the octets of a sharing token; throws Breach when there are none.
   static SkyvaultSharingToken decodeSkyvaultToken(Data tokenData);
 
-  FIELD(Optional<String>, homeName);
-  FIELD(Optional<Date>, inviteExpiryDate);
-  /// What the home's hub must be able to do.
-  FIELD(Optional<VespHearthInvitationRequestedCapabilities>, requestedCapabilities);
-  /// What the invited person may do, and when.
-  FIELD(Optional<Bool>, homeSuppressInviteNotification);
-  FIELD(Optional<Int>, inviteePrivilege);
-  FIELD(Optional<Bool>, doesHomeHaveCameras);
-  FIELD(Optional<VespHearthInviteeSchedule>, inviteeSchedule);
-  /// The home, and the hub that speaks for it.
-  FIELD(Optional<UUID>, homeUUID);
-  FIELD(Optional<Data>, controllerPublicKey);
-  FIELD(Optional<String>, controllerPairingName);
-  /// The invitation itself.
-  FIELD(Optional<UUID>, invitationIdentifier);
-  FIELD(Optional<SkyvaultSharingToken>, invitationShareToken);
-  FIELD(Optional<String>, userId);
-  FIELD(Optional<Int>, invitationState);
-  FIELD(Optional<Int>, presenceAuthorizationStatus);
-  /// Of whoever issued the invitation. Nothing vouches for it yet.
-  FIELD(Optional<Data>, issuerPublicKeyExternalRepresentation);
-
-  LABELS(VespHearthInvitation);
+  KEELGATE_RECORD(VespHearthInvitation,
+      (Optional<String>, homeName),
+      (Optional<Date>, inviteExpiryDate),
+      /// What the home's hub must be able to do.
+      (Optional<VespHearthInvitationRequestedCapabilities>, requestedCapabilities),
+      /// What the invited person may do, and when.
+      (Optional<Bool>, homeSuppressInviteNotification),
+      (Optional<Int>, inviteePrivilege),
+      (Optional<Bool>, doesHomeHaveCameras),
+      (Optional<VespHearthInviteeSchedule>, inviteeSchedule),
+      /// The home, and the hub that speaks for it.
+      (Optional<UUID>, homeUUID),
+      (Optional<Data>, controllerPublicKey),
+      (Optional<String>, controllerPairingName),
+      /// The invitation itself.
+      (Optional<UUID>, invitationIdentifier),
+      (Optional<SkyvaultSharingToken>, invitationShareToken),
+      (Optional<String>, userId),
+      (Optional<Int>, invitationState),
+      (Optional<Int>, presenceAuthorizationStatus),
+      /// Of whoever issued the invitation. Nothing vouches for it yet.
+      (Optional<Data>, issuerPublicKeyExternalRepresentation));
 };
 
 /// An invitation to share a group of stored credentials. Its share URL is needed to decode the
@@ -103,70 +93,62 @@ struct VespCofferSharingInvitation {
   /// Keeps the octets of a sharing token; throws Breach when there are none, or no share URL.
   static SkyvaultSharingToken decodeSkyvaultToken(Data tokenData, const String& shareURL);
 
-  FIELD(String, groupID);
-  FIELD(SkyvaultSharingToken, invitationToken);
-  FIELD(String, inviteeHandle);
-  FIELD(Optional<Date>, sentTime);
-  FIELD(Optional<String>, displayName);
-
-  LABELS(VespCofferSharingInvitation);
+  KEELGATE_RECORD(VespCofferSharingInvitation,
+      (String, groupID),
+      (SkyvaultSharingToken, invitationToken),
+      (String, inviteeHandle),
+      (Optional<Date>, sentTime),
+      (Optional<String>, displayName));
 };
 
 /// An invitation to share measurements.
 struct VespVitalsInvitation {
-  /// A serialised message that nobody has looked into.
-  FIELD(Data, untrustedData);
-
-  LABELS(VespVitalsInvitation);
+  KEELGATE_RECORD(VespVitalsInvitation,
+      /// A serialised message that nobody has looked into.
+      (Data, untrustedData));
 };
 
 /// An invitation to share activity.
 struct VespStrideSharingInvitation {
-  FIELD(Int, item);
-  /// A serialised message that nobody has looked into.
-  FIELD(Data, untrustedData);
-
-  LABELS(VespStrideSharingInvitation);
+  KEELGATE_RECORD(VespStrideSharingInvitation,
+      (Int, item),
+      /// A serialised message that nobody has looked into.
+      (Data, untrustedData));
 };
 
 /// The kind of an invitation, with its record. The position of an alternative travels between
 /// service and client, which are of one build.
-struct VespDictionaryContext
-    : std::variant<VespSampleInvitation, VespHearthInvitation, VespCofferSharingInvitation,
-                   VespVitalsInvitation, VespStrideSharingInvitation> {
-  CASES(VespDictionaryContext, vespSampleInvitation, vespHearthInvitation,
-        vespCofferSharingInvitation, vespVitalsInvitation, vespStrideSharingInvitation);
-};
+KEELGATE_CASES(VespDictionaryContext,
+    (VespSampleInvitation, vespSampleInvitation),
+    (VespHearthInvitation, vespHearthInvitation),
+    (VespCofferSharingInvitation, vespCofferSharingInvitation),
+    (VespVitalsInvitation, vespVitalsInvitation),
+    (VespStrideSharingInvitation, vespStrideSharingInvitation));
 
 /// How the context is written down; there is one way.
-struct VespInvitationContextType : std::variant<VespDictionaryContext> {
-  CASES(VespInvitationContextType, dictionary);
-};
+KEELGATE_CASES(VespInvitationContextType,
+    (VespDictionaryContext, dictionary));
 
 /// Which kind the invitation is, and its record.
 struct VespInvitationContext {
-  /// The schema string that named the kind.
-  FIELD(String, schema);
-  /// Always 1, the number of the one way: any other is refused.
-  FIELD(Int, contextType);
-  FIELD(VespInvitationContextType, context);
-
-  LABELS(VespInvitationContext);
+  KEELGATE_RECORD(VespInvitationContext,
+      /// The schema string that named the kind.
+      (String, schema),
+      /// Always 1, the number of the one way: any other is refused.
+      (Int, contextType),
+      (VespInvitationContextType, context));
 };
 
 /// The envelope. Its values are those of the message, unchecked.
 struct VespInvitation {
-  FIELD(VespInvitationContext, context);
-  /// The sender's code. Any integer.
-  FIELD(Int, state);
-  /// As the sender counts it; not compared with any clock.
-  FIELD(Optional<Double>, expiration);
-  /// Any text, an empty one too.
-  FIELD(String, identifier);
-
-  LABELS(VespInvitation);
+  KEELGATE_RECORD(VespInvitation,
+      (VespInvitationContext, context),
+      /// The sender's code. Any integer.
+      (Int, state),
+      /// As the sender counts it; not compared with any clock.
+      (Optional<Double>, expiration),
+      /// Any text, an empty one too.
+      (String, identifier));
 };
 
 }  // namespace Keelgate
-
-#include <keelgate/describe_end.h>

@@ -5,21 +5,18 @@
 #include <keelgate/describe.h>
 #include <keelgate/values.h>
 
-#include <keelgate/describe_begin.h>
-
 namespace Keelgate {
 
 /// What the framework may do with a kind of message.
-ENUMERATION(ClientMessageType, UInt, unrestricted = 0, restricted = 1);
+KEELGATE_ENUMERATION(ClientMessageType, UInt,
+    (unrestricted, 0),
+    (restricted, 1));
 
 /// It is the same for every message of its service. So it cannot leak any, and bytes that would
 /// harm a decoder never meet one.
 struct VespRestrictedMessage {
-  FIELD(ClientMessageType, messageType);
-
-  LABELS(VespRestrictedMessage);
+  KEELGATE_RECORD(VespRestrictedMessage,
+      (ClientMessageType, messageType));
 };
 
 }  // namespace Keelgate
-
-#include <keelgate/describe_end.h>

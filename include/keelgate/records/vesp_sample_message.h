@@ -6,23 +6,18 @@
 #include <keelgate/describe.h>
 #include <keelgate/values.h>
 
-#include <keelgate/describe_begin.h>
-
 namespace Keelgate {
 
 /// The fields are optional because the framework's record is so; the service always gives the first
 /// two.
 struct VespSampleMessage {
-  /// The command number that the message itself states. Deliberate: it may be another than the one
-  /// that the message arrived with.
-  FIELD(Optional<Int>, command);
-  FIELD(Optional<String>, clientName);
-  FIELD(Optional<Date>, date);
-  FIELD(Optional<Int>, version);
-
-  LABELS(VespSampleMessage);
+  KEELGATE_RECORD(VespSampleMessage,
+      /// The command number that the message itself states. Deliberate: it may be another than the
+      /// one that the message arrived with.
+      (Optional<Int>, command),
+      (Optional<String>, clientName),
+      (Optional<Date>, date),
+      (Optional<Int>, version));
 };
 
 }  // namespace Keelgate
-
-#include <keelgate/describe_end.h>

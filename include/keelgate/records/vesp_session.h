@@ -10,109 +10,113 @@
 #include <keelgate/describe.h>
 #include <keelgate/values.h>
 
-#include <keelgate/describe_begin.h>
-
 namespace Keelgate {
 
 /// A call is offered. The switches are wishes of a stranger. The host decides, above all on those
 /// that would take protection away.
 struct VespSessionInvitation {
   /// How the media of the call travel.
-  NESTED_ENUMERATION(TransportType, UInt, peerToPeer = 0, relay = 1, multiwayRelay = 2);
+  KEELGATE_NESTED_ENUMERATION(TransportType, UInt,
+      (peerToPeer, 0),
+      (relay, 1),
+      (multiwayRelay, 2));
 
-  FIELD(TransportType, transportType);
-  FIELD(UInt, version);
-  /// Hints and switches for setting up the connection.
-  FIELD(Optional<UInt>, connectionCountHint);
-  FIELD(Optional<Bool>, disableEncryption);
-  FIELD(Optional<Bool>, singleChannelDirectMode);
-  FIELD(Optional<Bool>, useStunMessageIntegrity);
-  FIELD(Optional<Bool>, useSecureHLControlMessage);
-  /// The offer itself; opaque here.
-  FIELD(Optional<Data>, blob);
-  FIELD(Optional<Bool>, messageIsRealTime);
-  /// The caller's key. Nothing vouches for it yet.
-  FIELD(Optional<Data>, unauthenticatedPublicKey);
-  FIELD(Optional<Bool>, assumeRemoteDeviceEncryption);
-  /// Opaque to everybody but the two ends.
-  FIELD(Optional<Data>, sessionMessageContext);
-  FIELD(Optional<Bool>, usePhoneTetherLocalMessage);
-  /// Who calls, and in which session, as they say.
-  FIELD(String, participantID);
-  FIELD(Bool, declineOnNetworkError);
-  FIELD(String, sessionID);
-  FIELD(Optional<Bool>, needsToWaitForPreConnectionData);
-  FIELD(Optional<Bool>, useCloudPairedControlChannel);
-
-  LABELS(VespSessionInvitation);
+  KEELGATE_RECORD(VespSessionInvitation,
+      (TransportType, transportType),
+      (UInt, version),
+      /// Hints and switches for setting up the connection.
+      (Optional<UInt>, connectionCountHint),
+      (Optional<Bool>, disableEncryption),
+      (Optional<Bool>, singleChannelDirectMode),
+      (Optional<Bool>, useStunMessageIntegrity),
+      (Optional<Bool>, useSecureHLControlMessage),
+      /// The offer itself; opaque here.
+      (Optional<Data>, blob),
+      (Optional<Bool>, messageIsRealTime),
+      /// The caller's key. Nothing vouches for it yet.
+      (Optional<Data>, unauthenticatedPublicKey),
+      (Optional<Bool>, assumeRemoteDeviceEncryption),
+      /// Opaque to everybody but the two ends.
+      (Optional<Data>, sessionMessageContext),
+      (Optional<Bool>, usePhoneTetherLocalMessage),
+      /// Who calls, and in which session, as they say.
+      (String, participantID),
+      (Bool, declineOnNetworkError),
+      (String, sessionID),
+      (Optional<Bool>, needsToWaitForPreConnectionData),
+      (Optional<Bool>, useCloudPairedControlChannel));
 };
 
 /// The call is taken. What an invitation calls the sender's own is `remote` here: it is seen from
 /// the caller.
 struct VespSessionAccept {
-  FIELD(UInt, version);
-  /// The answer itself; opaque here.
-  FIELD(Optional<Data>, blob);
-  FIELD(String, sessionID);
-  FIELD(String, participantID);
-  FIELD(Optional<Data>, sessionMessageContext);
-  FIELD(Optional<Bool>, useCloudPairedControlChannel);
-  FIELD(Optional<Bool>, useStunMessageIntegrity);
-  FIELD(Optional<Bool>, useSecureHLControlMessage);
-  FIELD(Optional<Data>, unauthenticatedPublicKey);
-  FIELD(Optional<Bool>, remoteUsePhoneTetherLocalMessage);
-  /// What the other side's media are secured with, and where its streams begin.
-  FIELD(Optional<Data>, remoteKeyMaterialData);
-  /// Deliberate: signed, as they travel.
-  FIELD(Optional<Int>, remoteSSRC);
-  FIELD(Optional<Int>, remoteSecStart);
-
-  LABELS(VespSessionAccept);
+  KEELGATE_RECORD(VespSessionAccept,
+      (UInt, version),
+      /// The answer itself; opaque here.
+      (Optional<Data>, blob),
+      (String, sessionID),
+      (String, participantID),
+      (Optional<Data>, sessionMessageContext),
+      (Optional<Bool>, useCloudPairedControlChannel),
+      (Optional<Bool>, useStunMessageIntegrity),
+      (Optional<Bool>, useSecureHLControlMessage),
+      (Optional<Data>, unauthenticatedPublicKey),
+      (Optional<Bool>, remoteUsePhoneTetherLocalMessage),
+      /// What the other side's media are secured with, and where its streams begin.
+      (Optional<Data>, remoteKeyMaterialData),
+      /// Deliberate: signed, as they travel.
+      (Optional<Int>, remoteSSRC),
+      (Optional<Int>, remoteSecStart));
 };
 
 /// The call is refused. Deliberate: declined elsewhere gives this record too, and which of the two
 /// commands it came with is not kept.
 struct VespSessionDecline {
-  FIELD(UInt, version);
-  FIELD(String, sessionID);
-  FIELD(String, participantID);
-  FIELD(Optional<Data>, sessionMessageContext);
-
-  LABELS(VespSessionDecline);
+  KEELGATE_RECORD(VespSessionDecline,
+      (UInt, version),
+      (String, sessionID),
+      (String, participantID),
+      (Optional<Data>, sessionMessageContext));
 };
 
 /// The caller takes the offer back, or a participant leaves.
 struct VespSessionCancel {
   /// Why the other side says that it ended.
-  NESTED_ENUMERATION(VespSessionEndedReason, UInt, unknown = 0, localHangUp = 1, remoteHangUp = 2,
-                     noAnswer = 3, answeredElsewhere = 4, declinedElsewhere = 5, busy = 6,
-                     networkFailure = 7, mediaFailure = 8);
+  KEELGATE_NESTED_ENUMERATION(VespSessionEndedReason, UInt,
+      (unknown, 0),
+      (localHangUp, 1),
+      (remoteHangUp, 2),
+      (noAnswer, 3),
+      (answeredElsewhere, 4),
+      (declinedElsewhere, 5),
+      (busy, 6),
+      (networkFailure, 7),
+      (mediaFailure, 8));
 
-  FIELD(UInt, version);
-  FIELD(String, sessionID);
-  FIELD(String, participantID);
-  /// Absent when the sender gave none.
-  FIELD(Optional<VespSessionEndedReason>, remoteEndReason);
-  FIELD(Optional<Data>, sessionMessageContext);
-
-  LABELS(VespSessionCancel);
+  KEELGATE_RECORD(VespSessionCancel,
+      (UInt, version),
+      (String, sessionID),
+      (String, participantID),
+      /// Absent when the sender gave none.
+      (Optional<VespSessionEndedReason>, remoteEndReason),
+      (Optional<Data>, sessionMessageContext));
 };
 
 /// A running session is set up anew.
 struct VespSessionReinitiate {
   /// There is no default: to do the wrong thing anew would be worse than to do nothing.
-  NESTED_ENUMERATION(VespSessionReinitiateSubcommand, UInt, restartConnection = 0,
-                     renegotiateMedia = 1, switchTransport = 2, rekey = 3);
+  KEELGATE_NESTED_ENUMERATION(VespSessionReinitiateSubcommand, UInt,
+      (restartConnection, 0),
+      (renegotiateMedia, 1),
+      (switchTransport, 2),
+      (rekey, 3));
 
-  FIELD(UInt, version);
-  FIELD(String, sessionID);
-  FIELD(String, participantID);
-  /// What is to be done anew.
-  FIELD(VespSessionReinitiateSubcommand, sessionReinitiateSubcommand);
-
-  LABELS(VespSessionReinitiate);
+  KEELGATE_RECORD(VespSessionReinitiate,
+      (UInt, version),
+      (String, sessionID),
+      (String, participantID),
+      /// What is to be done anew.
+      (VespSessionReinitiateSubcommand, sessionReinitiateSubcommand));
 };
 
 }  // namespace Keelgate
-
-#include <keelgate/describe_end.h>

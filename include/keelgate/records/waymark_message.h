@@ -8,93 +8,109 @@
 #include <keelgate/describe.h>
 #include <keelgate/values.h>
 
-#include <keelgate/describe_begin.h>
-
 namespace Keelgate {
 
 /// What the check-in tells. The one code that is required.
-DEFAULTING_ENUMERATION(WMMessageType, UInt, unknown, unknown = 0, sessionStart = 1,
-                       sessionUpdate = 2, sessionEnd = 3, trigger = 4, cacheUpdate = 5,
-                       locationUpdate = 6);
+KEELGATE_DEFAULTING_ENUMERATION(WMMessageType, UInt, unknown,
+    (unknown, 0),
+    (sessionStart, 1),
+    (sessionUpdate, 2),
+    (sessionEnd, 3),
+    (trigger, 4),
+    (cacheUpdate, 5),
+    (locationUpdate, 6));
 
 /// What is waited for.
-DEFAULTING_ENUMERATION(WMsessionType, UInt, unknown, unknown = 0, timer = 1, destination = 2,
-                       workout = 3);
+KEELGATE_DEFAULTING_ENUMERATION(WMsessionType, UInt, unknown,
+    (unknown, 0),
+    (timer, 1),
+    (destination, 2),
+    (workout, 3));
 
-DEFAULTING_ENUMERATION(WMSessionDestinationType, UInt, unknown, unknown = 0, home = 1, work = 2,
-                       school = 3, other = 4);
+KEELGATE_DEFAULTING_ENUMERATION(WMSessionDestinationType, UInt, unknown,
+    (unknown, 0),
+    (home, 1),
+    (work, 2),
+    (school, 3),
+    (other, 4));
 
-DEFAULTING_ENUMERATION(WMDeviceConfigurationLowPowerModeWarningState, UInt, unknown, unknown = 0,
-                       notShown = 1, shown = 2, dismissed = 3);
+KEELGATE_DEFAULTING_ENUMERATION(WMDeviceConfigurationLowPowerModeWarningState, UInt, unknown,
+    (unknown, 0),
+    (notShown, 1),
+    (shown, 2),
+    (dismissed, 3));
 
 /// What the coordinates refer to.
-DEFAULTING_ENUMERATION(GLClientLocationReferenceFrame, UInt, unknown, unknown = 0, wgs84 = 1,
-                       shifted = 2);
+KEELGATE_DEFAULTING_ENUMERATION(GLClientLocationReferenceFrame, UInt, unknown,
+    (unknown, 0),
+    (wgs84, 1),
+    (shifted, 2));
 
 /// Why the sender's device raised it.
-DEFAULTING_ENUMERATION(WMTriggerCategory, UInt, unknown, unknown = 0, timerExpired = 1,
-                       noProgress = 2, offRoute = 3, unresponsive = 4, emergency = 5);
+KEELGATE_DEFAULTING_ENUMERATION(WMTriggerCategory, UInt, unknown,
+    (unknown, 0),
+    (timerExpired, 1),
+    (noProgress, 2),
+    (offRoute, 3),
+    (unresponsive, 4),
+    (emergency, 5));
 
 /// One group of recipients. Receivers know a group by its number, not by its place in the list. An
 /// empty group is a group: all that the number says is that it may have recipients.
 struct WaymarkGroupFields {
-  /// 2 to 32.
-  FIELD(UInt, groupNumber);
-  FIELD(Optional<String>, receiverHandle);
-  FIELD(Optional<String>, sharingInvitationData);
-  FIELD(Optional<String>, shareURL);
-  FIELD(Optional<String>, participantID);
-
-  LABELS(WaymarkGroupFields);
+  KEELGATE_RECORD(WaymarkGroupFields,
+      /// 2 to 32.
+      (UInt, groupNumber),
+      (Optional<String>, receiverHandle),
+      (Optional<String>, sharingInvitationData),
+      (Optional<String>, shareURL),
+      (Optional<String>, participantID));
 };
 
 /// Times, angles, lengths and speeds are as the sender counts them. The first group of recipients
 /// stands in the record itself; `groupFields` has the groups 2 to 32, empty ones too. No value is
 /// tied to another: a latitude may come without a longitude.
 struct WaymarkMessage {
-  FIELD(WMMessageType, messageType);
-  /// The protocol version that the sender speaks.
-  FIELD(UInt, interfaceVersion);
-  /// When it was sent, as which message of which check-in.
-  FIELD(Double, sendDate);
-  FIELD(String, messageID);
-  FIELD(String, sessionID);
-  FIELD(Optional<String>, summaryText);
-  /// The first group of recipients.
-  FIELD(Optional<String>, receiverHandle);
-  FIELD(Optional<String>, sharingInvitationData);
-  FIELD(Optional<String>, shareURL);
-  FIELD(Optional<String>, participantID);
-  /// What is checked in on, and when it should end.
-  FIELD(Optional<WMsessionType>, sessionType);
-  FIELD(Optional<Double>, estimatedEndTime);
-  FIELD(Optional<Double>, coarseEstimatedEndTime);
-  FIELD(Optional<WMSessionDestinationType>, sessionDestinationType);
-  FIELD(Optional<String>, sessionDestinationMapItem);
-  /// What the sender's device last warned about.
-  FIELD(Optional<WMDeviceConfigurationLowPowerModeWarningState>, lowPowerModeWarningState);
-  /// What set it off, when and where. Degrees, metres and metres per second as the sender has
-  /// them; hunc and vunc are the horizontal and vertical uncertainty.
-  FIELD(Optional<Double>, triggerTime);
-  FIELD(Optional<Double>, latitude);
-  FIELD(Optional<Double>, longitude);
-  FIELD(Optional<Double>, hunc);
-  FIELD(Optional<Double>, altitude);
-  FIELD(Optional<Double>, vunc);
-  FIELD(Optional<Double>, timeOfLocation);
-  FIELD(Optional<GLClientLocationReferenceFrame>, referenceFrame);
-  FIELD(Optional<Double>, speed);
-  FIELD(Optional<WMTriggerCategory>, triggerType);
-  /// Where the sender left its last known state for the recipients.
-  FIELD(Optional<String>, safetyCacheKey);
-  FIELD(Optional<String>, safetyCacheToken);
-  FIELD(Optional<Bool>, isSOSTrigger);
-  /// Always present, with 31 groups.
-  FIELD(Optional<Array<WaymarkGroupFields>>, groupFields);
-
-  LABELS(WaymarkMessage);
+  KEELGATE_RECORD(WaymarkMessage,
+      (WMMessageType, messageType),
+      /// The protocol version that the sender speaks.
+      (UInt, interfaceVersion),
+      /// When it was sent, as which message of which check-in.
+      (Double, sendDate),
+      (String, messageID),
+      (String, sessionID),
+      (Optional<String>, summaryText),
+      /// The first group of recipients.
+      (Optional<String>, receiverHandle),
+      (Optional<String>, sharingInvitationData),
+      (Optional<String>, shareURL),
+      (Optional<String>, participantID),
+      /// What is checked in on, and when it should end.
+      (Optional<WMsessionType>, sessionType),
+      (Optional<Double>, estimatedEndTime),
+      (Optional<Double>, coarseEstimatedEndTime),
+      (Optional<WMSessionDestinationType>, sessionDestinationType),
+      (Optional<String>, sessionDestinationMapItem),
+      /// What the sender's device last warned about.
+      (Optional<WMDeviceConfigurationLowPowerModeWarningState>, lowPowerModeWarningState),
+      /// What set it off, when and where. Degrees, metres and metres per second as the sender has
+      /// them; hunc and vunc are the horizontal and vertical uncertainty.
+      (Optional<Double>, triggerTime),
+      (Optional<Double>, latitude),
+      (Optional<Double>, longitude),
+      (Optional<Double>, hunc),
+      (Optional<Double>, altitude),
+      (Optional<Double>, vunc),
+      (Optional<Double>, timeOfLocation),
+      (Optional<GLClientLocationReferenceFrame>, referenceFrame),
+      (Optional<Double>, speed),
+      (Optional<WMTriggerCategory>, triggerType),
+      /// Where the sender left its last known state for the recipients.
+      (Optional<String>, safetyCacheKey),
+      (Optional<String>, safetyCacheToken),
+      (Optional<Bool>, isSOSTrigger),
+      /// Always present, with 31 groups.
+      (Optional<Array<WaymarkGroupFields>>, groupFields));
 };
 
 }  // namespace Keelgate
-
-#include <keelgate/describe_end.h>
