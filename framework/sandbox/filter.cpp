@@ -3,12 +3,12 @@
 
 #include "framework/contracts/process.h"
 #include "framework/contracts/start_step.h"
+#include "framework/sandbox/processes.h"
 
 #include <linux/audit.h>
-#include <linux/seccomp.h>
 #include <sys/prctl.h>
-#include <sys/resource.h>
 #include <sys/syscall.h>
+#include <sys/wait.h>
 #include <unistd.h>
 #include <csignal>
 #include <cstddef>
@@ -71,9 +71,8 @@ constexpr sock_filter unlessEqual(unsigned value, unsigned char skipped) {
 constexpr sock_filter answer(unsigned action) {
   return BPF_STMT(BPF_RET | BPF_K, action);
 }
-constexpr sock_filter killed = answer(SECCOMP_RET_KILL_PROCESS);
 
-void append(std::vector<sock_filter>& program, const Rule& rule) {
+void append(std::vector<sock_filter>& program, const Rule& rule, sock_filter denied) {
   const auto call = static_cast<unsigned>(rule.call);
   switch (rule.verdict) {
     case Verdict::allow:
@@ -87,9 +86,34 @@ void append(std::vector<sock_filter>& program, const Rule& rule) {
       // x86-64 is little-endian: the half that the kernel reads comes first.
       program.insert(program.end(),
                      {unlessEqual(call, 4), load(offsetof(seccomp_data, args)),
-                      unlessEqual(rule.number, 1), answer(SECCOMP_RET_ALLOW), killed});
+                      unlessEqual(rule.number, 1), answer(SECCOMP_RET_ALLOW), denied});
       return;
   }
+}
+
+/// As the kernel has it in siginfo; the C library has no name for it.
+constexpr int trappedByFilter = 1;
+
+// How the child of a trial ends.
+constexpr int trapped = 0;
+constexpr int notTrapped = 1;
+constexpr int refused = 2;
+
+void noteTrap(int, siginfo_t* about, void*) {
+  _exit(about->si_code == trappedByFilter && about->si_syscall == SYS_getppid ? trapped
+                                                                              : notTrapped);
+}
+
+[[noreturn]] void makeForbiddenCall(std::span<const Rule> rules) try {
+  struct sigaction action {};
+  action.sa_sigaction = noteTrap;
+  action.sa_flags = SA_SIGINFO;
+  sigaction(SIGSYS, &action, nullptr);
+  enforce(compile(rules, SECCOMP_RET_TRAP));
+  getppid();
+  _exit(notTrapped);
+} catch (const StartError&) {
+  _exit(refused);
 }
 
 }  // namespace
@@ -101,17 +125,18 @@ std::span<const Rule> zygoteRules() noexcept {
   return zygote;
 }
 
-std::vector<sock_filter> compile(std::span<const Rule> rules) {
+std::vector<sock_filter> compile(std::span<const Rule> rules, unsigned deniedAction) {
+  const sock_filter denied = answer(deniedAction);
   // The architecture comes first: the same numbers mean other calls under another one, and
   // `int 0x80` changes it from one instruction to the next.
   std::vector<sock_filter> program{load(offsetof(seccomp_data, arch)),
                                    BPF_JUMP(BPF_JMP | BPF_JEQ | BPF_K, AUDIT_ARCH_X86_64, 1, 0),
-                                   killed,
+                                   denied,
                                    load(offsetof(seccomp_data, nr)),
                                    BPF_JUMP(BPF_JMP | BPF_JGE | BPF_K, firstX32Call, 0, 1),
-                                   killed};
-  for (const Rule& rule : rules) append(program, rule);
-  program.push_back(killed);
+                                   denied};
+  for (const Rule& rule : rules) append(program, rule, denied);
+  program.push_back(denied);
   return program;
 }
 
@@ -126,6 +151,17 @@ void enforce(std::span<const sock_filter> program) {
 #else
   static_cast<void>(program);
 #endif
+}
+
+void proveEnforced(std::span<const Rule> rules) {
+  const pid_t child = forkSelf(0);
+  if (child < 0) throw StartError(StartStep::startProcesses);
+  if (child == 0) makeForbiddenCall(rules);
+  int status = 0;
+  if (wait4(child, &status, 0, nullptr) != child) throw StartError(StartStep::startProcesses);
+  if (WIFEXITED(status) && WEXITSTATUS(status) == trapped) return;
+  const bool loaded = !WIFEXITED(status) || WEXITSTATUS(status) != refused;
+  throw StartError(loaded ? StartStep::proveFilter : StartStep::loadFilter, 0);
 }
 
 }  // namespace Keelgate::Sandbox

@@ -6,6 +6,7 @@
 #pragma once
 
 #include <linux/filter.h>
+#include <linux/seccomp.h>
 #include <span>
 #include <vector>
 
@@ -32,11 +33,18 @@ std::span<const Rule> workerRules() noexcept;
 /// All that the zygote can do, and a worker until its own filter stands.
 std::span<const Rule> zygoteRules() noexcept;
 
-/// The kernel's program for a table.
-std::vector<sock_filter> compile(std::span<const Rule> rules);
+/// The kernel's program for a table. `denied` is what it answers to calls that are not listed.
+std::vector<sock_filter> compile(std::span<const Rule> rules,
+                                 unsigned denied = SECCOMP_RET_KILL_PROCESS);
 
 /// Puts the calling thread under a program, in addition to those that it is under, for good;
 /// no_new_privs must be set. Throws StartError.
 void enforce(std::span<const sock_filter> program);
+
+/// Has a child of the calling process make a call that a table forbids, under a trial copy of its
+/// program. An emulation of the kernel, or a kernel told to ignore filters, accepts filters and
+/// enforces nothing. Throws StartError when the call is made. The copy traps the call instead of
+/// killing the process: a kill is what the kernel's log records as an attempt to break out.
+void proveEnforced(std::span<const Rule> rules);
 
 }  // namespace Keelgate::Sandbox

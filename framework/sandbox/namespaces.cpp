@@ -3,7 +3,7 @@
 
 #include "framework/contracts/layers.h"
 #include "framework/contracts/start_step.h"
-#include "framework/sandbox/spawn.h"
+#include "framework/sandbox/processes.h"
 
 #include <fcntl.h>
 #include <linux/sched.h>
@@ -54,12 +54,12 @@ long mapOne(const std::string& path, unsigned own) {
 
 }  // namespace
 
-Birth forkIntoNamespaces(bool userNamespace) {
+NamespaceChild forkIntoNamespaces(bool userNamespace) {
   for (const int flags : {CLONE_NEWUSER | CLONE_NEWPID, CLONE_NEWUSER, CLONE_NEWPID, 0}) {
     if (!userNamespace && (flags & CLONE_NEWUSER) != 0) continue;
     const pid_t child = forkSelf(static_cast<unsigned>(flags));
     if (child < 0) continue;
-    return {.child = child,
+    return {.process = child,
             .newUserNamespace = (flags & CLONE_NEWUSER) != 0,
             .newPidNamespace = (flags & CLONE_NEWPID) != 0};
   }

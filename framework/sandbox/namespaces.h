@@ -15,10 +15,10 @@ namespace Keelgate::Sandbox {
 /// caller may choose: nobody's.
 constexpr unsigned nobody = 65534;
 
-/// The launcher's part: what the child will have, told to it through shared memory of the fork.
-struct Birth {
-  /// As fork returns it.
-  pid_t child;
+/// A process that was forked into namespaces, and which of them it is in.
+struct NamespaceChild {
+  /// 0 in the child itself, as fork has it.
+  pid_t process;
   bool newUserNamespace;
   bool newPidNamespace;
 };
@@ -26,7 +26,7 @@ struct Birth {
 /// Forks a child into a new user and a new process namespace, or into as many of the two as the
 /// machine gives; without `userNamespace` none of that kind. Throws StartError when not even a
 /// plain fork succeeds. Single-threaded callers only.
-Birth forkIntoNamespaces(bool userNamespace);
+NamespaceChild forkIntoNamespaces(bool userNamespace);
 
 /// Maps `nobody` of the child's user namespace to an unprivileged user outside: where the caller is
 /// root to nobody, so that a worker which breaks out of everything owns nothing, otherwise to the

@@ -10,11 +10,11 @@
 #include "framework/sandbox/filter.h"
 #include "framework/sandbox/heap.h"
 #include "framework/sandbox/landlock.h"
+#include "framework/sandbox/launcher.h"
 #include "framework/sandbox/limits.h"
 #include "framework/sandbox/namespaces.h"
 #include "framework/sandbox/pages.h"
-#include "framework/sandbox/self_check.h"
-#include "framework/sandbox/spawn.h"
+#include "framework/sandbox/processes.h"
 
 #include <poll.h>
 #include <unistd.h>
@@ -22,21 +22,7 @@
 
 namespace Keelgate::Sandbox {
 
-#ifdef KEELGATE_UNSEALED
-
-ZygoteSeal sealZygote(std::uint32_t) {
-  dieWithParent();
-  return {.layers = 0, .workerFilter = {}};
-}
-
-void sealWorker(const WorkerSeal& seal) {
-  keepOnly(seal.channel);
-  dieWithParent();
-  if (getppid() != seal.parent) _exit(0);
-}
-
-#else
-
+#ifndef KEELGATE_UNSEALED
 namespace {
 
 /// Whether the message is there already: then its answer is waited for, and is not to wait for us.
@@ -55,10 +41,23 @@ std::uint32_t becomeNobodyIn(std::uint32_t layers) {
 }
 
 }  // namespace
+#endif
 
-ZygoteSeal sealZygote(std::uint32_t given) {
-  std::uint32_t layers = given;
+ZygoteSeal sealZygote() {
+  resetSignals();
+  // Before anything is made: what the one who started us left open must not reach a worker.
+  keepOnly(serviceDescriptor);
+  std::uint32_t layers = leaveGroups() ? layerNoSupplementaryGroups : 0U;
 
+  // From here on this is the zygote; the launcher stays behind.
+  const ZygoteStart start = startZygote();
+  ZygoteSeal seal{.layers = 0,
+                  .process = getpid(),
+                  .launcher = start.launcher,
+                  .childDeaths = watchChildren(),
+                  .workerFilter = {}};
+#ifndef KEELGATE_UNSEALED
+  layers |= start.layers;
   renounceNewPrivileges();
   layers |= layerNoNewPrivileges;
 
@@ -70,6 +69,7 @@ ZygoteSeal sealZygote(std::uint32_t given) {
   layers = becomeNobodyIn(layers);
   dropCapabilities();
   layers |= layerNoCapabilities;
+  // Again, since the change of credentials has reset it.
   dieWithParent();
 
   // After the launcher has written the maps: those of an undumpable process it could not open.
@@ -80,11 +80,13 @@ ZygoteSeal sealZygote(std::uint32_t given) {
   layers |= layerLimits;
 
   prepareHeap();
-  ZygoteSeal seal{.layers = layers, .workerFilter = compile(workerRules())};
-
+  proveEnforced(workerRules());
+  seal.workerFilter = compile(workerRules());
   enforce(compile(zygoteRules()));
-  proveFilter(seal.workerFilter);
-  seal.layers |= layerStrictFilter | layerOneDescriptor;
+  seal.layers = layers | layerStrictFilter | layerOneDescriptor;
+#else
+  static_cast<void>(layers);
+#endif
   return seal;
 }
 
@@ -93,13 +95,13 @@ void sealWorker(const WorkerSeal& seal) {
   dieWithParent();
   // It may have died before the line above.
   if (getppid() != seal.parent) _exit(0);
+#ifndef KEELGATE_UNSEALED
   limitWorker(seal.cpuSeconds);
   // Where there is no more to be had, the zygote's is enough for most messages.
   if (seal.longestMessage > shortMessage) growHeap(memoryBudget(seal.longestMessage));
   if (!isAwaited()) touchPages();
   enforce(seal.filter);
-}
-
 #endif
+}
 
 }  // namespace Keelgate::Sandbox

@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The seal, in two functions: one for the process that forks workers, one for each worker.
+/// The seal, its whole order in two functions: one for the process that forks workers, one for each
+/// worker.
 ///
 /// What only the zygote can pay for is done once: namespaces, the empty root, Landlock,
 /// credentials. What must differ from worker to worker is done by each: its descriptor, its limits,
@@ -11,31 +12,38 @@
 #include <linux/filter.h>
 #include <sys/types.h>
 #include <cstdint>
+#include <span>
 #include <vector>
 
 namespace Keelgate::Sandbox {
 
-/// What sealZygote achieved, and what it prepared for the workers.
+/// What sealZygote achieved, and what it prepared for the zygote's work.
 struct ZygoteSeal {
-  /// Layer.
+  /// The sum of the bits of Layer.
   std::uint32_t layers;
+  /// The zygote as it sees itself.
+  pid_t process;
+  /// Hangs up when the launcher dies.
+  int launcher;
+  /// Readable when a worker has ended.
+  int childDeaths;
   std::vector<sock_filter> workerFilter;
 };
 
-/// Seals the zygote, which can open nothing afterwards. `given` are the layers that the launcher
-/// gave it.
-ZygoteSeal sealZygote(std::uint32_t given);
+/// Called in the process that the client started. Returns in the zygote, which can open nothing any
+/// more; the calling process stays behind as its launcher.
+ZygoteSeal sealZygote();
 
 /// What a worker's seal is made of.
 struct WorkerSeal {
   /// The channel to its client, whatever its number.
-  int channel;
+  int channel = -1;
   /// The zygote as the worker sees it.
-  pid_t parent;
-  std::uint64_t cpuSeconds;
-  /// Bytes, in the length of the longest message that it will be given.
-  std::uint64_t longestMessage;
-  const std::vector<sock_filter>& filter;
+  pid_t parent = 0;
+  std::uint64_t cpuSeconds = 0;
+  /// Bytes: the length of the longest message that it will be given.
+  std::uint64_t longestMessage = 0;
+  std::span<const sock_filter> filter;
 };
 
 /// Seals a worker, which has read nothing yet from its channel.

@@ -22,12 +22,12 @@ using Protocol::RequestHeader;
 
 /// The next request's header. The process ends where there is none; a wrong one comes from a client
 /// of another build, which must not get an answer that it misreads.
-RequestHeader receiveHeader(const WorkerOptions& options, std::uint32_t sequence) {
+RequestHeader receiveHeader(std::uint32_t sequence, std::uint64_t longestMessage) {
   RequestHeader header;
   const auto bytes = std::as_writable_bytes(std::span(&header, 1));
   if (!Protocol::readAll(serviceDescriptor, bytes)) _exit(0);
   // A message that is longer than the heap was fixed for would end for want of memory.
-  if (!Protocol::isExpected(header, sequence, options.longestMessage)) {
+  if (!Protocol::isExpected(header, sequence, longestMessage)) {
     _exit(Protocol::protocolExitStatus);
   }
   return header;
@@ -64,14 +64,11 @@ void answer(const KeelgateServer& server, const RequestHeader& header) {
 
 }  // namespace
 
-void work(const KeelgateServer& server, const WorkerOptions& options, int channel) try {
-  Sandbox::sealWorker({.channel = channel,
-                       .parent = options.parent,
-                       .cpuSeconds = options.cpuSeconds,
-                       .longestMessage = options.longestMessage,
-                       .filter = options.filter});
-  for (std::uint32_t sequence = 0; sequence != options.messages; ++sequence) {
-    answer(server, receiveHeader(options, sequence));
+void work(const KeelgateServer& server, std::uint64_t messages,
+          const Sandbox::WorkerSeal& seal) try {
+  Sandbox::sealWorker(seal);
+  for (std::uint32_t sequence = 0; sequence != messages; ++sequence) {
+    answer(server, receiveHeader(sequence, seal.longestMessage));
   }
   _exit(0);
 } catch (const std::bad_alloc&) {

@@ -5,8 +5,8 @@
 #include "framework/contracts/process.h"
 #include "framework/contracts/start_step.h"
 #include "framework/protocol/control_frames.h"
-#include "framework/sandbox/seal.h"
-#include "framework/sandbox/spawn.h"
+#include "framework/sandbox/processes.h"
+#include "framework/server/worker.h"
 
 #include <poll.h>
 #include <sys/resource.h>
@@ -22,17 +22,6 @@ using Protocol::ControlFrame;
 using Protocol::ControlKind;
 
 namespace {
-
-/// Child deaths as something to poll for. Level-triggered: one read takes any number of them.
-int openDeathSignals() {
-  sigset_t deaths;
-  sigemptyset(&deaths);
-  sigaddset(&deaths, SIGCHLD);
-  if (sigprocmask(SIG_BLOCK, &deaths, nullptr) != 0) throw StartError(StartStep::watchProcesses);
-  const int signals = signalfd(-1, &deaths, SFD_CLOEXEC);
-  if (signals < 0) throw StartError(StartStep::watchProcesses);
-  return signals;
-}
 
 ControlFrame exitFrame(std::uint32_t slot, int status, const rusage& used) {
   const auto microseconds = [](const timeval& time) {
@@ -55,16 +44,10 @@ void send(const ControlFrame& frame) {
 }  // namespace
 
 void Zygote::serve() {
-  const int deaths = openDeathSignals();
-  options_.parent = getpid();
-  // Sealed before the first frame is read, though the client is trusted: whoever stands at the
-  // other end of an activated socket is whoever may connect to it.
-  Sandbox::ZygoteSeal seal = Sandbox::sealZygote(given_);
-  options_.filter = std::move(seal.workerFilter);
-  greet(seal.layers);
+  greet();
   pollfd channels[]{{.fd = serviceDescriptor, .events = POLLIN, .revents = 0},
-                    {.fd = deaths, .events = POLLIN, .revents = 0},
-                    {.fd = tether_, .events = 0, .revents = 0}};
+                    {.fd = seal_.childDeaths, .events = POLLIN, .revents = 0},
+                    {.fd = seal_.launcher, .events = 0, .revents = 0}};
   for (;;) {
     // ppoll and not poll: the kernel takes it up again after a stop without a call of its own.
     if (ppoll(channels, std::size(channels), nullptr, nullptr) < 0) continue;
@@ -73,17 +56,17 @@ void Zygote::serve() {
     if (channels[0].revents != 0 && !takeFrame()) return;
     if (channels[1].revents == 0) continue;
     signalfd_siginfo death;
-    if (read(deaths, &death, sizeof death) > 0) reap();
+    if (read(seal_.childDeaths, &death, sizeof death) > 0) reap();
   }
 }
 
-void Zygote::greet(std::uint32_t layers) {
+void Zygote::greet() {
   const Optional<Received> hello = receive();
   if (!hello) _exit(0);
   if (hello->frame.kind != ControlKind::hello) throw StartError(StartStep::readFrame, 0);
-  options_.messages = hello->frame.numbers[0];
-  options_.cpuSeconds = hello->frame.numbers[1];
-  send(Protocol::makeControlFrame(ControlKind::ready, 0, {layers, Protocol::ownVersion()}));
+  messages_ = hello->frame.numbers[0];
+  workerSeal_.cpuSeconds = hello->frame.numbers[1];
+  send(Protocol::makeControlFrame(ControlKind::ready, 0, {seal_.layers, Protocol::ownVersion()}));
 }
 
 Optional<Zygote::Received> Zygote::receive() {
@@ -107,7 +90,7 @@ bool Zygote::takeFrame() {
   if (!received) return false;
   switch (received->frame.kind) {
     case ControlKind::fork:
-      options_.longestMessage = received->frame.numbers[0];
+      workerSeal_.longestMessage = received->frame.numbers[0];
       fork(received->frame.slot, received->descriptor);
       return true;
     case ControlKind::kill:
@@ -123,9 +106,10 @@ void Zygote::fork(std::uint32_t slot, int channel) {
                                  [slot](const Child& child) { return child.slot == slot; });
   // Two workers on one slot: an exit could be told of the wrong one.
   if (taken) throw StartError(StartStep::readFrame, 0);
+  workerSeal_.channel = channel;
   const pid_t process = Sandbox::forkSelf(0);
   // What was forked never comes back here.
-  if (process == 0) work(server_, options_, channel);
+  if (process == 0) work(server_, messages_, workerSeal_);
   close(channel);
   if (process > 0) {
     children_.push_back({.slot = slot, .process = process});

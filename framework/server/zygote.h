@@ -4,8 +4,8 @@
 #pragma once
 
 #include "framework/protocol/frames.h"
+#include "framework/sandbox/seal.h"
 #include "framework/server/keelgate_server.h"
-#include "framework/server/worker.h"
 
 #include <sys/types.h>
 #include <cstdint>
@@ -17,14 +17,14 @@ namespace Keelgate {
 /// held locked would stay locked in every worker.
 class Zygote {
  public:
-  /// `tether` hangs up when the launcher dies. `given` are the layers (Layer) that the
-  /// launcher gave this process.
-  Zygote(const KeelgateServer& server, int tether, std::uint32_t given)
-      : server_(server), tether_(tether), given_(given) {}
+  /// In a process that has been sealed so.
+  Zygote(const KeelgateServer& server, Sandbox::ZygoteSeal seal)
+      : server_(server),
+        seal_(std::move(seal)),
+        workerSeal_{.parent = seal_.process, .filter = seal_.workerFilter} {}
 
-  /// Seals this process, says that it is ready, and serves until the client or the launcher goes.
-  /// Throws StartError when the seal is incomplete or the client breaks the protocol. Only
-  /// for a process with one thread.
+  /// Says that it is ready, and serves until the client or the launcher goes. Throws StartError
+  /// when the client breaks the protocol.
   void serve();
 
  private:
@@ -40,7 +40,7 @@ class Zygote {
     int descriptor;
   };
 
-  void greet(std::uint32_t layers);
+  void greet();
   /// The next frame, or nothing when the client has gone.
   static Optional<Received> receive();
   /// False when the client has gone.
@@ -51,10 +51,11 @@ class Zygote {
   void reap();
 
   const KeelgateServer& server_;
-  int tether_;
-  std::uint32_t given_;
-  /// What the next worker is forked with.
-  WorkerOptions options_{};
+  Sandbox::ZygoteSeal seal_;
+  /// How many a worker may be given.
+  std::uint64_t messages_ = 0;
+  /// Of the next worker.
+  Sandbox::WorkerSeal workerSeal_;
   std::vector<Child> children_;
 };
 
