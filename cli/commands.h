@@ -12,22 +12,29 @@ namespace Keelgate::CLI {
 
 struct UnpackOptions {
   JSON::Subject subject;
-  /// Paths; "-" is standard input, and so is no path at all.
+  /// Paths; "-" is standard input.
   Array<String> files;
+  /// The discarded one checks messages and prints nothing of them.
   JSON::Layout layout = JSON::Layout::compact;
+  /// Of a property list, the form that loses nothing.
+  Bool typed = false;
 };
 
 /// Unpacks every file, several at a time, and prints the replies in the order of the files. A file
 /// that cannot be read has no reply and does not keep the others from theirs.
-void unpack(Client::Options options, const UnpackOptions& what, Console& console);
+void unpack(const Client::Options& options, const UnpackOptions& what, Console& console);
 
-/// Answers the requests on standard input until it ends. Replies are flushed one by one: whoever is
-/// at the other end of the pipe may wait for each before writing the next request.
-void stream(Client::Options options, Console& console);
+/// Answers the requests on standard input until it ends. Replies are flushed as soon as no input
+/// waits: whoever is at the other end of the pipe may wait for each before writing the next
+/// request. `metrics` is the path of a file that is kept up to date with what was answered; empty:
+/// none is.
+void stream(const Client::Options& options, const String& metrics, Console& console);
+
+enum class DescribeForm : std::uint8_t { page, json, jsonSchema };
 
 /// Prints what this build knows, or what has the given name. An unknown name is said on the console
 /// together with the nearest ones. Starts no service.
-void describe(const Optional<String>& name, Bool json, Console& console);
+void describe(const Optional<String>& name, DescribeForm form, Console& console);
 
 /// Prints the versions of the command and of its service, and the service's sandbox layers.
 void reportVersions(std::string_view version, const Client::Options& options, Console& console);

@@ -16,6 +16,7 @@
 #include <charconv>
 #include <csignal>
 #include <cstdlib>
+#include <limits>
 #include <system_error>
 #include <utility>
 
@@ -23,8 +24,7 @@ namespace Keelgate::CLI {
 
 namespace {
 
-/// In columns. In fewer than 40 no table can be read; 80 is what is left where nobody says.
-constexpr std::size_t narrowest = 40;
+/// In columns, of a terminal that does not say.
 constexpr std::size_t usual = 80;
 
 /// As in JSON but without the outer quotes, and with inner ones as they are.
@@ -84,8 +84,12 @@ void Console::complain(std::string_view sentence) {
   sayLine(fmt::format("keelgate: {}", escaped(sentence)));
 }
 
-void Console::log(std::string_view line) {
-  sayLine(escaped(line));
+void Console::log(LogLevel level, std::string_view line) {
+  if (level <= logLevel_) sayLine(escaped(line));
+}
+
+void Console::remark(std::string_view sentence) {
+  if (logLevel_ != LogLevel::quiet) sayLine(sentence);
 }
 
 void Console::sayLine(std::string_view line) {
@@ -99,7 +103,7 @@ void Console::sayLine(std::string_view line) {
 }
 
 void Console::progress(std::size_t done, std::size_t total) {
-  if (!isTerminal(STDERR_FILENO)) return;
+  if (logLevel_ == LogLevel::quiet || !isTerminal(STDERR_FILENO)) return;
   const std::lock_guard lock(mutex_);
   // Without a newline: the next thing that is said takes its place.
   const String line = fmt::format("\r{} of {} messages", done, total);
@@ -130,13 +134,17 @@ Bool isTerminal(int descriptor) {
 }
 
 std::size_t outputWidth() {
-  std::size_t width = 0;
+  constexpr std::size_t most = std::numeric_limits<std::size_t>::max();
+  if (!isTerminal(STDOUT_FILENO)) return most;
+  std::size_t wanted = 0;
   const std::string_view columns = variable("COLUMNS");
-  std::from_chars(columns.data(), columns.data() + columns.size(), width);
+  std::from_chars(columns.data(), columns.data() + columns.size(), wanted);
   winsize window{};
-  // Asked of standard output, where the table goes.
-  if (width == 0 && ioctl(STDOUT_FILENO, TIOCGWINSZ, &window) == 0) width = window.ws_col;
-  return std::max(width == 0 ? usual : width, narrowest);
+  ioctl(STDOUT_FILENO, TIOCGWINSZ, &window);
+  // A wider COLUMNS is what is left of another terminal.
+  const std::size_t width =
+      std::min(wanted == 0 ? most : wanted, window.ws_col == 0 ? most : window.ws_col);
+  return width == most ? usual : width;
 }
 
 Bool outputHasColour() {

@@ -21,6 +21,17 @@ enum class Status : std::uint8_t {
   serviceLost = 3,
 };
 
+/// What is said beside errors, each with what stands before it.
+enum class LogLevel : std::uint8_t {
+  /// No progress and no sum-up either.
+  quiet,
+  none,
+  /// What the service logs.
+  error,
+  /// What the host has to say of the system.
+  warning,
+};
+
 /// Where nothing else is said, members may be called from many threads at once.
 class Console {
  public:
@@ -38,8 +49,12 @@ class Console {
   /// terminal are escaped.
   void complain(std::string_view sentence);
 
-  /// A line of the service's log.
-  void log(std::string_view line);
+  /// A line of a log.
+  void log(LogLevel level, std::string_view line);
+  /// A sentence about the run as a whole.
+  void remark(std::string_view sentence);
+  /// Before anything else is said.
+  void setLogLevel(LogLevel level) { logLevel_ = level; }
 
   /// Says how far the work is, at a terminal alone, over what it said before.
   void progress(std::size_t done, std::size_t total);
@@ -56,6 +71,7 @@ class Console {
   /// What is printed and not written yet. Never grows, so that printing needs no memory.
   std::array<char, std::size_t{64} << 10> buffer_;
   std::size_t buffered_ = 0;
+  LogLevel logLevel_ = LogLevel::warning;
 
   /// Guards the two below, and keeps lines on standard error whole.
   mutable std::mutex mutex_;
@@ -65,7 +81,8 @@ class Console {
 
 Bool isTerminal(int descriptor);
 
-/// In columns: what COLUMNS says, else the terminal at standard output, else 80. At least 40.
+/// In columns: of the terminal at standard output, or what COLUMNS says where that is less; without
+/// a terminal as many as there can be.
 std::size_t outputWidth();
 
 /// Whether headings may stand out: at a terminal that can, unless NO_COLOR is set.

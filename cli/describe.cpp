@@ -3,6 +3,8 @@
 /// record by name.
 #include "cli/commands.h"
 #include "cli/description.h"
+#include "cli/json_schema.h"
+#include "cli/nearest.h"
 #include "cli/table.h"
 #include "framework/json/values.h"
 
@@ -99,67 +101,62 @@ class Page {
  public:
   [[nodiscard]] String take() && { return std::move(text_); }
 
-  void heading(std::string_view title) {
+  void heading(const String& title) {
     if (!text_.empty()) text_ += '\n';
-    text_ += emphasised(String(title), colour_) + '\n';
+    for (const String& line : paragraph({title}, 0, width_)) {
+      text_ += emphasised(line, colour_) + '\n';
+    }
   }
 
-  void table(Array<String> headings, Array<Array<String>> rows) {
-    Table table(std::move(headings), outputWidth(), colour_);
-    for (Array<String>& row : rows) table.add(std::move(row));
-    text_ += table.text();
+  /// A table with a row for each element.
+  template <class Rows, class Cells>
+  void table(Array<String> headings, const Rows& rows, const Cells& cells) {
+    Table table(std::move(headings));
+    for (const auto& row : rows) table.add(cells(row));
+    text_ += table.text(width_, colour_);
   }
-
-  void line(std::string_view text) { text_ += fmt::format("\n{}\n", text); }
 
  private:
   String text_;
-  /// Asked once, so that a page is of one kind.
+  // Asked once, so that a page is of one kind.
+  std::size_t width_ = outputWidth();
   Bool colour_ = outputHasColour();
 };
-
-/// A table with a row for each element.
-template <class Rows, class Cells>
-void addTable(Page& page, Array<String> headings, const Rows& rows, Cells cells) {
-  Array<Array<String>> all;
-  for (const auto& row : rows) all.push_back(cells(row));
-  page.table(std::move(headings), std::move(all));
-}
 
 void addUnpackers(Page& page, const Description& what) {
   // Of a single name most tables are empty, and headings without rows would say nothing.
   if (what.messageUnpackers.empty()) return;
   page.heading("Record types");
-  addTable(page, {"RECORD", "UNPACKER", "SCHEMA"}, what.messageUnpackers,
-           [](const MessageUnpackerRow& row) -> Array<String> {
-             return {String(row.record), String(row.unpacker), String(row.schema)};
-           });
+  page.table(
+      {"RECORD", "UNPACKER", "SCHEMA"}, what.messageUnpackers,
+      [](const MessageUnpackerRow& row) -> Array<String> {
+        return {String(row.record), String(row.unpacker), String(row.schema.value_or("(any)"))};
+      });
 }
 
 void addServices(Page& page, const Description& what) {
   for (const ServiceRow& service : what.services) {
     page.heading(fmt::format("Service {}, by {}", service.service, service.unpacker));
-    addTable(page, {"COMMAND", "SCHEMA", "CASE"}, service.commands,
-             [](const CommandRow& row) -> Array<String> {
-               return {row.command ? fmt::format("{}", *row.command) : "any known",
-                       String(row.schema.value_or("(not decoded)")), String(row.caseName)};
-             });
+    page.table({"COMMAND", "SCHEMA", "CASE"}, service.commands,
+               [](const CommandRow& row) -> Array<String> {
+                 return {row.command ? fmt::format("{}", *row.command) : "any known",
+                         String(row.schema.value_or("(not decoded)")), String(row.caseName)};
+               });
   }
 }
 
 void addCommands(Page& page, const Description& what) {
   if (what.commands.empty()) return;
   page.heading("Commands");
-  addTable(page, {"NUMBER", "NAME"}, what.commands,
-           [](const EnumerationCase& row) -> Array<String> {
-             return {fmt::format("{}", row.rawValue), String(row.name)};
-           });
+  page.table({"NUMBER", "NAME"}, what.commands, [](const EnumerationCase& row) -> Array<String> {
+    return {fmt::format("{}", row.rawValue), String(row.name)};
+  });
 }
 
 /// In the overview: sixty tables of fields would bury the rest.
-void addNames(Page& page, std::string_view title, const Array<StructTable>& tables) {
+void addNames(Page& page, const String& title, const Array<StructTable>& tables) {
   page.heading(title);
-  addTable(page, {"NAME", "FIELDS"}, tables, [](const StructTable& table) -> Array<String> {
+  page.table({"NAME", "FIELDS"}, tables, [](const StructTable& table) -> Array<String> {
     return {String(table.name), fmt::format("{}", table.fields.size())};
   });
 }
@@ -167,15 +164,15 @@ void addNames(Page& page, std::string_view title, const Array<StructTable>& tabl
 void addFields(Page& page, const Description& what) {
   for (const StructTable& table : what.schemas) {
     page.heading(fmt::format("Schema {}", table.name));
-    addTable(page, {"FIELD", "KEY", "TYPE", ""}, table.fields,
-             [](const FieldRow& field) -> Array<String> {
-               return {String(field.name), String(field.key), field.type,
-                       field.required ? "required" : ""};
-             });
+    page.table({"FIELD", "KEY", "TYPE", ""}, table.fields,
+               [](const FieldRow& field) -> Array<String> {
+                 return {String(field.name), String(field.key), field.type,
+                         field.required ? "required" : ""};
+               });
   }
   for (const StructTable& table : what.records) {
     page.heading(fmt::format("Record {}", table.name));
-    addTable(page, {"FIELD", "TYPE", ""}, table.fields, [](const FieldRow& field) -> Array<String> {
+    page.table({"FIELD", "TYPE", ""}, table.fields, [](const FieldRow& field) -> Array<String> {
       return {String(field.name), field.type, field.required ? "" : "optional"};
     });
   }
@@ -194,10 +191,10 @@ String casesText(const EnumerationTable& table) {
 void addEnumerations(Page& page, const Description& what) {
   if (what.enumerations.empty()) return;
   page.heading("Enumerations");
-  addTable(page, {"NAME", "CASES"}, what.enumerations,
-           [](const EnumerationTable& table) -> Array<String> {
-             return {String(table.name), casesText(table)};
-           });
+  page.table({"NAME", "CASES"}, what.enumerations,
+             [](const EnumerationTable& table) -> Array<String> {
+               return {String(table.name), casesText(table)};
+             });
 }
 
 String pageText(const Description& what, Bool overview) {
@@ -213,31 +210,37 @@ String pageText(const Description& what, Bool overview) {
   }
   addEnumerations(page, what);
   // An overview is the only page that does not show all there is.
-  if (overview) page.line("`keelgate describe NAME` shows the fields of one.");
+  if (overview) page.heading("`keelgate describe NAME` shows the fields of one.");
   return std::move(page).take();
 }
 
 }  // namespace
 
-void describe(const Optional<String>& name, Bool json, Console& console) {
+void describe(const Optional<String>& name, DescribeForm form, Console& console) {
   const Description all = describeAll();
   // Everything is described and then cut down: one walk, whatever is asked.
   const Description what = name ? describeNamed(all, *name) : all;
+  Writer out(JSON::Layout::pretty);
   if (isEmpty(what)) {
-    const Array<std::string_view> nearest = nearestNames(all, *name);
-    const String hint = nearest.empty()
-                            ? "`keelgate describe` lists all names"
-                            : fmt::format("did you mean {}?", fmt::join(nearest, " or "));
-    console.complain(fmt::format("nothing is called \"{}\"; {}", *name, hint));
+    console.complain(
+        fmt::format("nothing is called \"{}\"; {}", *name,
+                    suggestion(namesOf(all), *name, "`keelgate describe` lists all names")));
     console.note(Status::unusable);
     return;
   }
-  if (!json) {
+  if (form == DescribeForm::page) {
     console.print(pageText(what, !name));
     return;
   }
-  Writer out(JSON::Layout::pretty);
-  writeDescription(out, what);
+  if (form == DescribeForm::json) {
+    writeDescription(out, what);
+  } else if (!name) {
+    writeReplySchema(out, all);
+  } else if (!writeJsonSchema(out, all, *name)) {
+    console.complain(fmt::format("\"{}\" is not a record: it has no JSON", *name));
+    console.note(Status::unusable);
+    return;
+  }
   for (const String& piece : std::move(out).take()) console.print(piece);
 }
 

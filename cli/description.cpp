@@ -2,6 +2,8 @@
 /// The walk is at compile time, over types; what it leaves behind is plain data.
 #include "cli/description.h"
 
+#include "cli/request_line.h"
+#include "framework/json/values.h"
 #include "program/service/tables.h"
 
 #include <keelgate/describe.h>
@@ -9,7 +11,6 @@
 
 #include <algorithm>
 #include <concepts>
-#include <numeric>
 #include <type_traits>
 #include <variant>
 
@@ -37,9 +38,15 @@ class Walk {
     if (std::ranges::count(section, typeName<T>(), &StructTable::name) > 0) return;
     // Before its fields: a payload holds payloads.
     const std::size_t position = section.size();
-    section.push_back({.name = typeName<T>(), .fields = {}});
+    section.push_back({.name = typeName<T>(), .fields = {}, .kind = kindOf<T>()});
     Array<FieldRow> fields = fieldsOf<T>(section);
     section[position].fields = std::move(fields);
+  }
+
+  template <class T>
+  static constexpr StructTable::Kind kindOf() {
+    if (CaseKeyed<T>) return StructTable::Kind::oneOfItsFields;
+    return JSON::isItsField<T> ? StructTable::Kind::itsField : StructTable::Kind::itsFields;
   }
 
   template <class T>
@@ -140,36 +147,22 @@ Array<CommandRow> commandsOf(Walk& walk) {
   return rows;
 }
 
-/// How many characters must change between two names. One row of the usual table at a time, since
-/// names are short and many.
-std::size_t distance(std::string_view one, std::string_view other) {
-  Array<std::size_t> row(other.size() + 1);
-  std::iota(row.begin(), row.end(), std::size_t{0});
-  for (std::size_t i = 0; i < one.size(); ++i) {
-    std::size_t diagonal = std::exchange(row[0], i + 1);
-    for (std::size_t j = 0; j < other.size(); ++j) {
-      const std::size_t changed = diagonal + (one[i] == other[j] ? 0 : 1);
-      diagonal = row[j + 1];
-      row[j + 1] = std::min({changed, row[j] + 1, row[j + 1] + 1});
-    }
-  }
-  return row.back();
-}
+/// All commands together.
+constexpr std::string_view commandsName = typeName<CommandType>();
 
-/// Sorted, each once.
-Array<std::string_view> namesOf(const Description& all) {
-  Array<std::string_view> names;
-  for (const auto& row : all.messageUnpackers)
-    names.insert(names.end(), {row.record, row.unpacker});
-  for (const auto& row : all.services) names.insert(names.end(), {row.service, row.unpacker});
-  for (const auto& row : all.commands) names.push_back(row.name);
-  for (const auto& table : all.schemas) names.push_back(table.name);
-  for (const auto& table : all.records) names.push_back(table.name);
-  for (const auto& table : all.enumerations) names.push_back(table.name);
-  std::ranges::sort(names);
-  // The record of a message unpacker stands among the records too, and services share unpackers.
-  names.erase(std::unique(names.begin(), names.end()), names.end());
-  return names;
+/// Who answers it, and how. Empty where the framework does not know it.
+Description describeCommand(const Description& all, UInt64 number) {
+  Description chosen;
+  for (const EnumerationCase& command : all.commands) {
+    if (command.rawValue == number) chosen.commands.push_back(command);
+  }
+  if (chosen.commands.empty()) return chosen;
+  for (ServiceRow service : all.services) {
+    std::erase_if(service.commands,
+                  [&](const CommandRow& row) { return row.command.value_or(number) != number; });
+    if (!service.commands.empty()) chosen.services.push_back(std::move(service));
+  }
+  return chosen;
 }
 
 }  // namespace
@@ -178,10 +171,13 @@ Description describeAll() {
   Description all;
   Walk walk(all);
   VespKeelgateService::MessageUnpackers::each([&]<class U>(std::type_identity<U>) {
-    all.messageUnpackers.push_back({.record = typeName<typename U::SchemaType>(),
-                                    .unpacker = typeName<U>(),
-                                    .schema = typeName<typename U::Schema>()});
-    walk.enter<typename U::Schema>();
+    MessageUnpackerRow row{
+        .record = typeName<typename U::SchemaType>(), .unpacker = typeName<U>(), .schema = {}};
+    if constexpr (requires { typename U::Schema; }) {
+      row.schema = typeName<typename U::Schema>();
+      walk.enter<typename U::Schema>();
+    }
+    all.messageUnpackers.push_back(row);
   });
   VespKeelgateService::Services::each([&]<class S>(std::type_identity<S>) {
     all.services.push_back({.service = S::identifier,
@@ -194,37 +190,40 @@ Description describeAll() {
 }
 
 Description describeNamed(const Description& all, std::string_view name) {
+  if (const Optional<UInt64> number = decimal(name)) return describeCommand(all, *number);
   // The rows of which one of the labels is the name.
   const auto named = [&](const auto& rows, auto... labels) {
     auto chosen = rows;
     std::erase_if(chosen, [&](const auto& row) { return (... && (row.*labels != name)); });
     return chosen;
   };
-  return {.messageUnpackers = named(all.messageUnpackers, &MessageUnpackerRow::record,
-                                    &MessageUnpackerRow::unpacker),
-          .services = named(all.services, &ServiceRow::service, &ServiceRow::unpacker),
-          .commands = named(all.commands, &EnumerationCase::name),
-          .schemas = named(all.schemas, &StructTable::name),
-          .records = named(all.records, &StructTable::name),
-          .enumerations = named(all.enumerations, &EnumerationTable::name)};
+  return {
+      .messageUnpackers =
+          named(all.messageUnpackers, &MessageUnpackerRow::record, &MessageUnpackerRow::unpacker),
+      .services = named(all.services, &ServiceRow::service, &ServiceRow::unpacker),
+      .commands = name == commandsName ? all.commands : named(all.commands, &EnumerationCase::name),
+      .schemas = named(all.schemas, &StructTable::name),
+      .records = named(all.records, &StructTable::name),
+      .enumerations = named(all.enumerations, &EnumerationTable::name)};
 }
 
 Bool isEmpty(const Description& description) {
   return namesOf(description).empty();
 }
 
-Array<std::string_view> nearestNames(const Description& all, std::string_view name) {
-  // More would be a list to search, and `describe` without a name has that already.
-  constexpr std::size_t most = 3;
-  // A third of the name may be mistyped; a part of a name is like it too.
-  const auto unlike = [&](std::string_view candidate) {
-    const Bool part = name.size() > 2 && candidate.find(name) != std::string_view::npos;
-    return part ? 0 : distance(name, candidate);
-  };
-  Array<std::string_view> names = namesOf(all);
-  std::erase_if(names, [&](std::string_view n) { return unlike(n) > name.size() / 3; });
-  std::ranges::stable_sort(names, {}, unlike);
-  if (names.size() > most) names.resize(most);
+Array<std::string_view> namesOf(const Description& all) {
+  Array<std::string_view> names;
+  for (const auto& row : all.messageUnpackers)
+    names.insert(names.end(), {row.record, row.unpacker});
+  for (const auto& row : all.services) names.insert(names.end(), {row.service, row.unpacker});
+  for (const auto& row : all.commands) names.push_back(row.name);
+  for (const auto& table : all.schemas) names.push_back(table.name);
+  for (const auto& table : all.records) names.push_back(table.name);
+  for (const auto& table : all.enumerations) names.push_back(table.name);
+  if (all.commands.size() > 1) names.push_back(commandsName);
+  std::ranges::sort(names);
+  // The record of a message unpacker stands among the records too, and services share unpackers.
+  names.erase(std::unique(names.begin(), names.end()), names.end());
   return names;
 }
 

@@ -18,7 +18,8 @@ namespace Keelgate::CLI {
 struct MessageUnpackerRow {
   std::string_view record;
   std::string_view unpacker;
-  std::string_view schema;
+  /// Absent: any message that is well-formed.
+  Optional<std::string_view> schema;
 };
 
 /// A command that a service answers.
@@ -39,8 +40,7 @@ struct ServiceRow {
   Array<CommandRow> commands;
 };
 
-/// A field of a schema or a record. Of a case-keyed enumeration the cases are listed, as fields
-/// none of which is required.
+/// A field of a schema or a record, or a case of a case-keyed enumeration, which is not required.
 struct FieldRow {
   std::string_view name;
   /// On the wire; of a record's field, which does not travel, its name.
@@ -52,8 +52,13 @@ struct FieldRow {
 
 /// A schema or a record with its fields in their order.
 struct StructTable {
+  /// How its value is printed: as an object of the fields that are there, of exactly one of them,
+  /// or as its only field.
+  enum class Kind : std::uint8_t { itsFields, oneOfItsFields, itsField };
+
   std::string_view name;
   Array<FieldRow> fields;
+  Kind kind;
 };
 
 /// An enumeration whose cases travel as numbers.
@@ -82,7 +87,7 @@ Description describeAll();
 Description describeNamed(const Description& all, std::string_view name);
 Bool isEmpty(const Description& description);
 
-/// The names that are most like `name`, nearest first; empty when none is like it.
-Array<std::string_view> nearestNames(const Description& all, std::string_view name);
+/// All names, sorted and each once.
+Array<std::string_view> namesOf(const Description& description);
 
 }  // namespace Keelgate::CLI

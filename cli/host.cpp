@@ -16,7 +16,7 @@ namespace {
 
 Client::Options completed(Client::Options options, Console& console, std::size_t mostMessages) {
   options.log = [&console](std::string_view line) {
-    console.log(line);
+    console.log(line.starts_with("keelgate: ") ? LogLevel::warning : LogLevel::error, line);
   };
   if (options.processes == 0) {
     options.processes = std::max(1U, std::thread::hardware_concurrency());
@@ -50,6 +50,7 @@ Bool Delivery::take(const std::vector<JSON::Reply>& due) noexcept {
     Bool goOn = true;
     for (const JSON::Reply& reply : due) {
       ++taken_;
+      tally_.count(reply);
       for (const String& piece : reply.json) goOn = goOn && console_.print(piece);
       say(reply);
       goOn = goOn && reply.outcome != JSON::Outcome::serviceLost;

@@ -3,6 +3,7 @@
 #pragma once
 
 #include "cli/console.h"
+#include "cli/tally.h"
 #include "framework/json/reply.h"
 
 #include <keelgate/client.h>
@@ -41,8 +42,8 @@ class Delivery {
   enum class Kind { files, stream };
 
   /// `total`: how many replies there will be, where that is known.
-  Delivery(Console& console, Kind kind, std::size_t total = 0)
-      : console_(console), kind_(kind), total_(total) {}
+  Delivery(Console& console, Tally& tally, Kind kind, std::size_t total = 0)
+      : console_(console), tally_(tally), kind_(kind), total_(total) {}
 
   /// False when no more replies are wanted.
   Bool take(const std::vector<JSON::Reply>& due) noexcept;
@@ -53,6 +54,7 @@ class Delivery {
   void say(const JSON::Reply& reply);
 
   Console& console_;
+  Tally& tally_;
   Kind kind_;
   std::size_t total_;
   std::size_t taken_ = 0;

@@ -3,7 +3,7 @@
 # names from what it describes.
 
 _keelgate_options() {
-  "$1" ${2:+"$2"} --help 2>/dev/null | command grep -oE -- '--[a-z-]+' | sort -u
+  "$1" ${2:+"$2"} --help 2>/dev/null | command grep -oE -- '--[a-z0-9-]+' | sort -u
 }
 
 # The values under a key of `describe --json`, which has one of them on each line.
@@ -45,14 +45,16 @@ _keelgate() {
         command sed -n 's/^ *"command": \([0-9]*\).*/\1/p' | sort -u)"
       return
       ;;
-    --service-path | --connect) mapfile -t COMPREPLY < <(compgen -f -- "$current"); return ;;
+    --log-level) _keelgate_complete "none error warning"; return ;;
+    --service-path | --connect | --files0-from | --metrics)
+      mapfile -t COMPREPLY < <(compgen -f -- "$current"); return ;;
     --processes | --messages-per-process | --time-limit | --max-message) return ;;
   esac
 
   case $subcommand:$current in
     *:-*) _keelgate_complete "$(_keelgate_options "$command" "$subcommand")" ;;
     :*) _keelgate_complete "$(_keelgate_subcommands "$command")" ;;
-    unpack:*) mapfile -t COMPREPLY < <(compgen -f -- "$current") ;;
+    unpack:* | check:*) mapfile -t COMPREPLY < <(compgen -f -- "$current") ;;
     describe:*) _keelgate_complete "$(_keelgate_names "$command")" ;;
   esac
 }

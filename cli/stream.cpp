@@ -3,6 +3,7 @@
 #include "cli/commands.h"
 #include "cli/files.h"
 #include "cli/host.h"
+#include "cli/metrics_file.h"
 #include "cli/ordered_work.h"
 #include "cli/request_line.h"
 
@@ -34,12 +35,14 @@ std::size_t longestLine(std::size_t largestMessage) {
 
 /// True when there is input, or its end. False when no reply is wanted any more: a filter whose
 /// result nobody takes must not wait for input that may never come.
-Bool waitForInput(int ended) {
+Bool waitForInput(int ended, MetricsFile& metrics) {
   pollfd entries[] = {{.fd = STDIN_FILENO, .events = POLLIN, .revents = 0},
                       {.fd = ended, .events = POLLIN, .revents = 0},
                       {.fd = STDOUT_FILENO, .events = 0, .revents = 0}};
-  while (poll(entries, std::size(entries), -1) < 0) {
-    if (errno != EINTR) throw std::system_error(errno, std::generic_category());
+  for (int ready = 0; ready <= 0;) {
+    metrics.update();
+    ready = poll(entries, std::size(entries), metrics.interval());
+    if (ready < 0 && errno != EINTR) throw std::system_error(errno, std::generic_category());
   }
   // POLLERR on the writing end of a pipe: its reader has gone.
   return entries[1].revents == 0 && (entries[2].revents & POLLERR) == 0;
@@ -56,9 +59,9 @@ class Lines {
   /// Calls `use(line)` for each until it gives false or `ended` becomes readable. Throws
   /// std::system_error.
   template <class Use>
-  void each(int ended, const Use& use) {
+  void each(int ended, MetricsFile& metrics, const Use& use) {
     const auto chunk = std::make_unique<char[]>(chunkSize);
-    while (waitForInput(ended)) {
+    while (waitForInput(ended, metrics)) {
       std::string_view text(chunk.get(), readSome(STDIN_FILENO, chunk.get(), chunkSize));
       if (text.empty()) {
         if (begun_) use(takeLine());
@@ -127,13 +130,21 @@ JSON::Reply answerLine(const Host& host, Line& line) {
 
 }  // namespace
 
-void stream(Client::Options options, Console& console) {
-  const Host host(std::move(options), console);
-  Delivery delivery(console, Delivery::Kind::stream);
+void stream(const Client::Options& options, const String& metrics, Console& console) {
+  Tally tally;
+  Optional<MetricsFile> file;
+  try {
+    file.emplace(metrics, tally, console);
+  } catch (const std::system_error& error) {
+    console.note(Status::unusable);
+    return console.complain(fmt::format("--metrics: {}", error.what()));
+  }
+  const Host host(options, console);
+  Delivery delivery(console, tally, Delivery::Kind::stream);
   OrderedWork work(host.threads(), [&](const auto& due) { return delivery.take(due); });
   try {
     // This thread only cuts lines; they are parsed where they are answered, several at a time.
-    Lines(longestLine(host.largestMessage())).each(work.endedDescriptor(), [&](Line line) {
+    Lines(longestLine(host.largestMessage())).each(work.endedDescriptor(), *file, [&](Line line) {
       const auto* text = std::get_if<String>(&line);
       const std::size_t weight = text == nullptr ? 0 : text->size();
       return work.add([&host, line = std::move(line)]() mutable { return answerLine(host, line); },

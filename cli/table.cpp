@@ -1,5 +1,4 @@
 // SPDX-License-Identifier: Apache-2.0
-/// Columns are as wide as their longest cell, and give way from the widest where that is too much.
 #include "cli/table.h"
 
 #include <algorithm>
@@ -11,44 +10,59 @@ namespace Keelgate::CLI {
 namespace {
 
 constexpr std::size_t gap = 2;
-/// Below this a column is no longer readable; a narrower terminal wraps the lines itself.
-constexpr std::size_t narrowestColumn = 8;
 
-/// Takes the first line of at most `width` characters off `text`.
-String takeLine(String& text, std::size_t width) {
-  if (text.size() <= width) return std::exchange(text, {});
-  const std::size_t space = text.rfind(' ', width);
-  // A word that is longer than its column is cut: it has to go somewhere.
-  const Bool atSpace = space != String::npos && space > 0;
-  String line = text.substr(0, atSpace ? space : width);
-  text.erase(0, line.size() + (atSpace ? 1 : 0));
-  return line;
+Array<std::string_view> wordsOf(std::string_view text) {
+  Array<std::string_view> words;
+  while (!text.empty()) {
+    const std::size_t end = std::min(text.find(' '), text.size());
+    if (end > 0) words.push_back(text.substr(0, end));
+    text.remove_prefix(std::min(end + 1, text.size()));
+  }
+  return words;
 }
 
-/// One row, over as many lines as its longest cell needs.
-Array<String> linesOf(Array<String> cells, const Array<std::size_t>& widths) {
-  Array<String> lines;
-  do {
-    String line;
-    for (std::size_t i = 0; i < cells.size(); ++i) {
-      String part = takeLine(cells[i], widths[i]);
-      part.resize(widths[i], ' ');
-      line.append(gap, ' ') += part;
-    }
+/// One row under its columns, the last of which is broken where the width is over.
+Array<String> aligned(const Array<String>& cells, const Array<std::size_t>& widths,
+                      std::size_t width) {
+  String head;
+  for (std::size_t i = 0; i + 1 < cells.size(); ++i) {
+    head.append(gap, ' ') += cells[i];
+    head.append(widths[i] - cells[i].size(), ' ');
+  }
+  head.append(gap, ' ');
+  Array<String> lines = paragraph({cells.back()}, 0, width - head.size());
+  for (String& line : lines) {
+    line.insert(0, std::exchange(head, String(head.size(), ' ')));
     // Trailing spaces would wrap on a terminal of just this width.
     line.erase(line.find_last_not_of(' ') + 1);
-    lines.push_back(std::move(line));
-  } while (!std::ranges::all_of(cells, &String::empty));
+  }
   return lines;
 }
 
 }  // namespace
 
-Table::Table(Array<String> headings, std::size_t width, Bool emphasise)
-    : rows_{std::move(headings)}, width_(width), emphasise_(emphasise) {}
+Array<String> paragraph(const Array<String>& cells, std::size_t indent, std::size_t width) {
+  Array<String> lines;
+  std::size_t space = 0;
+  for (const String& cell : cells) {
+    for (const std::string_view word : wordsOf(cell)) {
+      if (lines.empty() || lines.back().size() + space + word.size() > width) {
+        // Less of an indent where the word would not fit behind it.
+        const std::size_t room = width > word.size() ? width - word.size() : 0;
+        lines.emplace_back(std::min(lines.empty() ? indent : indent + 4, room), ' ');
+        space = 0;
+      }
+      lines.back().append(space, ' ') += word;
+      space = 1;
+    }
+    space = gap;
+  }
+  if (lines.empty()) lines.emplace_back();
+  return lines;
+}
 
-void Table::add(Array<String> cells) {
-  rows_.push_back(std::move(cells));
+String emphasised(const String& text, Bool emphasise) {
+  return emphasise ? "\033[1m" + text + "\033[0m" : text;
 }
 
 Array<std::size_t> Table::columnWidths() const {
@@ -56,33 +70,30 @@ Array<std::size_t> Table::columnWidths() const {
   for (const Array<String>& row : rows_) {
     for (std::size_t i = 0; i < row.size(); ++i) widths[i] = std::max(widths[i], row[i].size());
   }
-  const auto total = [&] {
-    return std::accumulate(widths.begin(), widths.end(), widths.size() * gap);
-  };
-  // From the widest, so that short columns keep their words whole.
-  while (total() > width_) {
-    const auto widest = std::ranges::max_element(widths);
-    if (*widest <= narrowestColumn) break;
-    --*widest;
-  }
   return widths;
 }
 
-String Table::text() const {
-  const Array<std::size_t> widths = columnWidths();
+String Table::text(std::size_t width, Bool emphasise) const {
+  Array<std::size_t> widths = columnWidths();
+  const std::size_t head = std::accumulate(widths.begin(), widths.end() - 1, widths.size() * gap);
+  std::size_t longest = 0;
+  for (const Array<String>& row : rows_) {
+    for (const std::string_view word : wordsOf(row.back())) {
+      longest = std::max(longest, word.size());
+    }
+  }
+  // A narrow last column would make many lines of few words.
+  const std::size_t least = std::max(longest, std::min<std::size_t>(widths.back(), 30));
+  const Bool fits = head + least <= width;
   String all;
   for (const Array<String>& row : rows_) {
     // By its place: a row of cells may look like it.
     const Bool heading = &row == &rows_.front();
-    for (const String& line : linesOf(row, widths)) {
-      all += emphasised(line, heading && emphasise_) + '\n';
+    for (const String& line : fits ? aligned(row, widths, width) : paragraph(row, gap, width)) {
+      all += emphasised(line, heading && emphasise) + '\n';
     }
   }
   return all;
-}
-
-String emphasised(const String& text, Bool emphasise) {
-  return emphasise ? "\033[1m" + text + "\033[0m" : text;
 }
 
 }  // namespace Keelgate::CLI

@@ -16,7 +16,7 @@ namespace {
 constexpr std::string_view standardInput = "-";
 
 JSON::Reply replyTo(const Host& host, const UnpackOptions& what, const String& path) {
-  JSON::Form form{.layout = what.layout};
+  JSON::Form form{.layout = what.layout, .typed = what.typed};
   if (what.files.size() > 1) {
     form.prefaceKey = "file";
     form.preface = JSON::quote(path);
@@ -47,10 +47,11 @@ JSON::Reply unpackFile(const Host& host, const UnpackOptions& what, const String
 
 }  // namespace
 
-void unpack(Client::Options options, const UnpackOptions& what, Console& console) {
+void unpack(const Client::Options& options, const UnpackOptions& what, Console& console) {
   const std::size_t total = what.files.size();
-  const Host host(std::move(options), console, total);
-  Delivery delivery(console, Delivery::Kind::files, total);
+  const Host host(options, console, total);
+  Tally tally;
+  Delivery delivery(console, tally, Delivery::Kind::files, total);
   OrderedWork work(host.threads(), [&](const auto& due) { return delivery.take(due); });
   for (const String& path : what.files) {
     if (!work.add([&, path] { return unpackFile(host, what, path); }, 0)) break;
@@ -60,6 +61,7 @@ void unpack(Client::Options options, const UnpackOptions& what, Console& console
     console.complain(
         fmt::format("{} of {} messages were not unpacked", total - delivery.taken(), total));
   }
+  if (total > 1) console.remark(tally.sentence());
 }
 
 }  // namespace Keelgate::CLI

@@ -42,6 +42,10 @@ install(FILES ${PROJECT_SOURCE_DIR}/docs/man/VespKeelgateService.8
   DESTINATION ${CMAKE_INSTALL_MANDIR}/man8)
 install(FILES ${PROJECT_SOURCE_DIR}/cli/keelgate.bash
   DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions RENAME keelgate)
+install(FILES ${PROJECT_SOURCE_DIR}/cli/_keelgate
+  DESTINATION ${CMAKE_INSTALL_DATADIR}/zsh/vendor-completions)
+install(FILES ${PROJECT_SOURCE_DIR}/cli/keelgate.fish
+  DESTINATION ${CMAKE_INSTALL_DATADIR}/fish/vendor_completions.d)
 install(FILES ${PROJECT_SOURCE_DIR}/README.md ${PROJECT_SOURCE_DIR}/CHANGELOG.md
   DESTINATION ${CMAKE_INSTALL_DOCDIR})
 install(FILES ${PROJECT_SOURCE_DIR}/packaging/copyright DESTINATION ${CMAKE_INSTALL_DOCDIR})

@@ -37,24 +37,6 @@ std::string_view nameOf(DecodingError::Kind kind) {
   return {};
 }
 
-std::string_view nameOf(HostError::Reason reason) {
-  switch (reason) {
-    case HostError::Reason::crashed:
-      return "crashed";
-    case HostError::Reason::timedOut:
-      return "timedOut";
-    case HostError::Reason::messageTooLarge:
-      return "messageTooLarge";
-    case HostError::Reason::resourcesExhausted:
-      return "resourcesExhausted";
-    case HostError::Reason::protocolViolation:
-      return "protocolViolation";
-    case HostError::Reason::startFailed:
-      return "startFailed";
-  }
-  return {};
-}
-
 std::string_view nameOf(VespClientMessageUnpackingError::Case which) {
   switch (which) {
     case VespClientMessageUnpackingError::Case::unimplementedCommand:
@@ -108,7 +90,7 @@ void writeError(Writer& out, const VespClientMessageUnpackingError& error) {
 
 void writeError(Writer& out, const HostError& error) {
   writeField(out, "kind", "host");
-  writeField(out, "reason", nameOf(error.reason));
+  writeField(out, "reason", JSON::nameOf(error.reason));
   writeField(out, "description", error.description);
 }
 
@@ -177,6 +159,24 @@ class Answer {
 };
 
 }  // namespace
+
+std::string_view nameOf(HostError::Reason reason) {
+  switch (reason) {
+    case HostError::Reason::crashed:
+      return "crashed";
+    case HostError::Reason::timedOut:
+      return "timedOut";
+    case HostError::Reason::messageTooLarge:
+      return "messageTooLarge";
+    case HostError::Reason::resourcesExhausted:
+      return "resourcesExhausted";
+    case HostError::Reason::protocolViolation:
+      return "protocolViolation";
+    case HostError::Reason::startFailed:
+      return "startFailed";
+  }
+  return {};
+}
 
 const Array<std::string_view>& recordNames() {
   // Made once, which the language keeps safe from any thread.

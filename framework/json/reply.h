@@ -54,7 +54,12 @@ struct Form {
   /// stands for nothing.
   std::string_view prefaceKey = {};
   String preface = {};
+  /// Of a PropertyList, the form that loses nothing.
+  Bool typed = false;
 };
+
+/// As replies spell it.
+std::string_view nameOf(HostError::Reason reason);
 
 /// Unpacks `message`, whose record has to be there, as JSON too, by the time limit. Never throws
 /// what the service threw: that is the reply. A record that has too much JSON for its message, or

@@ -28,6 +28,10 @@ void write(Writer& out, const UUID& uuid);
 template <class T>
 void write(Writer& out, const T& value);
 
+/// The one record that is not an object of its fields: it is its case.
+template <class T>
+constexpr Bool isItsField = std::same_as<T, VespClientMessageResult>;
+
 /// A member with its value; none where the value is absent.
 template <class T>
 void writeField(Writer& out, std::string_view name, const T& value) {
@@ -75,9 +79,8 @@ void write(Writer& out, const T& value) {
     out.string(value);
   } else if constexpr (std::same_as<T, Data>) {
     out.data(value);
-  } else if constexpr (std::same_as<T, VespClientMessageResult>) {
-    // The one record that is not an object of its fields: it is its case.
-    write(out, value.result);
+  } else if constexpr (isItsField<T>) {
+    FieldsOf<T>::each([&](auto field) { write(out, value.*field.member); });
   } else if constexpr (isArray<T>) {
     writeArray(out, value);
   } else {

@@ -1,15 +1,20 @@
 // SPDX-License-Identifier: Apache-2.0
 // The parts of the command that need no service: request lines, ordered work, tables.
+#include "cli/nearest.h"
 #include "cli/ordered_work.h"
 #include "cli/request_line.h"
 #include "cli/table.h"
+#include "cli/tally.h"
 
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <iterator>
 #include <latch>
-#include <numeric>
+#include <limits>
 #include <semaphore>
+#include <sstream>
+#include <thread>
 
 namespace Keelgate::CLI {
 namespace {
@@ -225,25 +230,71 @@ TEST(OrderedWork, EndsWithItsReader) {
   EXPECT_GE(added, 10);
 }
 
-TEST(Table, FitsAnyWidthAndLosesNothing) {
-  const Array<String> cells = {"averylongnamewithoutanyspace", "several words that can be broken",
-                               "short"};
-  for (std::size_t width = 30; width < 100; ++width) {
-    Table table({"NAME", "TEXT", "END"}, width, false);
-    table.add(cells);
-    String text = table.text();
+Array<String> wordsIn(const String& text) {
+  std::istringstream stream(text);
+  return {std::istream_iterator<String>(stream), {}};
+}
+
+TEST(Table, FitsAnyWidthAndBreaksNoWord) {
+  const Array<String> cells = {"a_long_name_without_any_space", "short",
+                               "several words that can be broken, but none of them within"};
+  Table table({"NAME", "SIZE", "TEXT"});
+  table.add(cells);
+  const Array<String> words =
+      wordsIn("NAME SIZE TEXT " + cells[0] + ' ' + cells[1] + ' ' + cells[2]);
+  for (std::size_t width = cells[0].size(); width < 110; ++width) {
+    const String text = table.text(width, false);
+    Array<String> found = wordsIn(text);
+    std::size_t longest = 0;
     for (std::size_t begin = 0; begin < text.size();) {
       const std::size_t end = text.find('\n', begin);
-      EXPECT_LE(end - begin, width);
-      EXPECT_NE(text[end - 1], ' ');
+      longest = std::max(longest, end - begin);
+      EXPECT_NE(text[end - 1], ' ') << width;
       begin = end + 1;
     }
-    const auto letters = [](const String& all) {
-      return std::ranges::count_if(all, [](char c) { return c != ' ' && c != '\n'; });
-    };
-    EXPECT_EQ(letters(text),
-              letters("NAMETEXTEND" + std::accumulate(cells.begin(), cells.end(), String())));
+    EXPECT_LE(longest, width);
+    // A wrapped last column keeps the words of its row in their order, and so do all rows.
+    EXPECT_EQ(found, words) << text;
   }
+  const String whole = table.text(std::numeric_limits<std::size_t>::max(), false);
+  EXPECT_EQ(std::ranges::count(whole, '\n'), 2);
+  EXPECT_EQ(whole.find("TEXT"), whole.find("several") - whole.find('\n') - 1)
+      << "under its heading";
+}
+
+TEST(Tally, SumsUpWhatIsNotZero) {
+  using Reason = HostError::Reason;
+  Tally tally;
+  const auto count = [&](JSON::Outcome outcome, Optional<Reason> reason, int times) {
+    for (int i = 0; i < times; ++i) tally.count({.outcome = outcome, .reason = reason});
+  };
+  const auto sentence = [&] {
+    return tally.sentence().substr(0, tally.sentence().rfind(", "));
+  };
+  EXPECT_EQ(sentence(), "0 messages");
+  count(JSON::Outcome::unusable, {}, 5);
+  count(JSON::Outcome::record, {}, 1);
+  EXPECT_EQ(sentence(), "1 message");
+  count(JSON::Outcome::record, {}, 1234);
+  count(JSON::Outcome::rejected, {}, 2);
+  for (Reason reason :
+       {Reason::crashed, Reason::timedOut, Reason::timedOut, Reason::messageTooLarge,
+        Reason::resourcesExhausted, Reason::protocolViolation}) {
+    count(JSON::Outcome::rejected, reason, 1);
+  }
+  count(JSON::Outcome::serviceLost, Reason::startFailed, 1);
+  EXPECT_EQ(sentence(), "1,244 messages, 2 rejected, 1 crashed, 2 timed out, 4 failed");
+}
+
+TEST(Nearest, NamesAreThoseThatSomebodyMayHaveMeant) {
+  const Array<std::string_view> names = {"unpack", "check", "stream", "describe"};
+  const std::pair<std::string_view, Array<std::string_view>> table[] = {
+      {"unpak", {"unpack"}}, {"desc", {"describe"}}, {"Stream", {"stream"}}, {"x", {}},
+      {"install", {}},       {"cehck", {"check"}},
+  };
+  for (const auto& [word, expected] : table) EXPECT_EQ(nearestNames(names, word), expected) << word;
+  EXPECT_EQ(suggestion(names, "unpak", "none"), "did you mean unpack?");
+  EXPECT_EQ(suggestion(names, "install", "none"), "none");
 }
 
 }  // namespace

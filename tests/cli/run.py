@@ -9,12 +9,14 @@ import json
 import os
 import pathlib
 import pty
+import re
 import shutil
 import struct
 import subprocess
 import sys
 import tempfile
 import threading
+import time
 
 root, keelgate, fake = pathlib.Path(sys.argv[1]), sys.argv[2], sys.argv[3]
 messages = root / "examples/messages"
@@ -64,11 +66,21 @@ def wrong_usage():
                   ["unpack", *record, "--pretty", "--compact"], ["unpack", *record, "-", "-"],
                   ["unpack", *record, "--time-limit", "0"], ["stream", "--time-limit", "nan"],
                   ["stream", "--processes", "0"], ["stream", "--max-message", "4294967296"],
-                  ["stream", "extra"], ["describe", "Nothing"], ["--verbose"]):
+                  ["stream", "extra"], ["describe", "Nothing"], ["--verbose"],
+                  ["stream", "--max-message", "4G"], ["stream", "--max-message", "1KK"],
+                  ["stream", "--log-level", "all"], ["unpack", *record, "--typed"],
+                  ["unpack", *record, "--files0-from", "/nonexistent"],
+                  ["unpack", *record, "--files0-from", "/dev/null", "x"],
+                  ["stream", "--metrics", "/nonexistent/file"],
+                  ["describe", "--json", "--json-schema"]):
         done = subprocess.run([keelgate, *words], capture_output=True, stdin=subprocess.DEVNULL)
         check((done.returncode, done.stdout) == (2, b""), f"{words}: {done}")
         check(done.stderr.startswith(b"keelgate: "), f"{words}: {done.stderr}")
-    check("VespInvitation" in run("describe", "VespInvitatoin")[2], "no nearest name")
+    for words, hint in ((["describe", "VespInvitatoin"], "VespInvitation"),
+                        (["unpak", "x"], "did you mean unpack?"),
+                        (["stream", "--proceses=3"], "did you mean --processes?"),
+                        (["stream", "--processes", "0"], "--processes: \"0\" is not")):
+        check(hint in run(*words)[2], f"{words} without a hint")
     for words in (["--help"], ["--version"], ["unpack", "--help"], ["stream", "--help"],
                   ["describe", "--help"], ["--version", "--verbose"]):
         status, out, err = run(*words)
@@ -84,7 +96,7 @@ def many_files():
     check([r["file"] for r in replies] == [str(good)] * 20 + [str(bad), str(good)], "order of files")
     check(all(next(iter(r)) == "file" for r in replies), "file comes first")
     check(all("record" in r for r in replies[:20] + replies[21:]), "good files beside bad ones")
-    check([line.split(":")[1].strip() for line in err.splitlines()]
+    check([line.split(":")[1].strip() for line in err.splitlines()[:-1]]
           == ["/nonexistent", str(bad), str(messages)], f"what is said: {err}")
 
     data = good.read_bytes()
@@ -118,6 +130,112 @@ def many_files():
     for empty in (["--service", "", "--command", "1"], ["--service=", "--command=1"]):
         reply = objects(run("unpack", *empty, stdin=data)[1])[0]
         check(reply["error"].get("service") == "", f"an empty service: {reply}")
+
+
+def said_of_a_run():
+    good, bad = messages / "command-response.xml", messages / "damaged.bplist"
+    record = ["--record", "VespCommandResponse"]
+    for words, status, expected in (
+            ([good] * 1001 + [bad, bad], 1, r"1,003 messages, 2 rejected, \d+\.\d\d s"),
+            ([good, "/nonexistent", good], 2, r"2 messages, \d+\.\d\d s"),
+            ([good, messages / "push-payload.xml", "--max-message", "1k"], 1,
+             r"2 messages, 1 failed, \d+\.\d\d s")):
+        for command in ("unpack", "check"):
+            done, out, err = run(command, *record, *words)
+            lines = err.splitlines()
+            files = sum(not str(word).startswith(("--", "/nonexistent", "1k")) for word in words)
+            check(done == status and re.fullmatch(expected, lines[-1]), f"{command}: {lines[-1:]}")
+            check(all(line.startswith("keelgate: ") for line in lines[:-1]), f"{command}: {err}")
+            check(len(out.splitlines()) == (files if command == "unpack" else 0), f"{command}")
+            quiet = run(command, *record, "--quiet", *words)
+            check(quiet[0] == status and quiet[2].splitlines() == lines[:-1], f"quiet {command}")
+    check(run("check", *record, good, good)[:2] == (0, b""), "all sound")
+    check(run("unpack", *record, good)[2] == "", "one file needs no sum-up")
+
+    unknown = ["unpack", "--service", "com.tessen.private.braid.rtcengine.rtctester", "--command",
+               "999", messages / "sample-message.xml"]
+    for words, logged in (([], True), (["--log-level", "error"], True), (["--quiet"], False),
+                          (["--log-level", "none"], False)):
+        check(("\nInvalid" in "\n" + run(*unknown, *words)[2]) == logged, f"log with {words}")
+
+    with tempfile.TemporaryDirectory() as folder:
+        names = pathlib.Path(folder, "names")
+        odd = os.path.join(os.fsencode(folder), b"a\n\xff")
+        pathlib.Path(os.fsdecode(odd)).write_bytes(good.read_bytes())
+        for end in (b"", b"\0"):
+            names.write_bytes(b"\0".join([os.fsencode(good), odd]) + end)
+            replies = objects(run("unpack", *record, "--files0-from", names)[1])
+            check([os.fsencode(r["file"]) for r in replies] == [os.fsencode(good), odd], "names")
+        done, out, _ = run("unpack", *record, "--files0-from", "-", stdin=os.fsencode(good))
+        check(done == 0 and "file" not in objects(out)[0], "names from standard input")
+        check(run("check", *record, "--files0-from", "/dev/null") == (0, b"", ""), "no names")
+        for wrong in (b"-", b"a\0\0b", b"\0"):
+            check(run("check", *record, "--files0-from", "-", stdin=wrong)[0] == 2, f"{wrong}")
+
+
+def metrics():
+    def counters(text):
+        return {line.rpartition(" ")[0]: float(line.rpartition(" ")[2])
+                for line in text.splitlines() if not line.startswith("#")}
+
+    with tempfile.TemporaryDirectory() as folder:
+        file = pathlib.Path(folder, "metrics.prom")
+        process = subprocess.Popen([keelgate, "stream", "--metrics", file], stdin=subprocess.PIPE,
+                                   stdout=subprocess.PIPE, stderr=subprocess.PIPE)
+        process.stdin.write((request(0) + "\n" + request(1, "") + "\n\n").encode())
+        process.stdin.flush()
+        replies = [process.stdout.readline() for _ in range(3)]
+        expected = {'keelgate_messages_total{outcome="record"}': 1.0,
+                    'keelgate_messages_total{outcome="rejected"}': 1.0,
+                    "keelgate_invalid_requests_total": 1.0,
+                    "keelgate_reply_bytes_total": float(sum(map(len, replies)))}
+        # While the stream waits for its next request.
+        end = time.monotonic() + 30
+        while time.monotonic() < end and not expected.items() <= counters(file.read_text()).items():
+            time.sleep(0.1)
+        text = file.read_text()
+        check(expected.items() <= counters(text).items(), f"metrics: {text}")
+        check(all(value == 0 for name, value in counters(text).items() if name not in expected),
+              f"metrics: {text}")
+        check(os.listdir(folder) == ["metrics.prom"], f"drafts: {os.listdir(folder)}")
+        process.communicate(request(2).encode(), timeout=60)
+        check(counters(file.read_text())['keelgate_messages_total{outcome="record"}'] == 2,
+              "metrics at the end")
+
+
+def hidden():
+    """What is in the command's memory is nobody else's business."""
+    process = subprocess.Popen([keelgate, "stream"], stdin=subprocess.PIPE, stdout=subprocess.PIPE,
+                               stderr=subprocess.DEVNULL)
+    process.stdin.write(b"\n")
+    process.stdin.flush()
+    process.stdout.readline()
+    limits = pathlib.Path(f"/proc/{process.pid}/limits").read_text()
+    check(re.search(r"core file size +0 +0 ", limits), "a core file is possible")
+    # Such a process gives its files in /proc to root.
+    if os.getuid() != 0:
+        check(os.stat(f"/proc/{process.pid}/environ").st_uid == 0, "a debugger is possible")
+    process.communicate()
+
+
+def memory():
+    """A file costs the command little more than its size."""
+    size = 256 << 20
+    good = (messages / "command-response.xml").read_bytes()
+    for source in ("file", "pipe"):
+        with tempfile.NamedTemporaryFile() as file:
+            file.write(good)
+            file.truncate(size)
+            file.flush()
+            words = [keelgate, "check", "--record", "VespCommandResponse", "--max-message", "1G"]
+            if source == "file":
+                process = subprocess.Popen([*words, file.name], stderr=subprocess.DEVNULL)
+            else:
+                feeder = subprocess.Popen(["cat", file.name], stdout=subprocess.PIPE)
+                process = subprocess.Popen(words, stdin=feeder.stdout, stderr=subprocess.DEVNULL)
+            _, _, usage = os.wait4(process.pid, 0)
+            check(usage.ru_maxrss * 1024 < size * 6 // 5,
+                  f"{size} bytes from a {source} take {usage.ru_maxrss} kB")
 
 
 def without_service():
@@ -177,6 +295,16 @@ def stream():
     check((status, err) == (2, ""), f"invalid requests: {status} {err}")
     check(run("stream", stdin=request(1, "").encode())[:1] == (0,), "rejection is an answer")
     check(run("stream") == (0, b"", ""), "an empty stream")
+    status, out, _ = run("stream", stdin=b"\xef\xbb\xbf" + request(1).encode())
+    check(status == 0 and "record" in objects(out)[0], "a byte order mark before the first line")
+    # What a line may have is derived from what a message may have; the stream goes on behind it.
+    longest = (1 << 20) + 3 * 512
+    lines = [request(0).ljust(longest), request(1).ljust(longest + 1), request(2)]
+    status, out, _ = run("stream", "--max-message", "1k", stdin="\n".join(lines).encode())
+    check(status == 2 and [r.get("id") for r in objects(out)] == [0, None, 2], f"long lines: {out}")
+    check(f"{longest} bytes" in objects(out)[1]["error"]["description"], f"a long line: {out}")
+    reply = objects(run("stream", "--max-message", "1K", stdin=request(1, "AAAA" * 342).encode())[1])
+    check((reply[0]["id"], host_error(reply[0])) == (1, "messageTooLarge"), f"too large: {reply}")
 
     process = subprocess.Popen([keelgate, "stream"], stdin=subprocess.PIPE, stdout=subprocess.PIPE,
                                stderr=subprocess.PIPE)
@@ -239,12 +367,45 @@ def described():
         for name in everything[section] if isinstance(everything[section], dict) else ():
             one = json.loads(run("describe", name, "--json")[1])
             check(one[section] == {name: everything[section][name]}, f"describe {name}")
-    for width in (40, 80, 132):
-        for words in ([], ["VespOstrelProtocolPayload"], ["com.tessen.private.braid.viso.audio"]):
-            out = run("describe", *words, env={**os.environ, "COLUMNS": str(width)})[1].decode()
-            # Headings are whole sentences, tables are indented.
-            check(all(len(line) <= width for line in out.splitlines() if line.startswith(" ")),
-                  f"describe {words} in {width} columns")
+    pages = [[], ["VespOstrelProtocolPayload"], ["com.tessen.private.braid.viso.audio"], ["232"],
+             ["CommandType"], ["VespClientMessageType"], ["WMMessageType"]]
+    for words in pages:
+        whole = run("describe", *words, env={**os.environ, "COLUMNS": "20"})[1].decode()
+        letters = set(whole.split())
+        check(max(map(len, whole.splitlines())) > 20, f"describe {words} is wrapped without need")
+        for width in (48, 60, 80, 132, 1000):
+            out = on_terminal("describe", *words, NO_COLOR="1", COLUMNS=str(width)).decode()
+            check(all(len(line) <= width for line in out.splitlines()) and out.split() and
+                  set(out.split()) == letters, f"describe {words} in {width} columns")
+        check(out.replace("\r", "") == whole, f"describe {words} in a wide terminal")
+    answered = json.loads(run("describe", "245", "--json")[1])
+    check([row["name"] for row in answered["commands"]] == ["livePhoto"] and
+          all(row.get("command", 245) == 245 for service in answered["services"]
+              for row in service["commands"]), f"describe 245: {answered}")
+    check(run("describe", "999")[0] == 2, "a number that is not a command's")
+
+
+def json_schema():
+    import jsonschema  # Debian's python3-jsonschema.
+    schema = json.loads(run("describe", "--json-schema")[1])
+    check(set(json.loads(run("describe", "--json")[1])["records"]) <= set(schema["$defs"]),
+          "every record has a definition")
+    replies = jsonschema.Draft202012Validator(schema)
+    replies.check_schema(schema)
+    for file in sorted(messages.glob("*.json")):
+        reply = json.loads(file.read_text())
+        check(replies.is_valid(reply), f"{file.name} against the schema of replies")
+        for wrong in ({**reply, "more": 1}, {key: reply[key] for key in list(reply)[1:]}):
+            check(not replies.is_valid(wrong), f"{file.name} changed: {list(wrong)}")
+        if "record" in reply:
+            own = json.loads(run("describe", "--json-schema", reply["record"])[1])
+            value = jsonschema.Draft202012Validator(own)
+            check(value.is_valid(reply["value"]), f"{file.name} against {reply['record']}")
+            check(not value.is_valid({**reply["value"], "more": 1}), f"{file.name} with more")
+    for key, path in (("key", []), (None, [1, "a"])):
+        error = {"kind": "keyNotFound", "codingPath": path, "description": "", "key": key}
+        check(replies.is_valid({"id": [], "error": error}) == (key is not None), f"error {error}")
+    check(run("describe", "--json-schema", "VespSessionInvitationSchema")[0] == 2, "not printed")
 
 
 def on_terminal(*words, **environment):
@@ -276,28 +437,40 @@ def terminal():
     check(b"\033" not in on_terminal("describe", NO_COLOR="1"), "NO_COLOR")
 
 
-def completed(*words):
-    script = ('source "$0"; COMP_WORDS=("$@"); COMP_CWORD=$(($# - 1)); _keelgate "$1"; '
-              'printf "%s\\n" "${COMPREPLY[@]}"')
-    done = subprocess.run(["bash", "-c", script, root / "cli/keelgate.bash", keelgate, *words],
-                          capture_output=True, text=True)
-    return done.stdout.split() if not done.stderr else done.stderr
+def completed(shell, *words):
+    """What the shell offers for the last word."""
+    scripts = {
+        "bash": 'source "$0/keelgate.bash"; COMP_WORDS=("$@"); COMP_CWORD=$(($# - 1)); '
+                '_keelgate "$1"; printf "%s\\n" "${COMPREPLY[@]}"',
+        # The function that takes the candidates stands in for the shell's own.
+        "zsh": 'compadd() { [[ $1 == -- ]] && shift; print -l -- ${(M)@:#$words[CURRENT]*} }; '
+               'dir=$0; words=("$@"); CURRENT=$#; source $dir/_keelgate',
+        "fish": 'source $argv[1]/keelgate.fish; set line (string escape -- $argv[3..-2]); '
+                'complete -C (string join " " -- keelgate $line $argv[-1]) | cut -f 1'}
+    path = {**os.environ, "PATH": f"{pathlib.Path(keelgate).parent}:{os.environ['PATH']}"}
+    done = subprocess.run([shell, "-c", scripts[shell], root / "cli", keelgate, *words],
+                          capture_output=True, text=True, env=path)
+    return sorted(done.stdout.split()) if not done.stderr else done.stderr
 
 
 def completion():
     for words, expected in (
-            ([""], ["unpack", "stream", "describe"]), (["d"], ["describe"]),
-            (["unpack", "--t"], ["--time-limit"]), (["describe", "--j"], ["--json"]),
-            (["unpack", "--record", "P"], ["PulseUserPayload"]),
-            (["unpack", "--service", "com.tessen.private.braid.w"],
+            (["d"], ["describe"]), (["st"], ["stream"]),
+            (["unpack", "--ti"], ["--time-limit"]), (["describe", "--json-"], ["--json-schema"]),
+            (["unpack", "--files"], ["--files0-from"]),
+            (["stream", "--log-level", "w"], ["warning"]),
+            (["unpack", "--record", "Pu"], ["PulseUserPayload"]),
+            (["check", "--service", "com.tessen.private.braid.w"],
              ["com.tessen.private.braid.waymark"]),
             (["unpack", "--service", "x", "--command", "24"], ["245"]),
             (["describe", "WMM"], ["WMMessageType"])):
-        check(completed(*words) == expected, f"completion of {words}: {completed(*words)}")
+        for shell in ("bash", "zsh", "fish"):
+            check(completed(shell, *words) == expected,
+                  f"{shell} completes {words}: {completed(shell, *words)}")
 
 
-for group in (wrong_usage, many_files, without_service, stream, long_stream, described,
-              terminal, completion):
+for group in (wrong_usage, many_files, said_of_a_run, metrics, hidden, memory, without_service, stream, long_stream, described,
+              json_schema, terminal, completion):
     group()
 print(f"{count - len(failures)} passed, {len(failures)} failed")
 sys.exit(bool(failures))

@@ -1,0 +1,240 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "cli/json_schema.h"
+
+#include "framework/json/reply.h"
+#include "framework/json/values.h"
+
+#include <algorithm>
+#include <iterator>
+
+namespace Keelgate::CLI {
+
+namespace {
+
+using JSON::writeField;
+using JSON::Writer;
+
+struct Scalar {
+  std::string_view name;
+  std::string_view schema;
+};
+
+/// Whatever is neither a record nor an enumeration, as values.cpp writes it.
+constexpr Scalar scalars[] = {
+    {"string", R"({"type":"string"})"},
+    {"bool", R"({"type":"boolean"})"},
+    {"int", R"({"type":"integer","minimum":-9223372036854775808,"maximum":9223372036854775807})"},
+    {"int64", R"({"type":"integer","minimum":-9223372036854775808,"maximum":9223372036854775807})"},
+    {"uint", R"({"type":"integer","minimum":0,"maximum":18446744073709551615})"},
+    {"uint64", R"({"type":"integer","minimum":0,"maximum":18446744073709551615})"},
+    {"double", R"({"anyOf":[{"type":"number"},{"enum":["nan","inf","-inf"]}]})"},
+    {"data",
+     R"({"type":"string","contentEncoding":"base64","pattern":"^([A-Za-z0-9+/]{4})*([A-Za-z0-9+/]{2}==|[A-Za-z0-9+/]{3}=)?$"})"},
+    {"date",
+     R"({"anyOf":[{"type":"string","format":"date-time","pattern":"^[0-9]{4}-[0-9]{2}-[0-9]{2}T[0-9]{2}:[0-9]{2}:[0-9]{2}([.][0-9]{1,6})?Z$"},{"type":"number"}]})"},
+    {"uuid",
+     R"({"type":"string","format":"uuid","pattern":"^[0-9A-F]{8}(-[0-9A-F]{4}){3}-[0-9A-F]{12}$"})"},
+    {"propertyList",
+     R"({"anyOf":[{"type":["string","number","boolean","null"]},{"type":"array","items":{"$ref":"#/$defs/propertyList"}},{"type":"object","additionalProperties":{"$ref":"#/$defs/propertyList"}}]})"},
+    {"reason",
+     R"({"enum":["crashed","timedOut","messageTooLarge","resourcesExhausted","protocolViolation","startFailed"]})"},
+    {"path",
+     R"({"type":"array","items":{"anyOf":[{"type":"string"},{"type":"integer","minimum":0}]}})"},
+};
+
+/// A member of an object that is printed.
+struct Member {
+  std::string_view name;
+  /// As a field's type.
+  std::string_view type;
+  Bool required = true;
+};
+
+struct ErrorShape {
+  Array<std::string_view> kinds;
+  Array<Member> members;
+};
+
+/// What errors have beside their `kind`.
+const Array<ErrorShape>& errorShapes() {
+  static const Array<ErrorShape> shapes = {
+      {{"keyNotFound"}, {{"key", "string"}, {"codingPath", "path"}, {"description", "string"}}},
+      {{"typeMismatch", "valueNotFound", "dataCorrupted"},
+       {{"codingPath", "path"}, {"description", "string"}}},
+      {{"breach"}, {{"domain", "string"}, {"errorType", "string"}, {"keyPath", "string", false}}},
+      {{"unpacking"},
+       {{"domain", "string"},
+        {"code", "int"},
+        {"case", "string"},
+        {"command", "uint64", false},
+        {"service", "string", false}}},
+      {{"host"}, {{"reason", "reason"}, {"description", "string"}}},
+      {{"request"}, {{"description", "string"}}},
+  };
+  return shapes;
+}
+
+class Schema {
+ public:
+  Schema(Writer& out, const Description& all) : out_(out), all_(all) {
+    out_.beginObject();
+    writeField(out_, "$schema", "https://json-schema.org/draft/2020-12/schema");
+  }
+
+  /// The value of a record or an enumeration.
+  void value(std::string_view name) {
+    referTo(name);
+    end();
+  }
+
+  void reply() {
+    out_.key("anyOf");
+    out_.beginArray();
+    for (const std::string_view name : JSON::recordNames()) answer(name);
+    answer("VespClientMessageResult");
+    out_.beginObject();
+    object({{"error", "error"}}, [&] { return preface(); });
+    out_.endObject();
+    out_.endArray();
+    end();
+  }
+
+ private:
+  /// All that was referred to, and what that refers to, each once.
+  void end() {
+    out_.key("$defs");
+    out_.beginObject();
+    // By position: definitions enter further names.
+    for (std::size_t i = 0; i < names_.size(); ++i) {
+      out_.key(names_[i]);
+      define(names_[i]);
+    }
+    out_.endObject();
+    out_.endObject();
+  }
+
+  void referTo(std::string_view type) {
+    if (type.starts_with('[')) {
+      writeField(out_, "type", "array");
+      out_.key("items");
+      out_.beginObject();
+      referTo(type.substr(1, type.size() - 2));
+      out_.endObject();
+      return;
+    }
+    writeField(out_, "$ref", "#/$defs/" + String(type));
+    if (std::ranges::find(names_, type) == names_.end()) names_.push_back(type);
+  }
+
+  void oneOf(std::string_view key, const Array<std::string_view>& values) {
+    out_.key(key);
+    out_.beginObject();
+    writeField(out_, "enum", values);
+    out_.endObject();
+  }
+
+  /// An object with these members and those that `others` writes, which gives the names of those of
+  /// its own that are required, and no more.
+  template <class Others>
+  void object(const Array<Member>& members, const Others& others) {
+    writeField(out_, "type", "object");
+    out_.key("properties");
+    out_.beginObject();
+    Array<std::string_view> required = others();
+    for (const Member& member : members) {
+      out_.key(member.name);
+      out_.beginObject();
+      referTo(member.type);
+      out_.endObject();
+      if (member.required) required.push_back(member.name);
+    }
+    out_.endObject();
+    writeField(out_, "required", required);
+    writeField(out_, "additionalProperties", false);
+  }
+
+  Array<std::string_view> preface() {
+    out_.key("id");
+    out_.raw("true");
+    out_.key("file");
+    out_.raw(R"({"type":"string"})");
+    return {};
+  }
+
+  void answer(std::string_view name) {
+    out_.beginObject();
+    object({{"value", name}}, [&] {
+      preface();
+      oneOf("record", {name});
+      return Array<std::string_view>{"record"};
+    });
+    out_.endObject();
+  }
+
+  void define(std::string_view name) {
+    const auto scalar = std::ranges::find(scalars, name, &Scalar::name);
+    if (scalar != std::end(scalars)) return out_.raw(scalar->schema);
+    out_.beginObject();
+    const auto record = std::ranges::find(all_.records, name, &StructTable::name);
+    const auto enumeration = std::ranges::find(all_.enumerations, name, &EnumerationTable::name);
+    if (record != all_.records.end()) {
+      define(*record);
+    } else if (enumeration != all_.enumerations.end()) {
+      Array<std::string_view> cases;
+      for (const EnumerationCase& entry : enumeration->cases) cases.push_back(entry.name);
+      writeField(out_, "enum", cases);
+    } else if (name == "error") {
+      defineError();
+    }
+    out_.endObject();
+  }
+
+  void define(const StructTable& table) {
+    if (table.kind == StructTable::Kind::itsField) return referTo(table.fields.front().type);
+    Array<Member> members;
+    for (const FieldRow& field : table.fields) {
+      members.push_back({field.name, field.type, field.required});
+    }
+    object(members, [] { return Array<std::string_view>(); });
+    if (table.kind == StructTable::Kind::oneOfItsFields) {
+      writeField(out_, "minProperties", Int{1});
+      writeField(out_, "maxProperties", Int{1});
+    }
+  }
+
+  void defineError() {
+    out_.key("anyOf");
+    out_.beginArray();
+    for (const ErrorShape& shape : errorShapes()) {
+      out_.beginObject();
+      object(shape.members, [&] {
+        oneOf("kind", shape.kinds);
+        return Array<std::string_view>{"kind"};
+      });
+      out_.endObject();
+    }
+    out_.endArray();
+  }
+
+  Writer& out_;
+  const Description& all_;
+  /// Of the definitions, in the order in which they are first referred to.
+  Array<std::string_view> names_;
+};
+
+}  // namespace
+
+Bool writeJsonSchema(Writer& out, const Description& all, std::string_view name) {
+  if (std::ranges::count(all.records, name, &StructTable::name) == 0 &&
+      std::ranges::count(all.enumerations, name, &EnumerationTable::name) == 0) {
+    return false;
+  }
+  Schema(out, all).value(name);
+  return true;
+}
+
+void writeReplySchema(Writer& out, const Description& all) {
+  Schema(out, all).reply();
+}
+
+}  // namespace Keelgate::CLI
