@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// A view of message bytes. Whoever makes one keeps the bytes alive and unchanged.
+/// A view of message bytes. Whoever makes one keeps the bytes alive and unchanged.
 #pragma once
 
 #include <cstddef>
@@ -9,8 +9,9 @@ namespace Keelgate::Text {}
 
 namespace PropertyList {
 
-namespace Text = Keelgate::Text;
-
 using Bytes = std::span<const std::byte>;
+
+/// Spellings that both sides of the seal share.
+namespace Text = Keelgate::Text;
 
 }  // namespace PropertyList

@@ -1,13 +1,17 @@
 // SPDX-License-Identifier: Apache-2.0
-// The one place where pointers move over message bytes.
-//
-// A cursor walks a window of a message and cannot leave it: every read is checked against the
-// window's end, and every amount that the message claims is compared with what remains before it
-// is added to anything, so that no claim can overflow. Binary reads throw Damage when the window
-// is too short; text reads see '\0' at the end, a character that no XML may hold.
-//
-// A value; not for use by several threads at once. The message must outlive it.
+/// The one place where pointers move over message bytes.
+///
+/// A cursor walks a window of a message and cannot leave it: every read is checked against the
+/// window's end, and every amount that the message claims is compared with what remains before it
+/// is added to anything, so that no claim can overflow. Binary reads throw MalformedDocument when
+/// the window is too short; text reads see '\0' at the end, a character that no XML may hold.
+///
+/// A value; not for use by several threads at once. The message must outlive it.
 #pragma once
+
+#include "plist/bytes.h"
+#include "plist/malformed_document.h"
+#include "text/ascii.h"
 
 #include <bit>
 #include <cstddef>
@@ -15,38 +19,33 @@
 #include <cstring>
 #include <string_view>
 
-#include "plist/block.h"
-#include "plist/bytes.h"
-#include "plist/damage.h"
-#include "text/ascii.h"
-
 namespace PropertyList {
 
-// Cheap to copy: a copy is how a reader looks ahead, or goes back.
+/// Cheap to copy: a copy is how a reader looks ahead, or goes back.
 class Cursor {
  public:
-  // The whole message.
+  /// The whole message.
   explicit Cursor(Bytes message) noexcept : Cursor(message, 0, message.size()) {}
-  // The window [from, to) of the message, with from <= to <= its length.
+  /// The window [from, to) of the message, with from <= to <= its length.
   Cursor(Bytes message, std::size_t from, std::size_t to) noexcept
       : begin_(message.data()), here_(begin_ + from), end_(begin_ + to) {}
 
-  // Bytes from the message's beginning.
+  /// Bytes from the message's beginning.
   std::size_t position() const noexcept { return static_cast<std::size_t>(here_ - begin_); }
-  // Bytes up to the window's end.
+  /// Bytes up to the window's end.
   std::size_t remaining() const noexcept { return static_cast<std::size_t>(end_ - here_); }
 
-  // --- binary: each throws Damage(objectOutside) rather than leave the window ---
+  /// Binary: each throws MalformedDocument(objectOutside) rather than leave the window.
 
   std::uint8_t byte() { return std::to_integer<std::uint8_t>(take(1)[0]); }
-  // The next `length` bytes, as a view into the message.
+  /// The next `length` bytes, as a view into the message.
   Bytes take(std::uint64_t length) {
-    if (length > remaining()) throw Damage(Problem::objectOutside, position());
+    if (length > remaining()) throw MalformedDocument(Problem::objectOutside, position());
     const Bytes taken(here_, static_cast<std::size_t>(length));
     here_ += length;
     return taken;
   }
-  // An unsigned number of 1 to 8 bytes, most significant first.
+  /// An unsigned number of 1 to 8 bytes, most significant first.
   std::uint64_t bigEndian(std::size_t width) {
     std::uint64_t number = 0;
     for (const std::byte next : take(width)) {
@@ -55,86 +54,65 @@ class Cursor {
     return number;
   }
 
-  // The number of `width` bytes (1 to 8) at `offset`. For offset tables and references, which the
-  // caller has checked and which lie before the 32-byte trailer, so that 8 bytes can be loaded at
-  // once whatever the width. Requires offset + 8 <= message.size().
+  /// The number of `width` bytes (1 to 8) at `offset`. For offset tables and references, which the
+  /// caller has checked and which lie before the 32-byte trailer, so that 8 bytes can be loaded at
+  /// once whatever the width. Requires offset + 8 <= message.size().
   static std::uint64_t bigEndianAt(Bytes message, std::size_t offset, std::size_t width) noexcept {
     std::uint64_t number;
     std::memcpy(&number, message.data() + offset, sizeof number);
     if constexpr (std::endian::native == std::endian::little) number = __builtin_bswap64(number);
     return number >> (64 - 8 * width);
   }
-  // The view of `length` bytes at `offset`; both checked by the caller when the node was made.
+  /// The view of `length` bytes at `offset`; both checked by the caller when the node was made.
   static std::string_view textAt(Bytes message, std::size_t offset, std::size_t length) noexcept {
     return {reinterpret_cast<const char*>(message.data() + offset), length};
   }
 
-  // The word that stands at `offset`, in the machine's byte order. Requires that it ends in the
-  // text. By memcpy, since nothing in a message is aligned.
-  template <typename Word>
-  static Word wordAt(std::string_view text, std::size_t offset) noexcept {
-    Word word;
-    std::memcpy(&word, text.data() + offset, sizeof word);
-    return word;
-  }
-
-  // --- text: nothing throws ---
+  /// Text: nothing throws.
 
   bool atEnd() const noexcept { return here_ == end_; }
-  // The byte so many places ahead, or '\0' beyond the end.
+  /// The byte so many places ahead, or '\0' beyond the end.
   char peek(std::size_t ahead = 0) const noexcept {
     return ahead < remaining() ? static_cast<char>(here_[ahead]) : '\0';
   }
-  // The eight bytes so many places ahead, in the machine's order, or zero when they are not all
-  // inside the window.
+  /// The eight bytes so many places ahead, the first one lowest; zero bytes beyond the end.
   std::uint64_t word(std::size_t ahead) const noexcept {
     std::uint64_t bytes = 0;
-    if (remaining() >= ahead + sizeof bytes) std::memcpy(&bytes, here_ + ahead, sizeof bytes);
-    return bytes;
+    if (remaining() >= ahead + sizeof bytes) {
+      std::memcpy(&bytes, here_ + ahead, sizeof bytes);
+    } else if (remaining() > ahead) {
+      std::memcpy(&bytes, here_ + ahead, remaining() - ahead);
+    }
+    return std::endian::native == std::endian::little ? bytes : __builtin_bswap64(bytes);
   }
-  // All that is left of the window.
+  /// All that is left of the window.
   std::string_view rest() const noexcept {
     return {reinterpret_cast<const char*>(here_), remaining()};
   }
-  // From an earlier position of this cursor up to here. The start may lie no further than here.
+  /// From an earlier position of this cursor up to here. The start may lie no further than here.
   std::string_view since(std::size_t start) const noexcept {
     return {reinterpret_cast<const char*>(begin_ + start), position() - start};
   }
-  // Moves on by at most what remains.
+  /// Moves on by at most what remains.
   void skip(std::size_t length) noexcept { here_ += length < remaining() ? length : remaining(); }
-  // Moves past the literal if it stands here; says whether it did. Case counts, as it does in XML.
+  /// Moves past the literal if it stands here; says whether it did. Case counts, as it does in XML.
   bool skipIf(std::string_view literal) noexcept {
     if (!rest().starts_with(literal)) return false;
     here_ += literal.size();
     return true;
   }
-  // Moves past white space as XML knows it; says whether there was any.
+  /// Moves past white space as XML knows it; says whether there was any.
   bool skipSpace() noexcept {
     const std::byte* const start = here_;
     while (here_ != end_ && Text::isSpace(std::to_integer<char>(*here_))) ++here_;
     return here_ != start;
   }
-  // Moves to the next byte that text gives a meaning to or forbids: '<', '&', ']', a carriage
-  // return, another control character, or any byte above 0x7F. Or to the end.
-  void skipPlain() noexcept {
-    // Most texts are short: the first block is looked at where it is asked for.
-    const std::size_t length = remaining() >= blockLength ? plainPrefix() : 0;
-    here_ += length;
-    if (length == 0 || length == blockLength) skipLongPlain();
-  }
+  /// Moves to the next byte that text gives a meaning to or forbids: '<', '&', ']', a carriage
+  /// return, another control character, or any byte above 0x7f. Or to the end.
+  void skipPlain() noexcept;
 
  private:
-  // How many bytes come before the first that is not plain. Requires a block inside the window.
-  std::size_t plainPrefix() const noexcept {
-    Block block;
-    std::memcpy(&block, here_, sizeof block);
-    // Bytes above 0x7F are below a space too.
-    return unmarkedPrefix(((block < ' ') & (block != '\n') & (block != '\t')) | (block == '<') |
-                          (block == '&') | (block == ']'));
-  }
-  void skipLongPlain() noexcept;
-
-  // Always begin_ <= here_ <= end_.
+  /// Always begin_ <= here_ <= end_.
   const std::byte* begin_;
   const std::byte* here_;
   const std::byte* end_;

@@ -1,15 +1,35 @@
 // SPDX-License-Identifier: Apache-2.0
-// The accessors: each checks the type, then looks at the node. Everything else was checked before.
+/// The accessors: each checks the type, then looks at the node. Everything else was checked before.
 #include "plist/document.h"
+
+#include "plist/limits.h"
 
 #include <bit>
 #include <stdexcept>
 
-#include "plist/limits.h"
-
 namespace PropertyList {
+namespace {
 
-// A logic error and not Damage: no message can bring it about, only a defect of its reader.
+/// What people send in place of a property list, told apart so that they see why it is refused.
+void refuseOtherFormats(std::string_view message) {
+  struct Format {
+    std::string_view beginning;
+    Problem problem;
+  };
+  static constexpr Format formats[] = {
+      {"\x1f\x8b", Problem::compressed}, {"\xfe\xff", Problem::utf16}, {"\xff\xfe", Problem::utf16},
+      {{"\0<", 2}, Problem::utf16},      {{"<\0", 2}, Problem::utf16},
+  };
+  if (message.empty()) throw MalformedDocument(Problem::empty, 0);
+  for (const Format& format : formats) {
+    if (message.starts_with(format.beginning)) throw MalformedDocument(format.problem, 0);
+  }
+}
+
+}  // namespace
+
+/// A logic error and not MalformedDocument: no message can bring it about, only a defect of its
+/// reader.
 void Value::refuse() {
   throw std::logic_error("A property-list value was asked for another type");
 }
@@ -35,15 +55,25 @@ Bytes Value::data() const {
   return std::as_bytes(std::span(store_->text(expect(Type::data))));
 }
 
+Bytes Value::uid() const {
+  return std::as_bytes(std::span(store_->text(expect(Type::uid))));
+}
+
 std::size_t Value::count() const {
   if (!isContainer(type())) refuse();
   return node().count;
 }
 
+std::size_t Value::position() const noexcept {
+  const bool isBytes = type() == Type::string || type() == Type::data;
+  const bool isReferences = isContainer(type()) && store_->referenceSize != 0;
+  return (isBytes && !node().has(Node::inSide)) || isReferences ? node().position() : 0;
+}
+
 ArrayRange Value::elements() const {
   // A set has an order here: that of the message.
   if (type() != Type::array && type() != Type::set) refuse();
-  return {*store_, store_->firstChild(number_), node().count, shared_};
+  return {*store_, 0, store_->firstChild(number_), node().count, shared_};
 }
 
 EntryRange Value::entries() const {
@@ -54,11 +84,13 @@ EntryRange Value::entries() const {
   return {*store_, key, key + apart, count, shared_};
 }
 
-// The first bytes decide; a binary one of another version is refused there, never tried as XML.
+/// The first bytes decide; a binary one of another version is refused there, never tried as XML.
 Document::Document(Bytes message) {
-  if (message.size() > Limits::messageLength) throw Damage(Problem::messageTooLarge, 0);
+  if (message.size() > Limits::length) throw MalformedDocument(Problem::messageTooLarge, 0);
   store_.message = message;
-  if (Cursor(message).rest().starts_with("bplist")) {
+  const std::string_view beginning = Cursor(message).rest();
+  refuseOtherFormats(beginning);
+  if (beginning.starts_with("bplist")) {
     readBinary(store_);
   } else {
     readXml(store_);

@@ -112,7 +112,7 @@ TEST(Numbers, Dates) {
   }
 }
 
-// The writer finds the calendar date in another way than the reader finds the day.
+/// The writer finds the calendar date in another way than the reader finds the day.
 TEST(Numbers, DaysOfTheWholeCalendar) {
   for (int day = -730'485; day <= 2'921'573; day += 97) {
     const Date noon{day * 86400.0 + 43200};

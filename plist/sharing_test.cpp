@@ -1,5 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
-// Depth, sharing, overlap and repeated keys: the ways to make a small message expensive.
+/// Depth, sharing, overlap and repeated keys: the ways to make a small message expensive.
+#include "plist/expansion_budget.h"
+#include "plist/key_hash.h"
 #include "plist/limits.h"
 #include "plist/test_messages.h"
 #include "plist/writer.h"
@@ -22,7 +24,7 @@ TEST(Depth, LimitIsExactInXml) {
   EXPECT_EQ(nested(100'000), Problem::tooDeep);
 }
 
-// [tail, chain]: the tail is walked first and alone, then hangs at the end of the chain.
+/// [tail, chain]: the tail is walked first and alone, then hangs at the end of the chain.
 std::string joined(std::size_t chain, std::size_t tail) {
   Raw raw{{"\xA2" + bigEndian(chain + 1, 2) + bigEndian(1, 2)}, 2, 4};
   for (std::size_t i = 1; i <= chain + tail; ++i) {
@@ -39,6 +41,25 @@ TEST(Depth, CountsEveryPathThroughSharedContainers) {
   EXPECT_EQ(problemIn(joined(0, 10'000)), Problem::tooDeep);
 }
 
+/// The list has a height only because what it holds was read before.
+TEST(Depth, IsPassedOnThroughWhatWasReadBefore) {
+  const auto message = [](std::size_t chain, std::size_t tail) {
+    // [tail, [tail], chain of that list]
+    const std::size_t list = tail + 1;
+    Raw raw{{"\xA3" + bigEndian(1, 2) + bigEndian(list, 2) + bigEndian(list + 1, 2)}, 2, 4};
+    for (std::size_t i = 1; i <= tail; ++i) {
+      raw.objects.push_back(i == tail ? "\xA0" : "\xA1" + bigEndian(i + 1, 2));
+    }
+    raw.objects.push_back("\xA1" + bigEndian(1, 2));
+    for (std::size_t i = 1; i <= chain; ++i) {
+      raw.objects.push_back("\xA1" + bigEndian(i == chain ? list : list + i + 1, 2));
+    }
+    return raw.message();
+  };
+  EXPECT_EQ(problemIn(message(200, 310)), std::nullopt);
+  EXPECT_EQ(problemIn(message(200, 311)), Problem::tooDeep);
+}
+
 std::string doubling(std::size_t levels) {
   std::vector<std::string> objects;
   for (std::size_t i = 1; i <= levels; ++i)
@@ -51,8 +72,8 @@ std::optional<Problem> problemInReading(const std::string& message) {
   try {
     read(message);
     return std::nullopt;
-  } catch (const Damage& damage) {
-    return damage.problem();
+  } catch (const MalformedDocument& error) {
+    return error.problem();
   }
 }
 
@@ -90,10 +111,10 @@ TEST(Sharing, TheBudgetFollowsTheMessage) {
   budget.spend(document.top(), 10 * allowance);
   budget.spend(shared, allowance - 1);
   budget.spend(shared, 1);
-  EXPECT_THROW(budget.spend(shared, 1), Damage);
+  EXPECT_THROW(budget.spend(shared, 1), MalformedDocument);
 }
 
-// Many object numbers for the same bytes: none is shared, yet each would be converted anew.
+/// Many object numbers for the same bytes: none is shared, yet each would be converted anew.
 TEST(Sharing, OverlappingObjectsAreCharged) {
   const auto overlapping = [](std::size_t copies, std::size_t units) {
     const std::string list = "\xAF\x12" + bigEndian(copies, 4);
@@ -107,6 +128,17 @@ TEST(Sharing, OverlappingObjectsAreCharged) {
     return objects + Raw{std::vector<std::string>(copies + 1), 2, 4}.trailer(table);
   };
   EXPECT_EQ(problemIn(overlapping(2, 10)), std::nullopt);
+  // 2 bytes for each reference in the list and in its count of units, as long as it is allowed.
+  const auto claimed = [](std::size_t copies, std::size_t units) {
+    return copies * 2 + copies * 2 * units;
+  };
+  for (std::size_t units = 5'000;; ++units) {
+    const std::string message = overlapping(10, units);
+    const std::size_t allowed = Limits::claimedBase + Limits::claimedFactor * message.size();
+    const bool isAllowed = claimed(10, units) <= allowed;
+    ASSERT_EQ(problemIn(message) == std::nullopt, isAllowed) << units;
+    if (!isAllowed) break;
+  }
   EXPECT_EQ(problemIn(overlapping(10'000, 50'000)), Problem::overlappingObjects);
 }
 
@@ -129,6 +161,25 @@ TEST(Keys, RepetitionIsFoundInDictionariesOfEverySize) {
   }
 }
 
+TEST(Keys, RepetitionIsFoundAtEveryPlace) {
+  for (const std::size_t count : {2u, 3u, 7u, 12u}) {
+    for (std::size_t second = 1; second < count; ++second) {
+      for (std::size_t first = 0; first < second; ++first) {
+        Dictionary entries;
+        for (std::size_t i = 0; i < count; ++i) {
+          // Equal keys around and inside are other dictionaries' keys.
+          entries.emplace_back(std::to_string(i), Dictionary{{"0", 1}, {"1", 2}});
+        }
+        EXPECT_EQ(problemIn(writeXml(Array{entries, entries})), std::nullopt);
+        EXPECT_EQ(problemIn(writeBinary(Array{entries, entries})), std::nullopt);
+        entries[second].first = entries[first].first;
+        EXPECT_EQ(problemIn(writeXml(entries)), Problem::duplicateKey) << first << second;
+        EXPECT_EQ(problemIn(writeBinary(entries)), Problem::duplicateKey) << first << second;
+      }
+    }
+  }
+}
+
 TEST(Keys, AreComparedByMeaning) {
   EXPECT_EQ(
       problemIn(binary({"\xD2\x01\x02\x03\x03", "\x52\x61\x62", bytes("\x62\0a\0b"), "\x09"})),
@@ -140,19 +191,47 @@ TEST(Keys, AreComparedByMeaning) {
             std::nullopt);
 }
 
-// Fingerprints look at the beginning, middle and end of a key; these differ elsewhere.
-TEST(Keys, CollisionsCostNoMoreThanASort) {
-  Dictionary entries;
-  for (int i = 0; i < 20'000; ++i) {
-    const std::string number = std::to_string(100'000 + i);
-    entries.emplace_back(std::string(10, 'a') + number + std::string(40, 'a'), true);
+/// Keys of eight ASCII characters that have one hash, made by undoing its steps: the lower half
+/// follows from the hash and is the same in all.
+std::vector<std::string> collidingKeys(std::size_t count) {
+  constexpr std::uint64_t factor = 0x9e37'79b9'7f4a'7c15;
+  std::uint64_t inverse = 1;
+  for (int i = 0; i < 6; ++i) inverse *= 2 - factor * inverse;
+  const auto wordFor = [&](std::uint64_t hash) {
+    return (hash * inverse) ^ (8 * factor);
+  };
+  std::uint64_t hash = 0;
+  while ((wordFor(hash) & 0x8080'8080) != 0) ++hash;
+  std::vector<std::string> keys;
+  for (std::uint64_t high = 0; keys.size() < count; ++high) {
+    const std::uint64_t word = wordFor(high << 32 | hash);
+    if ((word & 0x8080'8080'8080'8080) != 0) continue;
+    keys.emplace_back(reinterpret_cast<const char*>(&word), sizeof word);
   }
-  EXPECT_EQ(problemIn(writeXml(entries)), std::nullopt);
-  entries[1].first = entries[15'000].first;
-  EXPECT_EQ(problemIn(writeXml(entries)), Problem::duplicateKey);
+  return keys;
 }
 
-// 20,000 dictionaries with the same two long keys: 16 GB to compare, if compared in each.
+TEST(Keys, WithOneHashAreToldApart) {
+  const std::vector<std::string> keys = collidingKeys(5'000);
+  ASSERT_EQ(keyHash(keys.front()), keyHash(keys.back()));
+  Dictionary entries;
+  // Honest ones among them, so that the table grows while there are collisions.
+  for (std::size_t i = 0; i < keys.size(); ++i) {
+    entries.emplace_back(keys[i], true);
+    entries.emplace_back("honest " + std::to_string(i), true);
+  }
+  EXPECT_EQ(problemIn(writeBinary(entries)), std::nullopt);
+  for (const auto& [first, second] :
+       {std::pair(0u, 9'998u), {4u, 20u}, {600u, 602u}, {40u, 7'000u}}) {
+    const std::string kept = std::exchange(entries[second].first, entries[first].first);
+    // The same bytes in another object, since the writer would share it.
+    auto message = writeBinary(entries);
+    EXPECT_EQ(problemIn(message), Problem::duplicateKey) << second;
+    entries[second].first = kept;
+  }
+}
+
+/// 20,000 dictionaries with the same two long keys: 16 GB to compare, if compared in each.
 TEST(Keys, LongSharedKeysAreRankedOnce) {
   const auto message = [](char last) {
     constexpr std::size_t dictionaries = 20'000;

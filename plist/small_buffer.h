@@ -1,10 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
-// A growing array of plain values whose first N live inside it.
-//
-// Most messages have a few dozen objects: their whole document then costs no allocation. It grows
-// with realloc and leaves new elements unset, neither of which std::vector does.
-//
-// A resource, tied to its place: neither copied nor moved. One thread at a time.
+/// A growing array of plain values whose first N live inside it.
+///
+/// Most messages have a few dozen objects: their whole document then costs no allocation. It grows
+/// with realloc and leaves new elements unset, neither of which std::vector does.
+///
+/// A resource, tied to its place: neither copied nor moved. One thread at a time.
 #pragma once
 
 #include <algorithm>

@@ -1,25 +1,26 @@
 // SPDX-License-Identifier: Apache-2.0
-// What a reader fills and a Document shows: one flat table of 16-byte nodes and one side buffer.
-//
-// Binary: nodes are indexed by object number, and children are the references in the message.
-// XML: nodes stand in document order, a container before its children and a key before its value;
-// a container knows where its last descendant ends.
-//
-// A resource of its Document; fixed once the reader has returned.
+/// What a reader fills and a Document shows: one table of 16-byte nodes in the order in which they
+/// were read, the distinct keys, and one side buffer.
+///
+/// Binary: children are the references in the message, which the list of objects leads to nodes.
+/// XML: a container stands before its children and a key before its value; a container knows where
+/// its last descendant ends.
+///
+/// A resource of its Document; fixed once the reader has returned.
 #pragma once
-
-#include <cstddef>
-#include <cstdint>
-#include <string_view>
 
 #include "plist/bytes.h"
 #include "plist/cursor.h"
 #include "plist/small_buffer.h"
 
+#include <cstddef>
+#include <cstdint>
+#include <string_view>
+
 namespace PropertyList {
 
-// What values can be. The last two and null exist in binary alone: no field takes the two, and null
-// is absence.
+/// What values can be. The last two and null exist in binary alone: no field takes the two, and
+/// null is absence.
 enum class Type : std::uint8_t {
   null,
   boolean,
@@ -38,69 +39,92 @@ constexpr bool isContainer(Type type) noexcept {
   return type == Type::array || type == Type::dictionary || type == Type::set;
 }
 
-// All zero is a node that has not been read yet.
 struct Node {
   enum Flag : std::uint8_t {
     shared = 1,    // referenced more than once
     inSide = 2,    // the bytes are in the side buffer, not in the message
     negative = 4,  // an integer's bits are to be read as signed
-    open = 8,      // binary: being walked, so that another reference to it closes a circle
-    done = 16      // binary: checked with all that it reaches
+    open = 8       // binary: being walked, so that another reference to it closes a circle
   };
 
-  // A scalar's value; where bytes or references begin; an XML container's end in the node table.
+  /// A scalar's value. The position of bytes or references, and above it a key's number. An XML
+  /// container's end in the node table.
   std::uint64_t bits;
-  std::uint32_t count;   // bytes, elements or entries
-  std::uint16_t height;  // binary containers: the longest chain of containers from here
+  std::uint32_t count = 0;   // bytes, elements or entries
+  std::uint16_t height = 0;  // binary containers: the longest chain of containers from here
   Type type;
-  std::uint8_t flags;
+  std::uint8_t flags = 0;
 
   bool has(Flag flag) const noexcept { return (flags & flag) != 0; }
   void set(Flag flag) noexcept { flags = static_cast<std::uint8_t>(flags | flag); }
+
+  std::uint32_t position() const noexcept { return static_cast<std::uint32_t>(bits); }
+  /// Of a dictionary's key: its number in the key table, counted from 1. 0 before it has one.
+  std::uint32_t key() const noexcept { return static_cast<std::uint32_t>(bits >> 32); }
+  void setKey(std::uint32_t number) noexcept { bits |= std::uint64_t{number} << 32; }
 };
-// A byte of offset table can ask for a node, so this is the factor between a hostile message and
-// its table.
 static_assert(sizeof(Node) == 16);
 
-// Inline room for a small message: 128 nodes are 2 KiB, on the stack of whoever decodes. Two
-// formats, one shape: whoever walks it asks the members below and never knows which it is.
+/// A distinct key of the document. Numbers of keys are counted from 1.
+struct Key {
+  std::uint32_t node;        // the first with this text
+  std::uint32_t hash;        // keyHash of the text
+  std::uint32_t dictionary;  // while reading: the last that has it, counted from 1
+};
+
+/// Inline room for a small message, on the stack of whoever decodes. Two formats, one shape:
+/// whoever walks it asks the members below and never knows which it is.
 struct Store {
   Bytes message;
   SmallBuffer<Node, 128> nodes;
-  SmallBuffer<char, 512> side;    // unescaped and converted text, decoded base64
+  /// Binary: the node of each object, counted from 1; 0 where the object was not reached. Four
+  /// bytes for each that the message claims to have; nodes are for those that it refers to.
+  SmallBuffer<std::uint32_t, 128> objects;
+  SmallBuffer<char, 512> side;  // unescaped and converted text, decoded base64
+  SmallBuffer<Key, 64> keys;
   std::size_t referenceSize = 0;  // bytes; 0 for XML
-  std::uint32_t top = 0;
 
-  // A string's or data's bytes. The view is good until the side buffer grows: readers keep offsets,
-  // and views only once they are through.
+  /// A string's or data's bytes. The view is good until the side buffer grows: readers keep
+  /// positions, and views only once they are through.
   std::string_view text(const Node& node) const noexcept {
-    const auto offset = static_cast<std::size_t>(node.bits);
-    if (node.has(Node::inSide)) return {side.data() + offset, node.count};
-    return Cursor::textAt(message, offset, node.count);
+    if (node.has(Node::inSide)) return {side.data() + node.position(), node.count};
+    return Cursor::textAt(message, node.position(), node.count);
   }
 
-  // A position among children is an offset into the message in binary, a node number in XML.
-  // Where a container's children begin.
+  std::string_view keyText(std::uint32_t number) const noexcept {
+    return text(nodes[keys[number - 1].node]);
+  }
+
+  /// A position among children is an offset into the message in binary, a node number in XML.
+  /// Where a container's children begin.
   std::size_t firstChild(std::uint32_t container) const noexcept {
-    return referenceSize == 0 ? container + std::size_t{1}
-                              : static_cast<std::size_t>(nodes[container].bits);
+    return referenceSize == 0 ? container + std::size_t{1} : nodes[container].position();
   }
-  // The reader has held every reference against the number of objects.
+  /// The node of a child. The reader has held every reference against the number of objects.
   std::uint32_t child(std::size_t position) const noexcept {
-    const std::uint64_t number =
-        referenceSize == 0 ? position : Cursor::bigEndianAt(message, position, referenceSize);
-    return static_cast<std::uint32_t>(number);
+    if (referenceSize == 0) return static_cast<std::uint32_t>(position);
+    return objects[Cursor::bigEndianAt(message, position, referenceSize)] - 1;
   }
-  // The next sibling. In XML that is past all descendants.
+  /// The next sibling. In XML that is past all descendants.
   std::size_t after(std::size_t position) const noexcept {
     if (referenceSize != 0) return position + referenceSize;
     const Node& node = nodes[position];
     return isContainer(node.type) ? static_cast<std::size_t>(node.bits) : position + 1;
   }
+  /// The key after this one. Binary keeps all keys before all values; XML has them in turn.
+  std::size_t nextKey(std::size_t key) const noexcept {
+    return referenceSize != 0 ? key + referenceSize : after(key + 1);
+  }
+  /// Where in the message a child is named or begins; 0 where its text was assembled.
+  std::size_t place(std::size_t position) const noexcept {
+    if (referenceSize != 0) return position;
+    return nodes[position].has(Node::inSide) ? 0 : nodes[position].position();
+  }
 };
 
-// Fill a store whose message is set. Throw Damage and std::bad_alloc. They leave the store as it is
-// then: a Document whose constructor throws is never seen.
+/// Fill a store whose message is set; the top is node 0. Throw MalformedDocument and
+/// std::bad_alloc, and leave the store as it is then: a Document whose constructor throws is never
+/// seen.
 void readBinary(Store& store);
 void readXml(Store& store);
 

@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
-// Messages made by hand, for the tests of plist/.
+/// Messages made by hand, for the tests of plist/.
 #pragma once
+
+#include "plist/tree_of.h"
 
 #include <gtest/gtest.h>
 
@@ -8,8 +10,6 @@
 #include <string>
 #include <string_view>
 #include <vector>
-
-#include "fuzz/plist_walk.h"
 
 namespace PropertyList {
 
@@ -59,15 +59,19 @@ inline std::string xml(std::string_view content) {
   return "<plist>" + std::string(content) + "</plist>";
 }
 
-// What is wrong with a message; nothing where it is read.
+/// For the messages of a failed expectation.
+inline void PrintTo(Problem problem, std::ostream* out) {
+  *out << reason(problem);
+}
+
+/// What is wrong with a message; nothing where it is read.
 inline std::optional<Problem> problemIn(std::string_view message) {
   try {
     const Document document(bytesOf(message));
     return std::nullopt;
-  } catch (const Damage& damage) {
-    EXPECT_LE(damage.offset(), message.size());
-    EXPECT_EQ(damage.what(), sentence(damage.problem()));
-    return damage.problem();
+  } catch (const MalformedDocument& error) {
+    EXPECT_LE(error.offset(), message.size());
+    return error.problem();
   }
 }
 

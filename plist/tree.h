@@ -1,9 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
-// A property list to be written: an ordinary tree of values, dictionaries in the order given.
-//
-//   Tree tree = Dictionary{{"c", 232}, {"client", "sample"}, {"list", Array{1, 2.5, true}}};
-//
-// Values; may be used from any thread as any value may.
+/// A property list to be written: an ordinary tree of values, dictionaries in the order given.
+///
+///   Tree tree = Dictionary{{"c", 232}, {"client", "sample"}, {"list", Array{1, 2.5, true}}};
+///
+/// Values; may be used from any thread as any value may.
 #pragma once
 
 #include <concepts>
@@ -19,21 +19,21 @@ namespace PropertyList {
 
 struct Tree;
 
-// Any double; a writer refuses what its format cannot say.
+/// Any double; a writer refuses what its format cannot say.
 struct Date {
   double seconds;  // since 2001-01-01T00:00:00Z
 
   bool operator==(const Date&) const = default;
 };
 
-// No field takes one. It is here so that messages that have one can be made.
+/// No field takes one. It is here so that messages that have one can be made.
 struct Uid {
   std::uint64_t number;
 
   bool operator==(const Uid&) const = default;
 };
 
-// Dictionaries keep their order, since readers may depend on it and the mirror encoding does.
+/// Dictionaries keep their order, since readers may depend on it and the mirror encoding does.
 using Data = std::vector<std::byte>;
 using Array = std::vector<Tree>;
 using Dictionary = std::vector<std::pair<std::string, Tree>>;
@@ -43,7 +43,7 @@ struct Set {
   bool operator==(const Set&) const;
 };
 
-// One type with all cases, so that tests can write down what no schema has.
+/// One type with all cases, so that tests can write down what no schema has.
 struct Tree {
   using Variant = std::variant<std::nullptr_t, bool, std::int64_t, std::uint64_t, double, Date,
                                std::string, Data, Array, Dictionary, Uid, Set>;

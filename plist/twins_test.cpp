@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// Two readers must agree: random trees, written in both formats, read back as what they were.
+/// Two readers must agree: random trees, written in both formats, read back as what they were.
+#include <limits>
 #include <random>
 #include <stdexcept>
 

@@ -80,12 +80,9 @@ DecodingError invalidUUID(const CodingPath& path) {
   return corrupted(path, "The string is no UUID.");
 }
 
-// Without a path: what is damaged, or too much, is the message as a whole.
-DecodingError damaged(const PropertyList::Damage& damage) {
-  return {Kind::dataCorrupted,
-          std::nullopt,
-          {},
-          "The message is not a valid property list: " + String(damage.what())};
+// Without a path: what is malformed, or too much, is the message as a whole.
+DecodingError malformed(const PropertyList::MalformedDocument& error, Keelgate::Bytes message) {
+  return {Kind::dataCorrupted, std::nullopt, {}, PropertyList::describe(error, message)};
 }
 
 }  // namespace VespKeelgateService::Errors

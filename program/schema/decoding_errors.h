@@ -5,8 +5,8 @@
 /// of the message stands in a description but the type that was found.
 #pragma once
 
-#include "plist/damage.h"
 #include "plist/document.h"
+#include "plist/malformed_document.h"
 #include "program/schema/coding_path.h"
 
 #include <keelgate/errors.h>
@@ -40,6 +40,6 @@ DecodingError invalidRawValue(const CodingPath& path, std::string_view enumerati
 DecodingError invalidUUID(const CodingPath& path);
 
 /// The message is no property list, or expands out of proportion.
-DecodingError damaged(const PropertyList::Damage& damage);
+DecodingError malformed(const PropertyList::MalformedDocument& error, Keelgate::Bytes message);
 
 }  // namespace VespKeelgateService::Errors

@@ -213,9 +213,9 @@ class PropertyListDecoder {
       S schema{};
       decodeSchema(decoding, document.top(), CodingPath(), schema);
       return schema;
-    } catch (const PropertyList::Damage& damage) {
+    } catch (const PropertyList::MalformedDocument& error) {
       // From the check of the document, or from the budget while fields are read.
-      throw Errors::damaged(damage);
+      throw Errors::malformed(error, from);
     }
   }
 };

@@ -3,7 +3,7 @@
 /// that are listed with each.
 ///
 /// Pure but for the budget, which belongs to one decoding. Each throws DecodingError with `path`,
-/// and Damage where the budget is used up.
+/// and MalformedDocument where the budget is used up.
 #pragma once
 
 #include "plist/document.h"

@@ -1,27 +1,25 @@
 // SPDX-License-Identifier: Apache-2.0
-// Walks all of a document into a tree, as a reader that pays for what it copies; shared by the
-// fuzz harnesses and the tests of plist/.
-#pragma once
+#include "plist/tree_of.h"
+
+#include "plist/cursor.h"
+#include "plist/expansion_budget.h"
 
 #include <cmath>
 #include <limits>
-#include <string>
-
-#include "plist/document.h"
-#include "plist/expansion_budget.h"
-#include "plist/tree.h"
+#include <stdexcept>
 
 namespace PropertyList {
+namespace {
 
 Tree treeOf(const Value& value, ExpansionBudget& budget);
 
-inline Array elementsOf(const Value& value, ExpansionBudget& budget) {
+Array elementsOf(const Value& value, ExpansionBudget& budget) {
   Array elements;
   for (const Value element : value.elements()) elements.push_back(treeOf(element, budget));
   return elements;
 }
 
-inline Dictionary entriesOf(const Value& value, ExpansionBudget& budget) {
+Dictionary entriesOf(const Value& value, ExpansionBudget& budget) {
   Dictionary entries;
   for (const Entry entry : value.entries()) {
     budget.spend(value, entry.key.size() + 1);
@@ -30,9 +28,15 @@ inline Dictionary entriesOf(const Value& value, ExpansionBudget& budget) {
   return entries;
 }
 
-// Throws Damage when sharing makes the tree too large. Depth is at most 512, as Document checks.
-// UIDs become 0: they have no accessor, because no field takes one.
-inline Tree treeOf(const Value& value, ExpansionBudget& budget) {
+Uid uidOf(Bytes bytes) {
+  while (bytes.size() > 8) {
+    if (bytes.front() != std::byte{}) throw std::out_of_range("A UID does not fit 64 bits");
+    bytes = bytes.subspan(1);
+  }
+  return {Cursor(bytes).bigEndian(bytes.size())};
+}
+
+Tree treeOf(const Value& value, ExpansionBudget& budget) {
   budget.spend(value, sizeof(Tree));
   switch (value.type()) {
     case Type::null:
@@ -56,7 +60,7 @@ inline Tree treeOf(const Value& value, ExpansionBudget& budget) {
       budget.spend(value, value.data().size());
       return Data(value.data().begin(), value.data().end());
     case Type::uid:
-      return Uid{0};
+      return uidOf(value.uid());
     case Type::array:
       return elementsOf(value, budget);
     case Type::set:
@@ -67,7 +71,9 @@ inline Tree treeOf(const Value& value, ExpansionBudget& budget) {
   __builtin_unreachable();
 }
 
-inline Tree treeOf(Bytes message) {
+}  // namespace
+
+Tree treeOf(Bytes message) {
   const Document document(message);
   ExpansionBudget budget(message.size());
   return treeOf(document.top(), budget);

@@ -1,12 +1,12 @@
 // SPDX-License-Identifier: Apache-2.0
-// Containers wait on a stack of their own, as in the readers.
+/// Containers wait on a stack of their own, as in the readers.
 #include <array>
 #include <charconv>
 #include <cmath>
 #include <stdexcept>
 
-#include "plist/unicode.h"
 #include "plist/writer.h"
+#include "plist/xml/characters.h"
 #include "text/base64.h"
 #include "text/date_time.h"
 #include "text/utf8.h"
@@ -14,7 +14,7 @@
 namespace PropertyList {
 namespace {
 
-// All three that could be taken for markup, also where XML would let '>' stand.
+/// All three that could be taken for markup, also where XML would let '>' stand.
 void appendEscaped(std::string& out, std::string_view text) {
   while (!text.empty()) {
     const Text::Character next = Text::firstCharacter(text);
@@ -42,7 +42,7 @@ void appendEscaped(std::string& out, std::string_view text) {
   }
 }
 
-// The shortest spelling that reads back as the same double.
+/// The shortest spelling that reads back as the same double.
 std::string spelt(double number) {
   if (std::isnan(number)) return "nan";
   std::array<char, 32> text{};
@@ -108,7 +108,7 @@ void XmlWriter::open(Frame frame) {
   frames_.push_back(frame);
 }
 
-// Writes the next child of the innermost container, or its end tag.
+/// Writes the next child of the innermost container, or its end tag.
 void XmlWriter::step() {
   Frame& frame = frames_.back();
   const bool isArray = frame.array != nullptr;

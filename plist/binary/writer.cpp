@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// The trees here are our own, so this is plain code with ordinary containers.
+/// The trees here are our own, so this is plain code with ordinary containers.
 #include <bit>
 #include <cmath>
 #include <limits>
@@ -13,7 +13,7 @@
 namespace PropertyList {
 namespace {
 
-// The widths that integers have. Offsets and references may have others, and are given these.
+/// The widths that integers have. Offsets and references may have others, and are given these.
 std::size_t widthFor(std::uint64_t largest) noexcept {
   return largest <= 0xFF ? 1 : largest <= 0xFFFF ? 2 : largest <= 0xFFFF'FFFF ? 4 : 8;
 }
@@ -44,14 +44,14 @@ std::string encodedDouble(char marker, double number) {
   return out;
 }
 
-// A marker with its count, which follows as an integer object when 4 bits are too few.
+/// A marker with its count, which follows as an integer object when 4 bits are too few.
 std::string encodedHead(unsigned marker, std::size_t count) {
   std::string out(1, static_cast<char>(marker | (count < 15 ? count : 15)));
   if (count >= 15) out += encodedInteger(count, true);
   return out;
 }
 
-// As ASCII where it is, since that takes half the bytes.
+/// As ASCII where it is, since that takes half the bytes.
 std::string encodedString(std::string_view text) {
   if (Text::isAscii(text)) {
     return encodedHead(0x50, text.size()).append(text);
@@ -71,7 +71,7 @@ std::string encodedString(std::string_view text) {
   return encodedHead(0x60, units.size() / 2) + units;
 }
 
-// The bytes of a scalar; nothing for a container.
+/// The bytes of a scalar; nothing for a container.
 struct Encode {
   std::string operator()(std::nullptr_t) const { return std::string(1, '\0'); }
   std::string operator()(bool boolean) const { return std::string(1, boolean ? '\x09' : '\x08'); }
@@ -122,7 +122,7 @@ class BinaryWriter {
   std::unordered_map<std::string, std::size_t> scalars_;
 };
 
-// Equal bytes are one object, whatever types they came from.
+/// Equal bytes are one object, whatever types they came from.
 std::size_t BinaryWriter::numberOfScalar(std::string encoded) {
   const auto [place, isNew] = scalars_.emplace(encoded, objects_.size());
   if (isNew) objects_.push_back({nullptr, std::move(encoded), {}});
@@ -136,8 +136,8 @@ std::size_t BinaryWriter::number(const Tree& tree) {
   return objects_.size() - 1;
 }
 
-// Numbers a container's children. The list of objects may move meanwhile, so the container is
-// looked up again afterwards.
+/// Numbers a container's children. The list of objects may move meanwhile, so the container is
+/// looked up again afterwards.
 void BinaryWriter::refer(std::size_t container) {
   const Tree::Variant& value = objects_[container].container->value;
   std::vector<std::size_t> references;

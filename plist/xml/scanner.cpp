@@ -1,13 +1,12 @@
 // SPDX-License-Identifier: Apache-2.0
-// Text, references, tags' details, comments and instructions. The prolog is in xml_prolog.cpp.
-#include "plist/xml_scanner.h"
+/// Text, references, tags' details, comments and instructions. The prolog is in prolog.cpp.
+#include "plist/xml/scanner.h"
+
+#include "plist/xml/characters.h"
+#include "text/utf8.h"
 
 #include <algorithm>
 #include <array>
-
-#include "plist/duplicates.h"
-#include "plist/unicode.h"
-#include "text/utf8.h"
 
 namespace PropertyList {
 
@@ -24,13 +23,13 @@ void XmlScanner::markup() {
   }
 }
 
-// Past the "<!--". "--" may only stand in its end.
+/// Past the "<!--". "--" may only stand in its end.
 void XmlScanner::comment() {
   while (!cursor_.skipIf("--")) character();
   if (!cursor_.skipIf(">")) fail(Problem::badComment);
 }
 
-// Past the "<?". The target "xml" in any case is kept for the declaration.
+/// Past the "<?". The target "xml" in any case is kept for the declaration.
 void XmlScanner::instruction() {
   const std::string_view target = name(Problem::badInstruction);
   const auto isLetter = [&](std::size_t at, char lower) {
@@ -44,7 +43,7 @@ void XmlScanner::instruction() {
   while (!cursor_.skipIf("?>")) character();
 }
 
-// Passes one character of any kind and checks that XML admits it.
+/// Passes one character of any kind and checks that XML admits it.
 char32_t XmlScanner::character() {
   const char first = cursor_.peek();
   if (first >= ' ') {
@@ -60,7 +59,7 @@ char32_t XmlScanner::character() {
   return next.codePoint;
 }
 
-// A Name as XML has it; its colons mean nothing here.
+/// A Name as XML has it; its colons mean nothing here.
 std::string_view XmlScanner::name(Problem problem) {
   const std::size_t start = cursor_.position();
   while (!cursor_.atEnd()) {
@@ -74,6 +73,14 @@ std::string_view XmlScanner::name(Problem problem) {
   return cursor_.since(start);
 }
 
+bool XmlScanner::unusualStartTagEnd() {
+  if (cursor_.peek() != '/') attributes();
+  const bool isEmpty = cursor_.skipIf("/");
+  if (!cursor_.skipIf(">")) fail(cursor_.atEnd() ? Problem::truncated : Problem::badTag);
+  return isEmpty;
+}
+
+/// The attributes of a start tag and white space, up to its '>' or '/'.
 void XmlScanner::attributes() {
   // Gathered and compared once: a tag with a million attributes must not cost their square.
   SmallBuffer<std::string_view, 8> names;
@@ -88,10 +95,12 @@ void XmlScanner::attributes() {
     cursor_.skipSpace();
     attributeValue();
   }
-  if (hasDuplicates(names.all())) fail(Problem::duplicateAttribute);
+  const auto all = names.all();
+  std::ranges::sort(all);
+  if (std::ranges::adjacent_find(all) != all.end()) fail(Problem::duplicateAttribute);
 }
 
-// Checked as if it mattered: an unclosed quote would swallow the tags after it.
+/// Checked as if it mattered: an unclosed quote would swallow the tags after it.
 void XmlScanner::attributeValue() {
   const char quote = cursor_.peek();
   if (quote != '"' && quote != '\'') fail(Problem::badTag);
@@ -108,13 +117,7 @@ void XmlScanner::attributeValue() {
   cursor_.skip(1);
 }
 
-void XmlScanner::unusualEndTag(std::string_view name) {
-  if (!cursor_.skipIf("</") || !cursor_.skipIf(name)) fail(Problem::mismatchedEnd);
-  cursor_.skipSpace();
-  if (!cursor_.skipIf(">")) fail(Problem::mismatchedEnd);
-}
-
-// Past the '&'.
+/// Past the '&'.
 char32_t XmlScanner::reference() {
   if (cursor_.skipIf("#")) return characterReference();
   struct Entity {
@@ -130,7 +133,7 @@ char32_t XmlScanner::reference() {
   fail(Problem::badReference);
 }
 
-// Past the "&#".
+/// Past the "&#".
 char32_t XmlScanner::characterReference() {
   const bool isHex = cursor_.skipIf("x");
   const char32_t base = isHex ? 16 : 10;
@@ -156,7 +159,7 @@ char32_t XmlScanner::characterReference() {
   return codePoint;
 }
 
-// Passes text that means what it says, up to a '<', '&' or carriage return.
+/// Passes text that means what it says, up to a '<', '&' or carriage return.
 void XmlScanner::plainText() {
   for (;;) {
     cursor_.skipPlain();
@@ -169,17 +172,17 @@ void XmlScanner::plainText() {
   }
 }
 
-// Most text stands in the message as it is meant, and stays there.
-XmlScanner::Content XmlScanner::unusualText(const Spelling& element, std::size_t start) {
+/// Most text stands in the message as it is meant, and stays there.
+XmlScanner::Content XmlScanner::unusualText(const ShortText& name, std::size_t start) {
   plainText();
   if (cursor_.peek() == '<' && cursor_.peek(1) == '/') {
     const std::size_t length = cursor_.position() - start;
-    endTag(element);
+    endTag(name);
     return {start, length, false};
   }
   const std::size_t side = side_.size();
   assemble(start);
-  endTag(element);
+  endTag(name);
   return {side, side_.size() - side, true};
 }
 
@@ -206,7 +209,7 @@ void XmlScanner::assemble(std::size_t start) {
   }
 }
 
-// Past the "<![CDATA[": markup and references mean nothing, line ends still do.
+/// Past the "<![CDATA[": markup and references mean nothing, line ends still do.
 void XmlScanner::section() {
   std::size_t piece = cursor_.position();
   while (!cursor_.rest().starts_with("]]>")) {
@@ -222,13 +225,13 @@ void XmlScanner::section() {
   cursor_.skip(3);
 }
 
-// From the message as it stands, since that position.
+/// From the message as it stands, since that position.
 void XmlScanner::append(std::size_t start) {
   const std::string_view piece = cursor_.since(start);
   side_.append(piece.data(), piece.size());
 }
 
-// A carriage return, with or without a line feed, is one line end.
+/// A carriage return, with or without a line feed, is one line end.
 void XmlScanner::newline() {
   cursor_.skip(cursor_.peek(1) == '\n' ? 2 : 1);
   side_.push('\n');

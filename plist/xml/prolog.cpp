@@ -1,9 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
-// What stands before the root element: byte order mark, declaration, document type.
-#include <algorithm>
+/// What stands before the root element: byte order mark, declaration, document type.
+#include "plist/xml/scanner.h"
 
-#include "plist/unicode.h"
-#include "plist/xml_scanner.h"
+#include <algorithm>
 
 namespace PropertyList {
 namespace {
@@ -18,23 +17,20 @@ constexpr bool isLetterOrDigit(char c) noexcept {
   return Text::isLetter(c) || Text::isDigit(c);
 }
 
-// Which characters a public identifier may have.
+/// Which characters a public identifier may have.
 constexpr bool isPublicCharacter(char c) noexcept {
   return isLetterOrDigit(c) || isOneOf(c, " \r\n-'()+,./:=?;!*#@$_%");
 }
 
-// The only encoding that is read, so a name for any other is a lie or a mistake.
+/// The only encoding that is read, so a name for any other contradicts the message.
 bool isUtf8(std::string_view encoding) noexcept {
-  constexpr std::string_view utf8 = "utf-8";
-  return std::ranges::equal(encoding, utf8, [](char c, char lower) {
-    return c == lower || (c >= 'A' && c <= 'Z' && (c | 0x20) == lower);
-  });
+  return std::ranges::equal(encoding, std::string_view("utf-8"), {}, Text::lowerCase);
 }
 
-// Any 1.x is read as 1.0, as XML has it.
+/// Any 1.x is read as 1.0, as XML has it.
 bool isVersion(std::string_view version) noexcept {
   return version.size() > 2 && version.starts_with("1.") &&
-         std::ranges::all_of(version.substr(2), [](char c) { return c >= '0' && c <= '9'; });
+         std::ranges::all_of(version.substr(2), Text::isDigit);
 }
 
 }  // namespace
@@ -53,7 +49,7 @@ void XmlScanner::prolog() {
   }
 }
 
-// The three come in this order or not at all; the first is required.
+/// The three come in this order or not at all; the first is required.
 void XmlScanner::declaration() {
   cursor_.skip(5);
   std::string_view value;
@@ -66,7 +62,7 @@ void XmlScanner::declaration() {
   if (!cursor_.skipIf("?>")) fail(Problem::badDeclaration);
 }
 
-// Passes ` name="value"` if that is what stands here.
+/// Passes ` name="value"` if that is what stands here.
 bool XmlScanner::pseudoAttribute(std::string_view name, std::string_view& value) {
   const Cursor start = cursor_;
   if (!cursor_.skipSpace() || !cursor_.skipIf(name)) {
@@ -87,8 +83,8 @@ bool XmlScanner::pseudoAttribute(std::string_view name, std::string_view& value)
   return true;
 }
 
-// Past the "<!DOCTYPE". Its identifiers are checked for their characters and never looked up. An
-// internal subset could declare entities that expand without end, so there is none.
+/// Past the "<!DOCTYPE". Its identifiers are checked for their characters and never looked up. An
+/// internal subset could declare entities that expand without end, so there is none.
 void XmlScanner::documentType() {
   if (!cursor_.skipSpace()) fail(Problem::badDocumentType);
   name(Problem::badDocumentType);
@@ -101,7 +97,7 @@ void XmlScanner::documentType() {
   if (!cursor_.skipIf(">")) fail(Problem::badDocumentType);
 }
 
-// White space and an identifier in quotes.
+/// White space and an identifier in quotes.
 void XmlScanner::quoted(bool isPublic) {
   if (!cursor_.skipSpace()) fail(Problem::badDocumentType);
   const char quote = cursor_.peek();

@@ -1,0 +1,54 @@
+// SPDX-License-Identifier: Apache-2.0
+/// Numbers the distinct keys of a document: equal keys have one number, so that a dictionary's
+/// repeated key is found by comparing numbers.
+///
+/// The attacks: keys that all have one hash; and in binary, a million dictionaries that name the
+/// same two strings of a megabyte, equal but for their last byte. So every string is hashed and
+/// looked up once, however many dictionaries name it. A look-up compares with few others: keys that
+/// find no place because of collisions stand in an ordered set. Then n keys of t bytes altogether
+/// cost at most about t log n, whoever chose them.
+///
+/// A resource of one reading; one thread.
+#pragma once
+
+#include "plist/small_buffer.h"
+#include "plist/store.h"
+
+#include <cstddef>
+#include <cstdint>
+#include <set>
+#include <string_view>
+
+namespace PropertyList {
+
+class KeyTable {
+ public:
+  explicit KeyTable(Store& store);
+
+  /// Numbers the keys of this dictionary, which must all be read and be strings, and finds the
+  /// first that was there before. The dictionary ends at `end` in the message. Throws
+  /// MalformedDocument(duplicateKey), std::bad_alloc.
+  void check(std::uint32_t dictionary, std::size_t end);
+
+ private:
+  struct Less {
+    using is_transparent = void;
+    const Store* store;
+    bool operator()(std::uint32_t left, std::uint32_t right) const noexcept;
+    bool operator()(std::uint32_t left, std::string_view right) const noexcept;
+    bool operator()(std::string_view left, std::uint32_t right) const noexcept;
+  };
+
+  std::uint32_t find(std::uint32_t node);
+  std::uint32_t add(std::uint32_t node, std::uint32_t hash);
+  void place(std::uint32_t number);
+  void grow();
+
+  Store& store_;
+  /// Open addressing; keys' numbers, at most half of them taken. The size is a power of two.
+  SmallBuffer<std::uint32_t, 128> slots_;
+  /// Keys that found no slot. Empty in any message that was not made to collide, or nearly so.
+  std::set<std::uint32_t, Less> colliding_;
+};
+
+}  // namespace PropertyList

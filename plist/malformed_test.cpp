@@ -1,0 +1,243 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "plist/test_messages.h"
+#include "plist/writer.h"
+
+namespace PropertyList {
+namespace {
+
+struct Case {
+  const char* name;
+  std::string message;
+  std::optional<Problem> problem = std::nullopt;
+};
+
+void check(const std::vector<Case>& cases) {
+  for (const Case& c : cases) {
+    EXPECT_EQ(problemIn(c.message), c.problem) << c.name;
+  }
+}
+
+std::string withTrailer(std::size_t offsetSize, std::size_t referenceSize, std::uint64_t objects,
+                        std::uint64_t top, std::uint64_t table) {
+  return bytes("bplist00\x09\x08unused") + bigEndian(offsetSize, 1) + bigEndian(referenceSize, 1) +
+         bigEndian(objects, 8) + bigEndian(top, 8) + bigEndian(table, 8);
+}
+
+TEST(Malformed, Trailer) {
+  check(
+      {{"sound", withTrailer(1, 1, 1, 0, 9)},
+       {"empty", "", Problem::empty},
+       {"only magic", "bplist00", Problem::truncated},
+       {"other version", "bplist01" + withTrailer(1, 1, 1, 0, 9).substr(8), Problem::otherVersion},
+       {"one byte too short", "bplist00" + std::string(31, '\1'), Problem::truncated},
+       {"no room for an object", "bplist00" + withTrailer(1, 1, 1, 0, 8).substr(10),
+        Problem::trailer},
+       {"offset size 0", withTrailer(0, 1, 1, 0, 9), Problem::trailer},
+       {"offset size 9", withTrailer(9, 1, 1, 0, 9), Problem::trailer},
+       {"reference size 0", withTrailer(1, 0, 1, 0, 9), Problem::trailer},
+       {"reference size 9", withTrailer(1, 9, 1, 0, 9), Problem::trailer},
+       {"no objects", withTrailer(1, 1, 0, 0, 9), Problem::trailer},
+       {"top out of range", withTrailer(1, 1, 1, 1, 9), Problem::trailer},
+       {"table over the trailer", withTrailer(1, 1, 1, 0, 10), Problem::trailer},
+       {"table before the objects", withTrailer(1, 1, 1, 0, 7), Problem::trailer},
+       {"table beyond the end", withTrailer(1, 1, 1, 0, ~0ull), Problem::trailer},
+       {"overflowing table", withTrailer(8, 1, 0x2000'0000'0000'0001, 0, 9), Problem::trailer},
+       {"object in the table", withTrailer(1, 1, 1, 0, 8), Problem::objectOutside}});
+}
+
+TEST(Malformed, BinaryObjects) {
+  check(
+      {{"fill byte", binary({"\x0F"}), Problem::unknownMarker},
+       {"marker 7", binary({"\x70"}), Problem::unknownMarker},
+       {"marker B", binary({"\xB0"}), Problem::unknownMarker},
+       {"32-byte integer", binary({"\x15" + std::string(32, '\0')}), Problem::unknownMarker},
+       {"2-byte real", binary({bytes("\x21\0\0")}), Problem::unknownMarker},
+       {"4-byte date", binary({bytes("\x32\0\0\0\0")}), Problem::unknownMarker},
+       {"marker 7 of the singletons", binary({"\x07"}), Problem::unknownMarker},
+       {"marker 10 of the singletons", binary({"\x0A"}), Problem::unknownMarker},
+       {"marker 9", binary({"\x90x"}), Problem::unknownMarker},
+       {"marker E", binary({"\xE0"}), Problem::unknownMarker},
+       {"8-byte integer cut off", binary({"\x13" + std::string(7, '\0')}), Problem::objectOutside},
+       {"UID cut off", binary({"\x81x"}), Problem::objectOutside},
+       {"UTF-16 cut off", binary({bytes("\x61\0")}), Problem::objectOutside},
+       {"references cut off", binary({"\xA2\x01"}), Problem::objectOutside},
+       {"values cut off", binary({"\xD1\x01"}), Problem::objectOutside},
+       {"integer cut off", binary({bytes("\x13\0\0\0")}), Problem::objectOutside},
+       {"string over the table", binary({"\x52y"}), Problem::objectOutside},
+       {"count is a real", binary({bytes("\x5F\x22\0\0\0\0")}), Problem::badCount},
+       {"count of 16 bytes", binary({"\x5F\x14" + std::string(16, '\0')}), Problem::badCount},
+       {"8-byte count", binary({"\x5F\x13" + bigEndian(1, 8) + "x"})},
+       {"vast string", binary({"\x5F\x13" + bigEndian(~0ull, 8)}), Problem::objectOutside},
+       {"vast UTF-16", binary({"\x6F\x13" + bigEndian(1ull << 63, 8)}), Problem::objectOutside},
+       {"vast dictionary", binary({"\xDF\x13" + bigEndian(1ull << 63, 8)}), Problem::objectOutside},
+       {"not ASCII", binary({"\x52x\x80"}), Problem::notAscii},
+       {"not ASCII, far in", binary({"\x5F\x10\x64" + std::string(99, 'x') + "\xFF"}),
+        Problem::notAscii},
+       {"date NaN", binary({"\x33\x7F\xF8" + std::string(6, '\0')}), Problem::dateNotFinite},
+       {"date infinite", binary({"\x33\xFF\xF0" + std::string(6, '\0')}), Problem::dateNotFinite},
+       {"reference out of range", binary({"\xA1\x01"}), Problem::referenceOutOfRange},
+       {"key is an integer", binary({"\xD1\x01\x01", "\x10\x01"}), Problem::keyNotString},
+       {"key is an integer that was read before",
+        binary({"\xA2\x01\x02", "\x10\x01", "\xD1\x01\x03", "\x51x"}), Problem::keyNotString},
+       {"key is the container itself", binary({bytes("\xD1\x00\x01"), "\x09"}),
+        Problem::selfContaining},
+       {"second key is an integer",
+        binary({"\xD2\x01\x02\x03\x03", "\x51\x61", "\x10\x01", "\x09"}), Problem::keyNotString},
+       {"key is a container", binary({"\xD1\x01\x01", "\xA0"}), Problem::keyNotString},
+       {"itself", binary({bytes("\xA1\x00")}), Problem::selfContaining},
+       {"itself by a set", binary({"\xA1\x01", bytes("\xC1\x00")}), Problem::selfContaining},
+       {"damage under an unread key",
+        binary({"\xD2\x01\x02\x03\x04", "\x51\x61", "\x51\x62", "\x09", "\x51\x80"}),
+        Problem::notAscii},
+       {"damage in an object nobody references", binary({"\xA0", "\x51\x80"})}});
+}
+
+TEST(Malformed, Objects8BytesWide) {
+  const Raw wide{{"\xA1" + bigEndian(1, 8), "\x09"}, 8, 8};
+  EXPECT_EQ(read(wide.message()), Tree(Array{true}));
+  const Raw far{{"\xA1" + bigEndian((1ull << 63) + 1, 8), "\x09"}, 8, 8};
+  EXPECT_EQ(problemIn(far.message()), Problem::referenceOutOfRange);
+  for (std::size_t size = 1; size <= 8; ++size) {
+    const Raw raw{{"\xA2" + bigEndian(2, size) + bigEndian(1, size), "\x09", "\x08"}, size, size};
+    EXPECT_EQ(read(raw.message()), Tree(Array{false, true})) << size;
+  }
+}
+
+const std::string sound = "<plist><true/></plist>";
+const std::string type = "<!DOCTYPE plist PUBLIC \"-//Tessen//DTD PLIST 1.0//EN\" 'tessen.dtd'>";
+
+void all(std::optional<Problem> problem, const std::vector<std::string>& messages) {
+  for (const std::string& message : messages) EXPECT_EQ(problemIn(message), problem) << message;
+}
+
+TEST(Malformed, XmlMarkup) {
+  all(std::nullopt,
+      {"\xEF\xBB\xBF" + sound, " \r\n\t" + sound + "\n",
+       "<?xml version='1.0' encoding=\"utf-8\" standalone = 'no' ?>\n" + sound, type + sound,
+       "<!DOCTYPE plist SYSTEM 'x'>" + sound, "<!DOCTYPE plist>" + sound,
+       "<!-- a - b --><?x y?>" + type + "<!----><?z?>" + sound + "<!-- --> <?p?>",
+       "<plist version='1.0' b=\"&lt;'\"><true a = '&#65;'/></plist >"});
+  all(Problem::badInstruction, {" <?xml version='1.0'?>" + sound, xml("<?XmL?><true/>")});
+  all(Problem::badDeclaration,
+      {"<?xml version='1.0' encoding='UTF-16'?>" + sound, "<?xml encoding='UTF-8'?>" + sound,
+       "<?xml version='1.0' standalone='no' encoding='UTF-8'?>" + sound,
+       "<?xml version='2.0'?>" + sound});
+  all(Problem::utf16,
+      {bytes("\xFE\xFF\0<\0p"), bytes("\xFF\xFE<\0p\0"), bytes("\0<\0?"), bytes("<\0?\0")});
+  all(Problem::compressed, {"\x1F\x8B\x08" + sound});
+  all(Problem::notPropertyList, {"plist", "{}", "\xEF\xBB\xBFx", "\xFF" + sound});
+  all(Problem::truncated, {" ", "<?xml version='1.0'?>\n", "\xEF\xBB\xBF"});
+  all(Problem::badDocumentType, {"<!DOCTYPE plist [<!ENTITY a 'b'>]>" + sound});
+  all(Problem::unknownElement, {type + type + sound, xml(type + "<true/>")});
+  all(Problem::badComment, {xml("<!-- -- --><true/>"), xml("<!-- ---><true/>")});
+}
+
+TEST(Malformed, XmlElements) {
+  all(std::nullopt,
+      {xml("<string>a</string\n>"), xml("<true></true>"), xml("<dict><key/><array/></dict>")});
+  all(Problem::missingValue, {xml(""), "<plist/>", xml("<dict><key>a</key></dict>")});
+  all(Problem::mismatchedEnd, {xml("<true/><true/>"), xml("<string>a</key>"),
+                               xml("<array><dict></array></dict>"), xml("<string>a</ string>")});
+  all(Problem::strayText,
+      {sound + "x", sound + sound, xml("<array>x<true/></array>"), xml("<array>&#32;</array>"),
+       xml("<string>]]></string>"), xml("<true>1</true>"), xml("<false> </false>")});
+  all(Problem::unknownElement,
+      {"<list><true/></list>", xml("<array><![CDATA[ ]]></array>"), xml("<uid>1</uid>"),
+       xml("<Dict/>"), xml("<strings/>"), xml("<dat/>"), xml("<datum/>"), xml("<in/>"),
+       xml("<pl/>"), "<plists/>", "<Plist/>", xml(std::string(100'000, '<'))});
+  all(Problem::misplacedElement,
+      {xml("<string><b/></string>"), xml("<array><key>a</key></array>"),
+       xml("<dict><true/></dict>"), xml("<dict><key>a</key><key>b</key></dict>")});
+  all(std::nullopt,
+      {xml("<true _:a='' \xC3\xA9-1.\xCC\x80 = \"\"/>"), xml("<true a='1' b='2'\n></true>")});
+  all(Problem::badTag,
+      {xml("<true -a='1'/>"), xml("<true 1='1'/>"), xml("<true \xC3\x97='1'/>"), xml("<true a/>"),
+       xml("<true a='1' / >"), xml("<true/ >"), "<plist a='><true/></plist>", xml("<true a=b/>"),
+       xml("<true a='<'/>"), xml("<true a='1'b='2'/>")});
+  all(Problem::duplicateAttribute,
+      {xml("<true a='1' b='' a=\"2\"/>"), xml("<true b='1' a='' a=''/>"),
+       xml("<true a='' a='' b='1'/>")});
+  all(Problem::badInteger, {xml("<integer/>")});
+  all(Problem::badReal, {xml("<real></real>")});
+  all(Problem::badDate, {xml("<date/>")});
+}
+
+TEST(Malformed, EveryTruncationIsRefused) {
+  const Tree tree = Dictionary{{"list", Array{1, -1, 2.5, true, "text", "\xC3\xA9", Date{0}}},
+                               {"data", Data(20)},
+                               {"<&>", Dictionary{}}};
+  const auto message = writeBinary(tree);
+  for (std::size_t length = 0; length < message.size(); ++length) {
+    EXPECT_NE(problemIn(std::vector(message.begin(), message.begin() + static_cast<long>(length))),
+              std::nullopt);
+  }
+  for (std::string text = writeXml(tree); !text.empty(); text.pop_back()) {
+    const bool isWhole = text.ends_with("</plist>") || text.ends_with("</plist>\n");
+    EXPECT_EQ(problemIn(text) == std::nullopt, isWhole) << text;
+  }
+}
+
+std::string faultIn(std::string_view message) {
+  try {
+    read(message);
+    return {};
+  } catch (const MalformedDocument& error) {
+    EXPECT_EQ(error.what(), reason(error.problem()));
+    return describe(error, bytesOf(message));
+  }
+}
+
+TEST(Malformed, SaysWhereAndWhatInOneSentence) {
+  const std::string key = "<key>a</key>";
+  const std::pair<std::string, std::string> cases[] = {
+      {"", "byte 1: the message is empty"},
+      {"\x1F\x8B", "byte 1: the message is gzip-compressed and must be decompressed first"},
+      {"hello", "line 1, column 1: the message is neither binary nor XML"},
+      {"bplist17", "byte 1: the binary format has another version than 00"},
+      {"bplist00", "byte 9: the message ends too early"},
+      {binary({"\xA1\x01", "\x70"}), "byte 11: an object has an unknown marker"},
+      {binary({"\xD2\x01\x02\x03\x03", "\x51\x61", "\x51\x61", "\x09"}),
+       "byte 11: a dictionary has the same key twice"},
+      {binary({"\xA2\x01\x05", "\x09"}), "byte 11: a reference names no object"},
+      {"\n\n <x/>", "line 3, column 2: an element is unknown"},
+      {xml("\r\n\r\n<integer>x</integer>"),
+       "line 3, column 10: an integer is misspelt or does not fit 64 bits"},
+      {xml("\r<date> </date>"), "line 2, column 7: a date is misspelt or not in the calendar"},
+      {xml("<array>\n\xC3\xA9</array>"), "line 2, column 1: text stands where only elements may"},
+      {xml("\xC3\xA9"), "line 1, column 8: text stands where only elements may"},
+      {xml("<string>\xC3\xA9\xFF</string>"), "line 1, column 18: the text is not valid UTF-8"},
+      {xml("<array>\n</dict>"), "line 2, column 1: an end tag does not match its element"},
+      {xml("<dict>\n" + key + "\n</dict>"), "line 3, column 1: a value is missing"},
+      {xml("<dict>\n" + key + "<true/>\n" + key + "<true/></dict>"),
+       "line 3, column 6: a dictionary has the same key twice"},
+      {xml("<dict>" + key + "<true/>\n<key>&#97;</key><true/>\n</dict>"),
+       "line 3, column 1: a dictionary has the same key twice"},
+      {"<plist>\n<true/>", "line 2, column 8: the message ends too early"},
+  };
+  for (const auto& [message, expected] : cases) {
+    EXPECT_EQ(faultIn(message), "Malformed property list at " + expected + ".") << message;
+  }
+}
+
+TEST(Malformed, XmlCharacters) {
+  const auto texts = [](std::optional<Problem> problem, const std::vector<std::string>& contents) {
+    for (const std::string& text : contents) all(problem, {xml("<string>" + text + "</string>")});
+  };
+  texts(std::nullopt,
+        {"\xF4\x8F\xBF\xBF&#x10FFFF;&#000000000000065;", "\xED\x9F\xBF\xEE\x80\x80\xEF\xBF\xBD",
+         "&#xD7FF;&#xE000;&#xFFFD;&#9;&#x20;\x7F"});
+  texts(Problem::forbiddenCharacter, {std::string(1, '\0'), "a\x1F", "\x0B", "\xEF\xBF\xBE",
+                                      "\xEF\xBF\xBF", "<![CDATA[\x0C]]>"});
+  // Overlong in two, three and four bytes; a surrogate; beyond U+10FFFF; alone; cut short.
+  texts(Problem::badUtf8, {"\xC0\xAF", "\xE0\x80\xAF", "\xF0\x80\x80\xAF", "\xED\xA0\x80",
+                           "\xF4\x90\x80\x80", "\x80", "\xE2\x82", "<![CDATA[\xC0]]>"});
+  texts(Problem::badReference, {"&#0;", "&#31;", "&#xFFFE;", "&#xDFFF;", "&#xD800;", "&#xFFFF;",
+                                "&#x110000;", "&#x10000000000000041;", "&#X41;", "&#;", "&nbsp;",
+                                "a & b", "&lt", "&#x4g;", "&#65", "&#:;", "&#x;"});
+  all(Problem::forbiddenCharacter, {xml("<!--\x01--><true/>"), xml("<true a='\x02'/>")});
+  all(Problem::badUtf8, {xml("<?a \xFF?><true/>")});
+  all(Problem::badReference, {xml("<true a='&x;'/>")});
+}
+
+}  // namespace
+}  // namespace PropertyList
