@@ -6,6 +6,7 @@
 #include <cstdlib>
 #include <stdexcept>
 
+#include "plist/malformed_document.h"
 #include "plist/tree_of.h"
 #include "plist/writer.h"
 
