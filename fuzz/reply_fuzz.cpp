@@ -1,53 +1,22 @@
 // SPDX-License-Identifier: Apache-2.0
-// The door that a taken-over worker has into the client: the body of a reply. The first byte says
-// what the client expects, a record by its number or an error.
-#include "framework/transport/error_coding.h"
-#include "framework/transport/record_coding.h"
+/// The door that a taken-over worker has into the client: the body of a reply. The first byte says
+/// what the client expects, a record by its number or an error. What is accepted is printed.
+#include "framework/protocol/frames.h"
+#include "fuzz/round_trip.h"
 
-#include <keelgate/records.h>
-
-#include <algorithm>
-#include <cstdint>
-#include <cstdlib>
-
-namespace {
-
-using namespace Keelgate;
-
-/// One spelling for every record: what was accepted is what an honest worker would have written.
-template <class R>
-void checkRecord(Bytes body) {
-  const Data again = Transport::encodeRecord(Transport::decodeRecord<R>(body));
-  if (!std::ranges::equal(again, body)) std::abort();
-}
-
-template <class E>
-void checkError(const E& error, Bytes body) {
-  if (!std::ranges::equal(Transport::encodeError(error), body)) std::abort();
-}
-
-void check(std::size_t number, Bytes body) {
-  OutputRecords::each([&](auto type) {
-    using R = typename decltype(type)::type;
-    if (number == recordNumber<R>) checkRecord<R>(body);
-  });
-  if (number == OutputRecords::size) Transport::throwError(body);
-}
-
-}  // namespace
+#include "framework/transport/wire.h"
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+  using namespace Keelgate;
   if (size == 0) return 0;
+  const std::size_t record = data[0];
+  Reply reply{.kind = Protocol::ReplyKind::record, .body = {}, .log = {}};
+  if (record >= OutputRecords::size) reply.kind = Protocol::ReplyKind::error;
   const Bytes body = std::as_bytes(std::span(data, size)).subspan(1);
+  reply.body.assign(body.begin(), body.end());
   try {
-    check(data[0], body);
+    Fuzz::read({.record = record, .service = {}, .command = 0, .message = nullptr}, reply);
   } catch (const Transport::MalformedReply&) {
-  } catch (const DecodingError& error) {
-    checkError(error, body);
-  } catch (const Breach& error) {
-    checkError(error, body);
-  } catch (const VespKeelgateService::VespClientMessageUnpackingError& error) {
-    checkError(error, body);
   }
   return 0;
 }

@@ -1,0 +1,193 @@
+// SPDX-License-Identifier: Apache-2.0
+/// Makes every harness's seeds and a dictionary from the field tables: fuzz_seeds FOLDER
+#include "framework/json/writer.h"
+#include "framework/protocol/control_frames.h"
+#include "framework/protocol/data_frames.h"
+#include "fuzz/round_trip.h"
+#include "plist/writer.h"
+
+#include <array>
+#include <filesystem>
+#include <fstream>
+#include <functional>
+#include <iostream>
+#include <random>
+#include <set>
+#include <stdexcept>
+
+namespace {
+
+using namespace Keelgate;
+using namespace Keelgate::Fuzz;
+
+/// Every table gets some messages with nearly all of its fields and some with few.
+constexpr unsigned rounds = 6;
+/// Decisions for one message; the widest schema takes some 2,500.
+constexpr std::size_t decisions = 6000;
+
+class Folder {
+ public:
+  explicit Folder(std::filesystem::path path) : path_(std::move(path)) {}
+
+  void add(const std::string& harness, Bytes seed) {
+    std::filesystem::create_directories(path_ / harness);
+    write(path_ / harness / std::to_string(++count_), seed);
+  }
+  void addText(const std::string& name, const std::string& text) {
+    write(path_ / name, std::as_bytes(std::span(text)));
+  }
+
+ private:
+  static void write(const std::filesystem::path& path, Bytes bytes) {
+    std::ofstream file(path, std::ios::binary);
+    file.write(reinterpret_cast<const char*>(bytes.data()),
+               static_cast<std::streamsize>(bytes.size()));
+    if (!file.flush()) throw std::runtime_error(path.string() + " cannot be written");
+  }
+
+  std::filesystem::path path_;
+  int count_ = 0;
+};
+
+Data behind(std::size_t first, Bytes rest) {
+  Data all{static_cast<std::byte>(first)};
+  all.insert(all.end(), rest.begin(), rest.end());
+  return all;
+}
+
+void addRequest(Folder& folder, const Target& target, Bytes message) {
+  JSON::Writer out(JSON::Layout::compact);
+  out.beginObject();
+  out.key("service");
+  out.string(target.service);
+  out.key("command");
+  out.integer(target.command);
+  out.key("message");
+  out.data(message);
+  out.key("id");
+  out.raw("[1.50,{\"a\":null}]");
+  out.endObject();
+  String text;
+  for (const String& piece : std::move(out).take()) text += piece;
+  text.pop_back();
+  folder.add("request_fuzz", std::as_bytes(std::span(text)));
+}
+
+void addReply(Folder& folder, const Target& target, const Reply& reply) {
+  const bool isRecord = reply.kind == Protocol::ReplyKind::record;
+  folder.add("reply_fuzz", behind(isRecord ? target.record : OutputRecords::size, reply.body));
+  if (reply.body.size() > 4096) return;
+  // Of the frames' harness: a reply, in pieces of 41 bytes.
+  Data frames{std::byte{0}, std::byte{40}};
+  for (const String& line : reply.log) {
+    Protocol::appendReplyFrame(frames, 7, Protocol::ReplyKind::log, std::as_bytes(std::span(line)));
+  }
+  Protocol::appendReplyFrame(frames, 7, reply.kind, reply.body);
+  folder.add("frames_fuzz", frames);
+}
+
+void addMessage(Folder& folder, std::size_t which, const std::vector<std::uint8_t>& input) {
+  const Target& target = targets()[which];
+  Choices choices(input);
+  const Tree tree = target.message(choices);
+  folder.add("twins_fuzz", behind(which, std::as_bytes(std::span(input))));
+  std::vector<Data> messages;
+  try {
+    messages.push_back(PropertyList::writeBinary(tree));
+    folder.add("plist_binary_fuzz", messages.back());
+    const std::string xml = PropertyList::writeXml(tree);
+    const Bytes bytes = std::as_bytes(std::span(xml));
+    messages.emplace_back(bytes.begin(), bytes.end());
+    folder.add("plist_xml_fuzz", bytes);
+  } catch (const std::invalid_argument&) {
+    // A tree that the encoding cannot say is a seed of the twins alone.
+  }
+  for (const Data& message : messages) {
+    folder.add("unpack_fuzz", behind(which, message));
+    addReply(folder, target, replyTo(target, message));
+  }
+  if (!messages.empty()) addRequest(folder, target, messages.front());
+}
+
+void addControlFrames(Folder& folder) {
+  using Protocol::ControlKind;
+  for (auto kind = static_cast<int>(ControlKind::hello);
+       kind <= static_cast<int>(ControlKind::refused); ++kind) {
+    const auto frame = Protocol::makeControlFrame(static_cast<ControlKind>(kind), 3, {1, 2, 0, 0});
+    for (const std::byte hasDescriptor : {std::byte{0}, std::byte{1}}) {
+      Data seed{std::byte{1}, hasDescriptor};
+      const Bytes bytes = std::as_bytes(std::span(&frame, 1));
+      seed.insert(seed.end(), bytes.begin(), bytes.end());
+      folder.add("frames_fuzz", seed);
+    }
+  }
+}
+
+template <class S>
+void collectKeys(std::set<std::string>& keys) {
+  if constexpr (Schema<S>) {
+    for (const std::string_view key : S::CodingKeys::keys) keys.emplace(key);
+    S::CodingKeys::each([&](auto field) {
+      using Value = typename decltype(field)::Value;
+      if constexpr (isOptional<Value>) {
+        collectKeys<typename Value::value_type>(keys);
+      } else {
+        collectKeys<Value>(keys);
+      }
+    });
+  } else if constexpr (isArray<S>) {
+    if constexpr (!std::same_as<typename S::value_type,
+                                VespKeelgateService::VespOstrelProtocolPayload>) {
+      collectKeys<typename S::value_type>(keys);
+    }
+  } else if constexpr (CaseKeyed<S>) {
+    [&]<std::size_t... i>(std::index_sequence<i...>) {
+      (collectKeys<std::variant_alternative_t<i, typename S::variant>>(keys), ...);
+    }
+    (std::make_index_sequence<std::variant_size_v<typename S::variant>>());
+  }
+}
+
+/// The wire keys and the services, which a fuzzer would take long to come upon.
+std::string dictionary() {
+  using namespace VespKeelgateService;
+  std::set<std::string> words;
+  MessageUnpackers::each(
+      [&]<class U>(std::type_identity<U>) { collectKeys<typename U::Schema>(words); });
+  Services::each([&]<class S>(std::type_identity<S>) {
+    words.emplace(S::identifier);
+    S::Unpacker::Commands::each(
+        [&]<class Row>(std::type_identity<Row>) { collectKeys<typename Row::Schema>(words); });
+  });
+  std::string text;
+  for (const std::string& word : words) text += '"' + word + "\"\n";
+  return text;
+}
+
+}  // namespace
+
+int main(int count, char** arguments) try {
+  if (count != 2) {
+    std::cerr << "usage: fuzz_seeds FOLDER\n";
+    return 2;
+  }
+  const std::filesystem::path path = arguments[1];
+  std::filesystem::remove_all(path);
+  std::filesystem::create_directories(path);
+  Folder folder(path);
+  // Deliberate: the same numbers each time, so that the same seeds are made.
+  std::mt19937 random(1);
+  for (unsigned round = 0; round < rounds; ++round) {
+    for (std::size_t which = 0; which < targets().size(); ++which) {
+      std::vector<std::uint8_t> input(decisions >> round);
+      for (std::uint8_t& byte : input) byte = static_cast<std::uint8_t>(random());
+      addMessage(folder, which, input);
+    }
+  }
+  addControlFrames(folder);
+  folder.addText("keys.dict", dictionary());
+  return 0;
+} catch (const std::exception& problem) {
+  std::cerr << "fuzz_seeds: " << problem.what() << '\n';
+  return 1;
+}
