@@ -61,7 +61,7 @@ void addRequest(Folder& folder, const Target& target, Bytes message) {
   out.key("service");
   out.string(target.service);
   out.key("command");
-  out.integer(target.command);
+  out.integer(UInt64{target.command});
   out.key("message");
   out.data(message);
   out.key("id");
@@ -123,44 +123,41 @@ void addControlFrames(Folder& folder) {
   }
 }
 
-template <class S>
-void collectKeys(std::set<std::string>& keys) {
-  if constexpr (Schema<S>) {
-    for (const std::string_view key : S::CodingKeys::keys) keys.emplace(key);
-    S::CodingKeys::each([&](auto field) {
-      using Value = typename decltype(field)::Value;
-      if constexpr (isOptional<Value>) {
-        collectKeys<typename Value::value_type>(keys);
-      } else {
-        collectKeys<Value>(keys);
+/// Walks every schema once, since one may hold a list of its own kind.
+struct Words {
+  std::set<std::string> words;
+  std::set<std::string_view> schemas;
+
+  template <class T>
+  void collect() {
+    if constexpr (isOptional<T> || isArray<T>) {
+      collect<typename T::value_type>();
+    } else if constexpr (CaseKeyed<T>) {
+      [&]<std::size_t... i>(std::index_sequence<i...>) {
+        (collect<std::variant_alternative_t<i, typename T::variant>>(), ...);
       }
-    });
-  } else if constexpr (isArray<S>) {
-    if constexpr (!std::same_as<typename S::value_type,
-                                VespKeelgateService::VespOstrelProtocolPayload>) {
-      collectKeys<typename S::value_type>(keys);
+      (std::make_index_sequence<std::variant_size_v<typename T::variant>>());
+    } else if constexpr (Schema<T>) {
+      if (!schemas.insert(typeName<T>()).second) return;
+      for (const std::string_view key : T::CodingKeys::keys) words.emplace(key);
+      T::CodingKeys::each([&](auto field) { collect<typename decltype(field)::Value>(); });
     }
-  } else if constexpr (CaseKeyed<S>) {
-    [&]<std::size_t... i>(std::index_sequence<i...>) {
-      (collectKeys<std::variant_alternative_t<i, typename S::variant>>(keys), ...);
-    }
-    (std::make_index_sequence<std::variant_size_v<typename S::variant>>());
   }
-}
+};
 
 /// The wire keys and the services, which a fuzzer would take long to come upon.
 std::string dictionary() {
   using namespace VespKeelgateService;
-  std::set<std::string> words;
+  Words all;
   MessageUnpackers::each(
-      [&]<class U>(std::type_identity<U>) { collectKeys<typename U::Schema>(words); });
+      [&]<class U>(std::type_identity<U>) { all.collect<typename U::Schema>(); });
   Services::each([&]<class S>(std::type_identity<S>) {
-    words.emplace(S::identifier);
+    all.words.emplace(S::identifier);
     S::Unpacker::Commands::each(
-        [&]<class Row>(std::type_identity<Row>) { collectKeys<typename Row::Schema>(words); });
+        [&]<class Row>(std::type_identity<Row>) { all.collect<typename Row::Schema>(); });
   });
   std::string text;
-  for (const std::string& word : words) text += '"' + word + "\"\n";
+  for (const std::string& word : all.words) text += '"' + word + "\"\n";
   return text;
 }
 
