@@ -9,6 +9,7 @@
 #include <cstdint>
 #include <span>
 #include <string>
+#include <string_view>
 
 namespace Keelgate::Fuzz {
 
@@ -38,8 +39,9 @@ class Choices {
 
   /// UTF-8 with characters of every length and the edges of each.
   std::string text() {
+    using namespace std::string_view_literals;
     static constexpr std::u32string_view edges =
-        U"\x00\x01\x1f<&>\"\\\x7f\x80\x9f\x7ff\x800\x2028\xd7ff\xe000\xfffd\xffff\x10000\x10ffff";
+        U"\x00\x01\x1f<&>\"\\\x7f\x80\x9f\x7ff\x800\x2028\xd7ff\xe000\xfffd\xffff\x10000\x10ffff"sv;
     std::string text;
     for (std::size_t length = below(24); length > 0; --length) {
       const std::uint8_t choice = byte();
