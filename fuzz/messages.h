@@ -134,7 +134,7 @@ inline Tree invitationContext(Choices& choices, int depth) {
 
 template <class T>
 Tree valueFor(Choices& choices, int depth) {
-  if (choices.rarely(32)) return anything(choices, depth);
+  if (choices.rarely(128)) return anything(choices, depth);
   if constexpr (isOptional<T>) {
     return valueFor<typename T::value_type>(choices, depth);
   } else if constexpr (std::same_as<T, VespKeelgateService::VespInvitationContextSchema>) {
