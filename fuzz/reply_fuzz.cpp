@@ -2,7 +2,7 @@
 /// The door that a taken-over worker has into the client: the body of a reply. The first byte says
 /// what the client expects, a record by its number or an error. What is accepted is printed.
 #include "framework/protocol/frames.h"
-#include "fuzz/round_trip.h"
+#include "fuzz/messages/round_trip.h"
 
 #include "framework/transport/wire.h"
 

@@ -3,7 +3,7 @@
 #include "framework/json/writer.h"
 #include "framework/protocol/control_frames.h"
 #include "framework/protocol/data_frames.h"
-#include "fuzz/round_trip.h"
+#include "fuzz/messages/round_trip.h"
 #include "plist/writer.h"
 
 #include <array>

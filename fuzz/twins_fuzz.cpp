@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 /// One tree in both encodings gives one record, or one error. The first byte says where it is sent,
 /// the others decide what is in it.
+#include "fuzz/messages/round_trip.h"
 #include "fuzz/require.h"
-#include "fuzz/round_trip.h"
 #include "plist/writer.h"
 
 #include <stdexcept>

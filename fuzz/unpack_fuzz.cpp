@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 /// The door of every unpacker, from a message's bytes to its JSON. The first byte says where the
 /// message is sent.
-#include "fuzz/round_trip.h"
+#include "fuzz/messages/round_trip.h"
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   using namespace Keelgate::Fuzz;

@@ -6,7 +6,7 @@
 #pragma once
 
 #include "framework/server/keelgate_server.h"
-#include "fuzz/messages.h"
+#include "fuzz/messages/messages.h"
 
 #include <string>
 

@@ -5,7 +5,7 @@
 /// Pure but for the Choices, which belong to one thread.
 #pragma once
 
-#include "fuzz/choices.h"
+#include "fuzz/messages/choices.h"
 #include "plist/tree.h"
 #include "program/schema/mirror_encoding.h"
 #include "program/service/tables.h"

@@ -1,17 +1,15 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "fuzz/round_trip.h"
+#include "fuzz/messages/round_trip.h"
 
+#include "cli/request_line.h"
 #include "framework/json/values.h"
 #include "framework/transport/error_coding.h"
 #include "framework/transport/record_coding.h"
 #include "fuzz/require.h"
 #include "program/service/vesp_client_message_unpacker.h"
 
-#include <rapidjson/error/error.h>
-#include <rapidjson/reader.h>
-
 #include <algorithm>
-#include <string_view>
+#include <variant>
 
 namespace Keelgate::Fuzz {
 
@@ -33,14 +31,12 @@ const KeelgateServer& server() {
   return made;
 }
 
+/// Another reader finds the same in it: the command's own, as the id of a request.
 void requireJSON(const std::string& text) {
-  constexpr unsigned flags = rapidjson::kParseNumbersAsStringsFlag |
-                             rapidjson::kParseIterativeFlag | rapidjson::kParseValidateEncodingFlag;
-  rapidjson::Reader reader;
-  rapidjson::BaseReaderHandler<> ignored;
-  rapidjson::StringStream stream(text.c_str());
-  require(!reader.Parse<flags>(stream, ignored).IsError(), "a record's JSON is JSON");
-  require(text.find('\n') == text.size() - 1, "a record's JSON is one line");
+  std::string line = R"({"record":"PulseUserPayload","message":"","id":)" + text + "}";
+  const CLI::RequestLine read = CLI::readRequestLine(line);
+  require(std::holds_alternative<CLI::Request>(read.content), "a record's JSON is JSON");
+  require(read.id == text, "a record's JSON is the one spelling of what it says");
 }
 
 template <class R>
@@ -51,6 +47,8 @@ std::string readRecord(Bytes body) {
   JSON::write(out, record);
   std::string text;
   for (const String& piece : std::move(out).take()) text += piece;
+  require(text.ends_with('\n'), "a record's JSON is a line");
+  text.pop_back();
   requireJSON(text);
   return text;
 }
