@@ -1,65 +1,80 @@
 # SPDX-License-Identifier: Apache-2.0
-# What is installed, and the Debian package of it (cpack -G DEB).
+# What is installed. Three parts, which are three packages in Debian: the command with its service,
+# the shared library, and what it takes to build with it.
 include(CMakePackageConfigHelpers)
 
 set(keelgate_package_dir ${CMAKE_INSTALL_LIBDIR}/cmake/Keelgate)
+set(CMAKE_INSTALL_DEFAULT_COMPONENT_NAME service)
 
-install(TARGETS keelgate RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR})
-install(TARGETS VespKeelgateService RUNTIME DESTINATION ${CMAKE_INSTALL_LIBEXECDIR}/keelgate)
+if(KEELGATE_COMMAND)
+  install(TARGETS keelgate RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR} COMPONENT service)
+endif()
+install(TARGETS VespKeelgateService RUNTIME
+  DESTINATION ${CMAKE_INSTALL_LIBEXECDIR}/keelgate COMPONENT service)
 
 # The client: headers, library, and the two ways to find them. It needs nothing but the C++ library.
-install(DIRECTORY ${PROJECT_SOURCE_DIR}/include/keelgate DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}
-  FILES_MATCHING PATTERN *.h)
+install(DIRECTORY ${PROJECT_SOURCE_DIR}/include/ DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}
+  COMPONENT development FILES_MATCHING PATTERN *.h)
 set_target_properties(keelgate_client PROPERTIES EXPORT_NAME Client)
 set_target_properties(keelgate_headers PROPERTIES EXPORT_NAME Headers)
 install(TARGETS keelgate_client keelgate_headers EXPORT KeelgateTargets
-  LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR}
+  LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT library NAMELINK_COMPONENT development
+  ARCHIVE DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT development
   INCLUDES DESTINATION ${CMAKE_INSTALL_INCLUDEDIR})
-install(EXPORT KeelgateTargets NAMESPACE Keelgate:: DESTINATION ${keelgate_package_dir})
+install(EXPORT KeelgateTargets NAMESPACE Keelgate:: DESTINATION ${keelgate_package_dir}
+  COMPONENT development)
 configure_package_config_file(${PROJECT_SOURCE_DIR}/packaging/KeelgateConfig.cmake.in
-  ${CMAKE_BINARY_DIR}/KeelgateConfig.cmake INSTALL_DESTINATION ${keelgate_package_dir})
-write_basic_package_version_file(${CMAKE_BINARY_DIR}/KeelgateConfigVersion.cmake
+  ${PROJECT_BINARY_DIR}/KeelgateConfig.cmake INSTALL_DESTINATION ${keelgate_package_dir})
+write_basic_package_version_file(${PROJECT_BINARY_DIR}/KeelgateConfigVersion.cmake
   COMPATIBILITY SameMinorVersion)
-install(FILES ${CMAKE_BINARY_DIR}/KeelgateConfig.cmake
-  ${CMAKE_BINARY_DIR}/KeelgateConfigVersion.cmake DESTINATION ${keelgate_package_dir})
-# These name the prefix, which is known for sure only when it is installed: a package has another.
-function(install_naming_prefix template destination)
-  get_filename_component(name ${template} NAME_WLE)
-  install(CODE "
-    set(libdir \"${CMAKE_INSTALL_LIBDIR}\")
-    set(libexecdir \"${CMAKE_INSTALL_LIBEXECDIR}\")
-    set(PROJECT_VERSION \"${PROJECT_VERSION}\")
-    set(PROJECT_DESCRIPTION \"${PROJECT_DESCRIPTION}\")
-    configure_file(\"${PROJECT_SOURCE_DIR}/packaging/${template}\" \"${CMAKE_BINARY_DIR}/${name}\" @ONLY)
-    file(INSTALL \"${CMAKE_BINARY_DIR}/${name}\" DESTINATION \"\${CMAKE_INSTALL_PREFIX}/${destination}\")")
-endfunction()
-install_naming_prefix(keelgate.pc.in ${CMAKE_INSTALL_LIBDIR}/pkgconfig)
-install_naming_prefix(systemd/keelgate@.service.in lib/systemd/system)
+install(FILES ${PROJECT_BINARY_DIR}/KeelgateConfig.cmake
+  ${PROJECT_BINARY_DIR}/KeelgateConfigVersion.cmake DESTINATION ${keelgate_package_dir}
+  COMPONENT development)
+# Relative to itself, so that the tree can be moved.
+file(RELATIVE_PATH from_pkgconfig ${CMAKE_INSTALL_FULL_LIBDIR}/pkgconfig ${CMAKE_INSTALL_PREFIX})
+if(NOT BUILD_SHARED_LIBS)
+  set(libraries_private "-lstdc++")
+endif()
+configure_file(${PROJECT_SOURCE_DIR}/packaging/keelgate.pc.in
+  ${PROJECT_BINARY_DIR}/keelgate.pc @ONLY)
+install(FILES ${PROJECT_BINARY_DIR}/keelgate.pc DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig
+  COMPONENT development)
 
-# For people and for init.
-install(FILES ${PROJECT_SOURCE_DIR}/docs/man/keelgate.1 DESTINATION ${CMAKE_INSTALL_MANDIR}/man1)
-install(FILES ${PROJECT_SOURCE_DIR}/docs/man/VespKeelgateService.8
-  DESTINATION ${CMAKE_INSTALL_MANDIR}/man8)
+# For init. The unit names the prefix, which is known for sure only when it is installed.
+set(units lib/systemd/system)
+install(CODE "
+  set(libexecdir \"${CMAKE_INSTALL_LIBEXECDIR}\")
+  configure_file(\"${PROJECT_SOURCE_DIR}/packaging/systemd/keelgate@.service.in\"
+    \"${PROJECT_BINARY_DIR}/keelgate@.service\" @ONLY)
+  file(INSTALL \"${PROJECT_BINARY_DIR}/keelgate@.service\"
+    DESTINATION \"\${CMAKE_INSTALL_PREFIX}/${units}\")" COMPONENT service)
+foreach(unit keelgate.socket keelgate@.socket keelgate.slice)
+  install(FILES ${PROJECT_SOURCE_DIR}/packaging/systemd/${unit} DESTINATION ${units}
+    COMPONENT service)
+endforeach()
+install(FILES ${PROJECT_SOURCE_DIR}/packaging/systemd/keelgate.sysusers
+  DESTINATION lib/sysusers.d RENAME keelgate.conf COMPONENT service)
+
+# For people.
 install(FILES ${PROJECT_SOURCE_DIR}/cli/keelgate.bash
-  DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions RENAME keelgate)
+  DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions RENAME keelgate
+  COMPONENT service)
 install(FILES ${PROJECT_SOURCE_DIR}/cli/_keelgate
-  DESTINATION ${CMAKE_INSTALL_DATADIR}/zsh/vendor-completions)
+  DESTINATION ${CMAKE_INSTALL_DATADIR}/zsh/vendor-completions COMPONENT service)
 install(FILES ${PROJECT_SOURCE_DIR}/cli/keelgate.fish
-  DESTINATION ${CMAKE_INSTALL_DATADIR}/fish/vendor_completions.d)
-install(FILES ${PROJECT_SOURCE_DIR}/README.md ${PROJECT_SOURCE_DIR}/CHANGELOG.md
-  DESTINATION ${CMAKE_INSTALL_DOCDIR})
-install(FILES ${PROJECT_SOURCE_DIR}/packaging/copyright DESTINATION ${CMAKE_INSTALL_DOCDIR})
-install(FILES ${PROJECT_SOURCE_DIR}/packaging/systemd/keelgate.socket
-  DESTINATION lib/systemd/system)
+  DESTINATION ${CMAKE_INSTALL_DATADIR}/fish/vendor_completions.d COMPONENT service)
+install(FILES ${PROJECT_SOURCE_DIR}/docs/man/keelgate.1
+  DESTINATION ${CMAKE_INSTALL_MANDIR}/man1 COMPONENT service)
+install(FILES ${PROJECT_SOURCE_DIR}/docs/man/VespKeelgateService.8
+  DESTINATION ${CMAKE_INSTALL_MANDIR}/man8 COMPONENT service)
+file(GLOB pages ${PROJECT_SOURCE_DIR}/docs/*.md)
+install(FILES ${pages} DESTINATION ${CMAKE_INSTALL_DOCDIR}/docs COMPONENT service)
+install(FILES ${PROJECT_SOURCE_DIR}/README.md ${PROJECT_SOURCE_DIR}/SECURITY.md
+  ${PROJECT_SOURCE_DIR}/LICENSE
+  ${PROJECT_SOURCE_DIR}/CHANGELOG.md DESTINATION ${CMAKE_INSTALL_DOCDIR} COMPONENT service)
+install(FILES ${PROJECT_SOURCE_DIR}/examples/unpack.cpp
+  DESTINATION ${CMAKE_INSTALL_DOCDIR}/examples COMPONENT service)
 
-set(CPACK_PACKAGE_NAME keelgate)
-set(CPACK_PACKAGE_CONTACT "The Keelgate authors <keelgate@example.org>")
-set(CPACK_PACKAGE_DESCRIPTION_SUMMARY "${PROJECT_DESCRIPTION}")
-set(CPACK_PACKAGING_INSTALL_PREFIX /usr)
-set(CPACK_STRIP_FILES ON)
-set(CPACK_DEBIAN_FILE_NAME DEB-DEFAULT)
-set(CPACK_DEBIAN_PACKAGE_SECTION utils)
-set(CPACK_DEBIAN_PACKAGE_SHLIBDEPS ON)
-set(CPACK_DEBIAN_PACKAGE_GENERATE_SHLIBS ON)
-set(CPACK_DEBIAN_PACKAGE_RECOMMENDS bash-completion)
-include(CPack)
+if(PROJECT_IS_TOP_LEVEL)
+  include(DebianPackages)
+endif()
