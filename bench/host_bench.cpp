@@ -141,27 +141,27 @@ void bareForkExitWait(benchmark::State& state) {
 }
 
 void freshWorkerWithoutSpare(benchmark::State& state) {
-  DescriptorBook book(16);
-  const auto service =
-      std::make_shared<ServiceProcess>(ServiceSettings{.path = KEELGATE_SERVICE,
-                                                       .socket = {},
-                                                       .requireLayers = false,
-                                                       .messagesPerWorker = 1,
-                                                       .cpuSecondsPerWorker = 5,
-                                                       .maximumWorkers = 8},
-                                       book, deadlineAfter(std::chrono::seconds(5)));
+  DescriptorRegistry registry(16);
+  const ServiceSettings settings{.path = KEELGATE_SERVICE,
+                                 .socket = {},
+                                 .socketUser = {},
+                                 .requireLayers = false,
+                                 .messagesPerWorker = 1,
+                                 .cpuSecondsPerWorker = 5,
+                                 .maximumWorkers = 8};
+  const auto service = std::make_shared<ServiceProcess>(settings, registry);
+  for (; service->state() == ServiceProcess::State::starting; service->readNews()) usleep(1000);
   const Data bytes = message();
+  const ClientRequest request{
+      .record = recordNumber<VespCommandResponse>, .command = 0, .service = {}, .message = bytes};
   measure(state, std::chrono::milliseconds(2), [&] {
-    const Deadline deadline = deadlineAfter(std::chrono::seconds(5));
-    Worker worker(service, *service->fork(shortMessage, deadline));
-    ReceivedReply reply;
-    if (worker.exchange({.record = recordNumber<VespCommandResponse>,
-                         .command = 0,
-                         .service = {},
-                         .message = bytes},
-                        deadline, reply)) {
-      state.SkipWithError("no reply");
+    service->readNews();
+    Worker worker(service, *service->fork(shortMessage));
+    Exchange exchange(worker.channel(), request, worker.nextSequence());
+    while (exchange.advance() <= Exchange::State::receiving) {
+      waitFor({.descriptor = worker.channel(), .events = POLLIN, .until = Deadline::max()});
     }
+    if (exchange.state() != Exchange::State::answered) state.SkipWithError("no reply");
     worker.finish();
   });
 }

@@ -17,14 +17,19 @@ Deadline deadlineAfter(milliseconds span) noexcept {
   return Clock::now() + std::clamp(span, milliseconds(0), year);
 }
 
-short waitFor(int descriptor, short events, Deadline deadline) noexcept {
-  pollfd entry{.fd = descriptor, .events = events, .revents = 0};
+int pollUntil(pollfd* entries, std::size_t count, Deadline until) noexcept {
+  const nanoseconds left = std::max(nanoseconds(0), nanoseconds(until - Clock::now()));
+  const timespec timeout{.tv_sec = left.count() / 1'000'000'000,
+                         .tv_nsec = left.count() % 1'000'000'000};
+  // Nanoseconds: poll's milliseconds would end a wait early or late by up to one of them.
+  return ppoll(entries, count, until == Deadline::max() ? nullptr : &timeout, nullptr);
+}
+
+short waitFor(const Wait& wait) noexcept {
+  // The kernel ignores an entry whose descriptor is negative.
+  pollfd entry{.fd = wait.descriptor, .events = wait.events, .revents = 0};
   for (;;) {
-    const nanoseconds left = std::max(nanoseconds(0), nanoseconds(deadline - Clock::now()));
-    const timespec timeout{.tv_sec = left.count() / 1'000'000'000,
-                           .tv_nsec = left.count() % 1'000'000'000};
-    // Nanoseconds: poll's milliseconds would end a wait early or late by up to one of them.
-    const int ready = ppoll(&entry, 1, &timeout, nullptr);
+    const int ready = pollUntil(&entry, 1, wait.until);
     if (ready > 0) return entry.revents;
     if (ready == 0) return 0;
     // An error other than an interruption is as good as a dead peer to the caller, who finds out

@@ -5,7 +5,10 @@
 /// machine's time neither ends a call early nor keeps it waiting.
 #pragma once
 
+#include <poll.h>
+
 #include <chrono>
+#include <cstddef>
 
 namespace Keelgate {
 
@@ -15,8 +18,20 @@ using Deadline = Clock::time_point;
 /// The point in time that is so far away; a span that the clock cannot express is cut to a year.
 Deadline deadlineAfter(std::chrono::milliseconds span) noexcept;
 
-/// Waits until one of `events` (poll.h), a hang-up or an error is there; gives what is, or 0 when
-/// the deadline has passed. Signals that the application handles do not end it.
-short waitFor(int descriptor, short events, Deadline deadline) noexcept;
+/// What a state machine waits for before its next step: one of `events` (poll.h), a hang-up or an
+/// error on the descriptor, or the point in time. It may be asked to go on earlier.
+struct Wait {
+  /// Below 0: only the time counts.
+  int descriptor = -1;
+  short events = 0;
+  Deadline until{};
+};
+
+/// As poll, until a point in time; Deadline::max() stands for no end.
+int pollUntil(pollfd* entries, std::size_t count, Deadline until) noexcept;
+
+/// Waits for it; gives what is there, or 0 when the time has come. Signals that the application
+/// handles do not end it.
+short waitFor(const Wait& wait) noexcept;
 
 }  // namespace Keelgate

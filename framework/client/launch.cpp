@@ -121,17 +121,18 @@ StartFailure shortage(std::string_view what, int error) {
   return {String(what) + ": " + errorText(error) + remedyFor(error), true};
 }
 
-ServiceHandles launchService(const String& path, DescriptorBook& book) {
-  const TrustedProgram program = locateService(path, book);
+ServiceHandles launchService(const String& path, DescriptorRegistry& registry) {
+  const TrustedProgram program = locateService(path, registry);
   int ends[2];
   // Packets keep their bounds: nobody can leave half a frame in the way of the next.
   if (socketpair(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0, ends) != 0) {
     throw shortage(noChannel, errno);
   }
-  ServiceHandles handles{.control = Descriptor(book, ends[0]), .launcher = {}};
-  const Descriptor theirs(book, ends[1]);
+  ServiceHandles handles{.control = Descriptor(registry, ends[0]), .launcher = {}};
+  const Descriptor theirs(registry, ends[1]);
+  if (!handles.control || !theirs) throw shortage(noChannel, errno);
   const pid_t pid = SpawnPlan(theirs.get(), program).run();
-  handles.launcher = Descriptor(book, static_cast<int>(syscall(SYS_pidfd_open, pid, 0)));
+  handles.launcher = Descriptor(registry, static_cast<int>(syscall(SYS_pidfd_open, pid, 0)));
   // Where the application ignores SIGCHLD the process may be gone already: then the handshake
   // finds the channel closed, and there is nothing to signal.
   if (!handles.launcher && errno != ESRCH) {
@@ -159,7 +160,27 @@ void reapLauncher(const Descriptor& launcher) noexcept {
   waitid(P_PIDFD, static_cast<id_t>(launcher.get()), &ignored, WEXITED | WNOHANG);
 }
 
-ServiceHandles connectService(const String& socket, DescriptorBook& book, Deadline deadline) {
+namespace {
+
+/// As which user the peer listens: of a service manager's socket, that is the manager. Whoever else
+/// can put a socket there would be given the messages, and asked for the records.
+void requirePeer(const String& socket, const Descriptor& control, Optional<unsigned> alsoAllowed) {
+  ucred peer{};
+  socklen_t size = sizeof peer;
+  if (getsockopt(control.get(), SOL_SOCKET, SO_PEERCRED, &peer, &size) != 0) {
+    throw shortage(noChannel, errno);
+  }
+  if (peer.uid == 0 || peer.uid == geteuid() || peer.uid == alsoAllowed) return;
+  throw StartFailure("User " + std::to_string(peer.uid) + " listens on the socket " + socket +
+                         ", who is neither root nor the caller: if that is meant, say so "
+                         "(socketUser)",
+                     false);
+}
+
+}  // namespace
+
+ServiceHandles connectService(const String& socket, Optional<unsigned> socketUser,
+                              DescriptorRegistry& registry) {
   sockaddr_un address{};
   address.sun_family = AF_UNIX;
   if (socket.size() >= sizeof address.sun_path) {
@@ -167,20 +188,16 @@ ServiceHandles connectService(const String& socket, DescriptorBook& book, Deadli
   }
   // The rest of the field is zero and ends the path.
   std::memcpy(address.sun_path, socket.data(), socket.size());
-  Descriptor control(book, ::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0));
+  // It does not wait: a listener whose queue is full would hold the call as long as it likes.
+  Descriptor control(registry, ::socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
   if (!control) throw shortage(noChannel, errno);
-  // A listener whose queue is full would hold the call as long as it likes.
-  const auto left = std::chrono::ceil<std::chrono::microseconds>(deadline - Clock::now());
-  // Of 0 the kernel would make no limit.
-  const auto most = std::max<std::int64_t>(left.count(), 1);
-  const timeval limit{.tv_sec = most / 1'000'000, .tv_usec = most % 1'000'000};
-  setsockopt(control.get(), SOL_SOCKET, SO_SNDTIMEO, &limit, sizeof limit);
   if (connect(control.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0) {
     const int error = errno;
     throw StartFailure("No service answers on the socket " + socket + ": " + errorText(error) +
                            "; start the unit that listens there",
                        error == EAGAIN || error == ECONNREFUSED || error == EINTR);
   }
+  requirePeer(socket, control, socketUser);
   return {.control = std::move(control), .launcher = {}};
 }
 

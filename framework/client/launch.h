@@ -39,10 +39,10 @@ struct ServiceHandles {
   Descriptor launcher;
 };
 
-/// Starts the program that locateService finds. It gets an empty environment, its own session and nothing
-/// but descriptor 3. Throws StartFailure. Callable from any thread. Not waited for: whether it
-/// works is for the handshake to tell.
-ServiceHandles launchService(const String& path, DescriptorBook& book);
+/// Starts the program that locateService finds. It gets an empty environment, its own session and
+/// nothing but descriptor 3. Throws StartFailure. Callable from any thread. Not waited for: whether
+/// it works is for the handshake to tell.
+ServiceHandles launchService(const String& path, DescriptorRegistry& registry);
 
 /// By pidfd, so that no other process can be meant.
 void killLauncher(const Descriptor& launcher) noexcept;
@@ -52,8 +52,9 @@ void askToEnd(const Descriptor& launcher) noexcept;
 /// told the kernel that nobody will.
 void reapLauncher(const Descriptor& launcher) noexcept;
 
-/// Connects to an activated service. Throws StartFailure. Callable from any thread. Waits at most
-/// until the deadline for the listener to take the connection.
-ServiceHandles connectService(const String& socket, DescriptorBook& book, Deadline deadline);
+/// Connects to an activated service, on whose socket root, the caller or `socketUser` listens.
+/// Throws StartFailure. Callable from any thread. Does not wait.
+ServiceHandles connectService(const String& socket, Optional<unsigned> socketUser,
+                              DescriptorRegistry& registry);
 
 }  // namespace Keelgate

@@ -1,114 +1,110 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The workers of a client: one message each by default, a fresh one forked ahead, a new service
-/// where the old one died or could be learnt from.
+/// The workers of a client: one message each by default, and a fresh one forked ahead.
 #pragma once
 
+#include "framework/client/fair_semaphore.h"
 #include "framework/client/log_line.h"
-#include "framework/client/turnstile.h"
+#include "framework/client/supervisor.h"
 #include "framework/client/worker.h"
 
 #include <keelgate/client.h>
 
-#include <sys/types.h>
-
-#include <condition_variable>
+#include <algorithm>
 #include <deque>
-#include <functional>
-#include <memory>
 #include <mutex>
+#include <variant>
 
 namespace Keelgate {
 
-/// How long to wait before a service that died is started again: 0, 10, 100, 1000 ms, 10 s, and
-/// from then on a minute. A service that cannot live here must not take a processor for itself.
-class BackOff {
+/// The most calls at a time in the last seconds. What was needed once and is no more is forgotten.
+class RecentPeak {
  public:
-  void noteDeath() noexcept;
-  void noteGoodReply() noexcept { deaths_ = 0; }
-  [[nodiscard]] Deadline notBefore() const noexcept { return notBefore_; }
+  void note(std::size_t now, Deadline at) noexcept;
+  [[nodiscard]] std::size_t value() const noexcept { return std::max(before_, here_); }
 
  private:
-  std::size_t deaths_ = 0;
-  Deadline notBefore_{};
+  Deadline since_{};
+  std::size_t before_ = 1;
+  std::size_t here_ = 1;
+};
+
+/// Spaces abnormal ends out: somebody who makes one message after the other fail, to search for an
+/// address or to keep services restarting, is answered late, and nobody else is.
+class AbnormalEnds {
+ public:
+  explicit AbnormalEnds(unsigned perSecond) noexcept : perSecond_(perSecond) {}
+  /// Counts one, and gives when it may be answered.
+  Deadline note(Deadline now) noexcept;
+
+ private:
+  unsigned perSecond_;
+  Deadline next_{};
 };
 
 /// All members may be called from any thread, except where a process has been forked: there only
 /// isOurs and abandon.
 class Pool {
  public:
-  /// Starts the service. Throws HostError (startFailed).
-  Pool(const Client::Options& options, std::size_t processes);
-  /// Ends it. No call may be under way.
-  ~Pool();
+  /// Starts nothing yet.
+  explicit Pool(const Client::Options& options);
   Pool(const Pool&) = delete;
   Pool& operator=(const Pool&) = delete;
 
-  /// Takes the reply of an honest worker; throws MalformedReply when it is none after all. What
-  /// else it throws is the outcome of the message.
-  using Accept = std::function<void(const ReceivedReply&)>;
+  /// Waits for a running service, and has the first workers forked. Throws HostError.
+  Supervisor::Service start(Deadline deadline);
 
-  /// Gives the message to a worker, and the reply to `accept`. Throws HostError.
-  void exchange(const ClientRequest& request, Deadline deadline, const Accept& accept);
+  /// A worker for a message of so many bytes, `fresh` or one that may have served others; or what
+  /// to wait for before asking again. Throws HostError.
+  std::variant<Worker, Wait> take(std::size_t length, bool fresh, Deadline deadline);
+  /// Whether the worker has had its last message.
+  [[nodiscard]] bool isSpent(const Worker& worker) const noexcept {
+    return worker.served() >= messagesPerWorker();
+  }
+  /// A worker that has answered. It is used again, or ends.
+  void giveBack(Worker worker) noexcept;
+  /// What follows a message, and nobody waits for: workers are forked for those that come next,
+  /// services that were replaced are ended.
+  void tidy() noexcept;
+  /// When a message that ended abnormally may be answered.
+  Deadline noteAbnormalEnd() noexcept;
 
-  /// What the running service said of itself: Protocol::versionText takes the one, and bits of
-  /// Layer are the other.
-  struct Report {
-    std::uint64_t version;
-    std::uint64_t layers;
-  };
-  /// Throws HostError.
-  Report report(Deadline deadline);
+  [[nodiscard]] FairSemaphore& places() noexcept { return places_; }
+  [[nodiscard]] bool isLarge(std::size_t length) const noexcept;
+  [[nodiscard]] std::size_t processes() const noexcept { return processes_; }
+  [[nodiscard]] const LogSink& log() const noexcept { return log_; }
+  [[nodiscard]] DescriptorRegistry& registry() noexcept { return registry_; }
 
   /// Whether this is the process that made the pool, and not a fork of it.
-  [[nodiscard]] bool isOurs() const noexcept;
+  [[nodiscard]] bool isOurs() const noexcept { return mark_.isOurs(); }
   /// In a fork: closes its copies of the descriptors. Nothing else of the pool can be used or
   /// freed there, because threads that no longer exist may have held its locks.
-  void abandon() noexcept { book_.closeAll(); }
+  void abandon() noexcept { registry_.closeAll(); }
 
  private:
-  using Lock = std::unique_lock<std::mutex>;
-  using Service = std::shared_ptr<ServiceProcess>;
-  class Place;
+  [[nodiscard]] std::uint64_t messagesPerWorker() const noexcept {
+    return settings_.messagesPerWorker;
+  }
+  Optional<Worker> takeIdle(const Supervisor::Service& service);
+  std::size_t startForking(const ServiceProcess& service) noexcept;
+  void forkAhead(const Supervisor::Service& service) noexcept;
+  void keepIdle(Worker worker) noexcept;
 
-  Optional<HostError> attempt(Worker worker, const ClientRequest& request, Deadline deadline,
-                              const Accept& accept, std::uint64_t mayServe);
-  void keep(Worker worker, bool spent);
-  Worker take(std::size_t length, Deadline deadline, bool fresh);
-  Optional<Worker> takeIdle();
-  void forkAhead() noexcept;
-  Optional<Worker> forkQuietly(const Service& service) const noexcept;
-
-  Service running(Lock& lock, Deadline deadline);
-  void awaitBackOff(Lock& lock, Deadline deadline);
-  void start(Lock& lock, Deadline deadline);
-  void tellLayers(const ServiceProcess& service);
-
-  const pid_t owner_;
+  const ForkMark mark_;
+  const std::size_t processes_;
   const ServiceSettings settings_;
-  /// Bytes: what a worker must be ready for before its message is known.
-  const std::uint64_t foreseen_;
+  /// Bytes: what a worker is forked for before its message is known.
+  const std::uint64_t expectedLength_;
   const LogSink log_;
-  DescriptorBook book_;
-  Turnstile turnstile_;
+  DescriptorRegistry registry_;
+  FairSemaphore places_;
+  Supervisor supervisor_;
 
   std::mutex mutex_;
-  Service service_;
-  /// Workers of `service_`.
+  /// Workers of the current service.
   std::deque<Worker> idle_;
   std::size_t forking_ = 0;
-  /// Calls that hold a place, and the most that ever did at a time: so many workers are kept.
-  std::size_t busy_ = 0;
-  std::size_t mostBusy_ = 1;
-
-  BackOff backOff_;
-  String lastFailure_;
-  /// Whether a good reply has come since the last start: a service that dies before any counts as
-  /// one that died while it was starting.
-  bool proved_ = false;
-  bool layersTold_ = false;
-  /// One call starts the service, the others wait.
-  bool starting_ = false;
-  std::condition_variable started_;
+  RecentPeak busy_;
+  AbnormalEnds abnormalEnds_;
 };
 
 }  // namespace Keelgate

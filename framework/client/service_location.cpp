@@ -58,7 +58,8 @@ void checkHands(const struct stat& status, const String& program, const String& 
 /// One walk along a path, link by link as the kernel would follow it, with a look at each step.
 class Walk {
  public:
-  Walk(const String& program, DescriptorBook& book) : program_(program), book_(book) {}
+  Walk(const String& program, DescriptorRegistry& registry)
+      : program_(program), registry_(registry) {}
 
   Descriptor to(String rest) {
     enter(rest);
@@ -93,7 +94,7 @@ class Walk {
   }
 
   struct stat open(int folder, const char* name) {
-    current_ = Descriptor(book_, openat(folder, name, O_PATH | O_NOFOLLOW | O_CLOEXEC));
+    current_ = Descriptor(registry_, openat(folder, name, O_PATH | O_NOFOLLOW | O_CLOEXEC));
     struct stat status {};
     if (!current_ && (errno == EMFILE || errno == ENFILE || errno == ENOMEM)) {
       throw shortage("The service " + program_ + " could not be opened", errno);
@@ -114,7 +115,7 @@ class Walk {
   }
 
   const String& program_;
-  DescriptorBook& book_;
+  DescriptorRegistry& registry_;
   Descriptor current_;
   Descriptor before_;
   /// How `current_` was reached, for sentences.
@@ -178,7 +179,7 @@ String absolute(const String& path) {
 
 }  // namespace
 
-TrustedProgram locateService(const String& path, DescriptorBook& book) {
+TrustedProgram locateService(const String& path, DescriptorRegistry& registry) {
   const String program = path.empty() ? findService() : path;
   return {.file = Walk(program, book).to(absolute(program)), .path = program};
 }

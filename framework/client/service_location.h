@@ -26,6 +26,6 @@ struct TrustedProgram {
 /// installed tree, wherever it stands now, or else at the place that the build was configured for.
 /// Throws StartFailure, with a sentence that says which folder is in whose hands. Callable from any
 /// thread.
-TrustedProgram locateService(const String& path, DescriptorBook& book);
+TrustedProgram locateService(const String& path, DescriptorRegistry& registry);
 
 }  // namespace Keelgate

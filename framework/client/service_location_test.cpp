@@ -37,13 +37,13 @@ class ServiceLocation : public testing::Test {
   /// "found", or the sentence.
   String outcome(const char* name = "outer/inner/service") {
     try {
-      return locateService(root_ / name, book_).file ? "found" : "nothing";
+      return locateService(root_ / name, registry_).file ? "found" : "nothing";
     } catch (const StartFailure& failure) {
       return failure.sentence;
     }
   }
 
-  DescriptorBook book_{16};
+  DescriptorRegistry registry_{16};
   fs::path root_ = fs::temp_directory_path() / ("keelgate-located-" + std::to_string(getpid()));
 };
 
@@ -59,8 +59,8 @@ TEST_F(ServiceLocation, FollowsLinksDotsAndRelativePaths) {
   EXPECT_NE(outcome("outer/inner/service/more").find("Not a directory"), String::npos);
   const fs::path here = fs::current_path();
   fs::current_path(root_ / "outer");
-  EXPECT_TRUE(locateService("inner/service", book_).file);
-  EXPECT_TRUE(locateService("../link/inner/service", book_).file);
+  EXPECT_TRUE(locateService("inner/service", registry_).file);
+  EXPECT_TRUE(locateService("../link/inner/service", registry_).file);
   fs::current_path(here);
 }
 
@@ -107,7 +107,7 @@ TEST_F(ServiceLocation, KeepsTheFileThatWasLookedAt) {
   const fs::path service = root_ / "outer/inner/service";
   struct stat before {};
   ASSERT_EQ(stat(service.c_str(), &before), 0);
-  const TrustedProgram program = locateService(service, book_);
+  const TrustedProgram program = locateService(service, registry_);
   write("another", "another one");
   fs::rename(root_ / "another", service);
   struct stat held {};

@@ -4,7 +4,6 @@
 #include "framework/client/service_process.h"
 
 #include "framework/contracts/layers.h"
-#include "framework/contracts/memory_budget.h"
 #include "framework/contracts/start_step.h"
 #include "framework/protocol/control_frames.h"
 
@@ -23,290 +22,268 @@ using Protocol::ControlKind;
 using Protocol::makeControlFrame;
 using Protocol::noDescriptor;
 using Protocol::Transfer;
+using Protocol::Waiting;
 using std::chrono::milliseconds;
 
 namespace {
 
-/// An honest worker is gone so long after its last answer.
+/// From its start until it is ready.
+constexpr milliseconds startPatience{10'000};
+
+/// An honest worker is gone so long after its last answer; the slots are looked at as often.
 constexpr milliseconds leavePatience{10};
 
-/// A launcher gets so long to collect what it leaves: on a crowded machine it needs some. At the
-/// end of a client, which has promised to be quick, it gets less.
-constexpr milliseconds collectPatience{300};
-constexpr milliseconds lastPatience{80};
-/// One that was killed is gone when the kernel says so.
-constexpr milliseconds killedPatience{100};
+/// Ending of its own will, or by our hand, shows nothing of the address layout. Anything else may
+/// be somebody's miss, and the next try must not meet the same layout.
+bool isAbnormal(int status, bool killed) noexcept {
+  if (WIFEXITED(status)) return WEXITSTATUS(status) != 0;
+  return !(killed && WTERMSIG(status) == SIGKILL);
+}
 
-/// Sends a frame of a service that may have too little room for it, as long as the deadline allows.
-bool sendFrame(int control, const ControlFrame& frame, int descriptor, Deadline deadline) noexcept {
-  for (;;) {
-    const Transfer sent = Protocol::sendControl(control, frame, descriptor, Protocol::Waiting::no);
-    if (sent != Transfer::wouldBlock) return sent == Transfer::complete;
-    if (waitFor(control, POLLOUT, deadline) == 0) return false;
-  }
+const char* silentSentence(bool activated) {
+  return activated
+             ? "The activated service ended at once: 'journalctl -u keelgate@*' says why, and "
+               "'systemctl status keelgate.socket' whether its connections are used up "
+               "(MaxConnections)"
+             : "The service ended, or said something unknown, while it was starting: check that it "
+               "is a VespKeelgateService of this build";
 }
 
 }  // namespace
 
-ServiceProcess::ServiceProcess(const ServiceSettings& settings, DescriptorBook& book,
-                               Deadline deadline)
-    : book_(book), slots_(settings.maximumWorkers) {
-  handles_ = settings.socket.empty() ? launchService(settings.path, book)
-                                     : connectService(settings.socket, book, deadline);
-  try {
-    shakeHands(settings, deadline);
-  } catch (...) {
-    end(milliseconds(0));
-    throw;
-  }
+ServiceProcess::ServiceProcess(const ServiceSettings& settings, DescriptorRegistry& registry)
+    : settings_(settings), registry_(registry), slots_(settings.maximumWorkers) {
+  handles_ = settings.socket.empty()
+                 ? launchService(settings.path, registry)
+                 : connectService(settings.socket, settings.socketUser, registry);
+  // Said once and for all workers: what bounds a worker is fixed before any message is known. A
+  // service that has already refused takes no hello, and its reason is waiting to be read.
+  const ControlFrame hello = makeControlFrame(
+      ControlKind::hello, 0, {settings.messagesPerWorker, settings.cpuSecondsPerWorker});
+  static_cast<void>(
+      Protocol::sendControl(handles_.control.get(), hello, noDescriptor, Waiting::no));
 }
 
 ServiceProcess::~ServiceProcess() {
-  end(milliseconds(0));
+  constexpr Patience little{
+      .closed = milliseconds(0), .asked = milliseconds(300), .killed = milliseconds(100)};
+  while (!end(little)) waitFor(nextStep());
 }
 
-void ServiceProcess::shakeHands(const ServiceSettings& settings, Deadline deadline) {
-  // Said once and for all workers: what bounds a worker is fixed before any message is known.
-  const ControlFrame hello = makeControlFrame(
-      ControlKind::hello, 0, {settings.messagesPerWorker, settings.cpuSecondsPerWorker});
-  ControlFrame answer;
-  const int control = handles_.control.get();
-  // A service that has already refused takes no hello, and its reason is waiting to be read.
-  static_cast<void>(sendFrame(control, hello, noDescriptor, deadline));
-  if (waitFor(control, POLLIN, deadline) == 0) failToStart(true);
-  if (Protocol::receiveControl(control, answer, Protocol::Waiting::no) != Transfer::complete) {
-    failToStart(false);
+Optional<StartFailure> ServiceProcess::startFailure() const {
+  const std::lock_guard lock(mutex_);
+  return startFailure_;
+}
+
+void ServiceProcess::readNews() noexcept {
+  const std::lock_guard lock(mutex_);
+  for (ControlFrame frame; state_ != State::lost;) {
+    switch (Protocol::receiveControl(handles_.control.get(), frame, Waiting::no)) {
+      case Transfer::complete:
+        noteFrame(frame);
+        continue;
+      case Transfer::wouldBlock:
+        break;
+      case Transfer::ended:
+      case Transfer::malformed:
+        if (state_ == State::starting) {
+          failToStart({silentSentence(!settings_.socket.empty()), true});
+        }
+        lose();
+        break;
+    }
+    break;
   }
-  if (answer.kind == ControlKind::refused) {
-    throw StartFailure(
-        startFailureSentence(StartStep{answer.numbers[0]}, static_cast<int>(answer.numbers[1])),
-        false);
+  const Deadline now = Clock::now();
+  if (state_ == State::starting && now >= startedAt_ + startPatience) {
+    failToStart({"The service did not get ready in time: the machine may be overloaded", true});
   }
-  if (answer.kind != ControlKind::ready) failToStart(false);
-  layers_ = answer.numbers[0];
-  version_ = answer.numbers[1];
+  if (now < lastLook_ + leavePatience) return;
+  lastLook_ = now;
+  // One that was taken over may have answered and stay, to use the processor and its memory.
+  killOverdue(SlotState::overdue);
+  for (Slot& slot : slots_) {
+    if (slot.state == SlotState::leaving) slot.state = SlotState::overdue;
+  }
+}
+
+void ServiceProcess::noteFrame(const ControlFrame& frame) noexcept {
+  if (state_ == State::starting) {
+    try {
+      noteAnswerToHello(frame);
+    } catch (const std::bad_alloc&) {
+      lose();
+    }
+    return;
+  }
+  // The slot comes from outside and is a number to be checked like any other.
+  const bool known = frame.slot < slots_.size() && slots_[frame.slot].state != SlotState::free &&
+                     slots_[frame.slot].state != SlotState::ended;
+  if (!known || frame.kind != ControlKind::exit) {
+    lose();
+    return;
+  }
+  noteExit(slots_[frame.slot],
+           {.status = static_cast<int>(frame.numbers[0]), .neverStarted = frame.numbers[3] != 0});
+}
+
+void ServiceProcess::noteExit(Slot& slot, const Exit& exit) noexcept {
+  if (!exit.neverStarted && isAbnormal(exit.status, slot.state == SlotState::killed)) retire();
+  slot = {.state = slot.state == SlotState::held ? SlotState::ended : SlotState::free,
+          .exit = exit};
+}
+
+void ServiceProcess::noteAnswerToHello(const ControlFrame& frame) {
+  if (frame.kind == ControlKind::refused) {
+    failToStart(
+        {startFailureSentence(StartStep{frame.numbers[0]}, static_cast<int>(frame.numbers[1])),
+         false});
+    return;
+  }
+  if (frame.kind != ControlKind::ready) {
+    failToStart({silentSentence(!settings_.socket.empty()), true});
+    return;
+  }
+  layers_ = frame.numbers[0];
+  version_ = frame.numbers[1];
+  const String missing = missingLayersLine(layers_);
   // Records travel as they stand in the schema of one build: another's would be misread.
   if (version_ != Protocol::ownVersion()) {
-    throw StartFailure("The service is of version " + Protocol::versionText(version_) +
-                           " and its client of " + Protocol::versionText(Protocol::ownVersion()) +
-                           ": install both from one build",
-                       false);
-  }
+    failToStart({"The service is of version " + Protocol::versionText(version_) +
+                     " and its client of " + Protocol::versionText(Protocol::ownVersion()) +
+                     ": install both from one build",
+                 false});
 #ifndef KEELGATE_UNSEALED
-  // A service that was built for a sanitizer has no seal, and says so.
-  if ((layers_ & requiredLayers) != requiredLayers) {
-    throw StartFailure("The service was built without its seal: install a release build of it",
-                       false);
-  }
+    // A service that was built for a sanitizer has no seal, and says so.
+  } else if ((layers_ & requiredLayers) != requiredLayers) {
+    failToStart({"The service was built without its seal: install a release build of it", false});
 #endif
-  const String missing = missingLayersLine(layers_);
-  if (settings.requireLayers && !missing.empty()) {
-    throw StartFailure(missing +
-                           ", and all layers are required: run it where the kernel and the "
-                           "container's profile allow them, or don't require them",
-                       false);
+  } else if (settings_.requireLayers && !missing.empty()) {
+    failToStart({missing +
+                     ", and all layers are required: run it where the kernel and the container's "
+                     "profile allow them, or don't require them",
+                 false});
+  } else {
+    state_ = State::running;
   }
 }
 
-void ServiceProcess::failToStart(bool late) {
-  throw StartFailure(late ? "The service did not get ready in time: the machine may be overloaded"
-                          : "The service ended, or said something unknown, while it was starting: "
-                            "check that it is a VespKeelgateService of this build",
-                     true);
+void ServiceProcess::failToStart(StartFailure failure) {
+  startFailure_ = std::move(failure);
+  lose();
 }
 
-Optional<ServiceProcess::Forked> ServiceProcess::fork(std::uint64_t longestMessage,
-                                                      Deadline deadline) {
+Optional<ServiceProcess::Forked> ServiceProcess::fork(std::uint64_t longestMessage) {
   int ends[2];
   if (socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends) != 0) {
     throw shortage("No channel for a worker could be made", errno);
   }
-  Descriptor ours(book_, ends[0]);
-  // In the book as well: a copy in a forked child would keep the worker's channel open.
-  const Descriptor theirs(book_, ends[1]);
-  const Optional<std::uint32_t> slot = claimSlot(deadline);
-  if (!slot) return std::nullopt;
-  const ControlFrame frame = makeControlFrame(ControlKind::fork, *slot, {longestMessage});
-  // A zygote that takes no frame for so long forks for nobody else either.
-  if (!sendFrame(handles_.control.get(), frame, theirs.get(), deadline)) {
-    lose();
+  Descriptor ours(registry_, ends[0]);
+  // Registered as well: a copy in a forked child would keep the worker's channel open.
+  const Descriptor theirs(registry_, ends[1]);
+  if (!ours || !theirs) throw shortage("No channel for a worker could be made", errno);
+  const std::lock_guard lock(mutex_);
+  const auto free = std::find_if(slots_.begin(), slots_.end(),
+                                 [](const Slot& slot) { return slot.state == SlotState::free; });
+  if (state_ == State::lost) return std::nullopt;
+  if (free == slots_.end()) {
+    // Workers that have answered and stay: an honest one ends at once.
+    killOverdue(SlotState::leaving);
+    killOverdue(SlotState::overdue);
     return std::nullopt;
   }
-  return Forked{.slot = *slot,
-                .channel = std::move(ours),
-                .heap = memoryBudget(std::max(longestMessage, shortMessage))};
-}
-
-Optional<std::uint32_t> ServiceProcess::claimSlot(Deadline deadline) {
-  Lock lock(mutex_);
-  const auto free = [&] {
-    return std::find_if(slots_.begin(), slots_.end(),
-                        [](const Slot& slot) { return slot.phase == Slot::Phase::free; });
-  };
-  while (free() == slots_.end() && !isLost() && Clock::now() < deadline) {
-    // Workers that have answered and stay: an honest one ends at once.
-    for (std::uint32_t i = 0; i < slots_.size(); ++i) {
-      if (slots_[i].phase == Slot::Phase::released) killSlot(i);
-    }
-    readUntil(lock, std::min(deadlineAfter(killPatience), deadline),
-              [&] { return free() != slots_.end(); });
-    const Deadline longAgo = Clock::now() - killPatience;
-    const bool stuck = std::any_of(slots_.begin(), slots_.end(), [&](const Slot& slot) {
-      return slot.phase == Slot::Phase::released && slot.killed && !slot.confirmed &&
-             slot.since < longAgo;
-    });
-    if (stuck) destroy();
+  const auto slot = static_cast<std::uint32_t>(free - slots_.begin());
+  const ControlFrame frame = makeControlFrame(ControlKind::fork, slot, {longestMessage});
+  switch (Protocol::sendControl(handles_.control.get(), frame, theirs.get(), Waiting::no)) {
+    case Transfer::complete:
+      free->state = SlotState::held;
+      return Forked{.slot = slot, .channel = std::move(ours)};
+    case Transfer::wouldBlock:
+      return std::nullopt;
+    case Transfer::ended:
+    case Transfer::malformed:
+      break;
   }
-  const auto slot = free();
-  if (slot == slots_.end() || isLost()) return std::nullopt;
-  *slot = Slot{.phase = Slot::Phase::running};
-  return static_cast<std::uint32_t>(slot - slots_.begin());
+  lose();
+  return std::nullopt;
 }
 
-void ServiceProcess::killSlot(std::uint32_t slot) noexcept {
-  if (slots_[slot].phase == Slot::Phase::ended || slots_[slot].killed) return;
-  // Not waited for: if the zygote does not even read, its launcher is killed before long.
-  slots_[slot].killed = sendFrame(handles_.control.get(), makeControlFrame(ControlKind::kill, slot),
-                                  noDescriptor, Clock::now());
-  slots_[slot].since = Clock::now();
-}
-
-void ServiceProcess::kill(std::uint32_t slot) noexcept {
+Optional<ServiceProcess::Exit> ServiceProcess::exitOf(std::uint32_t slot) const {
   const std::lock_guard lock(mutex_);
-  killSlot(slot);
-}
-
-bool ServiceProcess::awaitKill(std::uint32_t slot, Deadline deadline) {
-  Lock lock(mutex_);
-  const auto heard = [&] {
-    return slots_[slot].confirmed || slots_[slot].phase == Slot::Phase::ended;
-  };
-  readUntil(lock, deadline, heard);
-  return heard();
-}
-
-Optional<ServiceProcess::Exit> ServiceProcess::awaitExit(std::uint32_t slot, Deadline deadline) {
-  Lock lock(mutex_);
-  const auto ended = [&] {
-    return slots_[slot].phase == Slot::Phase::ended;
-  };
-  readUntil(lock, deadline, ended);
-  if (!ended()) return std::nullopt;
+  if (slots_[slot].state != SlotState::ended) return std::nullopt;
   return slots_[slot].exit;
 }
 
-void ServiceProcess::release(std::uint32_t slot) noexcept {
+void ServiceProcess::release(std::uint32_t slot, Leaving how) noexcept {
   const std::lock_guard lock(mutex_);
-  Slot& its = slots_[slot];
-  its.phase = its.phase == Slot::Phase::ended ? Slot::Phase::free : Slot::Phase::released;
-  its.since = Clock::now();
-}
-
-void ServiceProcess::collect() noexcept {
-  const std::lock_guard lock(mutex_);
-  if (!reading_) readAll();
-  // One that was taken over may have answered and stay, to use the processor and its memory.
-  const Deadline longAgo = Clock::now() - leavePatience;
-  for (std::uint32_t i = 0; i < slots_.size(); ++i) {
-    if (slots_[i].phase == Slot::Phase::released && slots_[i].since < longAgo) killSlot(i);
-  }
-}
-
-// The first thread that finds nobody reading reads for all; when it has what it came for, it wakes
-// the others, and one of them takes its place.
-template <class Condition>
-void ServiceProcess::readUntil(Lock& lock, Deadline deadline, Condition condition) {
-  if (!reading_) readAll();
-  while (!condition() && !isLost() && Clock::now() < deadline) {
-    if (reading_) {
-      news_.wait_until(lock, deadline);
-      continue;
-    }
-    reading_ = true;
-    lock.unlock();
-    waitFor(handles_.control.get(), POLLIN, deadline);
-    lock.lock();
-    readAll();
-    reading_ = false;
-    news_.notify_all();
-  }
-}
-
-void ServiceProcess::readAll() noexcept {
-  for (ControlFrame frame; !isLost();) {
-    switch (Protocol::receiveControl(handles_.control.get(), frame, Protocol::Waiting::no)) {
-      case Transfer::wouldBlock:
-        return;
-      case Transfer::complete:
-        note(frame);
-        break;
-      case Transfer::ended:
-      case Transfer::malformed:
-        lose();
-        break;
-    }
-  }
-}
-
-void ServiceProcess::note(const ControlFrame& frame) noexcept {
-  // The slot comes from outside and is a number to be checked like any other.
-  Slot none;
-  Slot& slot = frame.slot < slots_.size() ? slots_[frame.slot] : none;
-  const bool alive = slot.phase == Slot::Phase::running || slot.phase == Slot::Phase::released;
-  if (alive && frame.kind == ControlKind::exit) {
-    noteExit(slot, frame);
-  } else if (alive && frame.kind == ControlKind::killed && slot.killed && !slot.confirmed) {
-    slot.confirmed = true;
+  SlotState& state = slots_[slot].state;
+  if (state == SlotState::ended) {
+    state = SlotState::free;
+  } else if (how == Leaving::byItself) {
+    state = SlotState::leaving;
   } else {
-    lose();
+    // Where the zygote has no room for the frame it is tried again at the next look.
+    state = sendKill(slot) ? SlotState::killed : SlotState::overdue;
   }
 }
 
-void ServiceProcess::noteExit(Slot& slot, const ControlFrame& frame) noexcept {
-  slot.exit = {.status = static_cast<int>(frame.numbers[0]), .neverStarted = frame.numbers[3] != 0};
-  slot.phase = slot.phase == Slot::Phase::released ? Slot::Phase::free : Slot::Phase::ended;
-  const int signal = WIFSIGNALED(slot.exit.status) ? WTERMSIG(slot.exit.status) : 0;
-  // Ending for want of processor time, or by our own hand, shows nothing of the address layout. Any
-  // other signal may be somebody's miss, and the next try must not meet the same layout.
-  const bool expected = signal == 0 || signal == SIGXCPU || (signal == SIGKILL && slot.killed);
-  State running = State::running;
+void ServiceProcess::killOverdue(SlotState from) noexcept {
+  for (std::uint32_t i = 0; i < slots_.size(); ++i) {
+    if (slots_[i].state == from && sendKill(i)) slots_[i].state = SlotState::killed;
+  }
+}
+
+bool ServiceProcess::sendKill(std::uint32_t slot) noexcept {
+  return Protocol::sendControl(handles_.control.get(), makeControlFrame(ControlKind::kill, slot),
+                               noDescriptor, Waiting::no) == Transfer::complete;
+}
+
+void ServiceProcess::retire() noexcept {
   // Exchanged: a lost service stays lost.
-  if (!expected) state_.compare_exchange_strong(running, State::retired);
+  State running = State::running;
+  state_.compare_exchange_strong(running, State::retired);
 }
 
 void ServiceProcess::lose() noexcept {
   state_ = State::lost;
 }
 
-void ServiceProcess::destroy() noexcept {
-  lose();
-  if (handles_.launcher) askToEnd(handles_.launcher);
-  // Ends the channel in every process that has a copy of it, and so whoever waits on it here.
-  shutdown(handles_.control.get(), SHUT_RDWR);
+// The zygote ends when its channel does, and its workers with it; the launcher is last. If the
+// launcher were killed at once, these would be left to the application where that is what collects
+// orphans: as pid 1 of a container.
+bool ServiceProcess::end(const Patience& patience) noexcept {
+  // Those who have released workers are done with it by then.
+  const std::lock_guard lock(mutex_);
+  if (endStep_ == EndStep::none) {
+    lose();
+    if (handles_.control) shutdown(handles_.control.get(), SHUT_RDWR);
+    handles_.control.close();
+    endStep_ = EndStep::closed;
+    nextStepAt_ = Clock::now() + patience.closed;
+  }
+  if (!handles_.launcher) return true;
+  const bool over = Clock::now() >= nextStepAt_;
+  if (waitFor({.descriptor = handles_.launcher.get(), .events = POLLIN, .until = {}}) != 0 ||
+      (over && endStep_ == EndStep::killed)) {
+    reapLauncher(handles_.launcher);
+    handles_.launcher.close();
+    return true;
+  }
+  if (!over) return false;
+  if (endStep_ == EndStep::closed) {
+    askToEnd(handles_.launcher);
+    endStep_ = EndStep::asked;
+    nextStepAt_ = Clock::now() + patience.asked;
+  } else {
+    killLauncher(handles_.launcher);
+    endStep_ = EndStep::killed;
+    nextStepAt_ = Clock::now() + patience.killed;
+  }
+  return false;
 }
 
-// The zygote ends when its channel does, and its workers with it; the launcher is last.
-void ServiceProcess::end(milliseconds patience) noexcept {
-  if (!handles_.control) return;
-  lose();
-  shutdown(handles_.control.get(), SHUT_RDWR);
-  handles_.control.close();
-  if (!handles_.launcher) return;
-  const auto hasEnded = [&](milliseconds within) {
-    return waitFor(handles_.launcher.get(), POLLIN, deadlineAfter(within)) != 0;
-  };
-  if (!hasEnded(patience)) {
-    // It kills its zygote and waits for all that it leaves. If the launcher were killed, these
-    // would be left to the application where that is what collects orphans: as pid 1 of a
-    // container.
-    askToEnd(handles_.launcher);
-    if (!hasEnded(patience.count() == 0 ? collectPatience : lastPatience)) {
-      killLauncher(handles_.launcher);
-      hasEnded(patience.count() == 0 ? killedPatience : lastPatience / 4);
-    }
-  }
-  reapLauncher(handles_.launcher);
-  handles_.launcher.close();
+Wait ServiceProcess::nextStep() const noexcept {
+  return {.descriptor = handles_.launcher.get(), .events = POLLIN, .until = nextStepAt_};
 }
 
 }  // namespace Keelgate

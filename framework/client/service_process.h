@@ -1,9 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
-/// One running service, seen from its client: the launcher's pidfd and the control channel to the
-/// zygote, which forks workers, kills them and tells how they ended.
+/// One service, seen from its client: the launcher's pidfd and the control channel to the zygote,
+/// which forks workers, kills them and tells how they ended.
 ///
-/// There is no thread that reads the channel. Whoever needs news reads it for all: one waiting
-/// thread at a time polls, the others sleep until it tells them.
+/// Nothing here waits but finishEnd(). Whoever needs news waits for descriptor() and calls
+/// readNews(), which reads for all.
 #pragma once
 
 #include "framework/client/launch.h"
@@ -13,18 +13,17 @@
 #include <keelgate/values.h>
 
 #include <atomic>
-#include <condition_variable>
 #include <mutex>
+#include <vector>
 
 namespace Keelgate {
-
-/// A zygote that is well has taken a frame within this.
-constexpr std::chrono::milliseconds killPatience{100};
 
 struct ServiceSettings {
   /// Where `socket` is empty the program at `path` is started.
   String path;
   String socket;
+  /// Who else than root and the caller may serve on the socket.
+  Optional<unsigned> socketUser;
   bool requireLayers;
   std::uint64_t messagesPerWorker;
   std::uint64_t cpuSecondsPerWorker;
@@ -36,29 +35,30 @@ struct ServiceSettings {
 /// All members may be called from any thread.
 class ServiceProcess {
  public:
-  /// Starts the service and shakes hands. Throws StartFailure.
-  ServiceProcess(const ServiceSettings& settings, DescriptorBook& book, Deadline deadline);
-  /// Ends it at once, if end() was not called.
+  /// It only ever moves on. A retired service finishes what it has and is given nothing more; a
+  /// lost one has ended, or said what it should not have said.
+  enum class State { starting, running, retired, lost };
+
+  /// Starts it. Throws StartFailure.
+  ServiceProcess(const ServiceSettings& settings, DescriptorRegistry& registry);
   ~ServiceProcess();
   ServiceProcess(const ServiceProcess&) = delete;
   ServiceProcess& operator=(const ServiceProcess&) = delete;
+
+  [[nodiscard]] State state() const noexcept { return state_; }
+  /// Why it never got ready. Nothing as long as it may, or when it did.
+  [[nodiscard]] Optional<StartFailure> startFailure() const;
 
   /// A worker as its slot, with the client's end of its channel.
   struct Forked {
     std::uint32_t slot;
     Descriptor channel;
-    /// Bytes of heap that it was given.
-    std::size_t heap;
   };
-  /// Asks for a worker for messages of at most so many bytes, without waiting for it; nothing when
-  /// the service is lost or all slots are taken until the deadline. Throws StartFailure when no
-  /// channel can be made.
-  Optional<Forked> fork(std::uint64_t longestMessage, Deadline deadline);
-  /// SIGKILL for the worker, if it still runs.
-  void kill(std::uint32_t slot) noexcept;
-  /// Whether the zygote says in time that it has killed the worker, or that the worker has ended.
-  /// The end itself may take longer: the kernel takes back what memory it had, gigabytes perhaps.
-  bool awaitKill(std::uint32_t slot, Deadline deadline);
+  /// Asks for a worker for messages of at most so many bytes; nothing when the service is lost or
+  /// has no slot or no room for the frame just now. Throws StartFailure when no channel can be
+  /// made.
+  Optional<Forked> fork(std::uint64_t longestMessage);
+
   /// How a worker ended.
   struct Exit {
     /// As waitpid gives it.
@@ -66,76 +66,94 @@ class ServiceProcess {
     /// There was no process to be had for it, so it has read nothing.
     bool neverStarted;
   };
-  /// How the worker ended; nothing when the service is lost or it takes too long.
-  /// The caller has had a worker on the slot and has not released it.
-  Optional<Exit> awaitExit(std::uint32_t slot, Deadline deadline);
-  /// Nobody will ask for this slot again.
-  void release(std::uint32_t slot) noexcept;
-  /// Takes note of the workers that have ended, without waiting.
-  void collect() noexcept;
+  /// How the worker ended, once it is known. The caller has not released it.
+  [[nodiscard]] Optional<Exit> exitOf(std::uint32_t slot) const;
 
-  /// Whether it should still be given messages: it is neither lost, nor did a worker of it die of a
-  /// signal. Workers are copies of one zygote and share its address layout: an attacker who could
-  /// crash one after the other could search for it.
-  [[nodiscard]] bool isUsable() const noexcept { return state_ == State::running; }
-  [[nodiscard]] bool isLost() const noexcept { return state_ == State::lost; }
+  /// Nobody will ask for this slot again: its worker has had its last message and ends by itself,
+  /// or is killed.
+  enum class Leaving { byItself, killed };
+  void release(std::uint32_t slot, Leaving how) noexcept;
 
-  /// SIGKILL for all of it. For a service that does not do what it is told. Whoever waits for news
-  /// of it is woken.
-  void destroy() noexcept;
-  /// Closes the channel, waits for the end so long, and then uses SIGKILL.
-  void end(std::chrono::milliseconds patience) noexcept;
+  /// Takes note of what the zygote has said, without waiting, and of workers that should have left.
+  void readNews() noexcept;
+  /// To wait for news on; -1 once it is being ended.
+  [[nodiscard]] int descriptor() const noexcept { return handles_.control.get(); }
 
-  /// The walls that it has, as bits of Layer.
+  /// It is given no further message. Workers are copies of one zygote and share its address layout:
+  /// an attacker who could make one after the other fail could search for it.
+  void retire() noexcept;
+
+  /// Counts a reply that was one, and gives how many there were.
+  std::uint64_t noteReply() noexcept { return ++replies_; }
+  [[nodiscard]] std::uint64_t replies() const noexcept { return replies_; }
+  [[nodiscard]] Deadline startedAt() const noexcept { return startedAt_; }
+
+  /// How long each means of ending it is given before the next.
+  struct Patience {
+    /// For a zygote whose channel is closed, and its workers with it.
+    std::chrono::milliseconds closed;
+    /// For a launcher to kill its zygote and collect all that this leaves.
+    std::chrono::milliseconds asked;
+    /// For the kernel, after SIGKILL.
+    std::chrono::milliseconds killed;
+  };
+  /// One step of its end, without waiting. Whether it has ended; otherwise to be called again when
+  /// nextStep() is over. One thread at a time, which nobody else uses it beside.
+  bool end(const Patience& patience) noexcept;
+  [[nodiscard]] Wait nextStep() const noexcept;
+
+  /// The layers that it has, as bits of Layer, and its version, as Protocol::versionText takes it.
+  /// Of a service that is running.
   [[nodiscard]] std::uint64_t layers() const noexcept { return layers_; }
-  /// Its version, as Transport::packVersion has it.
   [[nodiscard]] std::uint64_t version() const noexcept { return version_; }
 
  private:
-  /// It only ever moves to the right. A retired service finishes what it has.
-  enum class State { running, retired, lost };
+  enum class SlotState {
+    free,
+    /// Somebody has the worker.
+    held,
+    /// It has ended, and whoever has it has not asked yet.
+    ended,
+    /// Released, to end by itself.
+    leaving,
+    /// The same since the last look at the slots.
+    overdue,
+    /// Released and killed.
+    killed,
+  };
   struct Slot {
-    /// `released`: nobody asks any more, and it has not ended; `ended`: the other way round. Only
-    /// when both have happened is the slot free, so that no exit can be taken for another worker's.
-    enum class Phase { free, running, released, ended };
-    Phase phase = Phase::free;
-    /// By us: then a death by SIGKILL says nothing of the message.
-    bool killed = false;
-    /// The zygote has said that it did.
-    bool confirmed = false;
-    /// When it was released, or was killed after that.
-    Deadline since{};
+    SlotState state = SlotState::free;
     Exit exit{};
   };
-  using Lock = std::unique_lock<std::mutex>;
+  enum class EndStep { none, closed, asked, killed };
 
-  void shakeHands(const ServiceSettings& settings, Deadline deadline);
-  [[noreturn]] static void failToStart(bool late);
-  Optional<std::uint32_t> claimSlot(Deadline deadline);
-  void killSlot(std::uint32_t slot) noexcept;
-  /// Until the condition holds, the service is lost or the deadline has passed; the lock is given
-  /// up meanwhile.
-  template <class Condition>
-  void readUntil(Lock& lock, Deadline deadline, Condition condition);
-  void readAll() noexcept;
-  void note(const Protocol::ControlFrame& frame) noexcept;
-  void noteExit(Slot& slot, const Protocol::ControlFrame& frame) noexcept;
+  void noteFrame(const Protocol::ControlFrame& frame) noexcept;
+  void noteAnswerToHello(const Protocol::ControlFrame& frame);
+  void noteExit(Slot& slot, const Exit& exit) noexcept;
+  void killOverdue(SlotState from) noexcept;
+  bool sendKill(std::uint32_t slot) noexcept;
+  void failToStart(StartFailure failure);
   void lose() noexcept;
 
-  DescriptorBook& book_;
-  /// Constant between construction and end().
+  const ServiceSettings& settings_;
+  DescriptorRegistry& registry_;
+  /// Constant until its end.
   ServiceHandles handles_{};
+  const Deadline startedAt_ = Clock::now();
+  std::atomic<State> state_ = State::starting;
+  std::atomic<std::uint64_t> replies_ = 0;
+  /// Written before the state becomes `running`.
   std::uint64_t layers_ = 0;
   std::uint64_t version_ = 0;
-  std::atomic<State> state_ = State::running;
 
-  std::mutex mutex_;
-  /// Somebody has read the channel, or stopped reading it.
-  std::condition_variable news_;
-  /// Whether a thread polls the channel for all.
-  bool reading_ = false;
+  mutable std::mutex mutex_;
+  Optional<StartFailure> startFailure_;
   /// Its size never changes.
   std::vector<Slot> slots_;
+  Deadline lastLook_{};
+
+  EndStep endStep_ = EndStep::none;
+  Deadline nextStepAt_{};
 };
 
 }  // namespace Keelgate

@@ -1,11 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
-/// One worker of a service, owned.
-///
-/// It keeps its service alive: a service that has been replaced ends with the last worker of it
-/// that somebody still waits for.
+/// One worker of a service, owned. It keeps its service from being ended.
 #pragma once
 
-#include "framework/client/data_channel.h"
+#include "framework/client/descriptor.h"
+#include "framework/client/exchange.h"
 #include "framework/client/service_process.h"
 
 #include <keelgate/errors.h>
@@ -18,39 +16,35 @@ namespace Keelgate {
 class Worker {
  public:
   Worker(std::shared_ptr<ServiceProcess> service, ServiceProcess::Forked forked) noexcept
-      : service_(std::move(service)),
-        slot_(forked.slot),
-        channel_(std::move(forked.channel), forked.heap) {}
+      : service_(std::move(service)), slot_(forked.slot), channel_(std::move(forked.channel)) {}
   Worker(Worker&&) noexcept = default;
   Worker& operator=(Worker&&) = delete;
-  ~Worker();
+  ~Worker() {
+    // Moved from.
+    if (!service_) return;
+    using Leaving = ServiceProcess::Leaving;
+    service_->release(slot_, finished_ ? Leaving::byItself : Leaving::killed);
+  }
 
-  /// Gives the message to the worker. The reply, or what became of the worker: its death is
-  /// explained by its wait status, and one that is late or lies is killed. Throws std::bad_alloc.
-  /// After an error it must be dropped.
-  Optional<HostError> exchange(const ClientRequest& request, Deadline deadline,
-                               ReceivedReply& reply);
-
-  [[nodiscard]] DataChannel::Look look() const noexcept { return channel_.look(); }
+  [[nodiscard]] int channel() const noexcept { return channel_.get(); }
+  [[nodiscard]] WorkerSign sign() const noexcept { return signOf(channel_.get()); }
+  /// The sequence number of its next message.
+  std::uint32_t nextSequence() noexcept { return served_++; }
+  /// How many messages it has been given.
+  [[nodiscard]] std::uint64_t served() const noexcept { return served_; }
   /// It ends by itself: it has had its last message.
   void finish() noexcept { finished_ = true; }
 
-  /// How many messages it has been given.
-  [[nodiscard]] std::uint64_t served() const noexcept { return served_; }
-  [[nodiscard]] const ServiceProcess* service() const noexcept { return service_.get(); }
+  /// How it ended, once the service knows.
+  [[nodiscard]] Optional<ServiceProcess::Exit> exit() const { return service_->exitOf(slot_); }
+  [[nodiscard]] ServiceProcess& service() const noexcept { return *service_; }
 
  private:
-  HostError explainDeath();
-
   std::shared_ptr<ServiceProcess> service_;
   std::uint32_t slot_;
-  DataChannel channel_;
-  std::uint64_t served_ = 0;
-  /// Set when it may be left to end by itself.
+  Descriptor channel_;
+  std::uint32_t served_ = 0;
   bool finished_ = false;
 };
-
-/// The error for an answer that is none.
-HostError lie();
 
 }  // namespace Keelgate

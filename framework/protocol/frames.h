@@ -8,13 +8,10 @@
 ///                               <-    ready{layers}            or refused{step} and it exits
 ///     fork{slot, length} + descriptor ->                       a worker on that descriptor
 ///     kill{slot}                ->                             SIGKILL for that slot's worker
-///                               <-    killed{slot}           at once, where there was a worker
 ///                               <-    exit{slot, status, ...}  exactly one for every fork
 ///
 /// A slot is any number that no living worker has; it is free again with its exit. A kill for a
-/// slot without a worker is ignored: the worker may have ended meanwhile. A worker with gigabytes
-/// to give back takes its time to end, and `killed` tells the client that its zygote is well
-/// meanwhile.
+/// slot without a worker is ignored: the worker may have ended meanwhile.
 ///
 /// *Data* (client <-> one worker, SOCK_STREAM, half-duplex, one request in flight): a RequestHeader
 /// with the service identifier and the message behind it; then at most `maximumLogFrames` log
@@ -34,10 +31,10 @@ namespace Keelgate::Protocol {
 /// "KGAT". Nothing is looked at in a frame that begins otherwise.
 constexpr std::uint32_t magic = 0x4b47'4154;
 /// To be raised with any change of what travels: two builds that differ must refuse each other.
-constexpr std::uint16_t protocolVersion = 3;
+constexpr std::uint16_t protocolVersion = 4;
 
 /// From 1, here and below, so that a frame of zeros is not one.
-enum class ControlKind : std::uint16_t { hello = 1, ready, fork, kill, killed, exit, refused };
+enum class ControlKind : std::uint16_t { hello = 1, ready, fork, kill, exit, refused };
 
 /// What stands in `numbers` for each kind, all others being 0:
 ///   hello: [0] messages per worker, [1] CPU seconds per worker
@@ -50,7 +47,7 @@ struct ControlFrame {
   std::uint32_t magic;
   std::uint16_t version;
   ControlKind kind;
-  /// Of fork, kill, killed and exit; 0 in the others.
+  /// Of fork, kill and exit; 0 in the others.
   std::uint32_t slot;
   std::uint32_t reserved;
   std::array<std::uint64_t, 4> numbers;

@@ -126,7 +126,6 @@ void Zygote::kill(std::uint32_t slot) const {
     if (child.slot != slot) continue;
     // Not reaped yet, so the number is still this child's.
     ::kill(child.process, SIGKILL);
-    send(Protocol::makeControlFrame(ControlKind::killed, slot));
   }
 }
 

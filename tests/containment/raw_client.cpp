@@ -129,10 +129,8 @@ void RawClient::kill(std::uint32_t slot) {
 WorkerEnd RawClient::end(std::uint32_t slot) {
   while (!ended_.contains(slot)) {
     const ControlFrame frame = receiveFrame();
-    if (frame.kind == ControlKind::killed && killed_.insert(frame.slot).second) continue;
     if (frame.kind != ControlKind::exit) throw std::runtime_error("the service has gone");
-    ended_[frame.slot] = {.killed = killed_.erase(frame.slot) != 0,
-                          .status = static_cast<int>(frame.numbers[0]),
+    ended_[frame.slot] = {.status = static_cast<int>(frame.numbers[0]),
                           .peakBytes = frame.numbers[1],
                           .cpuMicroseconds = frame.numbers[2]};
   }

@@ -20,8 +20,6 @@ namespace Keelgate::Test {
 
 /// The end of a worker, as its exit frame has it.
 struct WorkerEnd {
-  /// A killed frame came before.
-  bool killed;
   int status;
   std::uint64_t peakBytes;
   std::uint64_t cpuMicroseconds;
@@ -85,7 +83,6 @@ class RawClient {
   pid_t launcher_ = -1;
   int control_ = -1;
   Protocol::ControlFrame first_{};
-  std::set<std::uint32_t> killed_;
   std::map<std::uint32_t, WorkerEnd> ended_;
 };
 

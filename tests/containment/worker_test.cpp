@@ -128,9 +128,7 @@ TEST_F(Worker, C3SeenFromOutside) {
   close(waiting);
   EXPECT_EQ(service_.end(1).exitStatus(), 0);
   service_.kill(2);
-  const WorkerEnd end = service_.end(2);
-  EXPECT_EQ(end.signal(), SIGKILL);
-  EXPECT_TRUE(end.killed);
+  EXPECT_EQ(service_.end(2).signal(), SIGKILL);
   close(spinning);
 }
 

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 // A service without seal and without manners. Its workers do what the message says, step by step;
 // how it starts follows from the name that it was started under (fake_service.mute and so on).
+#include "framework/contracts/layers.h"
 #include "framework/contracts/process.h"
 #include "framework/contracts/start_step.h"
 #include "framework/protocol/control_frames.h"
@@ -16,6 +17,7 @@
 #include <unistd.h>
 
 #include <array>
+#include <chrono>
 #include <csignal>
 #include <map>
 #include <string_view>
@@ -48,6 +50,22 @@ void die(int signal) {
   raise(signal);
 }
 
+void trickle(std::uint32_t milliseconds) {
+  const auto end = std::chrono::steady_clock::now() + std::chrono::milliseconds(milliseconds);
+  while (std::chrono::steady_clock::now() < end) {
+    write(std::array<std::byte, 1>());
+    usleep(100);
+  }
+}
+
+/// A service is given its channel and nothing else.
+bool hasOnlyChannel() {
+  for (int other = 0; other < 64; ++other) {
+    if (other != channel && fcntl(other, F_GETFD) >= 0) return false;
+  }
+  return environ == nullptr || *environ == nullptr;
+}
+
 void obey(Bytes script, std::uint32_t sequence) {
   while (script.size() >= sizeof(Step)) {
     Step step;
@@ -63,6 +81,8 @@ void obey(Bytes script, std::uint32_t sequence) {
     if (step.op == Op::raise) die(static_cast<int>(step.amount));
     if (step.op == Op::raiseIfUsed && sequence > 0) die(static_cast<int>(step.amount));
     if (step.op == Op::hitZygote) kill(getppid(), static_cast<int>(step.amount));
+    if (step.op == Op::answerZygote) writeFrame(sequence, recordNumbered(getppid()));
+    if (step.op == Op::trickle) trickle(step.amount);
     if (step.op == Op::exit) _exit(static_cast<int>(step.amount));
     while (step.op == Op::endless) write(std::array<std::byte, 4096>());
   }
@@ -150,7 +170,6 @@ class Zygote {
     for (const auto& [pid, its] : slots_) {
       if (its != slot) continue;
       if (!slow_) ::kill(pid, SIGKILL);
-      send(makeControlFrame(ControlKind::killed, slot));
     }
   }
   void reportExits() {
@@ -176,9 +195,12 @@ int main(int, char** arguments) {
   const std::string_view manner = name.substr(name.rfind('.') + 1);
   ControlFrame hello;
   int none;
+  if (!hasOnlyChannel()) return 1;
   if (!receive(hello, none) || manner == "dies") return 0;
   ControlFrame ready = makeControlFrame(ControlKind::ready);
-  ready.numbers[0] = manner == "bare" ? 0x3f : ~std::uint64_t{0};
+  ready.numbers[0] = manner == "bare"       ? requiredLayers
+                     : manner == "unsealed" ? requiredLayers & ~layerStrictFilter
+                                            : ~std::uint64_t{0};
   ready.numbers[1] = ownVersion() + (manner == "newer" ? 1 : 0);
   if (manner == "refuses") {
     ready.kind = ControlKind::refused;

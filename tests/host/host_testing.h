@@ -2,7 +2,6 @@
 /// What the tests of the host share: clients of the fake service, and outcomes as short texts.
 #pragma once
 
-#include "framework/transport/record_coding.h"
 #include "tests/host/script.h"
 
 #include <keelgate/client.h>
@@ -37,17 +36,11 @@ inline Client::Options fakeOptions(const String& manner = "honest") {
   options.processes = 2;
   options.timeLimit = std::chrono::milliseconds(20'000);
   options.servicePath = fakeService(manner);
+  // Tests make workers fail by the hundred.
+  options.abnormalEndsPerSecond = 0;
   options.log = [](std::string_view) {
   };
   return options;
-}
-
-/// A record that can be told from others.
-inline Data recordNumbered(Int number) {
-  VespCommandResponse record{};
-  record.command = number;
-  record.applicationId = "application " + std::to_string(number);
-  return Transport::encodeRecord(record);
 }
 
 inline const char* nameOf(HostError::Reason reason) {

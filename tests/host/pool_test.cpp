@@ -1,15 +1,19 @@
 // SPDX-License-Identifier: Apache-2.0
 // The life of a client: starting, sharing, retrying, forking, ending.
-#include "framework/client/pool.h"
+#include "framework/client/descriptor.h"
 #include "tests/host/host_testing.h"
 
 #include <gtest/gtest.h>
 
+#include <fcntl.h>
+#include <sched.h>
 #include <sys/resource.h>
 #include <sys/socket.h>
 #include <sys/un.h>
 #include <sys/wait.h>
 
+#include <algorithm>
+#include <array>
 #include <atomic>
 #include <csignal>
 #include <iterator>
@@ -47,6 +51,9 @@ TEST(Start, AFailureSaysWhatIsWrong) {
       {noProgram, "/etc/passwd could not be started: Permission denied"},
       {noSocket, "No service answers on the socket /nowhere/socket: No such file"},
       {layers, "Running without: user namespace, mount namespace"},
+#ifndef KEELGATE_UNSEALED
+      {fakeOptions("unsealed"), "built without its seal"},
+#endif
       {fakeOptions("refuses"), "The kernel refused the system call filter: use a kernel with"},
       {fakeOptions("newer"), "and its client of"},
       {fakeOptions("dies"), "of this build; it is not tried again for"},
@@ -124,51 +131,6 @@ TEST(Pool, AZygoteThatDoesNotServeIsReplacedInTime) {
   EXPECT_EQ(outcomeOf(client, good()), "timedOut");
   EXPECT_EQ(outcomeOf(client, good()), "timedOut");
   EXPECT_NE(children(), before);
-}
-
-/// Its memory may take the kernel longer to take back than a zygote may take to answer.
-TEST(Pool, AWorkerThatTakesLongToEndEndsNobodyElse) {
-  Client::Options options = fakeOptions("slow");
-  options.timeLimit = milliseconds(400);
-  Client client(options);
-  const std::set<int> before = children();
-  EXPECT_EQ(outcomeOf(client, good()), "record 7");
-  EXPECT_EQ(outcomeOf(client, Script().then(Op::pause, 60'000)), "timedOut");
-  EXPECT_EQ(outcomeOf(client, good()), "record 7");
-  EXPECT_EQ(children(), before);
-}
-
-TEST(Pool, AServiceThatCannotLiveIsTriedLessAndLess) {
-  BackOff backOff;
-  for (int round = 0; round < 2; ++round) {
-    for (const int wait : {0, 10, 100, 1000, 10'000, 60'000, 60'000}) {
-      const Deadline before = Clock::now();
-      backOff.noteDeath();
-      EXPECT_GE(backOff.notBefore(), before + milliseconds(wait));
-      EXPECT_LE(backOff.notBefore(), Clock::now() + milliseconds(wait));
-    }
-    backOff.noteGoodReply();
-  }
-}
-
-TEST(Pool, ASignalDeathGetsANewZygoteAndOthersKeepTheirMessage) {
-  Client client(fakeOptions());
-  const std::set<int> before = children();
-  std::atomic<bool> started = false;
-  std::thread other([&] {
-    started = true;
-    EXPECT_EQ(outcomeOf(client, Script().then(Op::pause, 300).answer(recordNumbered(9))),
-              "record 9");
-  });
-  while (!started) usleep(1000);
-  usleep(50'000);
-  EXPECT_EQ(outcomeOf(client, Script().then(Op::raise, SIGSEGV)), "crashed");
-  EXPECT_EQ(outcomeOf(client, good()), "record 7");
-  other.join();
-  EXPECT_EQ(outcomeOf(client, good()), "record 7");
-  const std::set<int> after = children();
-  EXPECT_EQ(after.size(), 1u);
-  EXPECT_NE(after, before);
 }
 
 TEST(Pool, OnlyAMessageThatFollowedOthersIsTriedAgain) {
@@ -263,7 +225,53 @@ TEST(Application, ItsForkHasAServiceOfItsOwn) {
   waitpid(child, &status, 0);
   EXPECT_EQ(status, 0);
   EXPECT_EQ(outcomeOf(client, good(4)), "record 4");
-  EXPECT_EQ(children(), before);
+  const std::set<int> after = children();
+  EXPECT_TRUE(std::includes(after.begin(), after.end(), before.begin(), before.end()));
+}
+
+/// What it writes there is not to reach a channel.
+TEST(Application, MayHaveNoStandardDescriptors) {
+  const pid_t child = fork();
+  if (child == 0) {
+    closefrom(0);
+    Client client(fakeOptions());
+    const bool right = outcomeOf(client, good()) == "record 7" &&
+                       outcomeOf(client, Script().then(Op::raise, SIGSEGV)) == "crashed" &&
+                       outcomeOf(client, good()) == "record 7" && client.descriptor() > 2;
+    for (const int standard : {0, 1, 2}) {
+      if (fcntl(standard, F_GETFD) >= 0) _exit(2);
+    }
+    _exit(right ? 0 : 1);
+  }
+  int status = -1;
+  waitpid(child, &status, 0);
+  EXPECT_EQ(status, 0);
+}
+
+/// A process number may be the same in another namespace.
+TEST(Application, IsToldFromItsForkWhateverTheirNumbers) {
+  const pid_t child = fork();
+  if (child == 0) {
+    if (unshare(CLONE_NEWUSER | CLONE_NEWPID) != 0) _exit(77);
+    const pid_t first = fork();
+    if (first == 0) {
+      const ForkMark mark;
+      const pid_t number = getpid();
+      if (!mark.isOurs() || unshare(CLONE_NEWPID) != 0) _exit(1);
+      const pid_t second = fork();
+      if (second == 0) _exit(getpid() == number && !mark.isOurs() ? 0 : 1);
+      int status = -1;
+      waitpid(second, &status, 0);
+      _exit(status == 0 && mark.isOurs() ? 0 : 1);
+    }
+    int status = -1;
+    waitpid(first, &status, 0);
+    _exit(status == 0 ? 0 : 1);
+  }
+  int status = -1;
+  waitpid(child, &status, 0);
+  if (WEXITSTATUS(status) == 77) GTEST_SKIP() << "no namespaces here";
+  EXPECT_EQ(status, 0);
 }
 
 TEST(Application, GetsBackWhatItHadWhenTheClientEnds) {
@@ -278,13 +286,16 @@ TEST(Application, GetsBackWhatItHadWhenTheClientEnds) {
 /// Serves connections of a socket as a service manager does: each gets a service on descriptor 3.
 class Activator {
  public:
-  explicit Activator(const String& path) : path_(path) {
+  /// `user` listens; the service is started under the name `manner`.
+  explicit Activator(const String& path, uid_t user = geteuid(),
+                     const char* manner = "fake_service")
+      : path_(path) {
     sockaddr_un address{};
     address.sun_family = AF_UNIX;
     path.copy(address.sun_path, sizeof address.sun_path - 1);
     listener_ = socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0);
     if (bind(listener_, reinterpret_cast<sockaddr*>(&address), sizeof address) != 0) abort();
-    listen(listener_, 8);
+    if (seteuid(user) != 0 || listen(listener_, 8) != 0 || seteuid(getuid()) != 0) abort();
     pid_ = fork();
     while (pid_ == 0) {
       const int connection = accept(listener_, nullptr, nullptr);
@@ -292,8 +303,9 @@ class Activator {
       if (fork() == 0) {
         signal(SIGCHLD, SIG_DFL);
         dup2(connection, 3);
+        for (const int standard : {0, 1, 2}) close(standard);
         closefrom(4);
-        execl(KEELGATE_FAKE_SERVICE, "fake_service", nullptr);
+        execle(KEELGATE_FAKE_SERVICE, manner, nullptr, std::array<char*, 1>().data());
         _exit(1);
       }
       close(connection);
@@ -312,10 +324,35 @@ class Activator {
   pid_t pid_;
 };
 
-TEST(Application, MayUseAnActivatedService) {
+Client::Options activated() {
   Client::Options options = fakeOptions();
   options.socket =
       std::filesystem::temp_directory_path() / ("keelgate-" + std::to_string(getpid()) + "-socket");
+  return options;
+}
+
+/// Whoever gets the messages of a client must not be just anybody.
+TEST(Application, TrustsTheListenersThatItNames) {
+  if (geteuid() != 0) GTEST_SKIP() << "only root can listen as somebody else";
+  Client::Options options = activated();
+  const Activator activator(options.socket, 65'534);
+  EXPECT_NE(startOf(options).find("User 65534 listens"), String::npos);
+  options.socketUser = 65'533;
+  EXPECT_NE(startOf(options).find("User 65534 listens"), String::npos);
+  options.socketUser = 65'534;
+  EXPECT_EQ(startOf(options), "started");
+}
+
+TEST(Application, IsToldWhereTheServiceManagerSaysWhy) {
+  const Client::Options options = activated();
+  const Activator activator(options.socket, geteuid(), "fake_service.dies");
+  const String outcome = startOf(options);
+  EXPECT_NE(outcome.find("journalctl -u"), String::npos) << outcome;
+  EXPECT_NE(outcome.find("MaxConnections"), String::npos) << outcome;
+}
+
+TEST(Application, MayUseAnActivatedService) {
+  const Client::Options options = activated();
   const Activator activator(options.socket);
   Client client(options);
   for (const Int number : {1, 2}) {

@@ -3,8 +3,9 @@
 #pragma once
 
 #include "framework/protocol/frames.h"
+#include "framework/transport/record_coding.h"
 
-#include <keelgate/values.h>
+#include <keelgate/records.h>
 
 #include <cstring>
 #include <string_view>
@@ -19,12 +20,15 @@ enum class Op : std::uint8_t {
   raise,
   raiseIfUsed,
   hitZygote,
+  answerZygote,
+  trickle,
   exit,
   endless
 };
 
 /// Behind it stand `amount` bytes for write, answer and log; for the others it is the milliseconds,
-/// the signal or the status.
+/// the signal or the status. `answerZygote` gives the number of the process that the worker was
+/// forked from; `trickle` sends a byte after the other for so long.
 struct Step {
   Op op;
   std::uint32_t amount;
@@ -37,6 +41,14 @@ enum Interruption : std::uint64_t {
   /// And the number of a signal.
   raiseAfterHeader = 2'000'000,
 };
+
+/// A record that can be told from others.
+inline Data recordNumbered(Int number) {
+  VespCommandResponse record{};
+  record.command = number;
+  record.applicationId = "application " + std::to_string(number);
+  return Transport::encodeRecord(record);
+}
 
 /// Builds a script, step by step.
 class Script {

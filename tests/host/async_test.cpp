@@ -1,0 +1,272 @@
+// SPDX-License-Identifier: Apache-2.0
+// Batches, and calls that an event loop of the application drives.
+#include "framework/protocol/data_frames.h"
+#include "framework/transport/error_coding.h"
+#include "tests/host/host_testing.h"
+
+#include <gtest/gtest.h>
+
+#include <poll.h>
+#include <sys/wait.h>
+
+#include <algorithm>
+#include <csignal>
+#include <thread>
+
+namespace Keelgate::Host {
+namespace {
+
+using std::chrono::milliseconds;
+using std::chrono::steady_clock;
+using Response = VespCommandResponse;
+
+Script answer(Int number, std::uint32_t after = 0) {
+  return Script().then(Op::pause, after).answer(recordNumbered(number));
+}
+
+String outcomeOf(Outcome<Response>& outcome) {
+  return Host::outcomeOf([&] { return outcome.record().command; });
+}
+
+/// An application's loop: dispatches when the descriptor says so, and not otherwise.
+template <class Condition>
+bool loopUntil(Client& client, Condition condition, milliseconds limit = milliseconds(10'000)) {
+  const auto end = steady_clock::now() + limit;
+  while (!condition() && steady_clock::now() < end) {
+    pollfd entry{.fd = client.descriptor(), .events = POLLIN, .revents = 0};
+    if (poll(&entry, 1, 100) > 0) client.dispatch();
+  }
+  return condition();
+}
+
+/// Messages with the outcome that each must have.
+struct Sent {
+  std::vector<Script> scripts;
+  std::vector<String> expected;
+  std::vector<Request> requests;
+
+  explicit Sent(Int count) {
+    for (Int i = 0; i < count; ++i) {
+      const bool dies = i % 7 == 3;
+      const bool lies = i % 7 == 5;
+      scripts.push_back(dies ? Script().then(Op::raise, SIGSEGV) : answer(i, i % 3 == 0 ? 5 : 0));
+      if (lies) scripts.back() = Script().answer(Data(3));
+      expected.push_back(dies   ? "crashed"
+                         : lies ? "protocolViolation"
+                                : "record " + std::to_string(i));
+    }
+    for (const Script& script : scripts) requests.push_back({.message = script});
+  }
+};
+
+TEST(Batch, GivesEachMessageItsOwnOutcomeInOrder) {
+  for (const unsigned processes : {1u, 3u}) {
+    Client::Options options = fakeOptions();
+    options.processes = processes;
+    Client client(options);
+    const Sent sent(50);
+    std::vector<Outcome<Response>> outcomes = client.unpackBatch<Response>(sent.requests);
+    ASSERT_EQ(outcomes.size(), sent.expected.size());
+    for (std::size_t i = 0; i < outcomes.size(); ++i) {
+      EXPECT_EQ(outcomeOf(outcomes[i]), sent.expected[i]) << i;
+    }
+    EXPECT_TRUE(client.unpackBatch<Response>({}).empty());
+  }
+}
+
+TEST(Batch, TellsOutcomesAsTheyCome) {
+  Client client(fakeOptions());
+  const Script slow = answer(0, 300), quick = answer(1);
+  const Request requests[] = {{.message = slow}, {.message = quick}, {.message = quick}};
+  std::vector<std::size_t> order;
+  client.unpackBatch<Response>(requests, [&](std::size_t position, Outcome<Response> outcome) {
+    EXPECT_EQ(outcomeOf(outcome), position == 0 ? "record 0" : "record 1");
+    order.push_back(position);
+  });
+  EXPECT_EQ(order, (std::vector<std::size_t>{1, 2, 0}));
+}
+
+/// Each message has its own time limit; the batch as a whole may take longer.
+TEST(Batch, HoldsEachMessageToItsTimeLimit) {
+  Client::Options options = fakeOptions();
+  options.timeLimit = milliseconds(400);
+  Client client(options);
+  std::vector<Script> scripts(6, answer(1, 250));
+  scripts[1] = Script().then(Op::pause, 60'000);
+  std::vector<Request> requests;
+  for (const Script& script : scripts) requests.push_back({.message = script});
+  std::vector<Outcome<Response>> outcomes = client.unpackBatch<Response>(requests);
+  for (std::size_t i = 0; i < outcomes.size(); ++i) {
+    EXPECT_EQ(outcomeOf(outcomes[i]), i == 1 ? "timedOut" : "record 1") << i;
+  }
+}
+
+TEST(Batch, IsEndedByAVisitorThatThrows) {
+  Client client(fakeOptions());
+  const Sent sent(20);
+  std::size_t told = 0;
+  EXPECT_THROW(client.unpackBatch<Response>(sent.requests,
+                                            [&](std::size_t, const Outcome<Response>&) {
+                                              if (++told == 3) throw std::runtime_error("enough");
+                                            }),
+               std::runtime_error);
+  EXPECT_EQ(told, 3u);
+  EXPECT_EQ(Host::outcomeOf(client, answer(1)), "record 1");
+}
+
+TEST(Async, CompletesEachMessageOnce) {
+  Client client(fakeOptions());
+  const Sent sent(50);
+  std::vector<std::vector<String>> seen(50);
+  std::size_t completed = 0;
+  for (std::size_t i = 0; i < seen.size(); ++i) {
+    client.start<Response>(sent.requests[i], [&, i](Outcome<Response> outcome) {
+      seen[i].push_back(outcomeOf(outcome));
+      ++completed;
+    });
+  }
+  EXPECT_EQ(completed, 0u);
+  EXPECT_TRUE(loopUntil(client, [&] { return completed == seen.size(); }));
+  for (std::size_t i = 0; i < seen.size(); ++i) {
+    EXPECT_EQ(seen[i], std::vector<String>{sent.expected[i]}) << i;
+  }
+  const Statistics figures = client.statistics();
+  EXPECT_EQ(figures.messages, 50u);
+  EXPECT_EQ(figures.crashed, 7u);
+  EXPECT_EQ(figures.protocolViolations, 7u);
+  EXPECT_EQ(figures.records, 36u);
+}
+
+TEST(Async, IsCancelledAtItsDeadlineAlsoBeforeItsTurn) {
+  Client::Options options = fakeOptions();
+  options.processes = 1;
+  Client client(options);
+  const Script stays = Script().then(Op::pause, 60'000);
+  const auto start = steady_clock::now();
+  std::vector<String> seen;
+  const auto note = [&](Outcome<Response> outcome) {
+    seen.push_back(outcomeOf(outcome));
+  };
+  client.start<Response>({.message = stays}, note, milliseconds(900));
+  for (const int limit : {300, 200}) {
+    client.start<Response>({.message = stays}, note, milliseconds(limit));
+  }
+  EXPECT_TRUE(loopUntil(client, [&] { return seen.size() == 2; }));
+  EXPECT_LT(steady_clock::now() - start, milliseconds(800));
+  EXPECT_TRUE(loopUntil(client, [&] { return seen.size() == 3; }));
+  EXPECT_EQ(seen, std::vector<String>(3, "timedOut"));
+  EXPECT_LT(steady_clock::now() - start, milliseconds(1900));
+  EXPECT_EQ(Host::outcomeOf(client, answer(1)), "record 1");
+}
+
+TEST(Async, CompletionsMayStartMessagesAndThrow) {
+  Client client(fakeOptions());
+  const Script script = answer(1);
+  int rest = 20;
+  int thrown = 0;
+  std::function<void(Outcome<Response>)> next = [&](const Outcome<Response>&) {
+    if (--rest > 0) client.start<Response>({.message = script}, next);
+    if (rest % 5 == 0) throw std::runtime_error("from a completion");
+  };
+  client.start<Response>({.message = script}, next);
+  while (rest > 0) {
+    try {
+      ASSERT_TRUE(loopUntil(client, [&] { return rest <= 0; }));
+    } catch (const std::runtime_error&) {
+      ++thrown;
+    }
+  }
+  EXPECT_EQ(thrown, 4);
+}
+
+TEST(Async, GoesOnBesideOtherThreads) {
+  Client client(fakeOptions());
+  const Script script = answer(5);
+  std::atomic<int> right = 0;
+  std::atomic<int> completed = 0;
+  std::vector<std::thread> threads;
+  for (int t = 0; t < 2; ++t) {
+    threads.emplace_back([&] {
+      for (int i = 0; i < 40; ++i) {
+        client.start<Response>({.message = script}, [&](Outcome<Response> outcome) {
+          if (outcomeOf(outcome) == "record 5") ++right;
+          ++completed;
+        });
+        if (Host::outcomeOf(client, script) == "record 5") ++right;
+      }
+    });
+    threads.emplace_back([&] { loopUntil(client, [&] { return completed == 80; }); });
+  }
+  for (std::thread& thread : threads) thread.join();
+  EXPECT_EQ(right, 160);
+}
+
+TEST(Async, EndsWithItsClient) {
+  const std::size_t descriptors = openDescriptors();
+  const Script stays = Script().then(Op::pause, 60'000);
+  bool told = false;
+  {
+    Client client(fakeOptions());
+    client.start<Response>({.message = stays}, [&](const Outcome<Response>&) { told = true; });
+    client.dispatch();
+    usleep(50'000);
+  }
+  EXPECT_FALSE(told);
+  EXPECT_TRUE(children().empty());
+  EXPECT_EQ(openDescriptors(), descriptors);
+}
+
+TEST(Async, AForkHasItsOwn) {
+  Client client(fakeOptions());
+  bool told = false;
+  const Script script = answer(1);
+  client.start<Response>({.message = script}, [&](const Outcome<Response>&) { told = true; });
+  const pid_t child = fork();
+  if (child == 0) {
+    int mine = 0;
+    client.start<Response>({.message = script}, [&](const Outcome<Response>&) { ++mine; });
+    const bool right = loopUntil(client, [&] { return mine == 1; }) && !told;
+    _exit(right ? 0 : 1);
+  }
+  EXPECT_TRUE(loopUntil(client, [&] { return told; }));
+  int status = -1;
+  waitpid(child, &status, 0);
+  EXPECT_EQ(status, 0);
+}
+
+TEST(Statistics, CountEveryOutcomeOfEveryKindOfCall) {
+  Client::Options options = fakeOptions();
+  options.timeLimit = milliseconds(500);
+  options.largestMessage = 1000;
+  Client first(options);
+  Data error = Transport::encodeError(Breach("domain", "type"));
+  Data rejection;
+  Protocol::appendReplyFrame(rejection, 0, Protocol::ReplyKind::error, error);
+  Host::outcomeOf(first, answer(1));
+  Host::outcomeOf(first, Script().write(rejection));
+  // It moves with what it has.
+  Client client(std::move(first));
+  Host::outcomeOf(client, Script().then(Op::raise, SIGSEGV));
+  Host::outcomeOf(client, Script().then(Op::pause, 60'000));
+  Host::outcomeOf(client, Data(1001));
+  Host::outcomeOf(client, Script().then(Op::exit, Protocol::resourceExitStatus));
+  const Script lie = Script().answer(Data(3)), good = answer(2);
+  const Request batch[] = {{.message = lie}, {.message = good}};
+  client.unpackBatch<Response>(batch);
+  const Statistics figures = client.statistics();
+  EXPECT_EQ(figures.records, 2u);
+  for (const UInt64 one :
+       {figures.rejections, figures.crashed, figures.timedOut, figures.messageTooLarge,
+        figures.resourcesExhausted, figures.protocolViolations}) {
+    EXPECT_EQ(one, 1u);
+  }
+  EXPECT_EQ(figures.startFailed, 0u);
+  EXPECT_EQ(figures.messages, 8u);
+  Client other(fakeOptions());
+  client = std::move(other);
+  EXPECT_EQ(Host::outcomeOf(client, answer(3)), "record 3");
+  EXPECT_EQ(client.statistics().messages, 1u);
+}
+
+}  // namespace
+}  // namespace Keelgate::Host
