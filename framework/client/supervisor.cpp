@@ -185,6 +185,7 @@ void Supervisor::noteReply(ServiceProcess& service) noexcept {
 }
 
 void Supervisor::tidy() noexcept try {
+  bool isMissing = false;
   {
     const std::lock_guard lock(mutex_);
     if (current_) current_->readNews();
@@ -192,7 +193,20 @@ void Supervisor::tidy() noexcept try {
     std::erase_if(replaced_, [](const Service& service) {
       return service.use_count() == 1 && service->end(aside);
     });
-    if (state_ != State::running || standby_ || !wantsStandby_ || spawningStandby_ ||
+    // By whoever made the last one unusable, and not by whoever needs the next one.
+    isMissing = wantsStandby_ && state_ == State::stopped;
+    if (isMissing) state_ = State::starting;
+  }
+  if (isMissing) start();
+  startStandby();
+} catch (const std::exception&) {
+  // A start that failed for good is met again by whoever asks for a service.
+}
+
+void Supervisor::startStandby() {
+  {
+    const std::lock_guard lock(mutex_);
+    if (!current_ || standby_ || !wantsStandby_ || spawningStandby_ ||
         Clock::now() < noStandbyBefore_) {
       return;
     }
@@ -208,8 +222,6 @@ void Supervisor::tidy() noexcept try {
   spawningStandby_ = false;
   standby_ = std::move(fresh);
   if (!standby_) noStandbyBefore_ = Clock::now() + standbyPatience;
-} catch (const std::exception&) {
-  // A start that failed for good is met again by whoever asks for a service.
 }
 
 }  // namespace Keelgate

@@ -64,6 +64,7 @@ class Supervisor {
   enum class State { stopped, starting, running, backingOff };
 
   void start();
+  void startStandby();
   void settle();
   void replaceCurrent();
   void fail(StartFailure failure);
