@@ -181,7 +181,7 @@ String absolute(const String& path) {
 
 TrustedProgram locateService(const String& path, DescriptorRegistry& registry) {
   const String program = path.empty() ? findService() : path;
-  return {.file = Walk(program, book).to(absolute(program)), .path = program};
+  return {.file = Walk(program, registry).to(absolute(program)), .path = program};
 }
 
 }  // namespace Keelgate

@@ -321,10 +321,11 @@ struct StackTrial {
 TEST(Stack, WhatIsPromisedIsEnoughAndLessIsRefused) {
   Client client(fakeOptions());
   StackTrial trial{client, nestedPayloads(Transport::maximumDepth), {}};
-  trial.runWith(leastStack + (32u << 10));
-  EXPECT_EQ(trial.outcome, "record 0");
+  // In this order: the C library gives a thread the stack of one before it that had more.
   trial.runWith(leastStack - (32u << 10));
   EXPECT_EQ(trial.outcome, "resourcesExhausted");
+  trial.runWith(leastStack + (32u << 10));
+  EXPECT_EQ(trial.outcome, "record 0");
 }
 #endif
 
