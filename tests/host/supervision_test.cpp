@@ -97,8 +97,9 @@ TEST(C14, TheNextMessageFindsAServiceThatWasReady) {
 
 TEST(C14, OthersKeepTheirMessageWhateverEndsBesideThem) {
   // The last one's zygote does not even say what happened, until the others have long been done.
-  const Script ends[] = {Script().then(Op::raise, SIGSEGV), Script().then(Op::pause, 60'000),
-                         Script().then(Op::hitZygote, SIGSTOP).then(Op::raise, SIGSEGV)};
+  const Script ends[] = {
+      Script().then(Op::pause, 1000).then(Op::raise, SIGSEGV), Script().then(Op::pause, 60'000),
+      Script().then(Op::pause, 1000).then(Op::hitZygote, SIGSTOP).then(Op::raise, SIGSEGV)};
   for (const Script& script : ends) {
     Client::Options options = fakeOptions();
     options.timeLimit = milliseconds(2000);
