@@ -61,14 +61,6 @@ struct Statistics {
   UInt64 startFailed;
 };
 
-/// A message as batches and asynchronous calls take it. The bytes are borrowed until its outcome is
-/// there.
-struct Request {
-  Bytes message;
-  /// For a VespClientMessageResult; the other records have none.
-  VespClientMessageContext context{.command = 0, .service = {}};
-};
-
 /// What became of one message: the record, or the error that a call for it alone would have thrown.
 template <OutputRecord R>
 class Outcome {
@@ -176,6 +168,14 @@ class KEELGATE_API Client {
     /// default they go to standard error. Several threads may be in it at once, each within a call
     /// to the client. It must not throw, and must not call the client back.
     std::function<void(std::string_view line)> log;
+  };
+
+  /// A message as batches and asynchronous calls take it. The bytes are borrowed until its outcome
+  /// is there.
+  struct Request {
+    Bytes message;
+    /// For a VespClientMessageResult; the other records have none.
+    VespClientMessageContext context{.command = 0, .service = {}};
   };
 
   /// Starts the service, which has 10 s to get ready. Throws HostError (startFailed) with a

@@ -43,7 +43,7 @@ bool loopUntil(Client& client, Condition condition, milliseconds limit = millise
 struct Sent {
   std::vector<Script> scripts;
   std::vector<String> expected;
-  std::vector<Request> requests;
+  std::vector<Client::Request> requests;
 
   explicit Sent(Int count) {
     for (Int i = 0; i < count; ++i) {
@@ -77,7 +77,7 @@ TEST(Batch, GivesEachMessageItsOwnOutcomeInOrder) {
 TEST(Batch, TellsOutcomesAsTheyCome) {
   Client client(fakeOptions());
   const Script slow = answer(0, 300), quick = answer(1);
-  const Request requests[] = {{.message = slow}, {.message = quick}, {.message = quick}};
+  const Client::Request requests[] = {{.message = slow}, {.message = quick}, {.message = quick}};
   std::vector<std::size_t> order;
   client.unpackBatch<Response>(requests, [&](std::size_t position, Outcome<Response> outcome) {
     EXPECT_EQ(outcomeOf(outcome), position == 0 ? "record 0" : "record 1");
@@ -93,7 +93,7 @@ TEST(Batch, HoldsEachMessageToItsTimeLimit) {
   Client client(options);
   std::vector<Script> scripts(6, answer(1, 250));
   scripts[1] = Script().then(Op::pause, 60'000);
-  std::vector<Request> requests;
+  std::vector<Client::Request> requests;
   for (const Script& script : scripts) requests.push_back({.message = script});
   std::vector<Outcome<Response>> outcomes = client.unpackBatch<Response>(requests);
   for (std::size_t i = 0; i < outcomes.size(); ++i) {
@@ -251,7 +251,7 @@ TEST(Statistics, CountEveryOutcomeOfEveryKindOfCall) {
   Host::outcomeOf(client, Data(1001));
   Host::outcomeOf(client, Script().then(Op::exit, Protocol::resourceExitStatus));
   const Script lie = Script().answer(Data(3)), good = answer(2);
-  const Request batch[] = {{.message = lie}, {.message = good}};
+  const Client::Request batch[] = {{.message = lie}, {.message = good}};
   client.unpackBatch<Response>(batch);
   const Statistics figures = client.statistics();
   EXPECT_EQ(figures.records, 2u);
