@@ -13,6 +13,7 @@
 #include "plist/malformed_document.h"
 #include "text/ascii.h"
 
+#include <array>
 #include <bit>
 #include <cstddef>
 #include <cstdint>
@@ -45,18 +46,13 @@ class Cursor {
     here_ += length;
     return taken;
   }
-  /// An unsigned number of 1 to 8 bytes, most significant first.
-  std::uint64_t bigEndian(std::size_t width) {
-    std::uint64_t number = 0;
-    for (const std::byte next : take(width)) {
-      number = (number << 8) | std::to_integer<std::uint64_t>(next);
-    }
-    return number;
-  }
+  /// An unsigned number of 1 to 8 bytes, most significant first. Requires 8 bytes of message from
+  /// here on, of which the window may have fewer.
+  std::uint64_t bigEndian(std::size_t width) { return bigEndianAt(take(width), 0, width); }
 
-  /// The number of `width` bytes (1 to 8) at `offset`. For offset tables and references, which the
-  /// caller has checked and which lie before the 32-byte trailer, so that 8 bytes can be loaded at
-  /// once whatever the width. Requires offset + 8 <= message.size().
+  /// The number of `width` bytes (1 to 8) at `offset`. For what the caller has checked and what
+  /// lies before the 32-byte trailer, so that 8 bytes can be loaded at once whatever the width.
+  /// Requires 8 bytes of message from there on.
   static std::uint64_t bigEndianAt(Bytes message, std::size_t offset, std::size_t width) noexcept {
     std::uint64_t number;
     std::memcpy(&number, message.data() + offset, sizeof number);
@@ -109,9 +105,36 @@ class Cursor {
   }
   /// Moves to the next byte that text gives a meaning to or forbids: '<', '&', ']', a carriage
   /// return, another control character, or any byte above 0x7f. Or to the end.
-  void skipPlain() noexcept;
+  void skipPlain() noexcept {
+    // Most texts are short: the first block is looked at where it is asked for.
+    const std::size_t plain = remaining() >= sizeof(Block) ? plainPrefix() : 0;
+    here_ += plain;
+    if (plain == 0 || plain == sizeof(Block)) skipLongPlain();
+  }
 
  private:
+  /// Sixteen bytes in the compilers' portable vectors: one register where the machine has such.
+  /// Signed, because that is what machines compare: the bytes above 0x7f are below zero.
+  using Block [[gnu::vector_size(16)]] = signed char;
+
+  /// How many bytes come before the first that is not plain. Requires a block inside the window.
+  std::size_t plainPrefix() const noexcept {
+    Block block;
+    std::memcpy(&block, here_, sizeof block);
+    // Bytes above 0x7f are below a space too.
+    const Block marks = ((block < ' ') & (block != '\n') & (block != '\t')) | (block == '<') |
+                        (block == '&') | (block == ']');
+    const auto words = std::bit_cast<std::array<std::uint64_t, 2>>(marks);
+    return words[0] != 0 ? bytesBefore(words[0]) : 8 + bytesBefore(words[1]);
+  }
+  /// Eight for a word of zero.
+  static std::size_t bytesBefore(std::uint64_t marks) noexcept {
+    constexpr bool isLittle = std::endian::native == std::endian::little;
+    const int bits = isLittle ? std::countr_zero(marks) : std::countl_zero(marks);
+    return static_cast<std::size_t>(bits) / 8;
+  }
+  void skipLongPlain() noexcept;
+
   /// Always begin_ <= here_ <= end_.
   const std::byte* begin_;
   const std::byte* here_;

@@ -48,7 +48,8 @@ constexpr std::uint32_t keyHash(std::string_view key) noexcept {
     add(loadWord<1>(key) | loadWord<1>(key.substr(size / 2)) << 8 |
         loadWord<1>(key.substr(size - 1)) << 16);
   }
-  return static_cast<std::uint32_t>(hash ^ hash >> 32);
+  // The upper half, in which all of the last word has a say.
+  return static_cast<std::uint32_t>(hash * factor >> 32);
 }
 
 }  // namespace PropertyList

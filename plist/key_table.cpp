@@ -4,6 +4,8 @@
 #include "plist/key_hash.h"
 #include "plist/malformed_document.h"
 
+#include <bit>
+
 namespace PropertyList {
 namespace {
 
@@ -35,6 +37,8 @@ KeyTable::KeyTable(Store& store) : store_(store), colliding_(Less{&store}) {
 }
 
 void KeyTable::check(std::uint32_t dictionary, std::size_t end) {
+  // Once for all of them, and seldom for dictionaries whose keys are known.
+  reserve(store_.keys.size() + store_.nodes[dictionary].count);
   std::size_t position = store_.firstChild(dictionary);
   for (std::uint32_t left = store_.nodes[dictionary].count; left > 0; --left) {
     const std::uint32_t node = store_.child(position);
@@ -49,32 +53,40 @@ void KeyTable::check(std::uint32_t dictionary, std::size_t end) {
   }
 }
 
-/// The number of the key with this node's text, which is new as a rule.
+/// The number of the key with this node's text, which is new as a rule. There is room for it.
 std::uint32_t KeyTable::find(std::uint32_t node) {
   const std::string_view text = store_.text(store_.nodes[node]);
   const std::uint32_t hash = keyHash(text);
   const std::size_t mask = slots_.size() - 1;
-  for (std::uint32_t step = 0; step < triedSlots; ++step) {
-    const std::uint32_t number = slots_[(hash + step * (step + 1) / 2) & mask];
-    if (number == 0) break;
-    if (store_.keys[number - 1].hash == hash && store_.keyText(number) == text) return number;
+  std::uint32_t* vacant = nullptr;
+  for (std::uint32_t step = 0; step < triedSlots && vacant == nullptr; ++step) {
+    std::uint32_t& slot = slots_[(hash + step * (step + 1) / 2) & mask];
+    if (slot == 0) {
+      vacant = &slot;
+    } else if (store_.keys[slot - 1].hash == hash && store_.keyText(slot) == text) {
+      return slot;
+    }
   }
   if (!colliding_.empty()) {
     const auto found = colliding_.find(text);
     if (found != colliding_.end()) return *found;
   }
-  return add(node, hash);
-}
-
-std::uint32_t KeyTable::add(std::uint32_t node, std::uint32_t hash) {
   store_.keys.push({.node = node, .hash = hash, .dictionary = 0});
   const auto number = static_cast<std::uint32_t>(store_.keys.size());
-  if (2 * store_.keys.size() > slots_.size()) {
-    grow();
+  if (vacant != nullptr) {
+    *vacant = number;
   } else {
-    place(number);
+    colliding_.insert(number);
   }
   return number;
+}
+
+/// Makes room for so many keys. Those that are there find new slots.
+void KeyTable::reserve(std::size_t keys) {
+  if (2 * keys <= slots_.size()) return;
+  slots_.zero(std::bit_ceil(4 * keys));
+  colliding_.clear();
+  for (std::uint32_t number = 1; number <= store_.keys.size(); ++number) place(number);
 }
 
 void KeyTable::place(std::uint32_t number) {
@@ -87,12 +99,6 @@ void KeyTable::place(std::uint32_t number) {
     return;
   }
   colliding_.insert(number);
-}
-
-void KeyTable::grow() {
-  slots_.zero(4 * slots_.size());
-  colliding_.clear();
-  for (std::uint32_t number = 1; number <= store_.keys.size(); ++number) place(number);
 }
 
 }  // namespace PropertyList

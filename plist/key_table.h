@@ -40,9 +40,8 @@ class KeyTable {
   };
 
   std::uint32_t find(std::uint32_t node);
-  std::uint32_t add(std::uint32_t node, std::uint32_t hash);
+  void reserve(std::size_t keys);
   void place(std::uint32_t number);
-  void grow();
 
   Store& store_;
   /// Open addressing; keys' numbers, at most half of them taken. The size is a power of two.

@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "plist/tree_of.h"
 
-#include "plist/cursor.h"
 #include "plist/expansion_budget.h"
 
 #include <cmath>
@@ -29,11 +28,12 @@ Dictionary entriesOf(const Value& value, ExpansionBudget& budget) {
 }
 
 Uid uidOf(Bytes bytes) {
-  while (bytes.size() > 8) {
-    if (bytes.front() != std::byte{}) throw std::out_of_range("A UID does not fit 64 bits");
-    bytes = bytes.subspan(1);
+  Uid uid{0};
+  for (const std::byte byte : bytes) {
+    if (uid.number >> 56 != 0) throw std::out_of_range("A UID does not fit 64 bits");
+    uid.number = uid.number << 8 | std::to_integer<std::uint64_t>(byte);
   }
-  return {Cursor(bytes).bigEndian(bytes.size())};
+  return uid;
 }
 
 Tree treeOf(const Value& value, ExpansionBudget& budget) {

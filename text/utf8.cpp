@@ -63,10 +63,15 @@ bool isUtf8(std::string_view text) noexcept {
 }
 
 bool isAscii(std::string_view text) noexcept {
-  text.remove_prefix(asciiBlocks(text));
-  unsigned char seen = 0;
-  for (const char c : text) seen = static_cast<unsigned char>(seen | static_cast<unsigned char>(c));
-  return seen < 0x80;
+  if (text.size() >= 64) text.remove_prefix(asciiBlocks(text));
+  std::uint64_t seen = 0;
+  for (; text.size() >= sizeof seen; text.remove_prefix(sizeof seen)) {
+    std::uint64_t word;
+    std::memcpy(&word, text.data(), sizeof word);
+    seen |= word;
+  }
+  for (const char c : text) seen |= static_cast<unsigned char>(c);
+  return (seen & 0x8080'8080'8080'8080) == 0;
 }
 
 std::size_t encodeUtf8(char32_t c, char* out) noexcept {

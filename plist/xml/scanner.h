@@ -39,9 +39,11 @@ class XmlScanner {
   }
   /// Passes '<' and the name if all of the name is this; says whether it was.
   bool startTag(const ShortText& name) noexcept {
-    const char next = cursor_.peek(1 + name.length);
+    const std::uint64_t word = cursor_.word(1);
+    // No name takes all of the word.
+    const auto next = static_cast<char>(word >> (8 * name.length) & 0xff);
     const bool isWhole = next == '>' || next == '/' || Text::isSpace(next);
-    if (cursor_.peek() != '<' || !name.begins(cursor_.word(1)) || !isWhole) return false;
+    if (cursor_.peek() != '<' || !name.begins(word) || !isWhole) return false;
     cursor_.skip(1 + name.length);
     return true;
   }
