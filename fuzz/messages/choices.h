@@ -48,7 +48,7 @@ class Choices {
       if (choice == 255 && rarely(32)) {
         append(text, byte() % 32u);
       } else {
-        append(text, choice < 32 ? edges[choice % edges.size()] : char32_t{choice} / 2);
+        append(text, choice < 64 ? edges[choice % edges.size()] : char32_t{choice} / 2);
       }
     }
     return text;
