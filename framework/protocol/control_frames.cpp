@@ -48,7 +48,8 @@ Transfer receivePacket(int channel, ControlFrame& frame, DescriptorRoom* room, m
   if (size < 0) return failedTransfer();
   if (size == 0) return Transfer::ended;
   const bool whole = size == sizeof received && (packet.msg_flags & (MSG_TRUNC | MSG_CTRUNC)) == 0;
-  if (!whole || received.magic != magic || received.version != protocolVersion) {
+  if (!whole || received.magic != magic || received.version != protocolVersion ||
+      received.reserved != 0) {
     return Transfer::malformed;
   }
   frame = received;

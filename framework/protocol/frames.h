@@ -49,6 +49,7 @@ struct ControlFrame {
   ControlKind kind;
   /// Of fork, kill and exit; 0 in the others.
   std::uint32_t slot;
+  /// Always 0, as below.
   std::uint32_t reserved;
   std::array<std::uint64_t, 4> numbers;
 };
