@@ -84,6 +84,16 @@ for folder in ("include", "text", "plist", "program", "framework", "cli", "tests
             check(text.startswith("// SPDX-License-Identifier: Apache-2.0"), f"{path}: no licence")
             check(len(text.splitlines()) <= 400, f"{path} is too long to read")
 
+# What the pages point to is there; in the tour each row's function is in the file that it names.
+for page in [*root.glob("*.md"), *(root / "docs").glob("*.md")]:
+    text = page.read_text()
+    for target in re.findall(r"\]\(([^)#:]+)(?:#[^)]*)?\)", text):
+        check((page.parent / target).exists(), f"{page.name} points to {target}, which is not there")
+    for target, function in re.findall(r"\]\(([^)#]+)\)(?: \| |,\s+)`([\w:]+)`",
+                                       text):
+        check(re.search(rf"\b{function}\(", (page.parent / target).read_text()),
+              f"{page.name}: {target} has no {function}")
+
 for failure in failures:
     print(failure)
 print("0 failed" if not failures else f"{len(failures)} failed")
