@@ -89,7 +89,7 @@ std::uint32_t layersOf(const NamespaceChild& child) {
   close(serviceDescriptor);
   // A zygote that has already failed does not listen, and its own status says why.
   std::signal(SIGPIPE, SIG_IGN);
-  static_cast<void>(write(tether.launcherEnd, &layers, sizeof layers));
+  [[maybe_unused]] const ssize_t written = write(tether.launcherEnd, &layers, sizeof layers);
   outlive(zygote, awaited);
 }
 
