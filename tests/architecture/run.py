@@ -22,8 +22,9 @@ def check(sound, what):
 
 def sources(folder):
     return [path for path in sorted((root / folder).rglob("*"))
-            if path.suffix in (".h", ".cpp") and "_test" not in path.name
-            and "test_" not in path.name]
+            if path.suffix in (".h", ".cpp")
+            # The rooms that stand alone do so in their tests, too.
+            and (folder in ("text", "plist") or not re.search("_test|test_", path.name))]
 
 
 def included(folder):
