@@ -83,6 +83,8 @@ class Walk {
       return typeText<typename V::value_type>(section);
     } else if constexpr (isArray<V>) {
       return "[" + typeText<typename V::value_type>(section) + "]";
+    } else if constexpr (std::same_as<V, PropertyListValue>) {
+      return "propertyList";
     } else if constexpr (Enumeration<V>) {
       enterEnumeration<V>();
       return String(typeName<V>());
@@ -173,7 +175,7 @@ Description describeAll() {
   VespKeelgateService::MessageUnpackers::each([&]<class U>(std::type_identity<U>) {
     MessageUnpackerRow row{
         .record = typeName<typename U::SchemaType>(), .unpacker = typeName<U>(), .schema = {}};
-    if constexpr (requires { typename U::Schema; }) {
+    if constexpr (Schema<typename U::Schema>) {
       row.schema = typeName<typename U::Schema>();
       walk.enter<typename U::Schema>();
     }

@@ -69,9 +69,7 @@ String Tally::metrics() const {
   };
   add("record", records_);
   add("rejected", rejected_);
-  for (std::size_t i = 0; i < givenUp_.size(); ++i) {
-    add(JSON::nameOf(static_cast<Reason>(i)), givenUp_[i]);
-  }
+  for (const auto& [name, number] : casesOf<Reason>) add(name, givenUp_[number]);
   const auto addCounter = [&](std::string_view name, std::string_view help, UInt64 number) {
     text += fmt::format("# HELP keelgate_{0} {1}\n# TYPE keelgate_{0} counter\nkeelgate_{0} {2}\n",
                         name, help, number);

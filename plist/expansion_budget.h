@@ -29,7 +29,11 @@ class ExpansionBudget {
   /// To be called before `bytes` of memory, at least 1, are made from the value. Free unless the
   /// value is shared. Throws MalformedDocument(excessiveExpansion) when the allowance is used up.
   void spend(const Value& value, std::size_t bytes) {
-    if (!value.isShared()) return;
+    if (value.isShared()) take(value, bytes);
+  }
+
+  /// The same, whether the value is shared or not: for what is copied from parts of it that may be.
+  void take(const Value& value, std::size_t bytes) {
     // Compared before it is subtracted: an amount near 2^64 must not wrap.
     if (bytes > left_) throw MalformedDocument(Problem::excessiveExpansion, value.position());
     left_ -= bytes;

@@ -110,24 +110,35 @@ TEST(Decoding, NumbersFillTheFieldsThatHoldThemExactly) {
   const Dictionary base{{"kHearthdVersionKey", 1.5}, {"kHearthdSupportedFeaturesKey", Array{}}};
   const auto version = [&](Tree number) {
     const Dictionary capabilities = with({{"kHearthdVersionKey", std::move(number)}}, base);
-    return outcome(invitation,
-                   Dictionary{{"c", Dictionary{{"cS", "ht-invite-v1"},
-                                               {"cT", 1},
-                                               {"cD", Dictionary{{"kRequestedCapabilitiesKey",
-                                                                  capabilities}}}}},
-                              {"s", 1},
-                              {"uID", "u"}})
-        .starts_with(".context.schema=");
+    const std::string got = outcome(
+        invitation,
+        Dictionary{
+            {"c", Dictionary{{"cS", "ht-invite-v1"},
+                             {"cT", 1},
+                             {"cD", Dictionary{{"kRequestedCapabilitiesKey", capabilities}}}}},
+            {"s", 1},
+            {"uID", "u"}});
+    const std::size_t at = got.find("hearthdVersion=");
+    return at == std::string::npos ? got : got.substr(at + 15, got.find(' ', at) - at - 15);
+  };
+  const std::string place = "@c.cD.kRequestedCapabilitiesKey.kHearthdVersionKey";
+  // As itself with either sign, or as an error: never as a neighbour.
+  const auto expectExactly = [&](std::uint64_t magnitude, bool fits) {
+    const std::string text = std::to_string(magnitude) + ".000000";
+    EXPECT_EQ(version(magnitude), fits ? text : "dataCorrupted " + place);
+    if (magnitude == 0 || magnitude > std::uint64_t{1} << 63) return;
+    EXPECT_EQ(version(static_cast<std::int64_t>(0 - magnitude)),
+              fits ? "-" + text : "dataCorrupted " + place);
   };
   for (int bits = 0; bits < 64; ++bits) {
     const std::uint64_t power = std::uint64_t{1} << bits;
-    EXPECT_TRUE(version(power)) << "2^" << bits;
-    EXPECT_EQ(version(power + 1), bits <= 53 - (bits == 53)) << "2^" << bits << " + 1";
-    EXPECT_EQ(version(power - 1), bits <= 53) << "2^" << bits << " - 1";
+    expectExactly(power, true);
+    expectExactly(power + 1, bits < 53);
+    expectExactly(power - 1, bits <= 53);
   }
-  EXPECT_TRUE(version(std::numeric_limits<std::int64_t>::min()));
-  EXPECT_FALSE(version(std::numeric_limits<std::uint64_t>::max()));
-  EXPECT_FALSE(version(true));
+  expectExactly(std::numeric_limits<std::uint64_t>::max(), false);
+  EXPECT_EQ(version(-2.5), "-2.500000");
+  EXPECT_EQ(version(true), "typeMismatch " + place);
 }
 
 TEST(Routing, FindsTheServiceAndChecksTheCommandFirst) {

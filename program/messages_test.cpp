@@ -24,6 +24,8 @@ TEST(Sessions, TheCommandAloneSelectsTheSchema) {
       {"an offer sent as an accept", accept, offer,
        ".result.sessionAccept.version=2 .result.sessionAccept.sessionID=S "
        ".result.sessionAccept.participantID=P"},
+      {"unknown transport", {video, 232}, with({{"t", 3}}, offer), "dataCorrupted @t"},
+      {"unknown subcommand", reinitiate, with({{"ri", 4}}, triple), "dataCorrupted @ri"},
       {"unknown end reason", cancel, with({{"e", 77}}, triple), "dataCorrupted @e"},
       {"negative end reason", cancel, with({{"e", -1}}, triple), "dataCorrupted @e"},
       {"end reason as text", cancel, with({{"e", "4"}}, triple), "typeMismatch @e"},
@@ -139,6 +141,17 @@ TEST(Invitations, FailInTheOrderOfTheirFields) {
       {"a UUID without dashes", invitation,
        kind("ht-invite-v1", Dictionary{{"kHomeUUID", "0f8fad5bd9cb469fa16570867728950e"}}),
        "dataCorrupted @c.cD.kHomeUUID"},
+      {"a UUID with another dash", invitation,
+       kind("ht-invite-v1", Dictionary{{"kHomeUUID", "0f8fad5b-d9cb-469fa-1657-0867728950e1"}}),
+       "dataCorrupted @c.cD.kHomeUUID"},
+      {"a UUID with another letter", invitation,
+       kind("ht-invite-v1", Dictionary{{"kHomeUUID", "0f8fad5g-d9cb-469f-a165-70867728950e"}}),
+       "dataCorrupted @c.cD.kHomeUUID"},
+      {"a UUID in either case", invitation,
+       kind("ht-invite-v1", Dictionary{{"kHomeUUID", "0f8FAD5b-d9cb-469f-A165-70867728950e"}}),
+       ".context.schema=ht-invite-v1 .context.contextType=1 "
+       ".context.context.dictionary.vespHearthInvitation.homeUUID="
+       "15:143:173:91:217:203:70:159:161:101:112:134:119:40:149:14: .state=-5 .identifier=u"},
       {"an empty home token", invitation,
        kind("ht-invite-v1", Dictionary{{"HRDHomeInvitationShareTokenKey", data("")}}),
        token + "Empty sharing token"},
@@ -195,6 +208,7 @@ TEST(Invitations, TheStandardDecodersOfTheCaseKeyedFormWantExactlyOneKey) {
   EXPECT_EQ(decoded(form({})), "2 " + notOne);
   EXPECT_EQ(decoded(form({{"vespSampleInvitation", body}, {"vespHearthInvitation", body}})),
             "2 " + notOne);
+  EXPECT_EQ(decoded(form({{"vespOtherInvitation", body}})), "2 " + notOne);
   EXPECT_EQ(decoded(form({{"vespSampleInvitation", Dictionary{}}})),
             "3 No value associated with key \"_0\".");
 }
@@ -212,6 +226,7 @@ TEST(CheckIns, FoldTheirGroupsAndTolerateUnknownCodes) {
   EXPECT_EQ(unpacked({{"receiverHandle1", "x"}, {"receiverHandle33", 5}, {"shareURL02", "x"}}),
             plain);
   EXPECT_NE(unpacked({{"messageType", 12345}}).find("messageType=0"), std::string::npos);
+  EXPECT_NE(plain.find("messageType=2"), std::string::npos) << "a known code stays";
   EXPECT_EQ(plain.find("triggerType"), std::string::npos) << "absent is not the default";
   EXPECT_NE(unpacked({{"triggerType", 12345}}).find("triggerType=0"), std::string::npos);
   EXPECT_EQ(unpacked({{"triggerType", -1}}), "dataCorrupted @triggerType");

@@ -1,9 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The service's start-up against a framework of the test's own, which writes down every call.
+// The service's start-up against a server of the test's own, which writes down every call.
 #include "program/service/start_up.h"
-#include "framework/contracts/process.h"
-#include "framework/server/keelgate_server.h"
-#include "program/service/vesp_client_message_unpacker.h"
 
 #include <gtest/gtest.h>
 
@@ -16,51 +13,60 @@ std::vector<std::string> calls;
 
 }  // namespace
 
-namespace Keelgate {
-
-void register_for_dlsym_callbacks() noexcept {
+// In place of the framework's own, which are process-wide.
+void Keelgate::register_for_dlsym_callbacks() noexcept {
   calls.emplace_back("dlsym callbacks");
 }
-void Preferences::setDirectMode(int on) noexcept {
+void Keelgate::Preferences::setDirectMode(int on) noexcept {
   calls.push_back("direct " + std::to_string(on));
 }
-void Preferences::setReadOnly(int on) noexcept {
+void Keelgate::Preferences::setReadOnly(int on) noexcept {
   calls.push_back("read-only " + std::to_string(on));
 }
 
-KeelgateServer& KeelgateServer::service() {
-  static KeelgateServer server;
-  calls.emplace_back("server");
-  return server;
-}
-
-// A contextual handler goes by the context: it knows the service of an unknown one.
-void KeelgateServer::add(std::size_t record, Handler handler) {
-  std::string kind = "message";
-  try {
-    handler({.record = record, .message = {}, .command = 1, .service = "nobody"});
-  } catch (const VespKeelgateService::VespClientMessageUnpackingError& error) {
-    kind = "contextual, " + *error.service;
-  } catch (const DecodingError&) {
-    kind = "message";
-  }
-  calls.push_back("register " + std::to_string(record) + " " + kind);
-}
-
-void KeelgateServer::resume(Optional<SandboxID> sandboxID) {
-  calls.emplace_back(sandboxID == SandboxID::keelgate ? "resume keelgate" : "resume");
-}
-
-}  // namespace Keelgate
-
 namespace VespKeelgateService {
 
+namespace {
+
+class Server {
+ public:
+  static Server& service() {
+    static Server server;
+    calls.emplace_back("server");
+    return server;
+  }
+
+  template <class R, Keelgate::MessageUnpacker U>
+  void registerUnpacker(U) {
+    static_assert(std::same_as<typename U::SchemaType, R>);
+    calls.push_back(std::string(Keelgate::typeName<U>()) + " for " +
+                    std::string(Keelgate::typeName<R>()));
+  }
+  template <class R, Keelgate::ContextualUnpacker U>
+  void registerUnpacker(const U& unpacker) {
+    try {
+      unpacker.unpack({}, {.command = 1, .service = "nobody"});
+    } catch (const VespClientMessageUnpackingError& error) {
+      calls.push_back(std::string(Keelgate::typeName<U>()) + " without a service " +
+                      *error.service);
+    }
+  }
+
+  void resume(Optional<Keelgate::SandboxID> sandboxID) {
+    calls.emplace_back(sandboxID == Keelgate::SandboxID::keelgate ? "resume keelgate" : "resume");
+  }
+};
+
 TEST(StartUp, RunsInExactlyThisOrder) {
-  EXPECT_EQ(startUp(), 0);
-  EXPECT_EQ(calls, (std::vector<std::string>{"dlsym callbacks", "direct 1", "read-only 1", "server",
-                                             "register 0 message", "register 1 message",
-                                             "register 2 message", "register 3 message",
-                                             "register 4 contextual, nobody", "resume keelgate"}));
+  EXPECT_EQ(startUp<Server>(), 0);
+  EXPECT_EQ(calls, (std::vector<std::string>{
+                       "dlsym callbacks", "direct 1", "read-only 1", "server",
+                       "VespOstrelPayloadUnpacker for PulseUserPayload",
+                       "VespCommandResponseUnpacker for VespCommandResponse",
+                       "VespCommandWebTunnelResponseUnpacker for VespCommandWebTunnelResponse",
+                       "VespInvitationUnpacker for VespInvitation",
+                       "PropertyListUnpacker for PropertyList",
+                       "VespClientMessageUnpacker without a service nobody", "resume keelgate"}));
 }
 
 struct Unpacker {
@@ -74,5 +80,7 @@ TEST(StartUpDeathTest, TheSameServiceTwiceEndsTheProcess) {
   using Twice = Keelgate::TypeList<Service<"a", Unpacker>, Service<"a", Unpacker>>;
   EXPECT_DEATH(ServiceToUnpackerMap{Twice()}, "");
 }
+
+}  // namespace
 
 }  // namespace VespKeelgateService

@@ -42,6 +42,8 @@ void flatten(const std::string& path, const T& value, Fields& into) {
       flatten(path + "." + std::string(field.name), value.*field.member, into);
     });
     if (into.size() == before) into.push_back(path + "={}");
+  } else if constexpr (std::same_as<T, std::nullptr_t>) {
+    into.push_back(path + "=null");
   } else if constexpr (std::same_as<T, String>) {
     into.push_back(path + "=" + value);
   } else if constexpr (std::same_as<T, Data>) {

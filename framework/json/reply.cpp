@@ -23,30 +23,6 @@ using VespKeelgateService::VespClientMessageUnpackingError;
 constexpr std::size_t anyMessage = std::size_t{16} << 20;
 constexpr std::size_t perByte = 64;
 
-std::string_view nameOf(DecodingError::Kind kind) {
-  switch (kind) {
-    case DecodingError::Kind::keyNotFound:
-      return "keyNotFound";
-    case DecodingError::Kind::typeMismatch:
-      return "typeMismatch";
-    case DecodingError::Kind::valueNotFound:
-      return "valueNotFound";
-    case DecodingError::Kind::dataCorrupted:
-      return "dataCorrupted";
-  }
-  return {};
-}
-
-std::string_view nameOf(VespClientMessageUnpackingError::Case which) {
-  switch (which) {
-    case VespClientMessageUnpackingError::Case::unimplementedCommand:
-      return "unimplementedCommand";
-    case VespClientMessageUnpackingError::Case::noUnpackerForService:
-      return "noUnpackerForService";
-  }
-  return {};
-}
-
 /// What the user can do about it, where there is something.
 std::string_view advice(HostError::Reason reason) {
   switch (reason) {
@@ -90,7 +66,7 @@ void writeError(Writer& out, const VespClientMessageUnpackingError& error) {
 
 void writeError(Writer& out, const HostError& error) {
   writeField(out, "kind", "host");
-  writeField(out, "reason", JSON::nameOf(error.reason));
+  writeField(out, "reason", nameOf(error.reason));
   writeField(out, "description", error.description);
 }
 
@@ -159,24 +135,6 @@ class Answer {
 };
 
 }  // namespace
-
-std::string_view nameOf(HostError::Reason reason) {
-  switch (reason) {
-    case HostError::Reason::crashed:
-      return "crashed";
-    case HostError::Reason::timedOut:
-      return "timedOut";
-    case HostError::Reason::messageTooLarge:
-      return "messageTooLarge";
-    case HostError::Reason::resourcesExhausted:
-      return "resourcesExhausted";
-    case HostError::Reason::protocolViolation:
-      return "protocolViolation";
-    case HostError::Reason::startFailed:
-      return "startFailed";
-  }
-  return {};
-}
 
 const Array<std::string_view>& recordNames() {
   // Made once, which the language keeps safe from any thread.

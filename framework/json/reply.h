@@ -58,9 +58,6 @@ struct Form {
   Bool typed = false;
 };
 
-/// As replies spell it.
-std::string_view nameOf(HostError::Reason reason);
-
 /// Unpacks `message`, whose record has to be there, as JSON too, by the time limit. Never throws
 /// what the service threw: that is the reply. A record that has too much JSON for its message, or
 /// more than there is memory for, becomes the reply `resourcesExhausted`.

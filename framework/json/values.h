@@ -23,14 +23,19 @@ namespace Keelgate::JSON {
 void write(Writer& out, Date date);
 /// Upper-case.
 void write(Writer& out, const UUID& uuid);
+/// {"uid": N}, and above 64 bits the hexadecimal string.
+void write(Writer& out, const PropertyListUID& uid);
+/// As the value that it is: an object, an array (of a set too), a string, a number.
+void write(Writer& out, const PropertyListValue& value);
 
 /// Any value that a record can hold, records included.
 template <class T>
 void write(Writer& out, const T& value);
 
-/// The one record that is not an object of its fields: it is its case.
+/// The records that are not an object of their fields, but the one field: a case, a tree.
 template <class T>
-constexpr Bool isItsField = std::same_as<T, VespClientMessageResult>;
+constexpr Bool isItsField =
+    std::same_as<T, VespClientMessageResult> || std::same_as<T, PropertyList>;
 
 /// A member with its value; none where the value is absent.
 template <class T>

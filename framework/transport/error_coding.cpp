@@ -39,11 +39,11 @@ CodingKey readCodingKey(Reader& from) {
 }
 
 DecodingError readDecodingError(Reader& from) {
-  const std::uint8_t kind = from.byte();
-  if (kind > static_cast<std::uint8_t>(DecodingError::Kind::dataCorrupted)) throw MalformedReply();
+  const Optional<DecodingError::Kind> kind = fromRawValue<DecodingError::Kind>(from.byte());
+  if (!kind) throw MalformedReply();
   Optional<String> key = readOptional(from);
   // A key that is missing is named, and nothing else is.
-  if (key.has_value() != (DecodingError::Kind{kind} == DecodingError::Kind::keyNotFound)) {
+  if (key.has_value() != (kind == DecodingError::Kind::keyNotFound)) {
     throw MalformedReply();
   }
   const std::size_t steps = from.count(smallestStep);
@@ -53,7 +53,7 @@ DecodingError readDecodingError(Reader& from) {
   if (steps > 0) from.charge(steps * sizeof(CodingKey));
   path.reserve(steps);
   for (std::size_t i = 0; i < steps; ++i) path.push_back(readCodingKey(from));
-  return {DecodingError::Kind{kind}, std::move(key), std::move(path), from.text()};
+  return {*kind, std::move(key), std::move(path), from.text()};
 }
 
 Breach readBreach(Reader& from) {

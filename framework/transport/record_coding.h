@@ -12,6 +12,7 @@
 #include "framework/transport/wire.h"
 
 #include <keelgate/describe.h>
+#include <keelgate/records/property_list.h>
 
 #include <bit>
 #include <cmath>
@@ -42,7 +43,9 @@ requires(isArray<Array<T>>) void write(Writer& to, const Array<T>& values) {
 
 template <class T>
 void write(Writer& to, const T& value) {
-  if constexpr (std::same_as<T, Bool>) {
+  if constexpr (std::same_as<T, std::nullptr_t>) {
+    // Its case says it all.
+  } else if constexpr (std::same_as<T, Bool>) {
     to.byte(value ? 1 : 0);
   } else if constexpr (std::integral<T> || Enumeration<T>) {
     to.word(static_cast<std::uint64_t>(value));
@@ -57,7 +60,7 @@ void write(Writer& to, const T& value) {
   } else if constexpr (std::same_as<T, Data>) {
     to.octets(value);
   } else if constexpr (CaseKeyed<T>) {
-    // A byte is enough: the largest of these enumerations has eight cases.
+    // A byte is enough: the largest of these enumerations has twelve cases.
     to.byte(static_cast<std::uint8_t>(value.index()));
     std::visit([&](const auto& payload) { write(to, payload); }, value);
   } else {
@@ -67,10 +70,14 @@ void write(Writer& to, const T& value) {
 
 // ---------------------------------------------------------------------------------- reading
 
-/// Property lists nest 512 containers, and a payload inside a payload takes two of them: 256
-/// payloads, and one record more inside the last. A lying service must not get any deeper into the
-/// client's stack than an honest one.
-constexpr int maximumDepth = 257;
+/// Property lists nest 512 containers, and what is read here has nested in one. A lying service
+/// must not get any deeper into the client's stack than an honest one.
+constexpr int maximumNesting = 512;
+
+/// How many containers an array of such values takes at each level: itself, and around the fields
+/// of a record their dictionary.
+template <class T>
+constexpr int containersOf = Record<T> && !std::same_as<T, PropertyListEntry> ? 2 : 1;
 
 /// The fewest bytes that a value is written as: a count is held against them before room is made.
 template <class T>
@@ -100,12 +107,15 @@ template <class T>
 requires(isArray<Array<T>>) void read(Reader& from, Array<T>& values, int depth) {
   const std::size_t count = from.count(smallestSize<T>());
   if (count == 0) return;
+  // Only through an array can a value hold another of its own kind.
+  const int inside = depth + containersOf<T>;
+  if (inside > maximumNesting) throw MalformedReply();
   // In one block, which is charged before it is there: a list that grows holds two of them.
   from.charge(count * sizeof(T));
   values.reserve(count);
   // Made in place: a temporary payload takes 4 KB of stack at every level of nesting, and the
   // application may call from a thread with little.
-  for (std::size_t i = 0; i < count; ++i) read(from, values.emplace_back(), depth);
+  for (std::size_t i = 0; i < count; ++i) read(from, values.emplace_back(), inside);
 }
 
 /// The case that the byte names; a byte that names none is a lie.
@@ -117,19 +127,19 @@ void readCase(Reader& from, T& value, int depth, std::index_sequence<i...>) {
   if (!known) throw MalformedReply();
 }
 
-/// Only records count as depth: only through one of them can a value hold another of its own kind.
 template <class T>
 void readRecord(Reader& from, T& value, int depth) {
   static_assert(T::Labels::isComplete(), "a member of the record is not in its list of fields");
-  if (depth >= maximumDepth) throw MalformedReply();
-  FieldsOf<T>::each([&](auto field) { read(from, value.*field.member, depth + 1); });
+  FieldsOf<T>::each([&](auto field) { read(from, value.*field.member, depth); });
   // What the framework refuses in the service is refused here too.
   admit(typeName<T>());
 }
 
 template <class T>
 void read(Reader& from, T& value, int depth) {
-  if constexpr (std::same_as<T, Bool>) {
+  if constexpr (std::same_as<T, std::nullptr_t>) {
+    value = nullptr;
+  } else if constexpr (std::same_as<T, Bool>) {
     value = from.flag();
   } else if constexpr (std::integral<T>) {
     value = static_cast<T>(from.word());

@@ -136,6 +136,18 @@ class FieldList {
            !decltype(Detail::takesMore<S>(All(), 0))::value;
   }
 
+  /// The key of one member.
+  template <class V>
+  static constexpr std::string_view keyOf(V S::*member) {
+    std::string_view key;
+    each([&]<class Value>(Field<S, Value> field) {
+      if constexpr (std::same_as<V, Value>) {
+        if (field.member == member) key = field.key;
+      }
+    });
+    return key;
+  }
+
   /// The names, and the keys, in declaration order. As arrays, for tables and comparisons that are
   /// made at compile time.
   static constexpr std::array<std::string_view, size> names = [] {

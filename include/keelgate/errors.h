@@ -10,6 +10,7 @@
 #pragma once
 
 #include <keelgate/command_type.h>
+#include <keelgate/enumeration.h>
 #include <keelgate/export.h>
 #include <keelgate/values.h>
 
@@ -40,17 +41,16 @@ using CodingKey = std::variant<String, std::size_t>;
 /// The message does not have the form that its schema demands.
 class KEELGATE_API DecodingError : public Error {
  public:
-  enum class Kind : std::uint8_t {
-    /// A required key is missing: `key` names it, `codingPath` leads to the dictionary without it.
-    keyNotFound,
-    /// A value has another type than its field; `codingPath` leads to the value.
-    typeMismatch,
-    /// A null stands where a value is required; `codingPath` leads to it.
-    valueNotFound,
-    /// The bytes are no well-formed property list (`codingPath` is empty), or a value of the right
-    /// type is none that its field accepts (`codingPath` leads to it).
-    dataCorrupted,
-  };
+  KEELGATE_NESTED_ENUMERATION(Kind, std::uint8_t,
+      /// A required key is missing: `key` names it, `codingPath` leads to the dictionary without it.
+      (keyNotFound, 0),
+      /// A value has another type than its field; `codingPath` leads to the value.
+      (typeMismatch, 1),
+      /// A null stands where a value is required; `codingPath` leads to it.
+      (valueNotFound, 2),
+      /// The bytes are no well-formed property list (`codingPath` is empty), or a value of the right
+      /// type is none that its field accepts (`codingPath` leads to it).
+      (dataCorrupted, 3));
 
   /// For whoever decodes, or reads a decoded reply; applications only receive it.
   DecodingError(Kind itsKind, Optional<String> itsKey, Array<CodingKey> itsPath,
@@ -85,20 +85,19 @@ class KEELGATE_API HostError : public Error {
  public:
   /// For programs, which may treat them differently: timedOut and crashed say nothing of the next
   /// message, startFailed does.
-  enum class Reason : std::uint8_t {
-    /// The process that held the message died.
-    crashed,
-    /// No answer within the time limit.
-    timedOut,
-    /// The message is larger than the client's limit; it was not sent.
-    messageTooLarge,
-    /// Decoding needed more memory than the message's size justifies.
-    resourcesExhausted,
-    /// The service answered with something that is no answer.
-    protocolViolation,
-    /// The service could not be started, or cannot be sealed on this system.
-    startFailed,
-  };
+  KEELGATE_NESTED_ENUMERATION(Reason, std::uint8_t,
+      /// The process that held the message died.
+      (crashed, 0),
+      /// No answer within the time limit.
+      (timedOut, 1),
+      /// The message is larger than the client's limit; it was not sent.
+      (messageTooLarge, 2),
+      /// Decoding needed more memory than the message's size justifies.
+      (resourcesExhausted, 3),
+      /// The service answered with something that is no answer.
+      (protocolViolation, 4),
+      /// The service could not be started, or cannot be sealed on this system.
+      (startFailed, 5));
 
   /// An empty description stands for the reason's own sentence.
   HostError(Reason itsReason, String itsDescription);
@@ -115,12 +114,11 @@ namespace VespKeelgateService {
 /// The program has no unpacker for the message. Nothing of the message was decoded.
 class KEELGATE_API VespClientMessageUnpackingError : public Keelgate::Error {
  public:
-  enum class Case : std::uint8_t {
-    /// `command` is known to the framework, and the service has no schema for it.
-    unimplementedCommand,
-    /// No unpacker serves `service`, which is the identifier as it was received.
-    noUnpackerForService,
-  };
+  KEELGATE_NESTED_ENUMERATION(Case, std::uint8_t,
+      /// `command` is known to the framework, and the service has no schema for it.
+      (unimplementedCommand, 0),
+      /// No unpacker serves `service`, which is the identifier as it was received.
+      (noUnpackerForService, 1));
 
   /// The only ways to make one, so that each case comes with its own field.
   static VespClientMessageUnpackingError unimplementedCommand(Keelgate::CommandType command);

@@ -6,6 +6,7 @@
 /// optionals. All of them are plain values that own what they hold.
 #pragma once
 
+#include <keelgate/records/property_list.h>
 #include <keelgate/records/pulse_user_payload.h>
 #include <keelgate/records/vesp_client_message_result.h>
 #include <keelgate/records/vesp_command_response.h>
@@ -32,7 +33,7 @@ struct TypeList {
 /// The output records. The position of a record in the list is its number in the protocol between
 /// client and service, which are always of the same build.
 using OutputRecords = TypeList<PulseUserPayload, VespCommandResponse, VespCommandWebTunnelResponse,
-                               VespInvitation, VespClientMessageResult>;
+                               VespInvitation, PropertyList, VespClientMessageResult>;
 
 namespace Detail {
 // The fold stops at the type; a type that is not in the list has its length for position.

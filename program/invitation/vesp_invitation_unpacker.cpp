@@ -16,9 +16,12 @@ using Keelgate::VespInvitationContext;
 
 namespace {
 
+using Keys = VespInvitationContextSchema::CodingKeys;
+
 template <class Payload>
 VespDictionaryContextData decodeKind(const KeyedContainer& container) {
-  return VespDictionaryContextClientSchema(container.decode<Payload>("cD"));
+  return VespDictionaryContextClientSchema(
+      container.decode<Payload>(Keys::keyOf(&VespInvitationContextSchema::contextData)));
 }
 
 /// A row of the table that chooses the kind.
@@ -50,8 +53,8 @@ VespDictionaryContextData decodeContextData(const String& schema, const KeyedCon
 
 VespInvitationContextSchema VespInvitationContextSchema::decode(const KeyedContainer& container) {
   // The order decides which error a message with several faults gives.
-  auto schema = container.decode<String>("cS");
-  const auto contextType = container.decode<VespInvitationContextType>("cT");
+  auto schema = container.decode(&VespInvitationContextSchema::schema);
+  const auto contextType = container.decode(&VespInvitationContextSchema::contextType);
   auto contextData = decodeContextData(schema, container);
   return {.schema = std::move(schema),
           .contextType = contextType,

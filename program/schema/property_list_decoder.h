@@ -70,6 +70,12 @@ class KeyedContainer {
     throw Errors::keyNotFound(path_, key);
   }
 
+  /// The same for a field under the key that its schema gives it.
+  template <Keelgate::Schema S, class T>
+  [[nodiscard]] T decode(T S::*field) const {
+    return decode<T>(S::CodingKeys::keyOf(field));
+  }
+
   /// The dictionary, and where it stands.
   [[nodiscard]] const PropertyList::Value& value() const { return value_; }
   [[nodiscard]] const CodingPath& path() const { return path_; }
@@ -206,13 +212,22 @@ class PropertyListDecoder {
   /// Throws DecodingError and std::bad_alloc. The schema owns all that it holds: the bytes may go.
   template <Keelgate::Schema S>
   [[nodiscard]] S decode(Keelgate::Bytes from) {
+    S schema{};
+    read(from, [&](Decoding& decoding, const PropertyList::Value& top) {
+      decodeSchema(decoding, top, CodingPath(), schema);
+    });
+    return schema;
+  }
+
+  /// Calls `body(decoding, top)` with the checked document's top value, which lives as long as the
+  /// call. What it throws comes through, and a message without a sound document as DecodingError.
+  template <class Body>
+  void read(Keelgate::Bytes from, Body&& body) {
     try {
       const PropertyList::Document document(from);
       PropertyList::ExpansionBudget budget(from.size());
       Decoding decoding{budget};
-      S schema{};
-      decodeSchema(decoding, document.top(), CodingPath(), schema);
-      return schema;
+      body(decoding, document.top());
     } catch (const PropertyList::MalformedDocument& error) {
       // From the check of the document, or from the budget while fields are read.
       throw Errors::malformed(error, from);

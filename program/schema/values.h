@@ -23,6 +23,9 @@ using Keelgate::UInt;
 using Keelgate::UInt64;
 using Keelgate::UUID;
 
+/// Stands where a schema would, of a message that is not decoded by one.
+struct NoSchema {};
+
 /// A dictionary as a schema that decodes itself sees it.
 class KeyedContainer;
 

@@ -3,5 +3,5 @@
 
 // Deliberate: it takes no arguments. There is nothing that a caller could switch off.
 int main() {
-  return VespKeelgateService::startUp();
+  return VespKeelgateService::startUp<>();
 }

@@ -9,8 +9,9 @@
 #include "program/payload/vesp_command_response_unpacker.h"
 #include "program/payload/vesp_command_web_tunnel_response_unpacker.h"
 #include "program/payload/vesp_ostrel_payload_unpacker.h"
+#include "program/property_list/property_list_unpacker.h"
 #include "program/service/vesp_sample_message_unpacker.h"
-#include "program/service/vesp_service_unpacker.h"
+#include "program/service_unpacker/vesp_service_unpacker.h"
 #include "program/session/viso_audio_video_message_unpacker.h"
 #include "program/session/viso_live_photo_message_unpacker.h"
 #include "program/waymark/waymark_message_unpacker.h"
@@ -18,9 +19,9 @@
 namespace VespKeelgateService {
 
 /// By the record that is asked for, in the order of registration.
-using MessageUnpackers =
-    Keelgate::TypeList<VespOstrelPayloadUnpacker, VespCommandResponseUnpacker,
-                       VespCommandWebTunnelResponseUnpacker, VespInvitationUnpacker>;
+using MessageUnpackers = Keelgate::TypeList<VespOstrelPayloadUnpacker, VespCommandResponseUnpacker,
+                                            VespCommandWebTunnelResponseUnpacker,
+                                            VespInvitationUnpacker, PropertyListUnpacker>;
 
 /// By the service that a client message arrived under. Identifiers are compared exactly, with
 /// regard to case.

@@ -2,7 +2,7 @@
 /// Routes a client message to the unpacker of the service that it arrived under.
 #pragma once
 
-#include "program/service/vesp_service_unpacker.h"
+#include "program/service_unpacker/vesp_service_unpacker.h"
 
 #include <functional>
 #include <map>

@@ -3,7 +3,7 @@
 #pragma once
 
 #include "program/service/vesp_sample_message_schema.h"
-#include "program/service/vesp_service_unpacker.h"
+#include "program/service_unpacker/vesp_service_unpacker.h"
 
 namespace VespKeelgateService {
 

@@ -3,7 +3,7 @@
 /// schema; which of the two services a message came from makes no difference.
 #pragma once
 
-#include "program/service/vesp_service_unpacker.h"
+#include "program/service_unpacker/vesp_service_unpacker.h"
 #include "program/session/vesp_session_schemas.h"
 
 namespace VespKeelgateService {
@@ -12,16 +12,19 @@ namespace VespKeelgateService {
 struct VisoAudioVideoMessageUnpacker {
   using SchemaType = VespClientMessageResult;
   using Context = VespClientMessageContext;
-  using Commands =
-      Keelgate::TypeList<On<232, VespSessionInvitationSchema, Keelgate::VespSessionInvitation>,
-                         On<233, VespSessionAcceptSchema, Keelgate::VespSessionAccept>,
-                         On<234, VespSessionDeclineSchema, Keelgate::VespSessionDecline>,
-                         On<235, VespSessionCancelSchema, Keelgate::VespSessionCancel>,
-                         // Deliberate: 236 is a gap. Like every number without a row it is refused
-                         // as unimplemented. Deliberate: 237 declines too; nothing records which of
-                         // the two numbers was used.
-                         On<237, VespSessionDeclineSchema, Keelgate::VespSessionDecline>,
-                         On<238, VespSessionReinitiateSchema, Keelgate::VespSessionReinitiate>>;
+  using Commands = Keelgate::TypeList<
+      On<CommandType::Case::sessionInvitation, VespSessionInvitationSchema,
+         Keelgate::VespSessionInvitation>,
+      On<CommandType::Case::sessionAccept, VespSessionAcceptSchema, Keelgate::VespSessionAccept>,
+      On<CommandType::Case::sessionDecline, VespSessionDeclineSchema, Keelgate::VespSessionDecline>,
+      On<CommandType::Case::sessionCancel, VespSessionCancelSchema, Keelgate::VespSessionCancel>,
+      // Deliberate: sessionMessage (236) is a gap. Like every number without a row it is refused
+      // as unimplemented. Deliberate: sessionDeclineElsewhere declines too; nothing records which
+      // of the two numbers was used.
+      On<CommandType::Case::sessionDeclineElsewhere, VespSessionDeclineSchema,
+         Keelgate::VespSessionDecline>,
+      On<CommandType::Case::sessionReinitiate, VespSessionReinitiateSchema,
+         Keelgate::VespSessionReinitiate>>;
 
   /// Throws Breach for an unknown command, VespClientMessageUnpackingError for one without a row,
   /// and DecodingError.

@@ -3,7 +3,7 @@
 /// nothing of their content crosses the sandbox's wall.
 #pragma once
 
-#include "program/service/vesp_service_unpacker.h"
+#include "program/service_unpacker/vesp_service_unpacker.h"
 
 namespace VespKeelgateService {
 
@@ -11,7 +11,8 @@ namespace VespKeelgateService {
 struct VisoLivePhotoMessageUnpacker {
   using SchemaType = VespClientMessageResult;
   using Context = VespClientMessageContext;
-  using Commands = Keelgate::TypeList<On<245, NoSchema, Keelgate::VespRestrictedMessage>>;
+  using Commands = Keelgate::TypeList<
+      On<CommandType::Case::livePhoto, NoSchema, Keelgate::VespRestrictedMessage>>;
 
   /// Deliberate: any bytes will do, none and damaged ones too. Throws Breach for an unknown
   /// command, and VespClientMessageUnpackingError for any other than the table's.

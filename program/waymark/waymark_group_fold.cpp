@@ -5,7 +5,7 @@
 
 #include "framework/contracts/construct.h"
 
-#include <map>
+#include <array>
 #include <string_view>
 #include <utility>
 
@@ -33,7 +33,7 @@ constexpr bool isDigit(char c) {
 }
 
 /// The number at the end of a field's name; the unnumbered field of a family has none.
-Optional<UInt> groupNumber(std::string_view name) {
+constexpr Optional<UInt> groupNumber(std::string_view name) {
   std::size_t digits = name.size();
   while (digits > 0 && isDigit(name[digits - 1])) --digits;
   if (digits == name.size()) return std::nullopt;
@@ -42,52 +42,51 @@ Optional<UInt> groupNumber(std::string_view name) {
   return number;
 }
 
-class GroupMap {
- public:
-  template <class V>
-  void visit(std::string_view name, V& value) {
+/// Where a field of a check-in goes: to a field of a group, or nowhere.
+struct Place {
+  UInt group = 0;
+  Optional<String> WaymarkGroupFields::*member = nullptr;
+};
+
+/// By the position of the field; made by the compiler.
+constexpr auto places = [] {
+  constexpr auto& names = WaymarkSchema::CodingKeys::names;
+  std::array<Place, names.size()> all{};
+  for (std::size_t i = 0; i < names.size(); ++i) {
     for (const Family& family : families) {
-      if (!name.starts_with(family.prefix)) continue;
-      const Optional<UInt> number = groupNumber(name);
+      if (!names[i].starts_with(family.prefix)) continue;
       // The unnumbered field is the first group, which lives in the message's own record.
-      if (!number) continue;
-      // Always so for a numbered field. The others only have to compile.
-      if constexpr (std::same_as<V, Optional<String>>) {
-        group(*number).*family.member = std::move(value);
-      }
+      const Optional<UInt> number = groupNumber(names[i]);
+      if (number) all[i] = {*number, family.member};
     }
   }
-
-  Array<WaymarkGroupFields> values() && {
-    Array<WaymarkGroupFields> values;
-    values.reserve(groups_.size());
-    for (auto& [number, group] : groups_) values.push_back(std::move(group));
-    return values;
-  }
-
- private:
-  // Made at the first sight of its number, value or not: every message gives all 31.
-  WaymarkGroupFields& group(UInt number) {
-    const auto known = groups_.find(number);
-    if (known != groups_.end()) return known->second;
-    auto empty = Keelgate::construct<WaymarkGroupFields>({.groupNumber = number,
-                                                          .receiverHandle = {},
-                                                          .sharingInvitationData = {},
-                                                          .shareURL = {},
-                                                          .participantID = {}});
-    return groups_.emplace(number, std::move(empty)).first->second;
-  }
-
-  std::map<UInt, WaymarkGroupFields> groups_;
-};
+  return all;
+}();
 
 }  // namespace
 
 Array<WaymarkGroupFields> foldGroups(WaymarkSchema& schema) {
-  GroupMap groups;
-  WaymarkSchema::CodingKeys::each(
-      [&](auto field) { groups.visit(field.name, schema.*field.member); });
-  return std::move(groups).values();
+  constexpr UInt first = 2;
+  constexpr UInt last = 32;
+  Array<WaymarkGroupFields> groups;
+  groups.reserve(last - first + 1);
+  for (UInt number = first; number <= last; ++number) {
+    groups.push_back(Keelgate::construct<WaymarkGroupFields>({.groupNumber = number,
+                                                              .receiverHandle = {},
+                                                              .sharingInvitationData = {},
+                                                              .shareURL = {},
+                                                              .participantID = {}}));
+  }
+  std::size_t position = 0;
+  WaymarkSchema::CodingKeys::each([&](auto field) {
+    const Place& place = places[position++];
+    // Always so for a field that has a place. The others only have to compile.
+    if constexpr (std::same_as<typename decltype(field)::Value, Optional<String>>) {
+      if (place.member == nullptr) return;
+      groups[place.group - first].*place.member = std::move(schema.*field.member);
+    }
+  });
+  return groups;
 }
 
 }  // namespace VespKeelgateService

@@ -8,9 +8,8 @@
 
 namespace VespKeelgateService {
 
-/// The groups 2 to 32, each exactly once, also where all their fields are absent. The order carries
-/// no meaning. Empties the numbered fields of the schema. Throws what the constructor of
-/// WaymarkGroupFields throws.
+/// The groups 2 to 32, each exactly once, also where all their fields are absent. Empties the
+/// numbered fields of the schema. Throws what the constructor of WaymarkGroupFields throws.
 Array<Keelgate::WaymarkGroupFields> foldGroups(WaymarkSchema& schema);
 
 }  // namespace VespKeelgateService

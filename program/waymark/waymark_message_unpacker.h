@@ -2,7 +2,7 @@
 /// Safety check-ins. Every known command of the service carries the same message.
 #pragma once
 
-#include "program/service/vesp_service_unpacker.h"
+#include "program/service_unpacker/vesp_service_unpacker.h"
 #include "program/waymark/waymark_schema.h"
 
 namespace VespKeelgateService {

@@ -43,20 +43,13 @@ inline Client::Options fakeOptions(const String& manner = "honest") {
   return options;
 }
 
-inline const char* nameOf(HostError::Reason reason) {
-  constexpr const char* names[] = {"crashed",           "timedOut",
-                                   "messageTooLarge",   "resourcesExhausted",
-                                   "protocolViolation", "startFailed"};
-  return names[static_cast<std::size_t>(reason)];
-}
-
 /// "record N", "decoding", "breach", or the reason of the host.
 template <class Call>
 String outcomeOf(Call call) {
   try {
     return "record " + std::to_string(call());
   } catch (const HostError& error) {
-    return nameOf(error.reason);
+    return String(nameOf(error.reason));
   } catch (const DecodingError&) {
     return "decoding";
   } catch (const Breach&) {

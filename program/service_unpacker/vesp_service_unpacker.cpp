@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "program/service/vesp_service_unpacker.h"
+#include "program/service_unpacker/vesp_service_unpacker.h"
 
 #include "framework/contracts/log.h"
 

@@ -29,11 +29,10 @@ concept VespServiceUnpacker = Keelgate::ContextualUnpacker<U> &&
   typename U::Commands;
 };
 
-/// A row of a command table: this command is decoded as S and gives an R. Being known to the
-/// framework is checked before any table is asked.
-template <UInt64 number, class S, class R>
+/// A row of a command table: this command is decoded as S and gives an R.
+template <CommandType::Case known, class S, class R>
 struct On {
-  static constexpr Optional<UInt64> command = number;
+  static constexpr Optional<UInt64> command = CommandType(known).rawValue();
   using Schema = S;
   using Record = R;
 };
@@ -45,9 +44,6 @@ struct OnAnyCommand {
   using Schema = S;
   using Record = R;
 };
-
-/// In a row whose message is answered without being decoded.
-struct NoSchema {};
 
 /// The identifier of a row as a template argument, which a string literal by itself cannot be.
 template <std::size_t n>

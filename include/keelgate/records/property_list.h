@@ -1,0 +1,69 @@
+// SPDX-License-Identifier: Apache-2.0
+/// The record of any property list: the tree that the message is. Values that own all that they
+/// hold; separate ones may be used from separate threads.
+///
+/// Containers nest at most 512 deep. Whoever walks a tree by recursion needs a stack for that. To
+/// copy, compare or destroy one is such a walk: some 200 KB.
+#pragma once
+
+#include <keelgate/describe.h>
+#include <keelgate/values.h>
+
+#include <cstddef>
+
+namespace Keelgate {
+
+struct PropertyListValue;
+struct PropertyListEntry;
+
+/// An unordered collection, in the order of the message.
+struct PropertyListSet {
+  KEELGATE_RECORD(PropertyListSet,
+      (Array<PropertyListValue>, elements));
+
+  bool operator==(const PropertyListSet& other) const = default;
+};
+
+/// A number of 128 bits that names something within the document.
+struct PropertyListUID {
+  KEELGATE_RECORD(PropertyListUID,
+      (UInt64, high),
+      (UInt64, low));
+
+  bool operator==(const PropertyListUID&) const = default;
+};
+
+/// One value, with everything below it. The entries of a dictionary stand in the order of the
+/// message, and no key stands twice. An integer is the second kind only above the largest Int64.
+KEELGATE_CASES(PropertyListValue,
+    (std::nullptr_t, null),
+    (Bool, boolean),
+    (Int64, integer),
+    (UInt64, integer),
+    (Double, real),
+    (Date, date),
+    (String, string),
+    (Data, data),
+    (PropertyListUID, uid),
+    (Array<PropertyListValue>, array),
+    (PropertyListSet, set),
+    (Array<PropertyListEntry>, dictionary));
+
+/// What a dictionary holds under one key.
+struct PropertyListEntry {
+  KEELGATE_RECORD(PropertyListEntry,
+      (String, key),
+      (PropertyListValue, value));
+
+  bool operator==(const PropertyListEntry&) const = default;
+};
+
+/// A whole document. Its form has been checked, and nothing is known of its meaning.
+struct PropertyList {
+  KEELGATE_RECORD(PropertyList,
+      (PropertyListValue, value));
+
+  bool operator==(const PropertyList&) const = default;
+};
+
+}  // namespace Keelgate

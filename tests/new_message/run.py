@@ -1,0 +1,135 @@
+#!/usr/bin/env python3
+# SPDX-License-Identifier: Apache-2.0
+"""Adds a throw-away kind of message to a copy of the tree, by the five steps of CONTRIBUTING.md and
+nothing else, builds the copy and unpacks a message of that kind through its service.
+
+usage: run.py ROOT FOLDER [cmake arguments]
+"""
+import json
+import pathlib
+import shutil
+import subprocess
+import sys
+
+root, copy = pathlib.Path(sys.argv[1]), pathlib.Path(sys.argv[2])
+LICENCE = "// SPDX-License-Identifier: Apache-2.0\n"
+
+FILES = {
+    "include/keelgate/records/vesp_weather.h": """#pragma once
+
+#include <keelgate/describe.h>
+#include <keelgate/values.h>
+
+namespace Keelgate {
+
+struct VespWeather {
+  KEELGATE_RECORD(VespWeather,
+      (String, place),
+      (Optional<Double>, degrees));
+};
+
+}  // namespace Keelgate
+""",
+    "program/weather/vesp_weather_schema.h": """#pragma once
+
+#include "program/schema/values.h"
+
+#include <keelgate/describe.h>
+
+namespace VespKeelgateService {
+
+struct VespWeatherSchema {
+  KEELGATE_SCHEMA(VespWeatherSchema,
+      (String, place, "p"),
+      (Optional<Double>, degrees, "d"));
+};
+
+}  // namespace VespKeelgateService
+""",
+    "program/weather/vesp_weather_unpacker.h": """#pragma once
+
+#include "program/weather/vesp_weather_schema.h"
+
+#include <keelgate/records/vesp_weather.h>
+
+namespace VespKeelgateService {
+
+struct VespWeatherUnpacker {
+  using SchemaType = Keelgate::VespWeather;
+  using Schema = VespWeatherSchema;
+
+  SchemaType unpack(Bytes from) const;
+};
+
+}  // namespace VespKeelgateService
+""",
+    "program/weather/vesp_weather_unpacker.cpp": """#include "program/weather/vesp_weather_unpacker.h"
+
+#include "framework/contracts/construct.h"
+#include "program/schema/field_by_field.h"
+#include "program/schema/property_list_decoder.h"
+
+namespace VespKeelgateService {
+
+Keelgate::VespWeather VespWeatherUnpacker::unpack(Bytes from) const {
+  auto schema = PropertyListDecoder().decode<Schema>(from);
+  return Keelgate::construct(fieldByField<Keelgate::VespWeather>(std::move(schema)));
+}
+
+}  // namespace VespKeelgateService
+""",
+}
+
+# A file, what stands there, and what takes its place.
+EDITS = [
+    ("include/keelgate/records.h", "#include <keelgate/records/vesp_invitation.h>\n",
+     "#include <keelgate/records/vesp_invitation.h>\n#include <keelgate/records/vesp_weather.h>\n"),
+    ("include/keelgate/records.h", "(VespInvitation)", "(VespInvitation), (VespWeather)"),
+    ("program/service/tables.h", "PropertyListUnpacker>",
+     "PropertyListUnpacker, VespWeatherUnpacker>"),
+    ("program/service/tables.h", '#include "program/waymark/waymark_message_unpacker.h"\n',
+     '#include "program/waymark/waymark_message_unpacker.h"\n'
+     '#include "program/weather/vesp_weather_unpacker.h"\n'),
+    ("program/CMakeLists.txt", "keelgate_library(program\n",
+     "keelgate_library(weather SOURCES weather/vesp_weather_unpacker.cpp\n"
+     "  PUBLIC Keelgate::contracts Keelgate::schema)\nkeelgate_library(program\n"),
+    ("program/CMakeLists.txt", "Keelgate::property_list Keelgate::server",
+     "Keelgate::property_list Keelgate::weather Keelgate::server"),
+]
+
+MESSAGE = "<plist><dict><key>p</key><string>Ulm</string><key>d</key><real>-2.5</real></dict></plist>"
+EXPECTED = {"record": "VespWeather", "value": {"place": "Ulm", "degrees": -2.5}}
+
+
+def run(*command, **options):
+    done = subprocess.run([str(part) for part in command], capture_output=True, text=True, **options)
+    if done.returncode != 0:
+        sys.exit(f"{command}\n{done.stdout[-4000:]}{done.stderr[-4000:]}")
+    return done.stdout
+
+
+shutil.rmtree(copy, ignore_errors=True)
+for name in run("git", "-C", root, "ls-files", "-co", "--exclude-standard").splitlines():
+    if (root / name).is_file():
+        (copy / name).parent.mkdir(parents=True, exist_ok=True)
+        shutil.copy2(root / name, copy / name)
+for name, text in FILES.items():
+    (copy / name).parent.mkdir(parents=True, exist_ok=True)
+    (copy / name).write_text(LICENCE + text)
+for name, there, then in EDITS:
+    text = (copy / name).read_text()
+    if text.count(there) != 1:
+        sys.exit(f"{name} no longer has: {there}")
+    (copy / name).write_text(text.replace(there, then))
+
+build = copy / "build"
+run("cmake", "-S", copy, "-B", build, "-G", "Ninja", "-DCMAKE_BUILD_TYPE=Debug",
+    "-DKEELGATE_TESTS=OFF", *sys.argv[3:])
+run("cmake", "--build", build, "--target", "keelgate", "VespKeelgateService")
+keelgate = build / "bin/keelgate"
+told = json.loads(run(keelgate, "unpack", "--record", "VespWeather", "-", input=MESSAGE))
+described = json.loads(run(keelgate, "describe", "VespWeatherSchema", "--json"))
+keys = [field["key"] for field in described["schemas"]["VespWeatherSchema"]]
+if told != EXPECTED or keys != ["p", "d"]:
+    sys.exit(f"the message gave {told}, and its keys are {keys}")
+print("the new kind of message is unpacked and described")
