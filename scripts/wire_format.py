@@ -47,7 +47,7 @@ def page(what):
     known = set(what["schemas"]) | set(what["records"])
     out = [INTRODUCTION, "## Record types\n",
            table(["record", "schema", "unpacker"],
-                 [[linked(row["record"], known), linked(row["schema"], known),
+                 [[linked(row["record"], known), linked(row["schema"], known) if "schema" in row else "any",
                    code(row["unpacker"])] for row in what["messageUnpackers"]]),
            "## Services\n",
            "A client message arrives under a service with a command, and gives a\n"

@@ -22,7 +22,7 @@
 
 namespace Keelgate::Fuzz {
 
-using PropertyList::Tree;
+using ::PropertyList::Tree;
 
 /// A place that a message can be sent to.
 struct Target {
@@ -47,32 +47,32 @@ inline Tree anything(Choices& choices, int depth) {
       return std::isnan(number) ? std::numeric_limits<double>::quiet_NaN() : number;
     }
     case 4:
-      return PropertyList::Date{static_cast<double>(choices.number() >> 30)};
+      return ::PropertyList::Date{static_cast<double>(choices.number() >> 30)};
     case 5:
-      return PropertyList::Data(choices.below(70), std::byte{choices.byte()});
+      return ::PropertyList::Data(choices.below(70), std::byte{choices.byte()});
     case 6:
-      return choices.rarely(2) ? Tree(nullptr) : Tree(PropertyList::Uid{choices.number()});
+      return choices.rarely(2) ? Tree(nullptr) : Tree(::PropertyList::Uid{choices.number()});
     case 7:
       return "";
     case 8:
     case 9:
       return choices.text();
     case 10: {
-      PropertyList::Set set;
+      ::PropertyList::Set set;
       for (std::size_t n = choices.below(4); n > 0; --n) {
         set.elements.push_back(anything(choices, depth + 1));
       }
       return set;
     }
     case 11: {
-      PropertyList::Array array;
+      ::PropertyList::Array array;
       for (std::size_t n = choices.below(20); n > 0; --n) {
         array.push_back(anything(choices, depth + 1));
       }
       return array;
     }
     default: {
-      PropertyList::Dictionary entries;
+      ::PropertyList::Dictionary entries;
       for (std::size_t n = choices.below(20); n > 0; --n) {
         std::string key = choices.text();
         entries.emplace_back(std::move(key), anything(choices, depth + 1));
@@ -87,7 +87,7 @@ Tree valueFor(Choices& choices, int depth);
 
 template <Schema S>
 Tree dictionaryFor(Choices& choices, int depth) {
-  PropertyList::Dictionary entries;
+  ::PropertyList::Dictionary entries;
   // Most fields or few, so that long messages and short ones are both made.
   const std::size_t often = choices.rarely(4) ? 2 : 16;
   S::CodingKeys::each([&](auto field) {
@@ -126,7 +126,7 @@ inline Tree invitationContext(Choices& choices, int depth) {
   const std::size_t which = choices.below(std::size(names));
   Tree data =
       alternativeFor<VespKeelgateService::VespDictionaryContextClientSchema>(choices, which, depth);
-  return PropertyList::Dictionary{
+  return ::PropertyList::Dictionary{
       {"cS", names[choices.rarely(16) ? choices.below(std::size(names)) : which]},
       {"cT", choices.rarely(16) ? valueFor<Int>(choices, depth) : Tree(1)},
       {"cD", std::move(data)}};
@@ -142,7 +142,7 @@ Tree valueFor(Choices& choices, int depth) {
   } else if constexpr (Schema<T>) {
     return dictionaryFor<T>(choices, depth + 1);
   } else if constexpr (isArray<T>) {
-    PropertyList::Array elements;
+    ::PropertyList::Array elements;
     // A schema may hold a list of its own kind: the deeper, the shorter.
     for (std::size_t n = depth < 8 ? choices.below(depth < 2 ? 6 : 2) : 0; n > 0; --n) {
       elements.push_back(valueFor<typename T::value_type>(choices, depth + 1));
@@ -160,13 +160,13 @@ Tree valueFor(Choices& choices, int depth) {
     const double number = static_cast<double>(static_cast<std::int64_t>(choices.number())) / 8;
     return choices.rarely(8) ? Tree(choices.number()) : Tree(number);
   } else if constexpr (std::same_as<T, Date>) {
-    return PropertyList::Date{static_cast<double>(choices.number() >> 30)};
+    return ::PropertyList::Date{static_cast<double>(choices.number() >> 30)};
   } else if constexpr (std::same_as<T, UUID>) {
     UUID uuid{};
     for (std::uint8_t& octet : uuid.octets) octet = choices.byte();
     return VespKeelgateService::uuidText(uuid);
   } else if constexpr (std::same_as<T, Data>) {
-    return PropertyList::Data(choices.below(70), std::byte{choices.byte()});
+    return ::PropertyList::Data(choices.below(70), std::byte{choices.byte()});
   } else {
     return choices.text();
   }

@@ -5,6 +5,8 @@
 #include "program/property_list/property_list_unpacker.h"
 
 #include "framework/contracts/construct.h"
+#include "plist/document.h"
+#include "plist/expansion_budget.h"
 #include "program/schema/property_list_decoder.h"
 
 #include <algorithm>
