@@ -84,7 +84,7 @@ Keelgate::VespWeather VespWeatherUnpacker::unpack(Bytes from) const {
 EDITS = [
     ("include/keelgate/records.h", "#include <keelgate/records/vesp_invitation.h>\n",
      "#include <keelgate/records/vesp_invitation.h>\n#include <keelgate/records/vesp_weather.h>\n"),
-    ("include/keelgate/records.h", "(VespInvitation)", "(VespInvitation), (VespWeather)"),
+    ("include/keelgate/records.h", "PropertyList, Vesp", "PropertyList, VespWeather, Vesp"),
     ("program/service/tables.h", "PropertyListUnpacker>",
      "PropertyListUnpacker, VespWeatherUnpacker>"),
     ("program/service/tables.h", '#include "program/waymark/waymark_message_unpacker.h"\n',
