@@ -22,8 +22,6 @@ namespace Keelgate::CLI {
 
 namespace {
 
-constexpr std::string_view propertyList = "PropertyList";
-
 /// What the options say, before they are put together.
 struct Arguments {
   CommandLine line;
@@ -278,13 +276,13 @@ void complete(const ::CLI::App& app, Arguments& arguments) {
         VespClientMessageContext{.command = arguments.command, .service = arguments.service};
   } else if (app.count("--record") > 0) {
     what.subject = arguments.record;
-  } else if (checks && JSON::isRecordName(propertyList)) {
-    what.subject = String(propertyList);
+  } else if (checks && JSON::isRecordName(JSON::propertyList)) {
+    what.subject = String(JSON::propertyList);
   } else {
     throw ::CLI::RequiredError("--record, or --service with --command,");
   }
-  if (what.typed && arguments.record != propertyList) {
-    refuse(fmt::format("--typed belongs to --record {}", propertyList));
+  if (what.typed && arguments.record != JSON::propertyList) {
+    refuse(fmt::format("--typed belongs to --record {}", JSON::propertyList));
   }
   if (app.count("--files0-from") > 0) {
     readFileNames(arguments.filesFrom, what.files);

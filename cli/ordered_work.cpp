@@ -123,7 +123,8 @@ void OrderedWork::deliver(std::unique_lock<std::mutex>& lock) {
     lock.lock();
     // Not before: a reply that cannot be written yet is memory too.
     weight_ -= weight;
-    room_.notify_one();
+    // Not for every reply: the adder would be woken for each line that it adds.
+    if (slots_.size() <= capacity_ / 2) room_.notify_one();
     // Several: the window may have kept all of them from their next job.
     if (mayBegin()) work_.notify_all();
     // The threads that wait are told; those in work see it when they are through.

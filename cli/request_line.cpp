@@ -23,7 +23,7 @@ namespace {
 
 using rapidjson::SizeType;
 
-enum Member : std::size_t { record, service, command, message, id, none };
+enum Member : std::size_t { record, service, command, message, typed, id, none };
 
 struct Rule {
   std::string_view key;
@@ -38,6 +38,7 @@ constexpr std::array<Rule, none> rules = {{
     {"service", rapidjson::kStringType, "a string"},
     {"command", rapidjson::kNumberType, "a number"},
     {"message", rapidjson::kStringType, "a string"},
+    {"typed", rapidjson::kTrueType, "true or false"},
     {"id", rapidjson::kNullType, "any value"},
 }};
 
@@ -171,10 +172,10 @@ class RequestReader : public rapidjson::BaseReaderHandler<rapidjson::UTF8<>, Req
 
 /// The reader compares with 0x19 where it should with 0x1f, and lets some control characters pass.
 bool hasForbiddenControl(std::string_view line) {
-  bool has = false;
-  // Without an early end, so that the compiler takes many characters at a time.
-  for (const char c : line) has |= c >= 0x1a && c <= 0x1f;
-  return has;
+  unsigned char found = 0;
+  // Without an early end or a branch, so that the compiler takes many characters at a time.
+  for (const char c : line) found |= static_cast<unsigned char>(c - 0x1a) < 6 ? 1 : 0;
+  return found != 0;
 }
 
 /// Thrown and caught in this file: why a line is not a request.
@@ -194,8 +195,11 @@ JSON::Subject subjectOf(const Members& members) {
       throw Invalid{fmt::format("unknown record {}: one of {}", JSON::quote(*members[record]),
                                 fmt::join(JSON::recordNames(), ", "))};
     }
+    demand(!members[typed] || *members[record] == JSON::propertyList,
+           "\"typed\" belongs to the record PropertyList");
     return String(*members[record]);
   }
+  demand(!members[typed], "\"typed\" needs \"record\"");
   demand(members[service] || members[command], "neither \"record\" nor \"service\" is given");
   demand(members[service].has_value(), "\"command\" needs \"service\"");
   demand(members[command].has_value(), "\"service\" needs \"command\"");
@@ -212,7 +216,9 @@ Request requestOf(const Members& members, String& line) {
   const Optional<std::size_t> size =
       Text::decodeBase64(*members[message], begin, Text::Base64::strict);
   demand(size.has_value(), "\"message\" is not base64 with padding");
-  return {.subject = std::move(subject), .message = std::as_bytes(std::span(begin, *size))};
+  return {.subject = std::move(subject),
+          .message = std::as_bytes(std::span(begin, *size)),
+          .typed = members[typed] == "true"};
 }
 
 }  // namespace

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 /// The lines of `keelgate stream`.
 ///
-///     {"record": TYPE, "message": BASE64, "id": ANY}
+///     {"record": TYPE, "message": BASE64, "id": ANY}      ("typed": true with PropertyList)
 ///     {"service": ID, "command": N, "message": BASE64, "id": ANY}
 ///
 /// Read strictly, because a request that is understood otherwise than it was meant unpacks a
@@ -22,6 +22,7 @@ struct Request {
   JSON::Subject subject;
   /// In the memory of the line.
   Bytes message;
+  Bool typed = false;
 };
 
 struct RequestLine {

@@ -124,7 +124,8 @@ JSON::Reply answerLine(const Host& host, Line& line) {
   if (const auto* problem = std::get_if<String>(&request.content)) {
     return JSON::requestError(*problem, form);
   }
-  const auto& [subject, message] = std::get<Request>(request.content);
+  const auto& [subject, message, typed] = std::get<Request>(request.content);
+  form.typed = typed;
   return host.answer(subject, message, form);
 }
 

@@ -22,6 +22,9 @@ namespace Keelgate::JSON {
 /// client message arrived under.
 using Subject = std::variant<String, VespClientMessageContext>;
 
+/// The record that any property list is, and that has a typed form.
+constexpr std::string_view propertyList = "PropertyList";
+
 /// The names that a Subject may have, in the order of the output records.
 const Array<std::string_view>& recordNames();
 Bool isRecordName(std::string_view name);

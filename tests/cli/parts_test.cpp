@@ -47,6 +47,8 @@ TEST(RequestLine, IsReadStrictly) {
       {R"({"record":"VespClientMessageResult","message":"","id":1})", "unknown record", "1"},
       {R"({"record":"VespInvitation","command":1,"message":"","id":1})", "excludes", "1"},
       {R"({"record":"VespInvitation","service":"","message":"","id":1})", "excludes", "1"},
+      {R"({"record":"VespInvitation","typed":true,"message":"","id":1})", "belongs to", "1"},
+      {R"({"service":"s","command":1,"typed":true,"message":"","id":1})", "\"typed\" needs", "1"},
       {R"({"record":5,"message":"","id":1})", "\"record\" must be a string", "1"},
       {R"({"record":{"id":2},"message":"","id":1})", "\"record\" must be a string", "1"},
       {R"({"service":"s","message":""})", "needs \"command\"", absent},
@@ -102,8 +104,9 @@ TEST(RequestLine, MessagesOfEveryLengthAndSpellingAreDecoded) {
     const RequestLine read = readRequestLine(line);
     ASSERT_EQ(problemOf(read), "ok") << spelling;
     EXPECT_EQ(read.id, "\"A\"");
-    const auto& [subject, message] = std::get<Request>(read.content);
+    const auto& [subject, message, typed] = std::get<Request>(read.content);
     EXPECT_TRUE(std::ranges::equal(message, std::as_bytes(std::span(octets)))) << spelling;
+    EXPECT_FALSE(typed);
     const auto& context = std::get<VespClientMessageContext>(subject);
     EXPECT_EQ(context.service, "com.example");
     EXPECT_EQ(context.command, 245U);
