@@ -106,16 +106,20 @@ void addServiceOptions(::CLI::App& app, Client::Options& options) {
 
 void addHostOptions(::CLI::App& app, CommandLine& line) {
   // The client would cut them to these; here somebody typed them, and is told.
-  constexpr UInt64 mostProcesses = 128;
-  constexpr UInt64 largestMessage = std::numeric_limits<std::uint32_t>::max();
-  addNumber(app, "--processes", line.host.processes, 1, mostProcesses,
+  using Options = Client::Options;
+  const Options defaults;
+  constexpr UInt64 most = std::numeric_limits<std::uint32_t>::max();
+  addNumber(app, "--processes", line.host.processes, 1, Options::mostProcesses,
             "Messages at once (default: as processors)");
-  addNumber(app, "--messages-per-process", line.host.messagesPerProcess, 1,
-            std::numeric_limits<std::uint32_t>::max(), "How many one process may see (default 1)");
+  addNumber(app, "--messages-per-process", line.host.messagesPerProcess, 1, most,
+            fmt::format("How many one process may see (default {})", defaults.messagesPerProcess));
   addSeconds(app, "--time-limit", line.host.timeLimit,
-             "What a message may take, e.g. 0.5 (default 5)");
-  addNumber(app, "--max-message", line.host.largestMessage, 1, largestMessage,
-            "The largest message, e.g. 4K, 2M, 1G (default 64M)", true);
+             fmt::format("What a message may take, e.g. 0.5 (default {})",
+                         std::chrono::duration<double>(defaults.timeLimit).count()));
+  addNumber(app, "--max-message", line.host.largestMessage, 1, Options::greatestLargestMessage,
+            fmt::format("The largest message, e.g. 4K, 2M, 1G (default {}M)",
+                        defaults.largestMessage >> 20),
+            true);
   app.add_flag("--require-layers", line.host.requireLayers,
                "Refuse to run without namespaces, Landlock");
   app.add_flag("--quiet", line.quiet, "Say nothing but errors");
@@ -276,7 +280,7 @@ void complete(const ::CLI::App& app, Arguments& arguments) {
         VespClientMessageContext{.command = arguments.command, .service = arguments.service};
   } else if (app.count("--record") > 0) {
     what.subject = arguments.record;
-  } else if (checks && JSON::isRecordName(JSON::propertyList)) {
+  } else if (checks) {
     what.subject = String(JSON::propertyList);
   } else {
     throw ::CLI::RequiredError("--record, or --service with --command,");

@@ -4,6 +4,9 @@
 #include "framework/json/reply.h"
 #include "framework/json/values.h"
 
+#include <keelgate/errors.h>
+#include <keelgate/type_name.h>
+
 #include <algorithm>
 #include <iterator>
 
@@ -13,6 +16,7 @@ namespace {
 
 using JSON::writeField;
 using JSON::Writer;
+using VespKeelgateService::VespClientMessageUnpackingError;
 
 struct Scalar {
   std::string_view name;
@@ -36,9 +40,7 @@ constexpr Scalar scalars[] = {
      R"({"type":"string","format":"uuid","pattern":"^[0-9A-F]{8}(-[0-9A-F]{4}){3}-[0-9A-F]{12}$"})"},
     {"propertyList",
      R"({"anyOf":[{"type":["string","number","boolean","null"]},{"type":"array","items":{"$ref":"#/$defs/propertyList"}},{"type":"object","additionalProperties":{"$ref":"#/$defs/propertyList"}}]})"},
-    {"reason",
-     R"({"enum":["crashed","timedOut","messageTooLarge","resourcesExhausted","protocolViolation","startFailed"]})"},
-    {"path",
+    {"codingPath",
      R"({"type":"array","items":{"anyOf":[{"type":"string"},{"type":"integer","minimum":0}]}})"},
 };
 
@@ -56,22 +58,33 @@ struct ErrorShape {
 };
 
 /// What errors have beside their `kind`.
-const Array<ErrorShape>& errorShapes() {
-  static const Array<ErrorShape> shapes = {
-      {{"keyNotFound"}, {{"key", "string"}, {"codingPath", "path"}, {"description", "string"}}},
-      {{"typeMismatch", "valueNotFound", "dataCorrupted"},
-       {{"codingPath", "path"}, {"description", "string"}}},
+Array<ErrorShape> errorShapes() {
+  using Kind = DecodingError::Kind;
+  Array<std::string_view> others;
+  for (const EnumerationCase& kind : casesOf<Kind>) {
+    if (kind.rawValue != rawValueOf(Kind::keyNotFound)) others.push_back(kind.name);
+  }
+  return {
+      {{nameOf(Kind::keyNotFound)},
+       {{"key", "string"}, {"codingPath", "codingPath"}, {"description", "string"}}},
+      {others, {{"codingPath", "codingPath"}, {"description", "string"}}},
       {{"breach"}, {{"domain", "string"}, {"errorType", "string"}, {"keyPath", "string", false}}},
       {{"unpacking"},
        {{"domain", "string"},
         {"code", "int"},
-        {"case", "string"},
+        {"case", "case"},
         {"command", "uint64", false},
         {"service", "string", false}}},
       {{"host"}, {{"reason", "reason"}, {"description", "string"}}},
       {{"request"}, {{"description", "string"}}},
   };
-  return shapes;
+}
+
+template <class E>
+Array<std::string_view> namesOf() {
+  Array<std::string_view> names;
+  for (const EnumerationCase& entry : casesOf<E>) names.push_back(entry.name);
+  return names;
 }
 
 class Schema {
@@ -91,7 +104,7 @@ class Schema {
     out_.key("anyOf");
     out_.beginArray();
     for (const std::string_view name : JSON::recordNames()) answer(name);
-    answer("VespClientMessageResult");
+    answer(typeName<VespClientMessageResult>());
     out_.beginObject();
     object({{"error", "error"}}, [&] { return preface(); });
     out_.endObject();
@@ -185,6 +198,10 @@ class Schema {
       writeField(out_, "enum", cases);
     } else if (name == "error") {
       defineError();
+    } else if (name == "reason") {
+      writeField(out_, "enum", namesOf<HostError::Reason>());
+    } else if (name == "case") {
+      writeField(out_, "enum", namesOf<VespClientMessageUnpackingError::Case>());
     }
     out_.endObject();
   }

@@ -33,8 +33,8 @@ class Tally {
   UInt64 rejected_ = 0;
   UInt64 unusable_ = 0;
   UInt64 bytes_ = 0;
-  /// By the host, for each reason.
-  std::array<UInt64, static_cast<std::size_t>(HostError::Reason::startFailed) + 1> givenUp_{};
+  /// By the host, for each reason, whose numbers have no gaps.
+  std::array<UInt64, casesOf<HostError::Reason>.size()> givenUp_{};
   const std::chrono::steady_clock::time_point begin_ = std::chrono::steady_clock::now();
 };
 

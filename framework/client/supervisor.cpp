@@ -155,7 +155,8 @@ void Supervisor::tellLayers() {
   const String missing = missingLayersLine(current_->layers());
   if (std::exchange(layersTold_, true) || missing.empty()) return;
   try {
-    logLine(log_, missing);
+    // With a name in front, so that it is not taken for a line of the service.
+    logLine(log_, "keelgate: " + missing);
   } catch (...) {
     // The application's own sink, against what it was asked for. It must not cost a start.
   }

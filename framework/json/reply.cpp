@@ -5,8 +5,6 @@
 
 #include "framework/json/values.h"
 
-#include <keelgate/type_name.h>
-
 #include <algorithm>
 #include <new>
 #include <type_traits>
@@ -124,6 +122,12 @@ class Answer {
                         .deadline = deadline_};
     return JSON::object(form_, budget, [&](Writer& out) {
       writeField(out, "record", typeName<R>());
+      if constexpr (std::is_same_v<R, PropertyList>) {
+        if (form_.typed) {
+          out.key("value");
+          return writeTyped(out, record.value);
+        }
+      }
       writeField(out, "value", record);
     });
   }

@@ -11,6 +11,7 @@
 #include <keelgate/client.h>
 #include <keelgate/errors.h>
 #include <keelgate/records.h>
+#include <keelgate/type_name.h>
 
 #include <chrono>
 #include <string_view>
@@ -23,7 +24,7 @@ namespace Keelgate::JSON {
 using Subject = std::variant<String, VespClientMessageContext>;
 
 /// The record that any property list is, and that has a typed form.
-constexpr std::string_view propertyList = "PropertyList";
+constexpr std::string_view propertyList = typeName<PropertyList>();
 
 /// The names that a Subject may have, in the order of the output records.
 const Array<std::string_view>& recordNames();

@@ -23,10 +23,10 @@ namespace Keelgate::JSON {
 void write(Writer& out, Date date);
 /// Upper-case.
 void write(Writer& out, const UUID& uuid);
-/// {"uid": N}, and above 64 bits the hexadecimal string.
-void write(Writer& out, const PropertyListUID& uid);
-/// As the value that it is: an object, an array (of a set too), a string, a number.
+/// As the value that it is: an object, an array (of a set too), a string, a number, {"uid": N}.
 void write(Writer& out, const PropertyListValue& value);
+/// {"type": T, "value": V} for each value of the tree, so that nothing is lost.
+void writeTyped(Writer& out, const PropertyListValue& value);
 
 /// Any value that a record can hold, records included.
 template <class T>

@@ -151,8 +151,9 @@ void Writer::separate() {
 
 void Writer::newLine() {
   if (layout_ != Layout::pretty) return;
-  put("\n");
-  for (std::size_t i = 0; i < depth_; ++i) put("  ");
+  piece_ += '\n';
+  piece_.append(2 * depth_, ' ');
+  if (piece_.size() >= pieceSize) next();
 }
 
 void Writer::quoted(std::string_view text) {

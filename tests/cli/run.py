@@ -5,6 +5,7 @@
 usage: run.py ROOT KEELGATE FAKE_SERVICE
 """
 import base64
+import datetime
 import json
 import os
 import pathlib
@@ -36,7 +37,7 @@ def heard(said):
     """What the command said, but for the line of a service that lacks a wall on this machine (in a
     chroot, say), which is no matter of these tests."""
     return b"".join(line for line in said.splitlines(keepends=True)
-                    if not line.startswith(b"Running without: "))
+                    if not line.startswith(b"keelgate: Running without: "))
 
 
 def run(*words, stdin=b"", **more):
@@ -171,6 +172,54 @@ def said_of_a_run():
         check(run("check", *record, "--files0-from", "/dev/null") == (0, b"", ""), "no names")
         for wrong in (b"-", b"a\0\0b", b"\0"):
             check(run("check", *record, "--files0-from", "-", stdin=wrong)[0] == 2, f"{wrong}")
+
+
+def property_lists():
+    """Any of them; what each value becomes is json_test's."""
+    for name in ("push-payload", "invitation-home", "check-in"):
+        trees = {run("unpack", "--record", "PropertyList", *typed, messages / f"{name}.{kind}")[1]
+                 for kind in ("xml", "bplist") for typed in ([], ["--typed"])}
+        values = sorted((json.loads(tree)["value"] for tree in trees), key=lambda v: "type" in v)
+        # The twins agree, and the types are all that the forms differ in.
+        check(len(values) == 2 and untyped(values[1]) == values[0], f"{name}: {trees}")
+    message = base64.b64encode((messages / "push-payload.bplist").read_bytes()).decode()
+    lines = [json.dumps({"record": "PropertyList", "message": message, **typed})
+             for typed in ({}, {"typed": False}, {"typed": True})]
+    replies = objects(run("stream", stdin="\n".join(lines).encode())[1])
+    check([reply["value"].get("type") for reply in replies] == [None, None, "dictionary"], "stream")
+    status, out, err = run("check", messages / "damaged.bplist")
+    check((status, out) == (1, b"") and re.search("at byte [0-9]+", err), f"check: {err}")
+    check(run("check", stdin=(messages / "check-in.xml").read_bytes()) == (0, b"", ""), "check")
+
+
+def long_replies():
+    """What indents to more than its message may have costs that message alone."""
+    deep, wide = 400, 100_000
+    with tempfile.NamedTemporaryFile(suffix=".plist") as file:
+        file.write(b"<plist>" + b"<array>" * deep + b"<true/>" * wide + b"</array>" * deep
+                   + b"</plist>")
+        file.flush()
+        good = messages / "check-in.xml"
+        words = ["unpack", "--record", "PropertyList", good, file.name, good]
+        done = subprocess.Popen([keelgate, *words, "--pretty", "--time-limit", "60"], stdout=subprocess.PIPE,
+                                stderr=subprocess.DEVNULL)
+        out = done.stdout.read().decode()
+        _, status, usage = os.wait4(done.pid, 0)
+        done.returncode = os.waitstatus_to_exitcode(status)
+        check(done.returncode == 1 and out.count('"reason": "resourcesExhausted"') == 1
+              and out.count('"record"') == 2, f"long replies: {done.returncode}")
+        check(usage.ru_maxrss < 300_000, f"a long reply takes {usage.ru_maxrss} kB")
+        status, out, _ = run(*words, "--compact", "--time-limit", "60")
+        check(status == 0 and len(out) > 5 * wide, f"a reply of one line: {status}")
+
+
+def untyped(tree):
+    kind, value = tree["type"], tree["value"]
+    if kind == "dictionary":
+        return {key: untyped(inner) for key, inner in value.items()}
+    if kind == "date":
+        return f"{datetime.datetime(2001, 1, 1) + datetime.timedelta(seconds=value):%FT%TZ}"
+    return [untyped(inner) for inner in value] if kind in ("array", "set") else value
 
 
 def metrics():
@@ -359,7 +408,7 @@ def described():
     tables += [everything[section] for section in ("messageUnpackers", "services", "commands")]
     # Which table has which columns, and what they hold, docs/wire-format.md pins.
     check({tuple(row) for table in tables for row in table}
-          == {("record", "unpacker", "schema"), ("service", "unpacker", "commands"),
+          == {("record", "unpacker", "schema"), ("record", "unpacker"), ("service", "unpacker", "commands"),
               ("command", "schema", "case"), ("schema", "case"), ("command", "case"),
               ("rawValue", "name"), ("name", "rawValue"), ("field", "key", "type", "required"),
               ("field", "type", "optional")}, "columns of tables")
@@ -469,7 +518,7 @@ def completion():
                   f"{shell} completes {words}: {completed(shell, *words)}")
 
 
-for group in (wrong_usage, many_files, said_of_a_run, metrics, hidden, memory, without_service, stream, long_stream, described,
+for group in (wrong_usage, many_files, said_of_a_run, property_lists, long_replies, metrics, hidden, memory, without_service, stream, long_stream, described,
               json_schema, terminal, completion):
     group()
 print(f"{count - len(failures)} passed, {len(failures)} failed")

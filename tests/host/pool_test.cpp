@@ -77,7 +77,7 @@ TEST(Start, MissingSecondWallsAreToldOnceAndReported) {
   EXPECT_EQ(outcomeOf(client, Script().then(Op::raise, SIGSEGV)), "crashed");
   EXPECT_EQ(outcomeOf(client, good()), "record 7");
   ASSERT_EQ(lines.size(), 1u);
-  EXPECT_TRUE(lines[0].starts_with("Running without: user namespace")) << lines[0];
+  EXPECT_TRUE(lines[0].starts_with("keelgate: Running without: user namespace")) << lines[0];
   std::size_t present = 0;
   for (const SandboxLayer& layer : client.report().layers) present += layer.present ? 1 : 0;
   EXPECT_EQ(present, 6u);
