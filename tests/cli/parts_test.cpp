@@ -9,6 +9,8 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <atomic>
+#include <chrono>
 #include <iterator>
 #include <latch>
 #include <limits>
@@ -210,6 +212,24 @@ TEST(OrderedWork, LongRepliesBehindASlowMessageKeepOthersFromBeginning) {
   work.finish();
   EXPECT_EQ(begun, jobs - 1);
   EXPECT_EQ(bytes, 1 + large * (jobs - 1));
+}
+
+TEST(OrderedWork, AWindowThatWasFullIsEmptyAgain) {
+  OrderedWork work(2, [](const Due&) { return true; });
+  for (int i = 0; i < 3; ++i) {
+    // More than the window as a request and most of it as a reply.
+    ASSERT_TRUE(work.add([] { return JSON::Reply{.json = {String(large, 'x')}}; }, 2 * large));
+  }
+  std::binary_semaphore second(0);
+  std::atomic<bool> together = false;
+  const auto first = [&] {
+    together = second.try_acquire_for(std::chrono::seconds(20));
+    return numbered(0);
+  };
+  work.add(first, 1);
+  work.add([&] { return second.release(), numbered(1); }, 1);
+  work.finish();
+  EXPECT_TRUE(together);
 }
 
 TEST(OrderedWork, AJobWithoutMemoryEndsTheWorkAndNotTheProgram) {
