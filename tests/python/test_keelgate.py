@@ -1,0 +1,255 @@
+# SPDX-License-Identifier: Apache-2.0
+"""The Python package as its users have it, against an installed tree: KEELGATE_MESSAGES names the
+folder of the example messages, KEELGATE_SERVICE_STAND_IN a service that misbehaves."""
+import asyncio
+import base64
+import json
+import math
+import os
+import pathlib
+import pickle
+import plistlib
+import random
+import re
+import subprocess
+import sys
+import threading
+import uuid
+from datetime import datetime, timezone
+
+import pytest
+
+import keelgate
+
+messages = pathlib.Path(os.environ["KEELGATE_MESSAGES"])
+VIDEO = "com.tessen.private.braid.viso.video"
+
+
+@pytest.fixture(scope="module")
+def client():
+    with keelgate.Client(processes=2) as made:
+        yield made
+
+
+def examples():
+    """Every example with its reply: the name, how it is unpacked, what the command printed."""
+    for line in (messages / "index.txt").read_text().splitlines():
+        if line and not line.startswith("#"):
+            name, *words = line.split()
+            files = [name] if "." in name else [name + ".xml", name + ".bplist"]
+            for file in files:
+                yield pytest.param(file, dict(zip(words[::2], words[1::2])), id=file)
+
+
+def unpack(client, data, how):
+    if "--record" in how:
+        return client.unpack(how["--record"], data)
+    return client.unpack_client_message(data, command=int(how["--command"]),
+                                        service=how["--service"])
+
+
+def plain(value):
+    """Back to what JSON shows."""
+    if isinstance(value, dict):
+        return {key: plain(held) for key, held in value.items()}
+    if isinstance(value, list):
+        return [plain(held) for held in value]
+    if isinstance(value, bytes):
+        return base64.b64encode(value).decode()
+    if isinstance(value, uuid.UUID):
+        return str(value).upper()
+    if isinstance(value, datetime):
+        return value.isoformat().replace("+00:00", "Z")
+    return value
+
+
+@pytest.mark.parametrize("file, how", examples())
+def test_examples_give_the_values_of_their_replies(client, file, how):
+    reply = json.loads((messages / (file.split(".")[0] + ".json")).read_text())
+    data = (messages / file).read_bytes()
+    if "value" in reply:
+        assert plain(unpack(client, data, how)) == reply["value"]
+        return
+    with pytest.raises(keelgate.Error) as caught:
+        unpack(client, data, how)
+    for name, field in reply["error"].items():
+        snake = re.sub("([A-Z])", lambda m: "_" + m[1].lower(), name)
+        if name != "kind" or isinstance(caught.value, keelgate.DecodingError):
+            assert getattr(caught.value, snake) == field
+    again = pickle.loads(pickle.dumps(caught.value))
+    assert (str(again), vars(again)) == (str(caught.value), vars(caught.value))
+
+
+def test_values_have_pythons_types(client):
+    payload = client.unpack("PulseUserPayload", (messages / "push-payload.xml").read_bytes())
+    assert isinstance(payload["payload"], bytes) and isinstance(payload["command"], int)
+    home = client.unpack("VespInvitation", bytearray((messages / "invitation-home.xml").read_bytes()))
+    invitation = home["context"]["context"]["dictionary"]["vespHearthInvitation"]
+    assert isinstance(invitation["homeUUID"], uuid.UUID)
+    assert invitation["inviteExpiryDate"].tzinfo is timezone.utc
+    assert isinstance(invitation["invitationShareToken"]["tokenData"], bytes)
+
+
+def random_tree(rng, depth):
+    kind = rng.randrange(9 if depth == 0 else 11)
+    if kind == 9:
+        return [random_tree(rng, depth - 1) for _ in range(rng.randrange(4))]
+    if kind == 10:
+        return {random_text(rng): random_tree(rng, depth - 1) for _ in range(rng.randrange(4))}
+    return (lambda: random_text(rng), lambda: rng.randbytes(rng.randrange(70)),
+            lambda: rng.randrange(-2**63, 2**64), lambda: rng.randrange(300), lambda: True,
+            lambda: False, lambda: rng.uniform(-1e300, 1e300), lambda: rng.random(),
+            lambda: datetime(rng.randrange(1, 10000), 2, 28, 23, 59, rng.randrange(60)))[kind]()
+
+
+def random_text(rng):
+    return "".join(chr(rng.choice((65, 97, 0xe9, 0x3b1, 0x1f600)) + rng.randrange(20))
+                   for _ in range(rng.randrange(20)))
+
+
+def aware(value):
+    if isinstance(value, dict):
+        return {key: aware(held) for key, held in value.items()}
+    if isinstance(value, list):
+        return [aware(held) for held in value]
+    return value.replace(tzinfo=timezone.utc) if isinstance(value, datetime) else value
+
+
+def test_any_property_list_comes_back_as_it_was(client):
+    rng = random.Random(20261121)
+    for _ in range(150):
+        tree = random_tree(rng, 4)
+        binary = plistlib.dumps(tree, fmt=plistlib.FMT_BINARY, sort_keys=False)
+        xml = re.sub(rb"<!DOCTYPE[^>]*>", b"", plistlib.dumps(tree, sort_keys=False))
+        for data in (binary, xml):
+            found = client.unpack("PropertyList", data)
+            assert found == aware(tree)
+            assert list(json.dumps(plain(found))) == list(json.dumps(plain(aware(tree))))
+
+
+def test_property_lists_keep_what_json_would_lose(client):
+    def xml(value):
+        return f'<plist version="1.0">{value}</plist>'.encode()
+    assert client.unpack("PropertyList", plistlib.dumps([plistlib.UID(7)],
+                                                        fmt=plistlib.FMT_BINARY)) == [7]
+    uid = client.unpack("PropertyList", plistlib.dumps(plistlib.UID(2**64 - 1),
+                                                       fmt=plistlib.FMT_BINARY))
+    assert isinstance(uid, keelgate.UID) and uid == 2**64 - 1
+    assert client.unpack("PropertyList", xml("<real>-inf</real>")) == -math.inf
+    assert math.isnan(client.unpack("PropertyList", xml("<real>nan</real>")))
+    assert isinstance(client.unpack("PropertyList", xml("<real>3</real>")), float)
+    assert client.unpack("PropertyList", xml("<string>3</string>")) == "3"
+    # A date that no calendar has is a number of seconds.
+    far = b"bplist00\x33" + b"\x43" + b"\x00" * 7 + b"\x08" + b"\x00" * 6 + b"\x01\x01"
+    far += (1).to_bytes(8, "big") + (0).to_bytes(8, "big") + (17).to_bytes(8, "big")
+    assert client.unpack("PropertyList", far) == float(2**55)
+
+
+@pytest.mark.parametrize("containers", [511, 512, 513])
+def test_depth_is_the_documents_and_not_the_interpreters(client, containers):
+    data = b"<plist>" + b"<array>" * containers + b"</array>" * containers + b"</plist>"
+    if containers > 512:
+        with pytest.raises(keelgate.DecodingError) as caught:
+            client.unpack("PropertyList", data)
+        assert caught.value.kind == "dataCorrupted" and caught.value.coding_path == []
+        return
+    value, depth = client.unpack("PropertyList", data), 1
+    while value:
+        value, depth = value[0], depth + 1
+    assert depth == containers
+
+
+def test_wrong_use_is_a_value_error(client):
+    for wrong in (lambda: client.unpack("Nothing", b""),
+                  lambda: client.unpack("VespClientMessageResult", b""),
+                  lambda: client.unpack("PulseUserPayload\0", b""),
+                  lambda: client.unpack_client_message(b"", command=-1, service=VIDEO),
+                  lambda: client.unpack_client_message(b"", command=2**64, service=VIDEO),
+                  lambda: client.unpack_client_message(b"", command=1, service="a\0b"),
+                  lambda: keelgate.Client(time_limit=0), lambda: keelgate.Client(time_limit=math.nan),
+                  lambda: keelgate.Client(processes=-1)):
+        with pytest.raises(ValueError):
+            wrong()
+    with pytest.raises(TypeError):
+        client.unpack("PulseUserPayload", "text")
+
+
+def test_errors_carry_their_fields(client):
+    with pytest.raises(keelgate.UnpackingError) as caught:
+        client.unpack_client_message(b"", command=236, service=VIDEO)
+    assert (caught.value.case, caught.value.code, caught.value.command, caught.value.service) == (
+        "unimplementedCommand", 0, 236, None)
+    with pytest.raises(keelgate.UnpackingError) as caught:
+        client.unpack_client_message(b"", command=1, service="nobody")
+    assert (caught.value.case, caught.value.command, caught.value.service) == (
+        "noUnpackerForService", None, "nobody")
+    with pytest.raises(keelgate.DecodingError) as caught:
+        client.unpack("VespInvitation", b"<plist><dict/></plist>")
+    assert caught.value.kind == "keyNotFound" and caught.value.key and not caught.value.coding_path
+
+
+def test_the_host_says_why():
+    with keelgate.Client(max_message=10) as small:
+        with pytest.raises(keelgate.HostError) as caught:
+            small.unpack("PropertyList", b"<plist><dict/></plist>")
+        assert caught.value.reason == "messageTooLarge" and caught.value.description
+    with pytest.raises(keelgate.HostError) as caught:
+        keelgate.Client(service_path="/nowhere/VespKeelgateService")
+    assert caught.value.reason == "startFailed" and "/nowhere" in caught.value.description
+
+
+def test_threads_and_event_loops_share_a_client(client):
+    data = [plistlib.dumps({"n": n}, fmt=plistlib.FMT_BINARY) for n in range(64)]
+    found = {}
+
+    def work(part):
+        for n in part:
+            found[n] = client.unpack("PropertyList", data[n])
+    threads = [threading.Thread(target=work, args=(range(t, 64, 8),)) for t in range(8)]
+    for thread in threads:
+        thread.start()
+    for thread in threads:
+        thread.join()
+    assert found == {n: {"n": n} for n in range(64)}
+
+    async def gather():
+        calls = [client.unpack_async("PropertyList", item) for item in data]
+        calls.append(client.unpack_client_message_async(b"", command=245,
+                                                        service="com.tessen.private.braid.viso.lp"))
+        return await asyncio.gather(*calls)
+    *values, marker = asyncio.run(gather())
+    assert values == [{"n": n} for n in range(64)]
+    assert marker == {"messageTypeRestricted": {"messageType": "restricted"}}
+
+
+def test_a_closed_client_says_so():
+    one = keelgate.Client()
+    data = b"<plist><array>" + b"<integer>1</integer>" * 20000 + b"</array></plist>"
+    results = []
+    threads = [threading.Thread(target=lambda: results.append(one.unpack("PropertyList", data)))
+               for _ in range(4)]
+    for thread in threads:
+        thread.start()
+    while one._calls < 4 and len(results) < 4:
+        pass
+    # Calls under way are waited for.
+    one.close()
+    for thread in threads:
+        thread.join()
+    assert [len(result) for result in results] == [20000] * 4
+    one.close()
+    with pytest.raises(ValueError):
+        one.unpack("PropertyList", data)
+    with pytest.raises(ValueError):
+        asyncio.run(one.unpack_async("PropertyList", data))
+
+
+def test_a_forked_child_has_a_service_of_its_own(client):
+    script = ("import os, keelgate\n"
+              "c = keelgate.Client(); d = b'<plist><string>a</string></plist>'\n"
+              "assert c.unpack('PropertyList', d) == 'a'\n"
+              "pid = os.fork()\n"
+              "assert c.unpack('PropertyList', d) == 'a'\n"
+              "if pid == 0: os._exit(0)\n"
+              "assert os.waitpid(pid, 0)[1] == 0\n")
+    subprocess.run([sys.executable, "-c", script], check=True, timeout=60)
