@@ -17,6 +17,7 @@ install(DIRECTORY ${PROJECT_SOURCE_DIR}/include/ DESTINATION ${CMAKE_INSTALL_INC
   COMPONENT development FILES_MATCHING PATTERN *.h)
 set_target_properties(keelgate_client PROPERTIES EXPORT_NAME Client)
 set_target_properties(keelgate_headers PROPERTIES EXPORT_NAME Headers)
+install(FILES ${PROJECT_SOURCE_DIR}/include/keelgate.h DESTINATION ${CMAKE_INSTALL_INCLUDEDIR})
 install(TARGETS keelgate_client keelgate_headers EXPORT KeelgateTargets
   LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT library NAMELINK_COMPONENT development
   ARCHIVE DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT development
