@@ -26,6 +26,8 @@ symbols=$(nm -D --defined-only "$libraries/libkeelgate.so" | awk '/ keelgate_/ {
 [ "$symbols" = "$(sort "$root/tests/bindings/symbols.txt")" ] ||
   { printf 'The C interface exports\n%s\n' "$symbols"; exit 1; }
 
+python3 "$root/tests/bindings/abi.py" "$root" "$work"
+
 export KEELGATE_MESSAGES="$root/examples/messages"
 python=/usr/bin/python3
 echo "The package of the installed tree"
