@@ -7,6 +7,9 @@
 #include <keelgate/client.h>
 
 #include <algorithm>
+#include <array>
+#include <chrono>
+#include <cstddef>
 #include <cstdlib>
 #include <cstring>
 #include <exception>
@@ -95,7 +98,7 @@ int statusOf(const Reply& reply) {
 /// What the functions that unpack have in common; `subject` makes a Subject, or throws.
 template <class MakeSubject>
 int unpack(keelgate_client* client, const void* message, std::size_t length, char** reply,
-           const MakeSubject& subject) noexcept {
+           const MakeSubject& subject, bool typed = false) noexcept {
   if (reply == nullptr) return KEELGATE_WRONG_USE;
   *reply = nullptr;
   if (client == nullptr || (message == nullptr && length > 0)) return KEELGATE_WRONG_USE;
@@ -103,7 +106,7 @@ int unpack(keelgate_client* client, const void* message, std::size_t length, cha
   try {
     Reply answer =
         Keelgate::JSON::answer(client->client, client->timeLimit, subject(),
-                               {static_cast<const std::byte*>(message), length}, {});
+                               {static_cast<const std::byte*>(message), length}, {.typed = typed});
     *reply = textOf(answer.json);
     if (*reply != nullptr) status = statusOf(answer);
   } catch (const std::exception&) {
@@ -125,8 +128,8 @@ void keelgate_options_init(keelgate_options* options, size_t size) {
 
 keelgate_client* keelgate_open(const keelgate_options* options, char** error) {
   if (error != nullptr) *error = nullptr;
-  if (options != nullptr && (options->size < sizeof options->size ||
-                             options->size > sizeof(keelgate_options))) {
+  if (options != nullptr &&
+      (options->size < sizeof options->size || options->size > sizeof(keelgate_options))) {
     tell(error,
          "The options have a size that this library does not know: fill them in with "
          "keelgate_options_init, and use a library that is not older than the header");
@@ -153,6 +156,13 @@ int keelgate_unpack(keelgate_client* client, const char* record, const void* mes
     return KEELGATE_WRONG_USE;
   }
   return unpack(client, message, length, reply, [&] { return Subject(Keelgate::String(record)); });
+}
+
+int keelgate_unpack_typed(keelgate_client* client, const void* message, size_t length,
+                          char** reply) {
+  return unpack(
+      client, message, length, reply,
+      [] { return Subject(Keelgate::String(Keelgate::JSON::propertyList)); }, true);
 }
 
 int keelgate_unpack_client_message(keelgate_client* client, const char* service, uint64_t command,
