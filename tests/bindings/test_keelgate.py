@@ -11,6 +11,7 @@ import pickle
 import plistlib
 import random
 import re
+import struct
 import subprocess
 import sys
 import threading
@@ -140,9 +141,9 @@ def test_property_lists_keep_what_json_would_lose(client):
     assert isinstance(client.unpack("PropertyList", xml("<real>3</real>")), float)
     assert client.unpack("PropertyList", xml("<string>3</string>")) == "3"
     # A date that no calendar has is a number of seconds.
-    far = b"bplist00\x33" + b"\x43" + b"\x00" * 7 + b"\x08" + b"\x00" * 6 + b"\x01\x01"
+    far = b"bplist00\x33" + struct.pack(">d", 2.0**55) + b"\x08" + bytes(6) + b"\x01\x01"
     far += (1).to_bytes(8, "big") + (0).to_bytes(8, "big") + (17).to_bytes(8, "big")
-    assert client.unpack("PropertyList", far) == float(2**55)
+    assert client.unpack("PropertyList", far) == 2.0**55
 
 
 @pytest.mark.parametrize("containers", [511, 512, 513])

@@ -69,11 +69,14 @@ fi
 complaints=$(lintian --allow-root --fail-on error,warning "$work"/packages/*.deb 2>&1 |
   grep '^[EW]:' || true)
 expect "lintian" "$complaints" ""
-for package in keelgate libkeelgate0 libkeelgate-dev; do
+for package in keelgate libkeelgate0 libkeelgate-dev python3-keelgate; do
   dpkg-deb -x "$work/packages/${package}_"*.deb "$work/deb"
 done
 expect "the packaged command" "$("$work/deb/usr/bin/keelgate" $unpack | cut -c 1-32)" \
   '{"record":"VespCommandResponse",'
+expect "the packaged Python package" \
+  "$(PYTHONPATH=$work/deb/usr/lib/python3/dist-packages /usr/bin/python3 -c \
+    'import keelgate; print(keelgate.__version__)')" "$("$work/deb/usr/bin/keelgate" --version | sed 's/^keelgate //')"
 depends=$(dpkg-deb -f "$work"/packages/libkeelgate0_*.deb Depends)
 expect "the library's dependencies" \
   "$(echo "$depends" | grep -c '^keelgate (= .*libstdc++6')" 1
