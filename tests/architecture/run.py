@@ -85,7 +85,7 @@ for folder in ("include", "text", "plist", "program", "framework", "cli", "tests
     for path in (root / folder).rglob("*"):
         if path.suffix in (".h", ".cpp"):
             text = path.read_text()
-            check(text.startswith("// SPDX-License-Identifier: Apache-2.0"), f"{path}: no licence")
+            check("SPDX-License-Identifier: Apache-2.0" in text.split("\n", 1)[0], f"{path}: no licence")
             check(len(text.splitlines()) <= 400, f"{path} is too long to read")
 
 # What the pages point to is there; in the tour each row's function is in the file that it names.
