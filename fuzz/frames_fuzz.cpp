@@ -54,7 +54,7 @@ void checkReply(Bytes reply, std::size_t step) {
   for (const String& line : whole->log()) {
     appendReplyFrame(again, 7, ReplyKind::log, std::as_bytes(std::span(line)));
   }
-  appendReplyFrame(again, 7, whole->kind(), whole->body(reply));
+  appendReplyFrame(again, 7, whole->kind(), whole->body(reply), whole->isLast());
   require(std::ranges::equal(again, reply), "one spelling of a reply");
   require(std::ranges::equal(whole->body(reply), inPieces->body(reply)), "one body of a reply");
 }

@@ -164,6 +164,7 @@ Optional<Wait> Call::stepExplaining() {
 }
 
 void Call::acceptReply() {
+  if (exchange_->isLast()) worker_->finish();
   // Before the reply is read: the next worker is forked meanwhile.
   if (pool_.isSpent(*worker_)) pool_.tidy();
   std::exception_ptr error;

@@ -60,6 +60,8 @@ class Exchange {
   /// With State::answered.
   [[nodiscard]] Protocol::ReplyKind kind() const noexcept { return parser_.kind(); }
   [[nodiscard]] Bytes body() const { return parser_.body(received()); }
+  /// Whether the worker ends with it.
+  [[nodiscard]] bool isLast() const noexcept { return parser_.isLast(); }
   /// As the worker sent them so far: not to be shown before escapeLogLine.
   [[nodiscard]] const Array<String>& log() const noexcept { return parser_.log(); }
 

@@ -58,7 +58,7 @@ class Pool {
   std::variant<Worker, Wait> take(std::size_t length, bool fresh, Deadline deadline);
   /// Whether the worker has had its last message.
   [[nodiscard]] bool isSpent(const Worker& worker) const noexcept {
-    return worker.served() >= messagesPerWorker();
+    return worker.isFinished() || worker.served() >= messagesPerWorker();
   }
   /// A worker that has answered. It is used again, or ends.
   void giveBack(Worker worker) noexcept;

@@ -34,6 +34,7 @@ class Worker {
   [[nodiscard]] std::uint64_t served() const noexcept { return served_; }
   /// It ends by itself: it has had its last message.
   void finish() noexcept { finished_ = true; }
+  [[nodiscard]] bool isFinished() const noexcept { return finished_; }
 
   /// How it ended, once the service knows.
   [[nodiscard]] Optional<ServiceProcess::Exit> exit() const { return service_->exitOf(slot_); }

@@ -22,9 +22,25 @@ constexpr std::size_t budgetBase = std::size_t{128} << 20;
 /// any more, and to grant its factor would let 64 MiB of message ask for the whole machine.
 constexpr std::size_t budgetPerByte = 64;
 
-/// Bytes of memory that a message of `length` bytes is worth.
+/// Bytes of memory that a message of `length` bytes is worth: resident, in the worker that decodes
+/// it, and once more in the client for the record.
 constexpr std::size_t memoryBudget(std::uint64_t length) {
   return budgetBase + budgetPerByte * static_cast<std::size_t>(length);
+}
+
+/// What a worker needs beside its heap: the program, a stack for the deepest message, and what the
+/// zygote has allocated.
+constexpr std::size_t processShare = std::size_t{12} << 20;
+
+/// Bytes of heap of a worker for messages of up to `length` bytes.
+constexpr std::size_t heapFor(std::uint64_t length) {
+  return memoryBudget(length) - processShare;
+}
+
+/// Bytes that may be allocated at a time for a message of `length` bytes. The rest of the heap is
+/// for the gaps between blocks, so that this limit is met first, in every worker at the same point.
+constexpr std::size_t allocationLimit(std::uint64_t length) {
+  return heapFor(length) / 16 * 15;
 }
 
 }  // namespace Keelgate

@@ -13,13 +13,18 @@ bool isExpected(const RequestHeader& header, std::uint32_t sequence,
          header.bodyLength <= longestMessage;
 }
 
-void appendReplyFrame(Data& frames, std::uint32_t sequence, ReplyKind kind, Bytes body) {
-  const ReplyHeader header{.magic = magic,
-                           .version = protocolVersion,
-                           .kind = kind,
-                           .sequence = sequence,
-                           .reserved = 0,
-                           .bodyLength = body.size()};
+ReplyHeader makeReplyHeader(std::uint32_t sequence, ReplyKind kind, std::uint64_t bodyLength,
+                            bool last) noexcept {
+  return {.magic = magic,
+          .version = protocolVersion,
+          .kind = kind,
+          .sequence = sequence,
+          .last = last ? 1U : 0U,
+          .bodyLength = bodyLength};
+}
+
+void appendReplyFrame(Data& frames, std::uint32_t sequence, ReplyKind kind, Bytes body, bool last) {
+  const ReplyHeader header = makeReplyHeader(sequence, kind, body.size(), last);
   const Bytes headerBytes = std::as_bytes(std::span(&header, 1));
   frames.reserve(frames.size() + headerBytes.size() + body.size());
   frames.insert(frames.end(), headerBytes.begin(), headerBytes.end());
@@ -66,6 +71,7 @@ ReplyParser::State ReplyParser::parse(Bytes received) {
     needed_ = next_ + sizeof header + header.bodyLength;
     if (received.size() < needed_) break;
     kind_ = header.kind;
+    last_ = header.last != 0;
     offset_ = next_ + sizeof header;
     length_ = header.bodyLength;
     // What lies behind the answer would be taken for the beginning of the next one.
@@ -82,12 +88,13 @@ ReplyParser::State ReplyParser::parse(Bytes received) {
 
 bool ReplyParser::isExpected(const ReplyHeader& header) const noexcept {
   if (header.magic != magic || header.version != protocolVersion || header.sequence != sequence_ ||
-      header.reserved != 0) {
+      header.last > 1) {
     return false;
   }
   switch (header.kind) {
     case ReplyKind::log:
-      return log_.size() < maximumLogFrames && header.bodyLength <= maximumLogLength;
+      return header.last == 0 && log_.size() < maximumLogFrames &&
+             header.bodyLength <= maximumLogLength;
     case ReplyKind::record:
     case ReplyKind::error:
       return header.bodyLength <= largestBody_;

@@ -19,8 +19,13 @@ namespace Keelgate::Protocol {
 bool isExpected(const RequestHeader& header, std::uint32_t sequence,
                 std::uint64_t longestMessage) noexcept;
 
+/// The header of a frame with such a body. `last`: the worker ends after this reply.
+ReplyHeader makeReplyHeader(std::uint32_t sequence, ReplyKind kind, std::uint64_t bodyLength,
+                            bool last = false) noexcept;
+
 /// Adds a frame of a reply to others. Throws std::bad_alloc.
-void appendReplyFrame(Data& frames, std::uint32_t sequence, ReplyKind kind, Bytes body);
+void appendReplyFrame(Data& frames, std::uint32_t sequence, ReplyKind kind, Bytes body,
+                      bool last = false);
 
 /// Fills `bytes`. False at the end of the channel; an error is an end too, because a process with
 /// three system calls has nothing to do about it.
@@ -60,6 +65,8 @@ class ReplyParser {
 
   /// Of a complete reply: what it is, and where among the bytes its body lies.
   [[nodiscard]] ReplyKind kind() const noexcept { return kind_; }
+  /// Whether its worker ends with it.
+  [[nodiscard]] bool isLast() const noexcept { return last_; }
   [[nodiscard]] Bytes body(Bytes received) const { return received.subspan(offset_, length_); }
   /// The log lines so far, as the worker sent them: any bytes at all.
   [[nodiscard]] const Array<String>& log() const noexcept { return log_; }
@@ -72,6 +79,7 @@ class ReplyParser {
   std::size_t next_ = 0;
   std::size_t needed_ = sizeof(ReplyHeader);
   ReplyKind kind_{};
+  bool last_ = false;
   std::size_t offset_ = 0;
   std::size_t length_ = 0;
   Array<String> log_;

@@ -83,8 +83,9 @@ struct ReplyHeader {
   std::uint16_t version;
   ReplyKind kind;
   std::uint32_t sequence;
-  /// Always 0: another number would be a second spelling of one frame.
-  std::uint32_t reserved;
+  /// 1 where the worker ends after this reply, otherwise 0: another number would be a second
+  /// spelling of one frame.
+  std::uint32_t last;
   std::uint64_t bodyLength;
 };
 static_assert(sizeof(ReplyHeader) == 24);

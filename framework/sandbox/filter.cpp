@@ -6,7 +6,9 @@
 #include "framework/sandbox/processes.h"
 
 #include <linux/audit.h>
+#include <sys/mman.h>
 #include <sys/prctl.h>
+#include <sys/resource.h>
 #include <sys/syscall.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -24,8 +26,8 @@ namespace {
 constexpr unsigned channel = serviceDescriptor;
 
 constexpr Rule worker[] = {
-    {SYS_read, Verdict::allowWithFirst, channel},
-    {SYS_write, Verdict::allowWithFirst, channel},
+    {SYS_read, Verdict::allowWith, channel},
+    {SYS_write, Verdict::allowWith, channel},
     {SYS_exit_group, Verdict::allow},
     // Deliberate: 0 and not ENOMEM. The C library takes the result for the new end of the heap and
     // compares it; with an error number it goes on to write past the end.
@@ -37,26 +39,29 @@ constexpr Rule worker[] = {
 constexpr Rule zygote[] = {
     // The zygote's own loop.
     {SYS_ppoll, Verdict::allow},
-    {SYS_recvmsg, Verdict::allowWithFirst, channel},
-    {SYS_sendto, Verdict::allowWithFirst, channel},
-    {SYS_shutdown, Verdict::allowWithFirst, channel},
-    {SYS_clone, Verdict::allowWithFirst, SIGCHLD},
+    {SYS_recvmsg, Verdict::allowWith, channel},
+    {SYS_sendto, Verdict::allowWith, channel},
+    {SYS_shutdown, Verdict::allowWith, channel},
+    {SYS_clone, Verdict::allowWith, SIGCHLD},
     {SYS_wait4, Verdict::allow},
     {SYS_kill, Verdict::allow},
     // A new worker, until it has sealed itself.
     {SYS_dup2, Verdict::allow},
     {SYS_close, Verdict::allow},
     {SYS_close_range, Verdict::allow},
-    {SYS_prctl, Verdict::allowWithFirst, PR_SET_PDEATHSIG},
+    {SYS_prctl, Verdict::allowWith, PR_SET_PDEATHSIG},
     {SYS_getppid, Verdict::allow},
-    {SYS_prlimit64, Verdict::allowWithFirst, 0},
-    {SYS_brk, Verdict::allow},
-    {SYS_seccomp, Verdict::allowWithFirst, SECCOMP_SET_MODE_FILTER},
+    {SYS_prlimit64, Verdict::allowWith, 0},
+    {SYS_setpriority, Verdict::allowWith, PRIO_PROCESS},
+    {SYS_mmap, Verdict::allowWith, PROT_READ | PROT_WRITE, 2, ENOMEM},
+    {SYS_seccomp, Verdict::allowWith, SECCOMP_SET_MODE_FILTER},
     // And what it is left with, which the zygote needs too.
     {SYS_read, Verdict::allow},
     {SYS_write, Verdict::allow},
     {SYS_exit_group, Verdict::allow},
-    {SYS_mmap, Verdict::refuse, ENOMEM},
+    // Refused, as in a worker, so that all memory that comes is in mappings: the kernel places them
+    // with more randomness.
+    {SYS_brk, Verdict::refuse, 0},
 };
 
 /// Calls of the x32 convention have numbers of their own from here, with x86-64's architecture.
@@ -82,11 +87,13 @@ void append(std::vector<sock_filter>& program, const Rule& rule, sock_filter den
       program.insert(program.end(),
                      {unlessEqual(call, 1), answer(SECCOMP_RET_ERRNO | rule.number)});
       return;
-    case Verdict::allowWithFirst:
+    case Verdict::allowWith:
       // x86-64 is little-endian: the half that the kernel reads comes first.
       program.insert(program.end(),
-                     {unlessEqual(call, 4), load(offsetof(seccomp_data, args)),
-                      unlessEqual(rule.number, 1), answer(SECCOMP_RET_ALLOW), denied});
+                     {unlessEqual(call, 4),
+                      load(offsetof(seccomp_data, args) + rule.argument * sizeof(std::uint64_t)),
+                      unlessEqual(rule.number, 1), answer(SECCOMP_RET_ALLOW),
+                      rule.error == 0 ? denied : answer(SECCOMP_RET_ERRNO | rule.error)});
       return;
   }
 }

@@ -15,8 +15,8 @@ namespace Keelgate::Sandbox {
 enum class Verdict {
   /// The call is made.
   allow,
-  /// The call is made when its first argument is `number`, which the kernel reads as 32 bits.
-  allowWithFirst,
+  /// The call is made when its argument is `number`, which the kernel reads as 32 bits.
+  allowWith,
   /// The call is not made and reports `number` as its errno; 0 stands for a result of 0.
   refuse,
 };
@@ -25,6 +25,10 @@ struct Rule {
   int call;
   Verdict verdict;
   unsigned number = 0;
+  /// For allowWith: which argument, from 0.
+  unsigned argument = 0;
+  /// For allowWith: what other calls report as their errno, where they are not to kill.
+  unsigned error = 0;
 };
 
 /// All that a worker can do from before it reads the first byte of a message: C1.

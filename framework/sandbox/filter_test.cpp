@@ -6,6 +6,7 @@
 #include <gtest/gtest.h>
 #include <linux/audit.h>
 #include <linux/seccomp.h>
+#include <sys/mman.h>
 #include <sys/prctl.h>
 #include <sys/syscall.h>
 #include <algorithm>
@@ -96,20 +97,34 @@ TEST(Filter, C1WorkerReadsWritesAndExits) {
 }
 
 TEST(Filter, ZygoteHasNoCallThatOpensOrExecutes) {
-  const std::vector<int> free{SYS_ppoll, SYS_wait4, SYS_kill,        SYS_dup2,
-                              SYS_close, SYS_brk,   SYS_close_range, SYS_getppid,
-                              SYS_read,  SYS_write, SYS_exit_group};
+  const std::vector<int> free{SYS_ppoll,       SYS_wait4,   SYS_kill, SYS_dup2,  SYS_close,
+                              SYS_close_range, SYS_getppid, SYS_read, SYS_write, SYS_exit_group};
   expectEverywhere(zygoteRules(), [&](int number, unsigned first) -> unsigned {
     const bool allowed =
         std::find(free.begin(), free.end(), number) != free.end() ||
         ((number == SYS_recvmsg || number == SYS_sendto || number == SYS_shutdown) && first == 3) ||
         (number == SYS_clone && first == SIGCHLD) ||
         (number == SYS_prctl && first == PR_SET_PDEATHSIG) ||
-        (number == SYS_prlimit64 && first == 0) ||
-        (number == SYS_seccomp && first == SECCOMP_SET_MODE_FILTER);
-    if (number == SYS_mmap) return SECCOMP_RET_ERRNO | 12;
+        ((number == SYS_prlimit64 || number == SYS_setpriority) && first == 0) ||
+        // Its third argument is 3 here: readable and writable memory.
+        number == SYS_mmap || (number == SYS_seccomp && first == SECCOMP_SET_MODE_FILTER);
+    if (number == SYS_brk) return SECCOMP_RET_ERRNO;
     return allowed ? SECCOMP_RET_ALLOW : SECCOMP_RET_KILL_PROCESS;
   });
+}
+
+/// Memory that can be executed is what a filter must not give, whatever the other bits are.
+TEST(Filter, ZygoteMapsMemoryToReadAndWriteAlone) {
+  const std::vector<sock_filter> program = compile(zygoteRules());
+  for (const std::uint64_t protection : arguments) {
+    const seccomp_data data{.nr = SYS_mmap,
+                            .arch = AUDIT_ARCH_X86_64,
+                            .instruction_pointer = 0,
+                            .args = {3, 3, protection, 3, 3, 3}};
+    const bool allowed = static_cast<unsigned>(protection) == (PROT_READ | PROT_WRITE);
+    EXPECT_EQ(run(program, data), allowed ? SECCOMP_RET_ALLOW : SECCOMP_RET_ERRNO | 12)
+        << protection;
+  }
 }
 
 }  // namespace

@@ -1,19 +1,30 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The heap: all of it is there before the first byte from outside is read, and no more comes.
+/// The heap of a worker: all of it is there before the first byte from outside is read, and no more
+/// comes.
+///
+/// It lies in a mapping that the kernel places, and begins at a random point of it. The area that
+/// the C library grows by itself, next to where a static program ends, has 18 bits of randomness:
+/// a message that fills a few megabytes would find its own bytes at an address that it can guess.
+///
+/// For single-threaded processes.
 #pragma once
 
 #include <cstddef>
 
 namespace Keelgate::Sandbox {
 
-/// Makes the allocator live on one growing area that never shrinks, grows it as far as a short
-/// message needs, and has the exception runtime do its one-time work, whose system call a sealed
-/// worker could not make. Throws StartError. Single-threaded callers only.
+/// The zygote's part, before its filter: settings of the allocator, a trial whether the machine
+/// gives the heap of a short message, and the one-time work of the exception runtime, whose system
+/// call a sealed worker could not make. Throws StartError.
 void prepareHeap();
 
-/// Grows the free part of the heap to `bytes`, or to the half, a quarter and so on, and at the
-/// least to the base, where the machine has not that much: most messages need little of what they
-/// may have. False when not even that is to be had.
-bool growHeap(std::size_t bytes) noexcept;
+/// The zygote's part, under its filter, which gives no memory next to the program any more: takes
+/// what is left there, so that nothing of it is ever handed out to a message.
+void abandonFirstHeap();
+
+/// The worker's part: maps a heap of so many bytes, or of the half, a quarter and so on, where the
+/// machine has not that much: most messages need little of what they may have. Throws StartError
+/// when not even the heap of an empty message is to be had.
+void reserveHeap(std::size_t bytes);
 
 }  // namespace Keelgate::Sandbox

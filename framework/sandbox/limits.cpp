@@ -4,33 +4,46 @@
 #include "framework/contracts/process.h"
 #include "framework/contracts/start_step.h"
 
+#include <fcntl.h>
+#include <unistd.h>
 #include <algorithm>
 
 namespace Keelgate::Sandbox {
 
 namespace {
 
-void limit(__rlimit_resource resource, rlim_t soft, rlim_t hard) {
+/// Seconds that a worker may have at the most, as the one who started the service has set it.
+rlim_t cpuCeiling = RLIM_INFINITY;
+
+void set(__rlimit_resource resource, rlim_t soft, rlim_t hard) {
 #ifndef KEELGATE_UNSEALED
-  // Never up: the one who started the service may have set a lower one.
-  rlimit now{};
-  if (getrlimit(resource, &now) != 0) throw StartError(StartStep::lowerLimits);
-  const rlimit lowered{.rlim_cur = std::min(soft, now.rlim_max),
-                       .rlim_max = std::min(hard, now.rlim_max)};
-  if (setrlimit(resource, &lowered) != 0) throw StartError(StartStep::lowerLimits);
+  const rlimit limit{.rlim_cur = soft, .rlim_max = hard};
+  if (setrlimit(resource, &limit) != 0) throw StartError(StartStep::lowerLimits);
 #else
   static_cast<void>(resource), static_cast<void>(soft), static_cast<void>(hard);
 #endif
 }
 
+rlim_t ceilingOf(__rlimit_resource resource) {
+  rlimit now{};
+  if (getrlimit(resource, &now) != 0) throw StartError(StartStep::lowerLimits);
+  return now.rlim_max;
+}
+
+/// Never up: the one who started the service may have set a lower one.
+void lower(__rlimit_resource resource, rlim_t limit) {
+  const rlim_t lowered = std::min(limit, ceilingOf(resource));
+  set(resource, lowered, lowered);
+}
+
 }  // namespace
 
 void limitZygote() {
-  limit(RLIMIT_CORE, 0, 0);
-  limit(RLIMIT_FSIZE, 0, 0);
-  limit(RLIMIT_MEMLOCK, 0, 0);
-  limit(RLIMIT_MSGQUEUE, 0, 0);
-  limit(RLIMIT_STACK, stackLimit, stackLimit);
+  lower(RLIMIT_CORE, 0);
+  lower(RLIMIT_FSIZE, 0);
+  lower(RLIMIT_MEMLOCK, 0);
+  lower(RLIMIT_MSGQUEUE, 0);
+  lower(RLIMIT_STACK, stackLimit);
 #ifndef KEELGATE_UNSEALED
   // With less an honest message would die of its depth, as if it were an attack.
   rlimit stack{};
@@ -38,14 +51,29 @@ void limitZygote() {
     throw StartError(StartStep::checkStack, 0);
   }
 #endif
-  limit(RLIMIT_NOFILE, zygoteDescriptors, zygoteDescriptors);
+  lower(RLIMIT_NOFILE, zygoteDescriptors);
+  cpuCeiling = ceilingOf(RLIMIT_CPU);
 }
 
 void limitWorker(std::uint64_t cpuSeconds) {
-  limit(RLIMIT_NPROC, 0, 0);
-  limit(RLIMIT_NOFILE, serviceDescriptor + 1, serviceDescriptor + 1);
+  // By what the zygote has: each look at a limit is a system call, and workers are many.
+  set(RLIMIT_NPROC, 0, 0);
+  set(RLIMIT_NOFILE, serviceDescriptor + 1, serviceDescriptor + 1);
   // The kernel takes 0 for 1. The second more lets the readable signal come first.
-  limit(RLIMIT_CPU, cpuSeconds, cpuSeconds + 1);
+  set(RLIMIT_CPU, std::min<rlim_t>(cpuSeconds, cpuCeiling),
+      std::min<rlim_t>(cpuSeconds + 1, cpuCeiling));
+}
+
+void offerMemoryFirst() {
+  const int file = open("/proc/self/oom_score_adj", O_WRONLY | O_CLOEXEC);
+  if (file < 0) return;
+  static_cast<void>(!write(file, "1000", 4));
+  close(file);
+}
+
+void lowerPriority() {
+  constexpr int lowest = 19;
+  if (setpriority(PRIO_PROCESS, 0, lowest) != 0) throw StartError(StartStep::lowerLimits);
 }
 
 }  // namespace Keelgate::Sandbox

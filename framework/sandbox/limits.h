@@ -20,9 +20,17 @@ constexpr rlim_t zygoteDescriptors = 16;
 /// bounded stack. Throws StartError.
 void limitZygote();
 
-/// For a worker: no further process, no further descriptor, and `cpuSeconds` of processor time, at
-/// the end of which it gets SIGXCPU. Behind the client's deadline, for a client that was stopped.
-/// Throws StartError.
+/// For a worker, after limitZygote in its zygote: no further process, no further descriptor, and
+/// `cpuSeconds` of processor time, at the end of which it gets SIGXCPU. Behind the client's
+/// deadline, for a client that was stopped. Throws StartError.
 void limitWorker(std::uint64_t cpuSeconds);
+
+/// For the zygote and all that it forks: the kernel looks for memory here first when the machine
+/// runs out of it. Where that is refused, or /proc is not there, nothing changes.
+void offerMemoryFirst();
+
+/// For a worker: everybody else who wants the processor gets it first, the zygote and the client
+/// among them, so that a message that wastes it costs others little. Throws StartError.
+void lowerPriority();
 
 }  // namespace Keelgate::Sandbox

@@ -18,6 +18,7 @@
 
 #include <poll.h>
 #include <unistd.h>
+#include <algorithm>
 #include <ctime>
 
 namespace Keelgate::Sandbox {
@@ -61,6 +62,7 @@ ZygoteSeal sealZygote() {
   renounceNewPrivileges();
   layers |= layerNoNewPrivileges;
 
+  offerMemoryFirst();
   layers |= unshareNamespaces();
   if ((layers & layerMountNamespace) != 0 && enterEmptyRoot()) layers |= layerEmptyRoot;
 
@@ -83,6 +85,7 @@ ZygoteSeal sealZygote() {
   proveEnforced(workerRules());
   seal.workerFilter = compile(workerRules());
   enforce(compile(zygoteRules()));
+  abandonFirstHeap();
   seal.layers = layers | layerStrictFilter | layerOneDescriptor;
 #else
   static_cast<void>(layers);
@@ -97,8 +100,8 @@ void sealWorker(const WorkerSeal& seal) {
   if (getppid() != seal.parent) _exit(0);
 #ifndef KEELGATE_UNSEALED
   limitWorker(seal.cpuSeconds);
-  // Where there is no more to be had, the zygote's is enough for most messages.
-  if (seal.longestMessage > shortMessage) growHeap(memoryBudget(seal.longestMessage));
+  lowerPriority();
+  reserveHeap(heapFor(std::max(seal.longestMessage, shortMessage)));
   if (!isAwaited()) touchPages();
   enforce(seal.filter);
 #endif

@@ -3,10 +3,12 @@
 /// state, and no way back into the zygote.
 #include "framework/server/worker.h"
 
+#include "framework/contracts/memory_budget.h"
 #include "framework/contracts/process.h"
 #include "framework/contracts/start_step.h"
 #include "framework/protocol/data_frames.h"
 #include "framework/sandbox/seal.h"
+#include "framework/server/message_memory.h"
 
 #include <unistd.h>
 #include <algorithm>
@@ -33,8 +35,11 @@ RequestHeader receiveHeader(std::uint32_t sequence, std::uint64_t longestMessage
   return header;
 }
 
-/// All frames of a reply in one piece, so that most replies are one write.
-Data frame(const Reply& reply, std::uint32_t sequence) {
+/// Smaller bodies are sent together with their header: a write costs more than a copy.
+constexpr std::size_t copiedBody = 64 * 1024;
+
+/// False when the client has gone.
+bool send(const Reply& reply, std::uint32_t sequence, bool last) {
   Data frames;
   std::size_t lines = 0;
   // Cut here so that an honest worker keeps within what its client will take.
@@ -42,14 +47,23 @@ Data frame(const Reply& reply, std::uint32_t sequence) {
     if (++lines > Protocol::maximumLogFrames) break;
     const Bytes bytes = std::as_bytes(std::span(line));
     Protocol::appendReplyFrame(frames, sequence, ReplyKind::log,
-                               bytes.first(std::min(line.size(), Protocol::maximumLogLength)));
+                               bytes.first(std::min(bytes.size(), Protocol::maximumLogLength)));
   }
-  Protocol::appendReplyFrame(frames, sequence, reply.kind, reply.body);
-  return frames;
+  if (reply.body.size() <= copiedBody) {
+    Protocol::appendReplyFrame(frames, sequence, reply.kind, reply.body, last);
+    return Protocol::writeAll(serviceDescriptor, frames);
+  }
+  const auto header = Protocol::makeReplyHeader(sequence, reply.kind, reply.body.size(), last);
+  return Protocol::writeAll(serviceDescriptor, frames) &&
+         Protocol::writeAll(serviceDescriptor, std::as_bytes(std::span(&header, 1))) &&
+         Protocol::writeAll(serviceDescriptor, reply.body);
 }
 
-/// From the first byte of the body on, this is the part that a stranger may take over.
-void answer(const KeelgateServer& server, const RequestHeader& header) {
+/// From the first byte of the body on, this is the part that a stranger may take over. False when
+/// the worker has nothing more to give: a process cannot give back memory under its filter, so one
+/// that has taken more than any short message may ends.
+bool answer(const KeelgateServer& server, const RequestHeader& header) {
+  MessageMemory::begin(allocationLimit(header.bodyLength));
   const std::size_t size = header.serviceLength + header.bodyLength;
   // One piece for both, so one allocation and one read; not zeroed, because it is filled at once.
   const auto bytes = std::make_unique_for_overwrite<std::byte[]>(size);
@@ -59,7 +73,9 @@ void answer(const KeelgateServer& server, const RequestHeader& header) {
        .message = {bytes.get() + header.serviceLength, header.bodyLength},
        .command = header.command,
        .service = {reinterpret_cast<const char*>(bytes.get()), header.serviceLength}});
-  if (!Protocol::writeAll(serviceDescriptor, frame(reply, header.sequence))) _exit(0);
+  const bool last = MessageMemory::peak() > allocationLimit(0);
+  if (!send(reply, header.sequence, last)) _exit(0);
+  return !last;
 }
 
 }  // namespace
@@ -68,7 +84,7 @@ void work(const KeelgateServer& server, std::uint64_t messages,
           const Sandbox::WorkerSeal& seal) try {
   Sandbox::sealWorker(seal);
   for (std::uint32_t sequence = 0; sequence != messages; ++sequence) {
-    answer(server, receiveHeader(sequence, seal.longestMessage));
+    if (!answer(server, receiveHeader(sequence, seal.longestMessage))) break;
   }
   _exit(0);
 } catch (const std::bad_alloc&) {

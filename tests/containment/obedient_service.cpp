@@ -10,10 +10,11 @@
 ///     vsyscall N       slot N of the vsyscall page
 ///     say HEX          writes these bytes to the channel, and answers afterwards
 ///     drip HEX         the same, one byte a second
-///     eat BYTES        takes and touches that much memory in pieces of 64 KiB, and keeps it
-///     count            how many of these this process has been given
-///     log N LENGTH     logs N lines of that length, and answers
-///     fault | trap | abort | recurse | spin | throw | execute
+///     eat BYTES PIECE  takes and touches that much memory in pieces of so many bytes, 64 KiB
+///                      without PIECE, and keeps it until it has answered
+///     address WHAT     where the program (0), its stack (1), a small block (2), a large one (3)
+///     lie count            how many of these this process has been given log N LENGTH     logs N
+///     lines of that length, and answers fault | trap | abort | recurse | spin | throw | execute
 ///     answer           behaves
 #include "framework/contracts/log.h"
 #include "framework/contracts/process.h"
@@ -79,14 +80,29 @@ void say(const std::string& hex, bool slowly) {
   }
 }
 
-void eat(std::size_t bytes) {
-  constexpr std::size_t piece = 65536;
-  // Never freed: it is held until the process ends.
-  // NOLINTBEGIN(clang-analyzer-cplusplus.NewDeleteLeaks)
+void eat(std::size_t bytes, std::size_t piece) {
+  struct Piece {
+    std::unique_ptr<std::byte[]> memory;
+    std::unique_ptr<Piece> next;
+  };
+  std::unique_ptr<Piece> first;
   for (std::size_t eaten = 0; eaten < bytes; eaten += piece) {
-    std::memset(new std::byte[piece], 1, piece);
+    auto another = std::make_unique<Piece>();
+    another->memory = std::make_unique_for_overwrite<std::byte[]>(piece);
+    std::memset(another->memory.get(), 1, piece);
+    another->next = std::move(first);
+    first = std::move(another);
   }
-  // NOLINTEND(clang-analyzer-cplusplus.NewDeleteLeaks)
+  // One by one: a list that frees itself would need a stack as deep as it is long.
+  while (first) first = std::move(first->next);
+}
+
+long addressOf(long what) {
+  const char here = 0;
+  const auto small = std::make_unique<char[]>(24);
+  const auto large = std::make_unique<char[]>(1 << 22);
+  const void* const all[] = {marker, &here, small.get(), large.get()};
+  return reinterpret_cast<long>(all[what]);
 }
 
 /// Calls itself until the stack ends; no message has this many levels.
@@ -137,7 +153,11 @@ long obey(const std::string& order) {
   if (verb == "call") return call(numbers);
   if (verb == "int80") return callByGate(numbers.at(0), numbers.at(1));
   if (verb == "vsyscall") return callVsyscall(numbers.at(0));
-  if (verb == "eat") eat(static_cast<std::size_t>(numbers.at(0)));
+  if (verb == "eat") {
+    numbers.resize(2, 65'536);
+    eat(static_cast<std::size_t>(numbers[0]), static_cast<std::size_t>(numbers[1]));
+  }
+  if (verb == "address") return addressOf(numbers.at(0));
   misbehave(verb);
   return 0;
 }

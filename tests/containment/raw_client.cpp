@@ -171,11 +171,12 @@ RawReply receiveReply(int channel, std::uint32_t sequence) {
   Data received;
   for (std::size_t filled = 0; parser.parse(received) == ReplyParser::State::incomplete;) {
     received.resize(parser.needed());
-    if (!readAll(channel, std::span(received).subspan(filled))) return {parser.log(), {}, {}};
+    if (!readAll(channel, std::span(received).subspan(filled)))
+      return {parser.log(), {}, {}, false};
     filled = received.size();
   }
   const Bytes body = parser.body(received);
-  return {parser.log(), parser.kind(), Data(body.begin(), body.end())};
+  return {parser.log(), parser.kind(), Data(body.begin(), body.end()), parser.isLast()};
 }
 
 Optional<Int64> resultOf(const RawReply& reply) {

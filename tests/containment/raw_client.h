@@ -34,6 +34,7 @@ struct RawReply {
   std::vector<std::string> log;
   Optional<Protocol::ReplyKind> kind;
   Data body;
+  bool last = false;
 };
 
 struct RawOptions {

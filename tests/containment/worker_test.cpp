@@ -1,10 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 /// What one worker can do to the others, to the machine and to the protocol.
 #include "framework/contracts/layers.h"
-#include "framework/contracts/memory_budget.h"
 #include "framework/contracts/start_step.h"
 #include "framework/protocol/data_frames.h"
-#include "tests/containment/raw_client.h"
+#include "tests/containment/containment_testing.h"
 
 #include <gtest/gtest.h>
 #include <keelgate/records.h>
@@ -21,25 +20,6 @@
 
 namespace Keelgate::Test {
 namespace {
-
-#ifdef KEELGATE_UNSEALED
-#define NEEDS_SEAL() GTEST_SKIP() << "this build has no seal"
-#else
-#define NEEDS_SEAL() static_cast<void>(0)
-#endif
-
-/// A service that is ready; workers that must go on answering afterwards.
-class Worker : public testing::Test {
- protected:
-  void SetUp() override { ASSERT_TRUE(service_.ready()) << service_.refusal(); }
-  void TearDown() override {
-    if (!HasFatalFailure() && !IsSkipped()) {
-      EXPECT_EQ(resultOf(service_.obey("answer").first), 0);
-    }
-  }
-
-  RawClient service_{OBEDIENT_SERVICE};
-};
 
 std::string readAll(const std::string& path) {
   std::ostringstream text;
@@ -132,45 +112,23 @@ TEST_F(Worker, C3SeenFromOutside) {
   close(spinning);
 }
 
-TEST_F(Worker, C4MemoryIsFixedBeforeTheMessageIsRead) {
+TEST_F(Worker, GivesWayToOthers) {
   NEEDS_SEAL();
-  constexpr std::size_t base = memoryBudget(shortMessage);
-  constexpr std::size_t length = 1 << 20;
-  const auto eat = [&](std::size_t bytes, std::size_t messageLength) {
-    std::string order = "eat " + std::to_string(bytes);
-    order.resize(std::max(order.size(), messageLength), ' ');
-    return service_.obey(order);
+  const int channel = service_.fork(1);
+  sendOrder(channel, "spin");
+  while (service_.workers().empty()) usleep(1000);
+  const auto niceOf = [](pid_t process) {
+    return getpriority(PRIO_PROCESS, static_cast<id_t>(process));
   };
-  constexpr std::size_t worth = memoryBudget(length);
-  constexpr std::size_t slack = 8 << 20;
-  EXPECT_EQ(resultOf(eat(base - slack, 0).first), 0);
-  EXPECT_EQ(resultOf(eat(worth - slack, length).first), 0);
-  for (const auto& [bytes, messageLength] : {std::pair(base + slack, std::size_t{0}),
-                                             {worth + slack, length},
-                                             {std::size_t{1} << 40, length}}) {
-    const auto [reply, end] = eat(bytes, messageLength);
-    EXPECT_FALSE(reply.kind);
-    EXPECT_EQ(end.exitStatus(), Protocol::resourceExitStatus);
-    EXPECT_LT(end.peakBytes, worth + slack);
-  }
-}
-
-TEST_F(Worker, C4AMachineThatHasLessStillAnswers) {
-  NEEDS_SEAL();
-  // Of address space, in MiB; the least is hardly more than what the zygote needs.
-  for (const rlim_t space : {160U, 200U, 300U, 512U}) {
-    RawOptions options;
-    options.before = [space] {
-      const rlimit little{.rlim_cur = space << 20, .rlim_max = space << 20};
-      setrlimit(RLIMIT_AS, &little);
-    };
-    RawClient service(OBEDIENT_SERVICE, options);
-    for (const std::size_t length : {6U, 1U << 18, 1U << 20, 3U << 20, 8U << 20}) {
-      std::string order = "answer";
-      order.resize(length, ' ');
-      EXPECT_EQ(resultOf(service.obey(order).first), 0) << space << " for " << length;
-    }
-  }
+  const pid_t worker = service_.workers()[0];
+  // It does so before it is sealed, which is soon.
+  for (int i = 0; i < 5000 && niceOf(worker) != 19; ++i) usleep(1000);
+  EXPECT_EQ(niceOf(worker), 19);
+  EXPECT_EQ(niceOf(service_.zygote()), niceOf(getpid()));
+  EXPECT_EQ(readAll("/proc/" + std::to_string(worker) + "/oom_score_adj"), "1000\n");
+  service_.kill(1);
+  service_.end(1);
+  close(channel);
 }
 
 TEST(Stack, TheDeepestMessageFits) {

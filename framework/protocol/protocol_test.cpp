@@ -1,0 +1,231 @@
+// SPDX-License-Identifier: Apache-2.0
+/// The frames of both channels: what one end sends the other takes, in whatever pieces it comes;
+/// anything that is not exactly right is refused.
+#include "framework/protocol/control_frames.h"
+#include "framework/protocol/data_frames.h"
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <sys/socket.h>
+#include <unistd.h>
+#include <algorithm>
+#include <array>
+#include <cstring>
+#include <functional>
+#include <utility>
+#include <vector>
+
+namespace Keelgate::Protocol {
+namespace {
+
+using State = ReplyParser::State;
+
+constexpr std::uint32_t sequence = 7;
+constexpr std::uint64_t largestBody = 1000;
+
+Data octets(std::size_t size) {
+  return Data(size, std::byte{'x'});
+}
+
+Data replyOf(std::size_t logLines, std::size_t logLength, std::size_t bodyLength,
+             ReplyKind kind = ReplyKind::record) {
+  Data reply;
+  for (std::size_t i = 0; i < logLines; ++i) {
+    appendReplyFrame(reply, sequence, ReplyKind::log, octets(logLength));
+  }
+  appendReplyFrame(reply, sequence, kind, octets(bodyLength), kind == ReplyKind::error);
+  return reply;
+}
+
+State parse(Bytes reply) {
+  return ReplyParser(sequence, largestBody).parse(reply);
+}
+
+TEST(Reply, IsTheSameInWhateverPiecesItArrives) {
+  const Data reply = replyOf(2, 5, 20, ReplyKind::error);
+  for (std::size_t step = 1; step <= reply.size(); ++step) {
+    ReplyParser parser(sequence, largestBody);
+    std::size_t arrived = 0;
+    State state = parser.parse({});
+    while (state == State::incomplete) {
+      ASSERT_LT(arrived, reply.size());
+      // It never wants more than there is, or a reader that waits for it would wait for ever.
+      EXPECT_GT(parser.needed(), arrived);
+      EXPECT_LE(parser.needed(), reply.size());
+      // To the end of a header, or of a body.
+      const std::size_t inFrame = parser.needed() % (sizeof(ReplyHeader) + 5);
+      EXPECT_TRUE(inFrame == sizeof(ReplyHeader) || inFrame == 0 ||
+                  parser.needed() == reply.size());
+      arrived = std::min(arrived + step, reply.size());
+      state = parser.parse(Bytes(reply).first(arrived));
+    }
+    ASSERT_EQ(state, State::complete) << step;
+    EXPECT_EQ(parser.kind(), ReplyKind::error);
+    EXPECT_TRUE(parser.isLast());
+    EXPECT_EQ(parser.log(), Array<String>(2, "xxxxx"));
+    EXPECT_EQ(parser.body(reply).size(), 20u);
+    EXPECT_EQ(parser.body(reply).data(), reply.data() + reply.size() - 20);
+  }
+}
+
+TEST(Reply, KeepsItsLimits) {
+  EXPECT_EQ(parse(replyOf(maximumLogFrames, maximumLogLength, largestBody)), State::complete);
+  EXPECT_EQ(parse(replyOf(maximumLogFrames + 1, 1, 1)), State::malformed);
+  EXPECT_EQ(parse(replyOf(1, maximumLogLength + 1, 1)), State::malformed);
+  EXPECT_EQ(parse(replyOf(0, 0, largestBody + 1)), State::malformed);
+  Data longer = replyOf(0, 0, 1);
+  longer.push_back({});
+  EXPECT_EQ(parse(longer), State::malformed);
+}
+
+/// A header alone shows it: nothing is waited for on its word.
+TEST(Reply, EveryWrongFieldShowsInItsHeader) {
+  const auto headerWith = [](ReplyKind kind, auto change) {
+    ReplyHeader header = makeReplyHeader(sequence, kind, 10);
+    change(header);
+    const Bytes bytes = std::as_bytes(std::span(&header, 1));
+    return parse(bytes);
+  };
+  for (const ReplyKind kind : {ReplyKind::log, ReplyKind::record, ReplyKind::error}) {
+    EXPECT_EQ(headerWith(kind, [](ReplyHeader&) {}), State::incomplete);
+    EXPECT_EQ(headerWith(kind, [](auto& h) { h.magic ^= 1; }), State::malformed);
+    EXPECT_EQ(headerWith(kind, [](auto& h) { ++h.version; }), State::malformed);
+    EXPECT_EQ(headerWith(kind, [](auto& h) { ++h.sequence; }), State::malformed);
+    EXPECT_EQ(headerWith(kind, [](auto& h) { h.last = 2; }), State::malformed);
+    EXPECT_EQ(headerWith(kind, [](auto& h) { h.bodyLength = ~std::uint64_t{0}; }),
+              State::malformed);
+    EXPECT_EQ(headerWith(kind, [](auto& h) { h.last = 1; }),
+              kind == ReplyKind::log ? State::malformed : State::incomplete);
+  }
+  for (const int kind : {0, 4, 65535}) {
+    EXPECT_EQ(headerWith(ReplyKind(kind), [](ReplyHeader&) {}), State::malformed) << kind;
+  }
+}
+
+TEST(Request, IsExpectedWithinItsLimits) {
+  const RequestHeader right = makeRequestHeader(1, 2, maximumServiceLength, 100, sequence);
+  EXPECT_TRUE(isExpected(right, sequence, 100));
+  EXPECT_FALSE(isExpected(right, sequence, 99));
+  EXPECT_FALSE(isExpected(right, sequence + 1, 100));
+  EXPECT_FALSE(
+      isExpected(makeRequestHeader(1, 2, maximumServiceLength + 1, 0, sequence), sequence, 100));
+  RequestHeader wrong = right;
+  wrong.magic ^= 1;
+  EXPECT_FALSE(isExpected(wrong, sequence, 100));
+  wrong = right;
+  ++wrong.version;
+  EXPECT_FALSE(isExpected(wrong, sequence, 100));
+}
+
+/// Both ends of a control channel.
+class Control : public testing::Test {
+ protected:
+  Control() { EXPECT_EQ(socketpair(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0, ends_.data()), 0); }
+  ~Control() override {
+    for (const int end : ends_) close(end);
+  }
+
+  /// What the client's end, and the zygote's, make of the same packet.
+  std::pair<Transfer, Transfer> taken(Bytes packet, const std::vector<int>& descriptors = {}) {
+    std::pair<Transfer, Transfer> both{};
+    send(packet, descriptors);
+    ControlFrame frame{};
+    both.first = receiveControl(ends_[1], frame, Waiting::no);
+    send(packet, descriptors);
+    int descriptor = noDescriptor;
+    both.second = receiveControl(ends_[1], frame, descriptor, Waiting::no);
+    if (descriptor != noDescriptor) close(descriptor);
+    return both;
+  }
+
+  std::array<int, 2> ends_{};
+
+ private:
+  void send(Bytes packet, const std::vector<int>& descriptors) {
+    iovec piece{.iov_base = const_cast<std::byte*>(packet.data()), .iov_len = packet.size()};
+    alignas(cmsghdr) std::array<char, CMSG_SPACE(4 * sizeof(int))> room{};
+    msghdr message{};
+    message.msg_iov = &piece;
+    message.msg_iovlen = 1;
+    if (!descriptors.empty()) {
+      const std::size_t size = descriptors.size() * sizeof(int);
+      message.msg_control = room.data();
+      message.msg_controllen = CMSG_SPACE(size);
+      cmsghdr* const item = CMSG_FIRSTHDR(&message);
+      item->cmsg_level = SOL_SOCKET;
+      item->cmsg_type = SCM_RIGHTS;
+      item->cmsg_len = CMSG_LEN(size);
+      std::memcpy(CMSG_DATA(item), descriptors.data(), size);
+    }
+    EXPECT_EQ(sendmsg(ends_[0], &message, 0), static_cast<ssize_t>(packet.size()));
+  }
+};
+
+template <class T>
+Bytes bytesOf(const T& value) {
+  return std::as_bytes(std::span(&value, 1));
+}
+
+TEST_F(Control, FramesArriveWholeWithTheirDescriptor) {
+  const ControlFrame fork = makeControlFrame(ControlKind::fork, 5, {1, 2, 3, 4});
+  ASSERT_EQ(sendControl(ends_[0], fork, STDERR_FILENO, Waiting::no), Transfer::complete);
+  ControlFrame received{};
+  int descriptor = noDescriptor;
+  ASSERT_EQ(receiveControl(ends_[1], received, descriptor, Waiting::yes), Transfer::complete);
+  EXPECT_EQ(std::memcmp(&received, &fork, sizeof fork), 0);
+  EXPECT_EQ(fcntl(descriptor, F_GETFD), FD_CLOEXEC);
+  close(descriptor);
+  EXPECT_EQ(receiveControl(ends_[1], received, Waiting::no), Transfer::wouldBlock);
+  close(std::exchange(ends_[0], -1));
+  EXPECT_EQ(receiveControl(ends_[1], received, Waiting::yes), Transfer::ended);
+  EXPECT_EQ(sendControl(ends_[1], fork, noDescriptor, Waiting::yes), Transfer::ended);
+}
+
+TEST_F(Control, AFullChannelIsToldFromOneThatHasEnded) {
+  const ControlFrame frame = makeControlFrame(ControlKind::kill, 1);
+  Transfer sent = Transfer::complete;
+  while (sent == Transfer::complete) sent = sendControl(ends_[0], frame, noDescriptor, Waiting::no);
+  EXPECT_EQ(sent, Transfer::wouldBlock);
+}
+
+TEST_F(Control, OnlyAForkBringsADescriptorAndOnlyOne) {
+  constexpr auto complete = Transfer::complete;
+  constexpr auto malformed = Transfer::malformed;
+  for (const ControlKind kind : {ControlKind::hello, ControlKind::kill, ControlKind::exit}) {
+    EXPECT_EQ(taken(bytesOf(makeControlFrame(kind))), std::pair(complete, complete));
+    EXPECT_EQ(taken(bytesOf(makeControlFrame(kind)), {2}), std::pair(malformed, malformed));
+  }
+  const ControlFrame fork = makeControlFrame(ControlKind::fork);
+  EXPECT_EQ(taken(bytesOf(fork)), std::pair(complete, malformed));
+  EXPECT_EQ(taken(bytesOf(fork), {2}), std::pair(malformed, complete));
+  EXPECT_EQ(taken(bytesOf(fork), {2, 2}), std::pair(malformed, malformed));
+  EXPECT_EQ(taken(bytesOf(fork), {2, 2, 2}), std::pair(malformed, malformed));
+}
+
+TEST_F(Control, PacketsThatAreNotExactlyAFrameAreRefused) {
+  const auto bothMalformed = std::pair(Transfer::malformed, Transfer::malformed);
+  const std::array<ControlFrame, 2> frames{makeControlFrame(ControlKind::kill, 3),
+                                           makeControlFrame(ControlKind::kill, 3)};
+  const Bytes bytes = std::as_bytes(std::span(frames));
+  for (const std::size_t size :
+       {std::size_t{1}, sizeof frames[0] - 1, sizeof frames[0] + 1, 2 * sizeof frames[0]}) {
+    EXPECT_EQ(taken(bytes.first(size)), bothMalformed) << size;
+  }
+  for (auto change : std::initializer_list<void (*)(ControlFrame&)>{
+           [](ControlFrame& f) { f.magic ^= 1; }, [](ControlFrame& f) { --f.version; },
+           [](ControlFrame& f) {
+             f.reserved = 1;
+           }}) {
+    ControlFrame wrong = frames[0];
+    change(wrong);
+    EXPECT_EQ(taken(bytesOf(wrong)), bothMalformed);
+  }
+}
+
+TEST(Version, IsReadBackAsText) {
+  EXPECT_EQ(versionText((std::uint64_t{1} << 32) + (2 << 16) + 65535), "1.2.65535");
+  EXPECT_NE(ownVersion(), 0u);
+}
+
+}  // namespace
+}  // namespace Keelgate::Protocol

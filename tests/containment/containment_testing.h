@@ -1,0 +1,30 @@
+// SPDX-License-Identifier: Apache-2.0
+/// What the tests of workers share.
+#pragma once
+
+#include "tests/containment/raw_client.h"
+
+#include <gtest/gtest.h>
+
+namespace Keelgate::Test {
+
+#ifdef KEELGATE_UNSEALED
+#define NEEDS_SEAL() GTEST_SKIP() << "this build has no seal"
+#else
+#define NEEDS_SEAL() static_cast<void>(0)
+#endif
+
+/// A service that is ready; workers that must go on answering afterwards.
+class Worker : public testing::Test {
+ protected:
+  void SetUp() override { ASSERT_TRUE(service_.ready()) << service_.refusal(); }
+  void TearDown() override {
+    if (!HasFatalFailure() && !IsSkipped()) {
+      EXPECT_EQ(resultOf(service_.obey("answer").first), 0);
+    }
+  }
+
+  RawClient service_{OBEDIENT_SERVICE};
+};
+
+}  // namespace Keelgate::Test

@@ -1,0 +1,148 @@
+// SPDX-License-Identifier: Apache-2.0
+/// How much memory a message gets, and where it lies.
+#include "framework/contracts/memory_budget.h"
+#include "tests/containment/containment_testing.h"
+
+#include <gtest/gtest.h>
+#include <sys/resource.h>
+#include <unistd.h>
+#include <algorithm>
+#include <bit>
+#include <map>
+#include <utility>
+
+namespace Keelgate::Test {
+namespace {
+
+/// An order to take so much memory, in a message of so many bytes.
+std::string toEat(std::size_t bytes, std::size_t piece, std::size_t length) {
+  std::string order = "eat " + std::to_string(bytes) + ' ' + std::to_string(piece);
+  order.resize(std::max(order.size(), length), ' ');
+  return order;
+}
+
+constexpr std::size_t piece = 65536;
+
+TEST_F(Worker, C4MemoryIsFixedBeforeTheMessageIsRead) {
+  NEEDS_SEAL();
+  // A short one, though its worker was made for any short one; and a longer one.
+  for (const std::size_t length : {std::size_t{30}, std::size_t{1} << 20}) {
+    constexpr std::size_t slack = 4 << 20;
+    const std::size_t limit = allocationLimit(length);
+    EXPECT_EQ(resultOf(service_.obey(toEat(limit - slack, piece, length)).first), 0);
+    for (const std::size_t bytes : {limit + slack, std::size_t{1} << 40}) {
+      const auto [reply, end] = service_.obey(toEat(bytes, piece, length));
+      EXPECT_FALSE(reply.kind);
+      EXPECT_EQ(end.exitStatus(), Protocol::resourceExitStatus);
+      EXPECT_LT(end.peakBytes, memoryBudget(length));
+    }
+  }
+}
+
+/// Sends orders to one worker that may have many, and checks each reply's result.
+class Reused {
+ public:
+  Reused(RawClient& service, std::uint64_t longest) : service_(service), longest_(longest) {}
+  ~Reused() { leave(); }
+  Reused(const Reused&) = delete;
+  Reused& operator=(const Reused&) = delete;
+
+  RawReply obey(std::string_view order) {
+    if (channel_ < 0) channel_ = service_.fork(9, longest_);
+    sendOrder(channel_, order, sequence_);
+    return receiveReply(channel_, sequence_++);
+  }
+  WorkerEnd leave() {
+    if (channel_ < 0) return {};
+    close(std::exchange(channel_, -1));
+    sequence_ = 0;
+    return service_.end(9);
+  }
+
+ private:
+  RawClient& service_;
+  std::uint64_t longest_;
+  int channel_ = -1;
+  std::uint32_t sequence_ = 0;
+};
+
+/// The budget is the message's and not the worker's.
+TEST_F(Worker, C4AMessageHasTheSameMemoryInEveryWorker) {
+  NEEDS_SEAL();
+  RawOptions options;
+  options.messages = 1000;
+  options.cpuSeconds = 100;
+  RawClient service(OBEDIENT_SERVICE, options);
+  Reused reused(service, 64 << 20);
+  // By size of the pieces: of large ones as many as the limit says, of small ones fewer.
+  for (const auto& [size, length] : {std::pair(piece, std::size_t{30}),
+                                     {piece, std::size_t{300'000}},
+                                     {std::size_t{3000}, std::size_t{30}}}) {
+    const std::size_t most = allocationLimit(length);
+    for (const std::size_t part : {90U, 98U, 102U}) {
+      const std::string order = toEat(most / 100 * part, size, length);
+      const bool alone = resultOf(service_.obey(order).first) == 0;
+      EXPECT_EQ(alone, part < 100) << part << ' ' << size;
+      // After others, of which one has left its memory full of small holes.
+      EXPECT_EQ(resultOf(reused.obey(toEat(4 << 20, 40, 0))), 0);
+      EXPECT_EQ(reused.obey(order).kind.has_value(), alone) << part << ' ' << size;
+      const WorkerEnd end = reused.leave();
+      EXPECT_EQ(end.exitStatus(), alone ? 0 : Protocol::resourceExitStatus);
+      EXPECT_LT(end.peakBytes, memoryBudget(length));
+    }
+  }
+}
+
+TEST_F(Worker, C4AWorkerThatHasTakenMuchEndsAndGivesItBack) {
+  NEEDS_SEAL();
+  RawOptions options;
+  options.messages = 1000;
+  options.cpuSeconds = 100;
+  RawClient service(OBEDIENT_SERVICE, options);
+  Reused reused(service, 64 << 20);
+  EXPECT_FALSE(reused.obey(toEat(100 << 20, piece, 0)).last);
+  EXPECT_FALSE(reused.obey("answer").last);
+  EXPECT_TRUE(reused.obey(toEat(130 << 20, piece, 1 << 20)).last);
+  EXPECT_EQ(reused.leave().exitStatus(), 0);
+}
+
+/// From start to start: of a few dozen addresses every bit that is random has both values.
+TEST_F(Worker, C13AddressesAreRandom) {
+  NEEDS_SEAL();
+  std::map<long, std::uint64_t> differences;
+  std::map<long, std::uint64_t> first;
+  for (int i = 0; i < 40; ++i) {
+    RawClient service(OBEDIENT_SERVICE);
+    for (const long what : {0L, 1L, 2L, 3L}) {
+      const auto result = resultOf(service.obey("address " + std::to_string(what)).first);
+      const auto address = static_cast<std::uint64_t>(result.value());
+      differences[what] |= first.try_emplace(what, address).first->second ^ address;
+    }
+  }
+#ifndef NDEBUG
+  // Some kernels place programs of 2 MiB and more on bounds of 2 MiB. What is shipped is smaller.
+  differences.erase(0);
+#endif
+  for (const auto& [what, bits] : differences) EXPECT_GE(std::popcount(bits), 28) << what;
+}
+
+TEST_F(Worker, C4AMachineThatHasLessStillAnswers) {
+  NEEDS_SEAL();
+  // Of address space, in MiB; the least is hardly more than what the zygote needs.
+  for (const rlim_t space : {160U, 200U, 300U, 512U}) {
+    RawOptions options;
+    options.before = [space] {
+      const rlimit little{.rlim_cur = space << 20, .rlim_max = space << 20};
+      setrlimit(RLIMIT_AS, &little);
+    };
+    RawClient service(OBEDIENT_SERVICE, options);
+    for (const std::size_t length : {6U, 1U << 18, 1U << 20, 3U << 20, 8U << 20}) {
+      std::string order = "answer";
+      order.resize(length, ' ');
+      EXPECT_EQ(resultOf(service.obey(order).first), 0) << space << " for " << length;
+    }
+  }
+}
+
+}  // namespace
+}  // namespace Keelgate::Test
