@@ -95,7 +95,8 @@ for page in [*root.glob("*.md"), *(root / "docs").glob("*.md")]:
         check((page.parent / target).exists(), f"{page.name} points to {target}, which is not there")
     for target, function in re.findall(r"\]\(([^)#]+)\)(?: \| |,\s+)`([\w:]+)`",
                                        text):
-        check(re.search(rf"\b{function}\(", (page.parent / target).read_text()),
+        source = page.parent / target
+        check(source.is_file() and re.search(rf"\b{function}\(", source.read_text()),
               f"{page.name}: {target} has no {function}")
 
 for failure in failures:
