@@ -6,6 +6,8 @@
 /// neighbours, which stands when the program is built.
 #pragma once
 
+#include "plist/key_hash.h"
+
 #include <keelgate/describe.h>
 
 #include <algorithm>
@@ -17,24 +19,6 @@
 
 namespace VespKeelgateService {
 
-/// The wire keys of a schema are told apart by their length and five of their characters. That is
-/// as good as it must be: keys that meet are compared in full, and how many of a schema's own meet
-/// is known when it is built.
-constexpr std::uint32_t keyHash(std::string_view key) {
-  const std::size_t n = key.size();
-  if (n == 0) return 0;
-  const auto at = [&](std::size_t i) {
-    return static_cast<unsigned char>(key[i]);
-  };
-  std::uint32_t hash = static_cast<std::uint32_t>(n);
-  hash = hash * 31 + at(0);
-  hash = hash * 31 + at(n / 3);
-  hash = hash * 31 + at(n / 2);
-  hash = hash * 31 + at(n - 1 - (n > 1 ? 1 : 0));
-  hash = hash * 31 + at(n - 1);
-  return hash * 0x9e37'79b1u;
-}
-
 /// Made by the compiler; constants, usable from any thread.
 template <Keelgate::Schema S>
 class KeyTable {
@@ -45,15 +29,13 @@ class KeyTable {
   // No schema has so many fields.
   static constexpr std::uint16_t vacant = 0xffff;
 
-  static constexpr std::size_t home(std::string_view key) {
-    return shift == 32 ? 0 : keyHash(key) >> shift;
-  }
+  static constexpr std::size_t home(std::uint32_t hash) { return shift == 32 ? 0 : hash >> shift; }
 
   static constexpr auto slots = [] {
     std::array<std::uint16_t, capacity> all{};
     all.fill(vacant);
     for (std::size_t field = 0; field < count; ++field) {
-      std::size_t at = home(S::CodingKeys::keys[field]);
+      std::size_t at = home(PropertyList::keyHash(S::CodingKeys::keys[field]));
       while (all[at] != vacant) at = (at + 1) % capacity;
       all[at] = static_cast<std::uint16_t>(field);
     }
@@ -71,10 +53,11 @@ class KeyTable {
  public:
   static constexpr std::size_t none = vacant;
 
-  /// The position of the field that travels under this key, or `none`.
-  static constexpr std::size_t find(std::string_view key) {
+  /// The position of the field that travels under this key, or `none`. The hash is the key's own,
+  /// which comes with an entry of the document.
+  static constexpr std::size_t find(std::string_view key, std::uint32_t hash) {
     // Ends: at least three slots in four are vacant.
-    for (std::size_t at = home(key);; at = (at + 1) % capacity) {
+    for (std::size_t at = home(hash);; at = (at + 1) % capacity) {
       const std::uint16_t field = slots[at];
       if (field == vacant || S::CodingKeys::keys[field] == key) return field;
     }

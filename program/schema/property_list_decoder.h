@@ -16,6 +16,7 @@
 #include "plist/expansion_budget.h"
 #include "program/schema/coding_path.h"
 #include "program/schema/decoding_errors.h"
+#include "program/schema/field_set.h"
 #include "program/schema/key_table.h"
 #include "program/schema/scalars.h"
 
@@ -107,27 +108,41 @@ template <class T>
 template <Keelgate::Schema S>
 class FieldValues {
  public:
+  using Fields = FieldSet<S::CodingKeys::size>;
+
   explicit FieldValues(const PropertyList::Value& dictionary) : dictionary_(dictionary) {
-    numbers_.fill(absent);
     for (const PropertyList::Entry entry : dictionary.entries()) {
       // Keys that no field has are passed over: a newer sender may know more of them.
-      const std::size_t field = KeyTable<S>::find(entry.key);
-      if (field != KeyTable<S>::none) numbers_[field] = entry.value.number();
+      const std::size_t field = KeyTable<S>::find(entry.key, entry.hash);
+      if (field == KeyTable<S>::none) continue;
+      present_.insert(field);
+      numbers_[field] = entry.value.number();
     }
   }
 
-  [[nodiscard]] bool has(std::size_t field) const { return numbers_[field] != absent; }
+  [[nodiscard]] const Fields& present() const { return present_; }
+  /// Of a field that is present.
   [[nodiscard]] PropertyList::Value at(std::size_t field) const {
     return dictionary_.child(numbers_[field]);
   }
 
  private:
-  // No object has this number: a message of 4 GiB has fewer.
-  static constexpr std::uint32_t absent = 0xffff'ffff;
-
   const PropertyList::Value& dictionary_;
+  Fields present_;
+  /// Unset where the field is absent.
   std::array<std::uint32_t, S::CodingKeys::size> numbers_;
 };
+
+template <Keelgate::Schema S>
+constexpr auto requiredFields = [] {
+  FieldSet<S::CodingKeys::size> required;
+  std::size_t position = 0;
+  S::CodingKeys::each([&](auto field) {
+    if (!Keelgate::isOptional<typename decltype(field)::Value>) required.insert(position);
+    ++position;
+  });
+  return required;
+}();
 
 /// In declaration order, whatever the order in the message: the same faults give the same error.
 template <Keelgate::Schema S>
@@ -141,14 +156,11 @@ void decodeSchema(Decoding& decoding, const PropertyList::Value& value, const Co
     into = S::decode(container);
   } else {
     const FieldValues<S> values(value);
-    std::size_t position = 0;
-    S::CodingKeys::each([&](auto field) {
-      const std::size_t at = position++;
-      if (values.has(at)) {
-        decodeField(decoding, values.at(at), path, field.key, into.*field.member);
-      } else if constexpr (!Keelgate::isOptional<typename decltype(field)::Value>) {
-        throw Errors::keyNotFound(path, field.key);
-      }
+    values.present().eachOfEither(requiredFields<S>, [&](std::size_t position) {
+      S::CodingKeys::at(position, [&](auto field) {
+        if (!values.present().contains(position)) throw Errors::keyNotFound(path, field.key);
+        decodeField(decoding, values.at(position), path, field.key, into.*field.member);
+      });
     });
   }
 }

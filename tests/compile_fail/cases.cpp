@@ -32,7 +32,7 @@ struct Record {
       (Optional<InnerRecord>, three));
 };
 
-static_assert(KeyTable<Schema>::find("1") == 0);
+static_assert(KeyTable<Schema>::find("1", PropertyList::keyHash("1")) == 0);
 
 Record convert(Schema&& schema) {
   return fieldByField<Record>(std::move(schema), label<&Record::three> = Optional<InnerRecord>());
