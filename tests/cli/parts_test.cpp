@@ -263,8 +263,9 @@ TEST(Table, FitsAnyWidthAndBreaksNoWord) {
                                "several words that can be broken, but none of them within"};
   Table table({"NAME", "SIZE", "TEXT"});
   table.add(cells);
+  table.add({"last", "", ""});
   const Array<String> words =
-      wordsIn("NAME SIZE TEXT " + cells[0] + ' ' + cells[1] + ' ' + cells[2]);
+      wordsIn("NAME SIZE TEXT " + cells[0] + ' ' + cells[1] + ' ' + cells[2] + " last");
   for (std::size_t width = cells[0].size(); width < 110; ++width) {
     const String text = table.text(width, false);
     Array<String> found = wordsIn(text);
@@ -280,7 +281,7 @@ TEST(Table, FitsAnyWidthAndBreaksNoWord) {
     EXPECT_EQ(found, words) << text;
   }
   const String whole = table.text(std::numeric_limits<std::size_t>::max(), false);
-  EXPECT_EQ(std::ranges::count(whole, '\n'), 2);
+  EXPECT_EQ(std::ranges::count(whole, '\n'), 3);
   EXPECT_EQ(whole.find("TEXT"), whole.find("several") - whole.find('\n') - 1)
       << "under its heading";
 }
@@ -298,7 +299,9 @@ TEST(Tally, SumsUpWhatIsNotZero) {
   count(JSON::Outcome::unusable, {}, 5);
   count(JSON::Outcome::record, {}, 1);
   EXPECT_EQ(sentence(), "1 message");
-  count(JSON::Outcome::record, {}, 1234);
+  count(JSON::Outcome::record, {}, 99);
+  EXPECT_EQ(sentence(), "100 messages");
+  count(JSON::Outcome::record, {}, 1135);
   count(JSON::Outcome::rejected, {}, 2);
   for (Reason reason :
        {Reason::crashed, Reason::timedOut, Reason::timedOut, Reason::messageTooLarge,
