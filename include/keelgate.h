@@ -56,9 +56,9 @@ enum {
 typedef struct keelgate_options {
   size_t size;
   /** The VespKeelgateService to start; NULL: the installed one. */
-  const char *service_path;
+  const char* service_path;
   /** The socket of an activated service, which is used in place of a started one; or NULL. */
-  const char *socket;
+  const char* socket;
   /** Messages that can be in work at once; 0 stands for one for each processor. */
   unsigned processes;
   /** Messages that a process may see before a fresh one takes its place. 0 counts as 1. */
@@ -75,14 +75,14 @@ typedef struct keelgate_options {
  * Sets the defaults. `size` is sizeof(keelgate_options) as the caller knows it; nothing beyond it
  * is written.
  */
-KEELGATE_C_API void keelgate_options_init(keelgate_options *options, size_t size);
+KEELGATE_C_API void keelgate_options_init(keelgate_options* options, size_t size);
 
 /**
  * Starts a service, which has 10 s to get ready. `options` may be NULL for the defaults, and is not
  * needed after the call. On failure NULL, and `*error` becomes a sentence that says what to do
  * about it; otherwise `*error` becomes NULL. `error` may be NULL.
  */
-KEELGATE_C_API keelgate_client *keelgate_open(const keelgate_options *options, char **error);
+KEELGATE_C_API keelgate_client* keelgate_open(const keelgate_options* options, char** error);
 
 /**
  * Unpacks the `length` bytes at `message`, which may be NULL where there are none. `record` is
@@ -90,26 +90,27 @@ KEELGATE_C_API keelgate_client *keelgate_open(const keelgate_options *options, c
  * "PropertyList". `*reply` becomes the reply object as compact JSON, and NULL with
  * KEELGATE_WRONG_USE.
  */
-KEELGATE_C_API int keelgate_unpack(keelgate_client *client, const char *record, const void *message,
-                                   size_t length, char **reply);
+KEELGATE_C_API int keelgate_unpack(keelgate_client* client, const char* record, const void* message,
+                                   size_t length, char** reply);
 
 /** The same for "PropertyList", with the type of each value beside it: nothing is lost. */
-KEELGATE_C_API int keelgate_unpack_typed(keelgate_client *client, const void *message,
-                                         size_t length, char **reply);
+KEELGATE_C_API int keelgate_unpack_typed(keelgate_client* client, const void* message,
+                                         size_t length, char** reply);
 
-/** The same for a client message, which comes with the service and command that it arrived under. */
-KEELGATE_C_API int keelgate_unpack_client_message(keelgate_client *client, const char *service,
-                                                  uint64_t command, const void *message,
-                                                  size_t length, char **reply);
+/** The same for a client message, which comes with the service and command that it arrived under.
+ */
+KEELGATE_C_API int keelgate_unpack_client_message(keelgate_client* client, const char* service,
+                                                  uint64_t command, const void* message,
+                                                  size_t length, char** reply);
 
 /** Frees a text that the library made. NULL is allowed. */
-KEELGATE_C_API void keelgate_free(char *text);
+KEELGATE_C_API void keelgate_free(char* text);
 
 /** Ends the service, within 200 ms. No call may be under way. NULL is allowed. */
-KEELGATE_C_API void keelgate_close(keelgate_client *client);
+KEELGATE_C_API void keelgate_close(keelgate_client* client);
 
 /** Of the library, e.g. "0.1.0". Not to be freed. */
-KEELGATE_C_API const char *keelgate_version(void);
+KEELGATE_C_API const char* keelgate_version(void);
 
 #ifdef __cplusplus
 }
