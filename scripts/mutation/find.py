@@ -133,6 +133,9 @@ class Source:
         if cursor.kind in SKIPPED:
             return
         start, end = extent(cursor)
+        # What a macro is made of is not this file's text; a macro alone may be an operand's.
+        if self.in_macro(start, end) and range(start, end) not in self.macros:
+            return
         if cursor.kind in FUNCTIONS:
             head = {token[2] for token in self.between(start, cursor.location.offset)}
             if "consteval" in head:
