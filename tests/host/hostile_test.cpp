@@ -143,7 +143,7 @@ TEST(C5, OneThatKeepsTheClientWaitingIsGivenUp) {
   EXPECT_EQ(outcome(answerBeforeBody), "protocolViolation");
 }
 
-/// The same through every wall of a real service, whose unpacker obeys the message.
+/// The same through every layer of a real service, whose unpacker obeys the message.
 TEST(Hostile, ASealedWorkerHasTheSameOutcomes) {
   Client::Options options = fakeOptions();
   options.servicePath = KEELGATE_OBEDIENT_SERVICE;
