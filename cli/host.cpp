@@ -21,6 +21,9 @@ Client::Options completed(Client::Options options, Console& console, std::size_t
   if (options.processes == 0) {
     options.processes = std::max(1U, std::thread::hardware_concurrency());
   }
+  // Deliberate: whoever made a message fail does not wait for the answer himself, but all those
+  // whose answers come behind it do.
+  options.abnormalEndsPerSecond = 0;
   // No more processes than messages: the others would be started for nothing.
   options.processes = static_cast<unsigned>(std::min<std::size_t>(options.processes, mostMessages));
   return options;
