@@ -42,6 +42,15 @@ TEST(Malformed, Trailer) {
        {"table before the objects", withTrailer(1, 1, 1, 0, 7), Problem::trailer},
        {"table beyond the end", withTrailer(1, 1, 1, 0, ~0ull), Problem::trailer},
        {"overflowing table", withTrailer(8, 1, 0x2000'0000'0000'0001, 0, 9), Problem::trailer},
+       {"table in the trailer", withTrailer(1, 1, 1, 0, 11), Problem::trailer},
+       {"9-byte offsets that are there",
+        "bplist00" + std::string(9, '\x08') + withTrailer(9, 1, 1, 0, 8).substr(10),
+        Problem::trailer},
+       {"9-byte references that are there",
+        "bplist00\xA1" + std::string(9, '\0') + "\x08" + withTrailer(1, 9, 1, 0, 18).substr(10),
+        Problem::trailer},
+       {"object in the magic", bytes("bplist00\x09\x00") + withTrailer(1, 1, 1, 0, 9).substr(10),
+        Problem::objectOutside},
        {"object in the table", withTrailer(1, 1, 1, 0, 8), Problem::objectOutside}});
 }
 
@@ -65,6 +74,7 @@ TEST(Malformed, BinaryObjects) {
        {"integer cut off", binary({bytes("\x13\0\0\0")}), Problem::objectOutside},
        {"string over the table", binary({"\x52y"}), Problem::objectOutside},
        {"count is a real", binary({bytes("\x5F\x22\0\0\0\0")}), Problem::badCount},
+       {"count is null", binary({bytes("\x5F\x00\x01x")}), Problem::badCount},
        {"count of 16 bytes", binary({"\x5F\x14" + std::string(16, '\0')}), Problem::badCount},
        {"8-byte count", binary({"\x5F\x13" + bigEndian(1, 8) + "x"})},
        {"vast string", binary({"\x5F\x13" + bigEndian(~0ull, 8)}), Problem::objectOutside},
@@ -121,13 +131,14 @@ TEST(Malformed, XmlMarkup) {
   all(Problem::badDeclaration,
       {"<?xml version='1.0' encoding='UTF-16'?>" + sound, "<?xml encoding='UTF-8'?>" + sound,
        "<?xml version='1.0' standalone='no' encoding='UTF-8'?>" + sound,
-       "<?xml version='2.0'?>" + sound});
+       "<?xml version='2.0'?>" + sound, "<?xml version='1.0' standalone='maybe'?>" + sound});
   all(Problem::utf16,
       {bytes("\xFE\xFF\0<\0p"), bytes("\xFF\xFE<\0p\0"), bytes("\0<\0?"), bytes("<\0?\0")});
   all(Problem::compressed, {"\x1F\x8B\x08" + sound});
   all(Problem::notPropertyList, {"plist", "{}", "\xEF\xBB\xBFx", "\xFF" + sound});
   all(Problem::truncated, {" ", "<?xml version='1.0'?>\n", "\xEF\xBB\xBF"});
-  all(Problem::badDocumentType, {"<!DOCTYPE plist [<!ENTITY a 'b'>]>" + sound});
+  all(Problem::badDocumentType,
+      {"<!DOCTYPE plist PUBLIC '{' 'x'>" + sound, "<!DOCTYPE plist [<!ENTITY a 'b'>]>" + sound});
   all(Problem::unknownElement, {type + type + sound, xml(type + "<true/>")});
   all(Problem::badComment, {xml("<!-- -- --><true/>"), xml("<!-- ---><true/>")});
 }
@@ -155,7 +166,7 @@ TEST(Malformed, XmlElements) {
        xml("<true a='1' / >"), xml("<true/ >"), "<plist a='><true/></plist>", xml("<true a=b/>"),
        xml("<true a='<'/>"), xml("<true a='1'b='2'/>")});
   all(Problem::duplicateAttribute,
-      {xml("<true a='1' b='' a=\"2\"/>"), xml("<true b='1' a='' a=''/>"),
+      {xml("<true a='' a=''/>"), xml("<true a='1' b='' a=\"2\"/>"), xml("<true b='1' a='' a=''/>"),
        xml("<true a='' a='' b='1'/>")});
   all(Problem::badInteger, {xml("<integer/>")});
   all(Problem::badReal, {xml("<real></real>")});

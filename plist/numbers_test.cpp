@@ -52,6 +52,14 @@ TEST(Numbers, BinaryIntegers) {
   EXPECT_EQ(read(binary({"\x14" + zeros + zeros})), Tree(0));
   EXPECT_EQ(read(binary({"\x14" + ones + ones})), Tree(-1));
   EXPECT_EQ(read(binary({"\x14" + ones + top})), Tree(lowest));
+  // The sign is told apart from the bits.
+  for (const auto& [text, isNegative] : {std::pair("\x10\xFF", false),
+                                         {"\x11\xFF\xFF", false},
+                                         {"\x12\xFF\xFF\xFF\xFF", false},
+                                         {"\x13\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF", true}}) {
+    const std::string message = binary({text});
+    EXPECT_EQ(Document(bytesOf(message)).top().integer().negative, isNegative) << text;
+  }
   EXPECT_EQ(problemIn(binary({"\x14" + ones + zeros})), Problem::integerTooLarge);
   EXPECT_EQ(problemIn(binary({"\x14" + bigEndian(1, 8) + zeros})), Problem::integerTooLarge);
   EXPECT_EQ(problemIn(binary({"\x14" + top + ones})), Problem::integerTooLarge);
@@ -62,6 +70,8 @@ TEST(Numbers, XmlIntegers) {
                            "00000000000000000000000000000000000012", "1<!-- -->2", "&#49;2"}) {
     EXPECT_EQ(read(integer(text)), Tree(12)) << text;
   }
+  const std::string zero = integer("-0");
+  EXPECT_EQ(Document(bytesOf(zero)).top().integer(), (Integer{0, false}));
   const std::pair<const char*, Tree> sound[] = {{"-0", 0},
                                                 {"-007", -7},
                                                 {"0x0", 0},
@@ -91,6 +101,10 @@ TEST(Numbers, Reals) {
     EXPECT_EQ(problemIn(real(text)), Problem::badReal) << text;
   }
   EXPECT_EQ(read(binary({bytes("\x22\xBF\x00\x00\x00")})), Tree(-0.5));
+  EXPECT_EQ(read(binary({"\x23\x7F\xF0" + std::string(6, '\0')})),
+            Tree(std::numeric_limits<double>::infinity()));
+  EXPECT_EQ(read(binary({"\x22\xFF\x80" + std::string(2, '\0')})),
+            Tree(-std::numeric_limits<double>::infinity()));
 }
 
 TEST(Numbers, Dates) {

@@ -102,6 +102,14 @@ TEST(Sharing, IsInheritedDownwards) {
   }
 }
 
+TEST(Sharing, IsInheritedByTheValuesOfADictionary) {
+  const std::string message = binary({"\xA2\x01\x01", "\xD1\x02\x03", "\x51\x61", "\x51x"});
+  const Document document(bytesOf(message));
+  const Value shared = *document.top().elements().begin();
+  EXPECT_TRUE((*shared.entries().begin()).value.isShared());
+  EXPECT_EQ((*shared.entries().begin()).hash, keyHash("a"));
+}
+
 TEST(Sharing, TheBudgetFollowsTheMessage) {
   const std::string message = doubling(1);
   const Document document(bytesOf(message));
@@ -116,29 +124,26 @@ TEST(Sharing, TheBudgetFollowsTheMessage) {
 
 /// Many object numbers for the same bytes: none is shared, yet each would be converted anew.
 TEST(Sharing, OverlappingObjectsAreCharged) {
-  const auto overlapping = [](std::size_t copies, std::size_t units) {
+  const auto overlapping = [](std::size_t copies, std::size_t units, std::size_t unused = 0) {
     const std::string list = "\xAF\x12" + bigEndian(copies, 4);
     std::string objects = "bplist00" + list;
     for (std::size_t i = 1; i <= copies; ++i) objects += bigEndian(i, 2);
     const std::size_t text = objects.size();
     objects += "\x6F\x12" + bigEndian(units, 4) + std::string(2 * units, 'x');
+    objects.append(unused, '\0');
     const std::size_t table = objects.size();
     objects += bigEndian(8, 4);
     for (std::size_t i = 1; i <= copies; ++i) objects += bigEndian(text, 4);
     return objects + Raw{std::vector<std::string>(copies + 1), 2, 4}.trailer(table);
   };
   EXPECT_EQ(problemIn(overlapping(2, 10)), std::nullopt);
-  // 2 bytes for each reference in the list and in its count of units, as long as it is allowed.
-  const auto claimed = [](std::size_t copies, std::size_t units) {
-    return copies * 2 + copies * 2 * units;
-  };
-  for (std::size_t units = 5'000;; ++units) {
-    const std::string message = overlapping(10, units);
-    const std::size_t allowed = Limits::claimedBase + Limits::claimedFactor * message.size();
-    const bool isAllowed = claimed(10, units) <= allowed;
-    ASSERT_EQ(problemIn(message) == std::nullopt, isAllowed) << units;
-    if (!isAllowed) break;
-  }
+  // To the byte: the references, and two bytes for each unit. What nobody names makes the message
+  // longer and claims nothing.
+  const std::size_t claimed = 10 * (2 + 2 * 20'000);
+  const std::size_t needed = (claimed - Limits::claimedBase) / Limits::claimedFactor;
+  const std::size_t length = overlapping(10, 20'000, 0).size();
+  EXPECT_EQ(problemIn(overlapping(10, 20'000, needed - length)), std::nullopt);
+  EXPECT_EQ(problemIn(overlapping(10, 20'000, needed - length - 1)), Problem::overlappingObjects);
   EXPECT_EQ(problemIn(overlapping(10'000, 50'000)), Problem::overlappingObjects);
 }
 
@@ -191,37 +196,26 @@ TEST(Keys, AreComparedByMeaning) {
             std::nullopt);
 }
 
-/// Keys of eight ASCII characters that have one hash, made by undoing its steps.
-std::vector<std::string> collidingKeys(std::size_t count) {
-  constexpr std::uint64_t factor = 0x9e37'79b9'7f4a'7c15;
-  std::uint64_t inverse = 1;
-  for (int i = 0; i < 6; ++i) inverse *= 2 - factor * inverse;
-  std::vector<std::string> keys;
-  for (std::uint64_t low = 0; keys.size() < count; ++low) {
-    const std::uint64_t mixed = (std::uint64_t{0x1234'5678} << 32 | low) * inverse;
-    const std::uint64_t word = ((mixed ^ mixed >> 32) * inverse) ^ (8 * factor);
-    if ((word & 0x8080'8080'8080'8080) != 0) continue;
-    keys.emplace_back(reinterpret_cast<const char*>(&word), sizeof word);
-  }
-  return keys;
-}
-
 TEST(Keys, WithOneHashAreToldApart) {
-  const std::vector<std::string> keys = collidingKeys(5'000);
+  const std::vector<std::string> keys = keysOfOneHash(2'000);
   ASSERT_EQ(keyHash(keys.front()), keyHash(keys.back()));
   Dictionary entries;
   // Honest ones among them, so that the table grows while there are collisions.
   for (std::size_t i = 0; i < keys.size(); ++i) {
-    entries.emplace_back(keys[i], true);
-    entries.emplace_back("honest " + std::to_string(i), true);
+    entries.emplace_back(keys[i], Dictionary{{"honest " + std::to_string(i), true}});
   }
   EXPECT_EQ(problemIn(writeBinary(entries)), std::nullopt);
+  EXPECT_EQ(problemIn(writeXml(Array{entries, entries})), std::nullopt);
+  // In XML equal keys are never one object.
   for (const auto& [first, second] :
-       {std::pair(0u, 9'998u), {4u, 20u}, {600u, 602u}, {40u, 7'000u}}) {
+       {std::pair(0u, 1'999u), {4u, 20u}, {600u, 602u}, {1'997u, 1'998u}}) {
     const std::string kept = std::exchange(entries[second].first, entries[first].first);
-    // The same bytes in another object, since the writer would share it.
-    auto message = writeBinary(entries);
-    EXPECT_EQ(problemIn(message), Problem::duplicateKey) << second;
+    EXPECT_EQ(problemIn(writeXml(entries)), Problem::duplicateKey) << second;
+    // Known from another dictionary, of keys that have found no place, too.
+    EXPECT_EQ(
+        problemIn(writeXml(Array{Dictionary(entries.begin(), entries.begin() + second), entries})),
+        Problem::duplicateKey)
+        << second;
     entries[second].first = kept;
   }
 }

@@ -6,6 +6,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -57,6 +58,22 @@ inline std::string binary(std::vector<std::string> objects) {
 
 inline std::string xml(std::string_view content) {
   return "<plist>" + std::string(content) + "</plist>";
+}
+
+/// Keys of eight printable characters that have one hash, made by undoing its steps.
+inline std::vector<std::string> keysOfOneHash(std::size_t count) {
+  constexpr std::uint64_t factor = 0x9e37'79b9'7f4a'7c15;
+  std::uint64_t inverse = 1;
+  for (int i = 0; i < 6; ++i) inverse *= 2 - factor * inverse;
+  std::vector<std::string> keys;
+  for (std::uint64_t low = 0; keys.size() < count; ++low) {
+    const std::uint64_t mixed = (std::uint64_t{0x1234'5678} << 32 | low) * inverse;
+    const std::uint64_t word = ((mixed ^ mixed >> 32) * inverse) ^ (8 * factor);
+    if ((word & 0x8080'8080'8080'8080) != 0) continue;
+    std::string key(reinterpret_cast<const char*>(&word), sizeof word);
+    if (std::ranges::all_of(key, [](char c) { return c >= ' '; })) keys.push_back(std::move(key));
+  }
+  return keys;
 }
 
 /// For the messages of a failed expectation.
