@@ -99,7 +99,8 @@ endfunction()
 # and it has so few pages that forking it costs half of what a dynamic one costs.
 function(keelgate_service name)
   cmake_parse_arguments(arg "" "" "SOURCES;LIBRARIES" ${ARGN})
-  add_executable(${name} ${arg_SOURCES})
+  add_executable(${name} ${arg_SOURCES}
+    ${PROJECT_SOURCE_DIR}/framework/server/service_operators.cpp)
   target_include_directories(${name} PRIVATE ${PROJECT_SOURCE_DIR} ${PROJECT_SOURCE_DIR}/include)
   target_link_libraries(${name} PRIVATE ${arg_LIBRARIES})
   if(NOT KEELGATE_SANITIZE)

@@ -16,12 +16,10 @@ std::size_t atBegin = 0;
 std::size_t most = 0;
 std::size_t limit = std::numeric_limits<std::size_t>::max();
 
-#ifndef KEELGATE_UNSEALED
 /// With what the allocator keeps beside each block.
 std::size_t costOf(void* block) noexcept {
   return malloc_usable_size(block) + sizeof(std::size_t);
 }
-#endif
 
 }  // namespace
 
@@ -37,13 +35,7 @@ std::size_t peak() noexcept {
   return most - atBegin;
 }
 
-}  // namespace Keelgate::MessageMemory
-
-#ifndef KEELGATE_UNSEALED
-using namespace Keelgate::MessageMemory;
-
-// The forms for arrays and those that do not throw call these.
-void* operator new(std::size_t size) {
+void* allocate(std::size_t size) {
   // Compared so that nothing can wrap. What is allocated may be above the limit by a block's own
   // overhead.
   if (allocated > limit || size > limit - allocated) throw std::bad_alloc();
@@ -54,12 +46,11 @@ void* operator new(std::size_t size) {
   most = std::max(most, allocated);
   return block;
 }
-void operator delete(void* block) noexcept {
+
+void release(void* block) noexcept {
   if (block == nullptr) return;
   allocated -= costOf(block);
   std::free(block);
 }
-void operator delete(void* block, std::size_t) noexcept {
-  operator delete(block);
-}
-#endif
+
+}  // namespace Keelgate::MessageMemory

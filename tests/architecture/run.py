@@ -68,11 +68,16 @@ for program in ("bin/keelgate", "lib/libkeelgate.so"):
     # The record of that name has no parser.
     check(not re.search(r"(?<!Keelgate::)\bPropertyList::", symbols.stdout),
           f"{program} has a property-list parser in it")
+    # It counts for one message and one thread at a time.
+    check(not re.search(r" T operator new\(unsigned long\)$", symbols.stdout, re.M),
+          f"{program} allocates like a service")
 
 # The writers serve tests and tools, never the service.
 symbols = subprocess.run(["nm", "-C", build / "bin/VespKeelgateService"],
                          capture_output=True, text=True).stdout
 check("PropertyList::Document" in symbols, "VespKeelgateService has no parser in it")
+check(re.search(r" T operator new\(unsigned long\)$", symbols, re.M),
+      "VespKeelgateService does not count what it allocates")
 check("PropertyList::write" not in symbols, "VespKeelgateService has a writer in it")
 
 # The public headers define macros of their own prefix alone.
