@@ -2,8 +2,8 @@
 /// The record of any property list: the tree that the message is. Values that own all that they
 /// hold; separate ones may be used from separate threads.
 ///
-/// Containers nest at most 512 deep. Whoever walks a tree by recursion needs a stack for that. To
-/// copy, compare or destroy one is such a walk: some 200 KB.
+/// Containers nest at most 512 deep. Whoever walks a tree by recursion needs a stack for that; to
+/// copy, compare or destroy one is such a walk.
 #pragma once
 
 #include <keelgate/describe.h>
