@@ -113,7 +113,7 @@ def packages():
     client.stdin.flush()
     check(client.stdout.readline(), "a client while the package is upgraded")
     check(unpacks(SHARED), "a client after it")
-    gone = run("dpkg", "-r", "libkeelgate-dev", "libkeelgate0", "keelgate")
+    gone = run("dpkg", "-r", "python3-keelgate", "libkeelgate-dev", "libkeelgate0", "keelgate")
     check(gone.returncode == 0, gone.stderr)
     check(not instances() and not os.path.exists(SHARED), "what runs after the removal")
     check(shown("keelgate.socket", "LoadState") == "not-found", "the unit after the removal")
