@@ -93,9 +93,9 @@ void addMessage(Folder& folder, std::size_t which, const std::vector<std::uint8_
   folder.add("twins_fuzz", behind(which, std::as_bytes(std::span(input))));
   std::vector<Data> messages;
   try {
-    messages.push_back(PropertyList::writeBinary(tree));
+    messages.push_back(::PropertyList::writeBinary(tree));
     folder.add("plist_binary_fuzz", messages.back());
-    const std::string xml = PropertyList::writeXml(tree);
+    const std::string xml = ::PropertyList::writeXml(tree);
     const Bytes bytes = std::as_bytes(std::span(xml));
     messages.emplace_back(bytes.begin(), bytes.end());
     folder.add("plist_xml_fuzz", bytes);

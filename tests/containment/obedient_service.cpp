@@ -101,8 +101,12 @@ long addressOf(long what) {
   const char here = 0;
   const auto small = std::make_unique<char[]>(24);
   const auto large = std::make_unique<char[]>(1 << 22);
-  const void* const all[] = {marker, &here, small.get(), large.get()};
-  return reinterpret_cast<long>(all[what]);
+  // A number, which nobody is to follow.
+  const auto number = [](const void* address) {
+    return reinterpret_cast<long>(address);
+  };
+  const long all[] = {number(marker), number(&here), number(small.get()), number(large.get())};
+  return all[what];
 }
 
 /// Calls itself until the stack ends; no message has this many levels.

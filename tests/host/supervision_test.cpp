@@ -304,9 +304,9 @@ struct StackTrial {
   String outcome;
 
   static void* run(void* trial) {
-    auto& [client, reply, outcome] = *static_cast<StackTrial*>(trial);
-    outcome =
-        outcomeOf([&] { return client.unpack<PulseUserPayload>(Script().answer(reply)).command; });
+    StackTrial& self = *static_cast<StackTrial*>(trial);
+    self.outcome = outcomeOf(
+        [&] { return self.client.unpack<PulseUserPayload>(Script().answer(self.reply)).command; });
     return nullptr;
   }
   void runWith(std::size_t stack) {
