@@ -34,6 +34,9 @@ echo "The package of the installed tree"
 PYTHONPATH=$prefix/lib/python3/dist-packages $python -m pytest -q -p no:cacheprovider \
   "$root/tests/bindings"
 
+PYTHONPATH=$prefix/lib/python3/dist-packages $python "$root/examples/unpack.py" \
+  "$root/examples/messages/sample-message.xml" | grep -q "rtc-tester & friends"
+
 echo "The wheel, in an environment of its own"
 "$root/scripts/wheel" "$prefix" "$work/dist"
 $python -m venv --system-site-packages "$work/venv"
