@@ -2,6 +2,7 @@
 #include "framework/protocol/control_frames.h"
 
 #include <sys/socket.h>
+#include <unistd.h>
 #include <cerrno>
 #include <cstring>
 
@@ -101,7 +102,7 @@ Transfer receiveControl(int channel, ControlFrame& frame, int& descriptor,
   DescriptorRoom room{};
   msghdr packet;
   const Transfer transfer = receivePacket(channel, frame, &room, packet, waiting);
-  if (transfer != Transfer::complete) return transfer;
+  if (transfer != Transfer::complete && transfer != Transfer::malformed) return transfer;
   if (const cmsghdr* const item = CMSG_FIRSTHDR(&packet)) {
     if (item->cmsg_level != SOL_SOCKET || item->cmsg_type != SCM_RIGHTS ||
         item->cmsg_len != CMSG_LEN(sizeof descriptor)) {
@@ -109,8 +110,14 @@ Transfer receiveControl(int channel, ControlFrame& frame, int& descriptor,
     }
     std::memcpy(&descriptor, CMSG_DATA(item), sizeof descriptor);
   }
-  const bool expected = (descriptor != noDescriptor) == (frame.kind == ControlKind::fork);
-  return expected ? Transfer::complete : Transfer::malformed;
+  if (transfer == Transfer::complete &&
+      (descriptor != noDescriptor) == (frame.kind == ControlKind::fork)) {
+    return Transfer::complete;
+  }
+  // What came with a frame that is refused has no other owner.
+  if (descriptor != noDescriptor) close(descriptor);
+  descriptor = noDescriptor;
+  return Transfer::malformed;
 }
 
 std::uint64_t ownVersion() noexcept {
