@@ -5,6 +5,7 @@
 #include "program/schema/mirror_encoding.h"
 #include "program/service/tables.h"
 #include "program/test_support.h"
+#include "tests/filler.h"
 
 #include <gtest/gtest.h>
 
@@ -14,48 +15,7 @@ namespace VespKeelgateService::Testing {
 
 namespace {
 
-using Keelgate::isArray;
 using Keelgate::isOptional;
-using Keelgate::Schema;
-
-/// Gives every value a different one, as far as its type has so many.
-class Filler {
- public:
-  template <class T>
-  void fill(T& value, int depth = 0) {
-    const int n = ++last_;
-    if constexpr (isOptional<T>) {
-      fill(value.emplace(), depth);
-    } else if constexpr (isArray<T>) {
-      if (depth < 2) value.resize(2);
-      for (auto& element : value) fill(element, depth + 1);
-    } else if constexpr (Schema<T>) {
-      T::CodingKeys::each([&](auto field) { fill(value.*field.member, depth); });
-    } else if constexpr (std::same_as<T, String>) {
-      value = "text " + std::to_string(n);
-    } else if constexpr (std::same_as<T, Data>) {
-      const std::string text = "octets " + std::to_string(n);
-      const auto bytes = std::as_bytes(std::span(text));
-      value.assign(bytes.begin(), bytes.end());
-    } else if constexpr (std::same_as<T, Date>) {
-      value.secondsSinceReferenceDate = n;
-    } else if constexpr (std::same_as<T, UUID>) {
-      value.octets[3] = static_cast<std::uint8_t>(n >> 8);
-      value.octets[15] = static_cast<std::uint8_t>(n);
-    } else if constexpr (std::same_as<T, Bool>) {
-      value = n % 2 == 0;
-    } else if constexpr (Keelgate::Enumeration<T>) {
-      value = static_cast<T>(Keelgate::casesOf<T>.back().rawValue);
-    } else if constexpr (std::same_as<T, Double>) {
-      value = n + 0.25;
-    } else {
-      value = static_cast<T>(n);
-    }
-  }
-
- private:
-  int last_ = 100;
-};
 
 /// What a record is expected to hold of the schema's fields.
 using Expect = std::function<Fields(const Fields& schema)>;
@@ -140,7 +100,7 @@ void expectToArrive(const Kind& kind, const S& schema, std::string_view what) {
 template <class S>
 void expectEveryField(const Kind& kind) {
   S full{};
-  Filler().fill(full);
+  Keelgate::Testing::Filler().fill(full);
   expectToArrive(kind, full, "all fields");
 
   S::CodingKeys::each([&](auto field) {

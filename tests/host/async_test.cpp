@@ -7,7 +7,6 @@
 #include <gtest/gtest.h>
 
 #include <poll.h>
-#include <sys/wait.h>
 
 #include <algorithm>
 #include <csignal>
@@ -16,12 +15,10 @@
 namespace Keelgate::Host {
 namespace {
 
-using std::chrono::milliseconds;
-using std::chrono::steady_clock;
 using Response = VespCommandResponse;
 
 Script answer(Int number, std::uint32_t after = 0) {
-  return Script().then(Op::pause, after).answer(recordNumbered(number));
+  return Script().then(Op::pause, after).answer(number);
 }
 
 String outcomeOf(Outcome<Response>& outcome) {
@@ -61,9 +58,7 @@ struct Sent {
 
 TEST(Batch, GivesEachMessageItsOwnOutcomeInOrder) {
   for (const unsigned processes : {1u, 3u}) {
-    Client::Options options = fakeOptions();
-    options.processes = processes;
-    Client client(options);
+    Client client(fakeOptions("honest", milliseconds(20'000), processes));
     const Sent sent(50);
     std::vector<Outcome<Response>> outcomes = client.unpackBatch<Response>(sent.requests);
     ASSERT_EQ(outcomes.size(), sent.expected.size());
@@ -88,9 +83,7 @@ TEST(Batch, TellsOutcomesAsTheyCome) {
 
 /// Each message has its own time limit; the batch as a whole may take longer.
 TEST(Batch, HoldsEachMessageToItsTimeLimit) {
-  Client::Options options = fakeOptions();
-  options.timeLimit = milliseconds(400);
-  Client client(options);
+  Client client(fakeOptions("honest", milliseconds(400)));
   std::vector<Script> scripts(6, answer(1, 250));
   scripts[1] = Script().then(Op::pause, 60'000);
   std::vector<Client::Request> requests;
@@ -138,9 +131,7 @@ TEST(Async, CompletesEachMessageOnce) {
 }
 
 TEST(Async, IsCancelledAtItsDeadlineAlsoBeforeItsTurn) {
-  Client::Options options = fakeOptions();
-  options.processes = 1;
-  Client client(options);
+  Client client(fakeOptions("honest", milliseconds(20'000), 1));
   const Script stays = Script().then(Op::pause, 60'000);
   const auto start = steady_clock::now();
   std::vector<String> seen;
@@ -179,30 +170,33 @@ TEST(Async, CompletionsMayStartMessagesAndThrow) {
   EXPECT_EQ(thrown, 4);
 }
 
-TEST(Async, GoesOnBesideOtherThreads) {
+TEST(Async, ManyThreadsShareAClientInEveryWay) {
   Client client(fakeOptions());
-  const Script script = answer(5);
   std::atomic<int> right = 0;
   std::atomic<int> completed = 0;
+  std::vector<Script> scripts;
+  for (Int i = 0; i < 120; ++i) scripts.push_back(answer(i));
   std::vector<std::thread> threads;
-  for (int t = 0; t < 2; ++t) {
-    threads.emplace_back([&] {
-      for (int i = 0; i < 40; ++i) {
-        client.start<Response>({.message = script}, [&](Outcome<Response> outcome) {
-          if (outcomeOf(outcome) == "record 5") ++right;
+  for (std::size_t t = 0; t < 3; ++t) {
+    threads.emplace_back([&, t] {
+      for (std::size_t i = t * 40; i < t * 40 + 40; ++i) {
+        const Script& script = scripts[i];
+        const String expected = "record " + std::to_string(i);
+        client.start<Response>({.message = script}, [&, expected](Outcome<Response> outcome) {
+          if (outcomeOf(outcome) == expected) ++right;
           ++completed;
         });
-        if (Host::outcomeOf(client, script) == "record 5") ++right;
+        if (Host::outcomeOf(client, script) == expected) ++right;
       }
     });
-    threads.emplace_back([&] { loopUntil(client, [&] { return completed == 80; }); });
+    threads.emplace_back([&] { loopUntil(client, [&] { return completed == 120; }); });
   }
   for (std::thread& thread : threads) thread.join();
-  EXPECT_EQ(right, 160);
+  EXPECT_EQ(right, 240);
 }
 
 TEST(Async, EndsWithItsClient) {
-  const std::size_t descriptors = openDescriptors();
+  const auto descriptors = openDescriptors();
   const Script stays = Script().then(Op::pause, 60'000);
   bool told = false;
   {
@@ -221,51 +215,45 @@ TEST(Async, AForkHasItsOwn) {
   bool told = false;
   const Script script = answer(1);
   client.start<Response>({.message = script}, [&](const Outcome<Response>&) { told = true; });
-  const pid_t child = fork();
-  if (child == 0) {
-    int mine = 0;
-    client.start<Response>({.message = script}, [&](const Outcome<Response>&) { ++mine; });
-    const bool right = loopUntil(client, [&] { return mine == 1; }) && !told;
-    _exit(right ? 0 : 1);
-  }
+  EXPECT_EQ(inFork([&] {
+              int mine = 0;
+              client.start<Response>({.message = script},
+                                     [&](const Outcome<Response>&) { ++mine; });
+              return loopUntil(client, [&] { return mine == 1; }) && !told ? 0 : 1;
+            }),
+            0);
   EXPECT_TRUE(loopUntil(client, [&] { return told; }));
-  int status = -1;
-  waitpid(child, &status, 0);
-  EXPECT_EQ(status, 0);
 }
 
 TEST(Statistics, CountEveryOutcomeOfEveryKindOfCall) {
-  Client::Options options = fakeOptions();
-  options.timeLimit = milliseconds(500);
+  Client::Options options = fakeOptions("honest", milliseconds(500));
   options.largestMessage = 1000;
   Client first(options);
-  Data error = Transport::encodeError(Breach("domain", "type"));
   Data rejection;
-  Protocol::appendReplyFrame(rejection, 0, Protocol::ReplyKind::error, error);
+  Protocol::appendReplyFrame(rejection, 0, Protocol::ReplyKind::error,
+                             Transport::encodeError(Breach("domain", "type")));
   Host::outcomeOf(first, answer(1));
-  Host::outcomeOf(first, Script().write(rejection));
   // It moves with what it has.
   Client client(std::move(first));
-  Host::outcomeOf(client, Script().then(Op::raise, SIGSEGV));
-  Host::outcomeOf(client, Script().then(Op::pause, 60'000));
-  Host::outcomeOf(client, Data(1001));
-  Host::outcomeOf(client, Script().then(Op::exit, Protocol::resourceExitStatus));
+  for (const Data& message :
+       std::initializer_list<Data>{Script().write(rejection), Script().then(Op::raise, SIGSEGV),
+                                   Script().then(Op::pause, 60'000), Data(1001),
+                                   Script().then(Op::exit, Protocol::resourceExitStatus)}) {
+    Host::outcomeOf(client, message);
+  }
   const Script lie = Script().answer(Data(3)), good = answer(2);
   const Client::Request batch[] = {{.message = lie}, {.message = good}};
   client.unpackBatch<Response>(batch);
-  const Statistics figures = client.statistics();
-  EXPECT_EQ(figures.records, 2u);
-  for (const UInt64 one :
-       {figures.rejections, figures.crashed, figures.timedOut, figures.messageTooLarge,
-        figures.resourcesExhausted, figures.protocolViolations}) {
-    EXPECT_EQ(one, 1u);
-  }
-  EXPECT_EQ(figures.startFailed, 0u);
-  EXPECT_EQ(figures.messages, 8u);
-  Client other(fakeOptions());
-  client = std::move(other);
+  const auto all = [](const Statistics& of) {
+    return std::vector<UInt64>{
+        of.messages,          of.records,         of.rejections,  of.crashed,
+        of.timedOut,          of.messageTooLarge, of.startFailed, of.resourcesExhausted,
+        of.protocolViolations};
+  };
+  EXPECT_EQ(all(client.statistics()), (std::vector<UInt64>{8, 2, 1, 1, 1, 1, 0, 1, 1}));
+  client = Client(fakeOptions());
   EXPECT_EQ(Host::outcomeOf(client, answer(3)), "record 3");
-  EXPECT_EQ(client.statistics().messages, 1u);
+  EXPECT_EQ(all(client.statistics()), (std::vector<UInt64>{1, 1, 0, 0, 0, 0, 0, 0, 0}));
 }
 
 }  // namespace

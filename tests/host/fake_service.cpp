@@ -30,10 +30,6 @@ namespace {
 
 constexpr int channel = serviceDescriptor;
 
-void read(std::span<std::byte> bytes) {
-  if (!readAll(channel, bytes)) _exit(0);
-}
-
 void write(Bytes bytes) {
   if (!writeAll(channel, bytes)) _exit(0);
 }
@@ -71,8 +67,7 @@ void obey(Bytes script, std::uint32_t sequence) {
     Step step;
     std::memcpy(&step, script.data(), sizeof step);
     script = script.subspan(sizeof step);
-    const bool hasBytes = step.op <= Op::log;
-    const Bytes bytes = script.first(hasBytes ? step.amount : 0);
+    const Bytes bytes = script.first(step.op <= Op::log ? step.amount : 0);
     script = script.subspan(bytes.size());
     if (step.op == Op::write) write(bytes);
     if (step.op == Op::answer) writeFrame(sequence, bytes);
@@ -92,13 +87,13 @@ void obey(Bytes script, std::uint32_t sequence) {
   if (early) writeFrame(0, {});
   for (std::uint64_t i = 0; i < messages; ++i) {
     RequestHeader header;
-    read(std::as_writable_bytes(std::span(&header, 1)));
+    if (!readAll(channel, std::as_writable_bytes(std::span(&header, 1)))) break;
     const std::uint64_t signal = header.command - raiseAfterHeader;
     if (signal > 0 && signal < NSIG) die(static_cast<int>(signal));
     if (header.command == answerBeforeBody) writeFrame(header.sequence, {});
     while (header.command == ignoreBody || header.command == answerBeforeBody) pause();
     Data script(header.serviceLength + header.bodyLength);
-    read(script);
+    if (!readAll(channel, script)) break;
     obey(Bytes(script).subspan(header.serviceLength), header.sequence);
   }
   _exit(0);
@@ -112,13 +107,10 @@ void send(const ControlFrame& frame) {
   static_cast<void>(sendControl(channel, frame, noDescriptor, Waiting::yes));
 }
 
-class Zygote {
- public:
-  Zygote(std::uint64_t messages, std::string_view manner)
-      : messages_(messages),
-        early_(manner == "early"),
-        barren_(manner == "barren"),
-        slow_(manner == "slow") {}
+struct Zygote {
+  const std::uint64_t messages;
+  const std::string_view manner;
+  std::map<pid_t, std::uint32_t> slots{};
 
   void serve() {
     sigset_t child;
@@ -143,15 +135,14 @@ class Zygote {
     }
   }
 
- private:
   /// Leaves nobody behind, as a launcher does.
   [[noreturn]] void end() {
-    for (const auto& [pid, slot] : slots_) ::kill(pid, SIGKILL);
+    for (const auto& [pid, slot] : slots) ::kill(pid, SIGKILL);
     while (wait(nullptr) > 0) continue;
     _exit(0);
   }
   void fork(std::uint32_t slot, int descriptor) {
-    if (barren_) {
+    if (manner == "barren") {
       close(descriptor);
       send(makeControlFrame(ControlKind::exit, slot, {0, 0, 0, 1}));
       return;
@@ -161,31 +152,23 @@ class Zygote {
       prctl(PR_SET_PDEATHSIG, SIGKILL);
       dup2(descriptor, channel);
       for (int other = channel + 1; other < 64; ++other) close(other);
-      work(messages_, early_);
+      work(messages, manner == "early");
     }
     close(descriptor);
-    slots_[pid] = slot;
+    slots[pid] = slot;
   }
   void kill(std::uint32_t slot) {
-    for (const auto& [pid, its] : slots_) {
-      if (its != slot) continue;
-      if (!slow_) ::kill(pid, SIGKILL);
+    for (const auto& [pid, its] : slots) {
+      if (its == slot) ::kill(pid, SIGKILL);
     }
   }
   void reportExits() {
     int status;
     for (pid_t pid; (pid = waitpid(-1, &status, WNOHANG)) > 0;) {
-      send(makeControlFrame(ControlKind::exit, slots_[pid], {static_cast<std::uint64_t>(status)}));
-      slots_.erase(pid);
+      send(makeControlFrame(ControlKind::exit, slots[pid], {static_cast<std::uint64_t>(status)}));
+      slots.erase(pid);
     }
   }
-
-  std::uint64_t messages_;
-  bool early_;
-  bool barren_;
-  /// As if the kernel took its time to end whom it killed.
-  bool slow_;
-  std::map<pid_t, std::uint32_t> slots_;
 };
 
 }  // namespace
@@ -209,5 +192,5 @@ int main(int, char** arguments) {
   if (manner == "babbles") ready.magic = 0;
   if (manner != "mute") send(ready);
   while (manner == "mute" || manner == "stuck") pause();
-  Zygote(hello.numbers[0], manner).serve();
+  Zygote{hello.numbers[0], manner}.serve();
 }

@@ -7,12 +7,14 @@
 
 #include <keelgate/records.h>
 
-#include <cstring>
 #include <string_view>
 
 namespace Keelgate::Host {
 
-enum class Op : std::uint8_t {
+/// The first three have bytes behind their step, the others milliseconds, a signal or a status in
+/// it. `answerZygote` gives the number of the process that the worker was forked from; `trickle`
+/// sends a byte after the other for so long.
+enum class Op : std::uint32_t {
   write,
   answer,
   log,
@@ -26,9 +28,6 @@ enum class Op : std::uint8_t {
   endless
 };
 
-/// Behind it stand `amount` bytes for write, answer and log; for the others it is the milliseconds,
-/// the signal or the status. `answerZygote` gives the number of the process that the worker was
-/// forked from; `trickle` sends a byte after the other for so long.
 struct Step {
   Op op;
   std::uint32_t amount;
@@ -36,8 +35,9 @@ struct Step {
 
 /// Contexts whose command is one of these don't get as far as their script.
 enum Interruption : std::uint64_t {
+  none,
   ignoreBody = 1'000'001,
-  answerBeforeBody = 1'000'002,
+  answerBeforeBody,
   /// And the number of a signal.
   raiseAfterHeader = 2'000'000,
 };
@@ -50,39 +50,24 @@ inline Data recordNumbered(Int number) {
   return Transport::encodeRecord(record);
 }
 
-/// Builds a script, step by step.
-class Script {
+inline Bytes bytesOf(std::string_view text) {
+  return std::as_bytes(std::span(text));
+}
+
+class Script : public Data {
  public:
-  Script& write(Bytes bytes) { return add(Op::write, bytes); }
+  Script& then(Op op, std::size_t amount = 0, Bytes behind = {}) {
+    const Step step{.op = op, .amount = static_cast<std::uint32_t>(amount)};
+    for (const Bytes part : {std::as_bytes(std::span(&step, 1)), behind}) {
+      insert(end(), part.begin(), part.end());
+    }
+    return *this;
+  }
+  Script& write(Bytes bytes) { return then(Op::write, bytes.size(), bytes); }
   /// An honest record frame around the body.
-  Script& answer(Bytes body) { return add(Op::answer, body); }
-  Script& log(std::string_view line) {
-    return add(Op::log, std::as_bytes(std::span(line.data(), line.size())));
-  }
-  Script& then(Op op, std::uint32_t amount = 0) {
-    put(Step{.op = op, .amount = amount});
-    return *this;
-  }
-  Script& frame(Protocol::ReplyHeader header, Bytes body) {
-    const Bytes head = std::as_bytes(std::span(&header, 1));
-    Data whole(head.begin(), head.end());
-    whole.insert(whole.end(), body.begin(), body.end());
-    return write(whole);
-  }
-  operator Bytes() const { return bytes_; }
-
- private:
-  Script& add(Op op, Bytes bytes) {
-    put(Step{.op = op, .amount = static_cast<std::uint32_t>(bytes.size())});
-    bytes_.insert(bytes_.end(), bytes.begin(), bytes.end());
-    return *this;
-  }
-  void put(Step step) {
-    const Bytes bytes = std::as_bytes(std::span(&step, 1));
-    bytes_.insert(bytes_.end(), bytes.begin(), bytes.end());
-  }
-
-  Data bytes_;
+  Script& answer(Bytes body) { return then(Op::answer, body.size(), body); }
+  Script& answer(Int number) { return answer(recordNumbered(number)); }
+  Script& log(std::string_view line) { return then(Op::log, line.size(), bytesOf(line)); }
 };
 
 }  // namespace Keelgate::Host

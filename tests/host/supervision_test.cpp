@@ -1,41 +1,31 @@
 // SPDX-License-Identifier: Apache-2.0
-// What becomes of services and places: an abnormal end costs its message, its worker and the
-// address layout (C13), and the others nothing (C14).
+// What becomes of services and places: whoever is hit is replaced (C9), and an abnormal end costs
+// the others nothing (C14).
 #include "framework/client/pool.h"
 #include "framework/client/stack.h"
-#include "framework/protocol/data_frames.h"
 #include "tests/host/host_testing.h"
 
 #include <gtest/gtest.h>
 
 #include <pthread.h>
 
-#include <algorithm>
 #include <csignal>
 #include <thread>
 
 namespace Keelgate::Host {
 namespace {
 
-using std::chrono::milliseconds;
 using std::chrono::seconds;
 using Place = FairSemaphore::Place;
 using State = ServiceProcess::State;
 
 const Script zygote = Script().then(Op::answerZygote);
+const Script fault = Script().then(Op::raise, SIGSEGV);
+constexpr int strikes[] = {SIGKILL, SIGSEGV, SIGSTOP};
 
 /// The process that the workers of a client are forked from just now.
-int zygoteOf(Client& client) {
-  return static_cast<int>(client.unpack<VespCommandResponse>(zygote).command);
-}
-
-template <class Condition>
-bool comesTrue(Condition condition) {
-  for (int i = 0; i < 500; ++i) {
-    if (condition()) return true;
-    usleep(10'000);
-  }
-  return false;
+pid_t zygoteOf(Client& client) {
+  return static_cast<pid_t>(client.unpack<VespCommandResponse>(zygote).command);
 }
 
 /// More than a single call, and time for what is started behind them to get ready.
@@ -45,38 +35,54 @@ void settle(Client& client) {
   usleep(100'000);
 }
 
-TEST(C13, EveryAbnormalEndCostsTheLayout) {
-  const std::pair<Script, const char*> ends[] = {
-      {Script().then(Op::raise, SIGSEGV), "crashed"},
-      {Script().then(Op::raise, SIGXCPU), "timedOut"},
-      {Script().then(Op::exit, 0), "crashed"},
-      {Script().then(Op::exit, 3), "crashed"},
-      {Script().then(Op::exit, Protocol::resourceExitStatus), "resourcesExhausted"},
-      {Script().then(Op::exit, Protocol::refusedExitStatus), "resourcesExhausted"},
-      {Script().write(Data(64)), "protocolViolation"},
-      {Script().answer(Data(3)), "protocolViolation"},
-      {Script().then(Op::pause, 60'000), "timedOut"},
-      {Script().then(Op::trickle, 60'000), "protocolViolation"}};
-  Client::Options options = fakeOptions();
-  options.timeLimit = milliseconds(1500);
-  for (const std::size_t reuse : {1u, 100u}) {
-    options.messagesPerProcess = reuse;
-    Client client(options);
-    for (const auto& [script, outcome] : ends) {
-      const int before = zygoteOf(client);
-      EXPECT_EQ(outcomeOf(client, script), outcome);
-      EXPECT_NE(zygoteOf(client), before) << outcome;
+/// Whether a message is answered again, after few that something which was hit explains, each of
+/// them in time.
+bool recovers(Client& client, Bytes message, milliseconds limit) {
+  for (int i = 0; i < 6; ++i) {
+    const auto start = steady_clock::now();
+    const String outcome = outcomeOf(client, message);
+    EXPECT_LE(steady_clock::now() - start, limit + milliseconds(1000)) << outcome;
+    if (outcome == "record 1") return true;
+    EXPECT_TRUE(outcome == "crashed" || outcome == "timedOut") << outcome;
+  }
+  return false;
+}
+
+TEST(C9, AZygoteThatIsHitIsReplaced) {
+  constexpr milliseconds limit(400);
+  for (const int signal : strikes) {
+    for (const Script& step : {Script(), Script().write(Data(10)), Script().answer(7)}) {
+      Client client(fakeOptions("honest", limit, 1));
+      Script script = step;
+      script.then(Op::hitZygote, static_cast<unsigned>(signal)).then(Op::pause, 50);
+      const String outcome = outcomeOf(client, script);
+      EXPECT_TRUE(outcome == "record 7" || outcome == "crashed") << signal << ": " << outcome;
+      EXPECT_TRUE(recovers(client, Script().answer(1), limit)) << signal;
     }
   }
 }
 
-/// It had answered: its message is not lost, but what it does next is no accident.
-TEST(C13, AnEndBehindTheAnswerCostsTheLayoutToo) {
-  Client client(fakeOptions());
-  const int before = zygoteOf(client);
-  EXPECT_EQ(outcomeOf(client, Script().answer(recordNumbered(1)).then(Op::raise, SIGSEGV)),
-            "record 1");
-  EXPECT_TRUE(comesTrue([&] { return zygoteOf(client) != before; }));
+/// The real service: its launcher, its zygote, its spare workers.
+TEST(C9, WhoeverIsHitWhileNothingIsAskedIsReplaced) {
+  constexpr milliseconds limit(400);
+  const Bytes message = bytesOf("<plist><dict><key>c</key><integer>1</integer></dict></plist>");
+  for (const int signal : strikes) {
+    for (const int depth : {0, 1, 2}) {
+      // The first process of a namespace takes no such signal from outside.
+      if (signal == SIGSEGV && depth == 1) continue;
+      Client client(optionsFor(KEELGATE_SERVICE, limit, 1));
+      ASSERT_TRUE(recovers(client, message, limit));
+      std::set<pid_t> victims = children();
+      for (int i = 0; i < depth; ++i) {
+        std::set<pid_t> below;
+        for (const pid_t victim : victims) below.merge(children(victim));
+        victims = below;
+      }
+      ASSERT_FALSE(victims.empty());
+      for (const pid_t victim : victims) kill(victim, signal);
+      EXPECT_TRUE(recovers(client, message, limit)) << signal << " at depth " << depth;
+    }
+  }
 }
 
 TEST(C14, TheNextMessageFindsAServiceThatWasReady) {
@@ -84,8 +90,8 @@ TEST(C14, TheNextMessageFindsAServiceThatWasReady) {
   settle(client);
   for (int i = 0; i < 3; ++i) {
     const int old = zygoteOf(client);
-    const std::set<int> ready = children();
-    EXPECT_EQ(outcomeOf(client, Script().then(Op::raise, SIGSEGV)), "crashed");
+    const std::set<pid_t> ready = children();
+    EXPECT_EQ(outcomeOf(client, fault), "crashed");
     const int next = zygoteOf(client);
     EXPECT_NE(next, old);
     EXPECT_TRUE(ready.contains(next)) << i;
@@ -101,14 +107,11 @@ TEST(C14, OthersKeepTheirMessageWhateverEndsBesideThem) {
       Script().then(Op::pause, 1000).then(Op::raise, SIGSEGV), Script().then(Op::pause, 60'000),
       Script().then(Op::pause, 1000).then(Op::hitZygote, SIGSTOP).then(Op::raise, SIGSEGV)};
   for (const Script& script : ends) {
-    Client::Options options = fakeOptions();
-    options.timeLimit = milliseconds(2000);
-    Client client(options);
+    Client client(fakeOptions("honest", milliseconds(2000)));
     const int before = zygoteOf(client);
     std::thread other([&] {
       usleep(700'000);
-      const Script slow = Script().then(Op::pause, 1500).answer(recordNumbered(9));
-      EXPECT_EQ(outcomeOf(client, slow), "record 9");
+      EXPECT_EQ(outcomeOf(client, Script().then(Op::pause, 1500).answer(9)), "record 9");
     });
     const String outcome = outcomeOf(client, script);
     EXPECT_TRUE(outcome == "crashed" || outcome == "timedOut") << outcome;
@@ -134,30 +137,15 @@ TEST(C14, AZygoteThatDiesIsReplacedAtOnceAsLongAsAnswersCome) {
   EXPECT_LT(Clock::now() - start, seconds(8));
 }
 
-TEST(C5, BytesThatKeepComingDoNotKeepTheClient) {
-  Client::Options options = fakeOptions();
-  options.timeLimit = milliseconds(300);
-  Client client(options);
-  const Data body(std::size_t{1} << 20);
-  Data frame;
-  Protocol::appendReplyFrame(frame, 0, Protocol::ReplyKind::record, body);
-  frame.resize(100);
-  const auto start = Clock::now();
-  EXPECT_EQ(outcomeOf(client, Script().write(frame).then(Op::trickle, 5000)), "timedOut");
-  EXPECT_LT(Clock::now() - start, options.timeLimit + seconds(1));
-}
-
 class Supervised : public testing::Test {
  protected:
   Supervisor::Service running() {
-    for (;;) {
-      auto service = supervisor_.demand(deadlineAfter(seconds(10)));
-      if (const Wait* wait = std::get_if<Wait>(&service)) {
-        waitFor(*wait);
-      } else {
-        return std::get<Supervisor::Service>(service);
-      }
+    auto service = supervisor_.demand(deadlineAfter(seconds(10)));
+    for (; std::holds_alternative<Wait>(service);
+         service = supervisor_.demand(deadlineAfter(seconds(10)))) {
+      waitFor(std::get<Wait>(service));
     }
+    return std::get<Supervisor::Service>(service);
   }
 
   DescriptorRegistry registry_{64};
@@ -228,16 +216,16 @@ TEST(Supervision, AbnormalEndsAreSpacedOut) {
 }
 
 TEST(Supervision, WhoMakesWorkersFailIsAnsweredLateAndInTime) {
-  Client::Options options = fakeOptions();
+  Client::Options options = fakeOptions("honest", milliseconds(400));
   options.abnormalEndsPerSecond = 1;
-  options.timeLimit = milliseconds(400);
   Client client(options);
-  const Script dies = Script().then(Op::raise, SIGSEGV);
-  for (int i = 0; i < 4; ++i) EXPECT_EQ(outcomeOf(client, dies), "crashed");
-  const auto start = Clock::now();
-  EXPECT_EQ(outcomeOf(client, dies), "crashed");
-  EXPECT_GE(Clock::now() - start, options.timeLimit);
-  EXPECT_LT(Clock::now() - start, options.timeLimit + seconds(1));
+  for (int i = 0; i < 5; ++i) {
+    const auto start = Clock::now();
+    EXPECT_EQ(outcomeOf(client, fault), "crashed");
+    const auto took = Clock::now() - start;
+    EXPECT_LT(took, options.timeLimit + seconds(1));
+    EXPECT_TRUE(i < 4 || took >= options.timeLimit);
+  }
 }
 
 TEST(Supervision, APeakIsForgottenAfterAWhile) {
@@ -281,54 +269,39 @@ TEST(Places, AreGivenInTurnAndSomeAreKeptForSmallOnes) {
 // A sanitizer makes frames larger: nothing of this holds there.
 #ifndef KEELGATE_UNSEALED
 
-/// So many payloads, each the only element of the list before it.
-Data nestedPayloads(std::size_t depth) {
-  PulseUserPayload payload{};
-  const Data flat = Transport::encodeRecord(payload);
-  payload.ostrelMessageList.emplace_back(PulseUserPayload{});
-  const Data one = Transport::encodeRecord(payload);
-  const auto count = std::mismatch(flat.begin(), flat.end(), one.begin()).first - flat.begin();
-  Data all;
-  for (std::size_t i = 1; i < depth; ++i) {
-    all.insert(all.end(), one.begin(), one.begin() + count + 8);
+/// The deepest reply that there is, on the least stack that is promised to do.
+TEST(Stack, WhatIsPromisedIsEnoughAndLessIsRefused) {
+  struct Trial {
+    Client client{fakeOptions()};
+    Data reply;
+    String outcome;
+  } trial;
+  PulseUserPayload nested{};
+  for (std::size_t i = 0; i < Transport::maximumNesting / 2; ++i) {
+    PulseUserPayload outer{};
+    outer.ostrelMessageList.push_back(std::move(nested));
+    nested = std::move(outer);
   }
-  all.insert(all.end(), flat.begin(), flat.end());
-  for (std::size_t i = 1; i < depth; ++i)
-    all.insert(all.end(), flat.begin() + count + 8, flat.end());
-  return all;
-}
-
-struct StackTrial {
-  Client& client;
-  Data reply;
-  String outcome;
-
-  static void* run(void* trial) {
-    StackTrial& self = *static_cast<StackTrial*>(trial);
-    self.outcome = outcomeOf(
-        [&] { return self.client.unpack<PulseUserPayload>(Script().answer(self.reply)).command; });
-    return nullptr;
-  }
-  void runWith(std::size_t stack) {
+  trial.reply = Transport::encodeRecord(nested);
+  const auto runWith = [&](std::size_t stack) {
     pthread_attr_t attributes;
     pthread_attr_init(&attributes);
     pthread_attr_setstacksize(&attributes, stack);
     pthread_t thread;
-    ASSERT_EQ(pthread_create(&thread, &attributes, run, this), 0);
+    const auto run = [](void* of) -> void* {
+      auto& [client, reply, outcome] = *static_cast<Trial*>(of);
+      outcome = outcomeOf(
+          [&] { return client.unpack<PulseUserPayload>(Script().answer(reply)).command; });
+      return nullptr;
+    };
+    EXPECT_EQ(pthread_create(&thread, &attributes, run, &trial), 0);
     pthread_join(thread, nullptr);
     pthread_attr_destroy(&attributes);
-  }
-};
-
-/// The deepest reply that there is, on the least stack that is promised to do.
-TEST(Stack, WhatIsPromisedIsEnoughAndLessIsRefused) {
-  Client client(fakeOptions());
-  StackTrial trial{client, nestedPayloads(1 + Transport::maximumNesting / 2), {}};
+    return trial.outcome;
+  };
   // In this order: the C library gives a thread the stack of one before it that had more.
-  trial.runWith(leastStack - (32u << 10));
-  EXPECT_EQ(trial.outcome, "resourcesExhausted");
-  trial.runWith(leastStack + (32u << 10));
-  EXPECT_EQ(trial.outcome, "record 0");
+  EXPECT_EQ(runWith(leastStack - (32u << 10)), "resourcesExhausted");
+  EXPECT_EQ(runWith(leastStack + (32u << 10)), "record 0");
 }
 #endif
 
