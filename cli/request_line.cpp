@@ -8,8 +8,10 @@
 #include "text/utf8.h"
 
 #include <fmt/format.h>
-// Sixteen characters of a string at a time, which every x86-64 can.
+#ifdef __SSE2__
+// Sixteen characters of a string at a time.
 #define RAPIDJSON_SSE2
+#endif
 #include <rapidjson/error/en.h>
 #include <rapidjson/reader.h>
 

@@ -35,7 +35,7 @@ void closeAll(unsigned first, unsigned last) {
 
 void keepOnly(int kept) {
   constexpr unsigned channel = serviceDescriptor;
-  if (kept != serviceDescriptor && dup2(kept, serviceDescriptor) < 0) {
+  if (kept != serviceDescriptor && dup3(kept, serviceDescriptor, 0) < 0) {
     throw StartError(StartStep::closeDescriptors);
   }
   closeAll(0, channel - 1);

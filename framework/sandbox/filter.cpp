@@ -3,9 +3,9 @@
 
 #include "framework/contracts/process.h"
 #include "framework/contracts/start_step.h"
+#include "framework/sandbox/architecture.h"
 #include "framework/sandbox/processes.h"
 
-#include <linux/audit.h>
 #include <sys/mman.h>
 #include <sys/prctl.h>
 #include <sys/resource.h>
@@ -14,10 +14,6 @@
 #include <unistd.h>
 #include <csignal>
 #include <cstddef>
-
-#ifndef __x86_64__
-#error "A filter is written and proven for each architecture; so far for x86-64 alone."
-#endif
 
 namespace Keelgate::Sandbox {
 
@@ -46,7 +42,7 @@ constexpr Rule zygote[] = {
     {SYS_wait4, Verdict::allow},
     {SYS_kill, Verdict::allow},
     // A new worker, until it has sealed itself.
-    {SYS_dup2, Verdict::allow},
+    {SYS_dup3, Verdict::allow},
     {SYS_close, Verdict::allow},
     {SYS_close_range, Verdict::allow},
     {SYS_prctl, Verdict::allowWith, PR_SET_PDEATHSIG},
@@ -63,9 +59,6 @@ constexpr Rule zygote[] = {
     // with more randomness.
     {SYS_brk, Verdict::refuse, 0},
 };
-
-/// Calls of the x32 convention have numbers of their own from here, with x86-64's architecture.
-constexpr unsigned firstX32Call = 0x4000'0000;
 
 constexpr sock_filter load(std::size_t offset) {
   return BPF_STMT(BPF_LD | BPF_W | BPF_ABS, static_cast<unsigned>(offset));
@@ -88,7 +81,6 @@ void append(std::vector<sock_filter>& program, const Rule& rule, sock_filter den
                      {unlessEqual(call, 1), answer(SECCOMP_RET_ERRNO | rule.number)});
       return;
     case Verdict::allowWith:
-      // x86-64 is little-endian: the half that the kernel reads comes first.
       program.insert(program.end(),
                      {unlessEqual(call, 4),
                       load(offsetof(seccomp_data, args) + rule.argument * sizeof(std::uint64_t)),
@@ -134,14 +126,12 @@ std::span<const Rule> zygoteRules() noexcept {
 
 std::vector<sock_filter> compile(std::span<const Rule> rules, unsigned deniedAction) {
   const sock_filter denied = answer(deniedAction);
-  // The architecture comes first: the same numbers mean other calls under another one, and
-  // `int 0x80` changes it from one instruction to the next.
+  // The calling convention comes first: the same numbers mean other calls under another one, and
+  // `int 0x80` changes it from one instruction to the next. x32 shares x86-64's, but its numbers
+  // have a bit of their own, so that no table lists one of them.
   std::vector<sock_filter> program{load(offsetof(seccomp_data, arch)),
-                                   BPF_JUMP(BPF_JMP | BPF_JEQ | BPF_K, AUDIT_ARCH_X86_64, 1, 0),
-                                   denied,
-                                   load(offsetof(seccomp_data, nr)),
-                                   BPF_JUMP(BPF_JMP | BPF_JGE | BPF_K, firstX32Call, 0, 1),
-                                   denied};
+                                   BPF_JUMP(BPF_JMP | BPF_JEQ | BPF_K, nativeCalls, 1, 0), denied,
+                                   load(offsetof(seccomp_data, nr))};
   for (const Rule& rule : rules) append(program, rule, denied);
   program.push_back(denied);
   return program;

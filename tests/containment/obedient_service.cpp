@@ -6,7 +6,7 @@
 ///
 ///     call N [A...]    system call N with up to six arguments; its result is the answer's
 ///                      messageId
-///     int80 N A        the same by the old 32-bit gate
+///     int80 N A        the same by x86-64's old 32-bit gate
 ///     vsyscall N       slot N of the vsyscall page
 ///     say HEX          writes these bytes to the channel, and answers afterwards
 ///     drip HEX         the same, one byte a second
@@ -19,9 +19,10 @@
 #include "framework/contracts/log.h"
 #include "framework/contracts/process.h"
 #include "framework/server/keelgate_server.h"
+#include "tests/containment/machine.h"
 
 #include <unistd.h>
-#include <x86intrin.h>
+#include <algorithm>
 #include <charconv>
 #include <cstdlib>
 #include <cstring>
@@ -32,43 +33,21 @@
 namespace {
 
 using namespace Keelgate;
+using namespace Keelgate::Test;
 
 /// What the link check looks for, whatever is inlined or stripped.
 [[gnu::used]] constexpr char marker[] = "an unpacker that obeys";
 
-long callByGate(long number, long first) {
-  long result = number;
-  asm volatile("int $0x80"
-               : "+a"(result)
-               : "b"(first), "c"(0), "d"(0)
-               : "memory", "r8", "r9", "r10", "r11");
-  return result;
-}
-
-long callVsyscall(long slot) {
-  using Function = long (*)(long, long);
-  return reinterpret_cast<Function>(0xffff'ffff'ff60'0000 + static_cast<std::size_t>(slot) * 1024)(
-      0, 0);
-}
-
 long call(const std::vector<long>& numbers) {
-  long a[7]{};
-  std::copy(numbers.begin(), numbers.end(), std::begin(a));
-  long result = a[0];
-  register long r10 asm("r10") = a[4];
-  register long r8 asm("r8") = a[5];
-  register long r9 asm("r9") = a[6];
-  asm volatile("syscall"
-               : "+a"(result)
-               : "D"(a[1]), "S"(a[2]), "d"(a[3]), "r"(r10), "r"(r8), "r"(r9)
-               : "memory", "rcx", "r11");
-  return result;
+  RawCall whole{};
+  std::copy(numbers.begin(), numbers.end(), whole.begin());
+  return callKernel(whole);
 }
 
-/// A sealed process cannot sleep; a second is long enough if it is one on a slow machine.
+/// A sealed process cannot sleep.
 void passSecond() {
-  const std::uint64_t start = __rdtsc();
-  while (__rdtsc() - start < 3'000'000'000) _mm_pause();
+  const std::uint64_t start = ticks();
+  while (ticks() - start < ticksPerSecond()) relax();
 }
 
 void say(const std::string& hex, bool slowly) {
@@ -125,11 +104,11 @@ void misbehave(const std::string& how) {
   if (how == "abort") std::abort();
   if (how == "recurse") recurse(1'000'000);
   if (how == "throw") throw 1;
-  while (how == "spin") _mm_pause();
+  while (how == "spin") relax();
   if (how == "execute") {
-    // A return instruction, in memory that can be written.
-    volatile unsigned char code[] = {0xc3};
-    address = reinterpret_cast<std::size_t>(code);
+    // In memory that can be written.
+    volatile unsigned code = returnInstruction;
+    address = reinterpret_cast<std::size_t>(&code);
     reinterpret_cast<void (*)()>(address)();
   }
 }

@@ -4,12 +4,14 @@
 #include "framework/contracts/start_step.h"
 #include "framework/protocol/data_frames.h"
 #include "tests/containment/containment_testing.h"
+#include "tests/containment/machine.h"
 
 #include <gtest/gtest.h>
 #include <keelgate/records.h>
 #include <sys/resource.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
 #include <unistd.h>
 #include <algorithm>
 #include <csignal>
@@ -86,7 +88,7 @@ TEST_F(Worker, C3SeenFromOutside) {
   while (workers.size() < 2) workers = service_.workers();
   std::sort(workers.begin(), workers.end());
   // The one waits for a header, in read, for descriptor 3: it is sealed by then.
-  waitFor(workers[0], "syscall", "0 0x3 ");
+  waitFor(workers[0], "syscall", std::to_string(SYS_read) + " 0x3 ");
   waitFor(workers[1], "status", filters);
   expectSealed(service_.zygote());
   for (const pid_t worker : workers) {
@@ -157,13 +159,13 @@ TEST_F(Worker, C5ProcessorTimeIsLimitedWithoutTheClient) {
 TEST_F(Worker, EveryFaultEndsOneWorkerAlone) {
   NEEDS_SEAL();
   for (const auto& [order, signal] : {std::pair("fault", SIGSEGV),
-                                      {"trap", SIGILL},
+                                      {"trap", trapSignal},
                                       {"recurse", SIGSEGV},
                                       {"execute", SIGSEGV},
                                       // Raising a signal is a system call.
                                       {"abort", SIGSYS},
                                       // Nobody catches it: the process ends on the spot.
-                                      {"throw", SIGILL}}) {
+                                      {"throw", trapSignal}}) {
     const int other = service_.fork(7);
     const auto [reply, end] = service_.obey(order);
     EXPECT_EQ(end.signal(), signal) << order;
