@@ -243,7 +243,8 @@ RequestLine readRequestLine(String& line) {
     demand(Text::isUtf8(line), "not readable as JSON: not UTF-8");
     demand(!hasForbiddenControl(line), "not readable as JSON: a control character");
     // The reader looks at whole blocks of this size, the last one included.
-    line.reserve(line.size() + sizeof(__m128i));
+    constexpr std::size_t block = 16;
+    line.reserve(line.size() + block);
     rapidjson::InsituStringStream stream(line.data());
     rapidjson::Reader reader;
     RequestReader request;

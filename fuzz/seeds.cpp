@@ -6,6 +6,7 @@
 #include "fuzz/messages/round_trip.h"
 #include "plist/writer.h"
 
+#include <algorithm>
 #include <array>
 #include <filesystem>
 #include <fstream>
@@ -50,8 +51,8 @@ class Folder {
 };
 
 Data behind(std::size_t first, Bytes rest) {
-  Data all{static_cast<std::byte>(first)};
-  all.insert(all.end(), rest.begin(), rest.end());
+  Data all(1 + rest.size(), static_cast<std::byte>(first));
+  std::ranges::copy(rest, all.begin() + 1);
   return all;
 }
 

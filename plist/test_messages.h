@@ -70,7 +70,8 @@ inline std::vector<std::string> keysOfOneHash(std::size_t count) {
     const std::uint64_t mixed = (std::uint64_t{0x1234'5678} << 32 | low) * inverse;
     const std::uint64_t word = ((mixed ^ mixed >> 32) * inverse) ^ (8 * factor);
     if ((word & 0x8080'8080'8080'8080) != 0) continue;
-    std::string key(reinterpret_cast<const char*>(&word), sizeof word);
+    std::string key;
+    for (unsigned shift = 0; shift < 64; shift += 8) key += static_cast<char>(word >> shift);
     if (std::ranges::all_of(key, [](char c) { return c >= ' '; })) keys.push_back(std::move(key));
   }
   return keys;

@@ -224,6 +224,7 @@ std::vector<Hungry> hungryBodies() {
            }}};
 }
 
+#ifndef KEELGATE_UNSEALED
 /// The least memory that the body can be read with.
 std::size_t memoryFor(const Hungry& hungry) {
   std::size_t low = 0;
@@ -241,7 +242,6 @@ std::size_t memoryFor(const Hungry& hungry) {
   return high;
 }
 
-#ifndef KEELGATE_UNSEALED
 TEST(Reply, C12ReadingNeverTakesMoreThanItsMemory) {
   for (const Hungry& hungry : hungryBodies()) {
     const std::size_t memory = memoryFor(hungry);

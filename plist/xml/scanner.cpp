@@ -46,7 +46,8 @@ void XmlScanner::instruction() {
 /// Passes one character of any kind and checks that XML admits it.
 char32_t XmlScanner::character() {
   const char first = cursor_.peek();
-  if (first >= ' ') {
+  // Where char is unsigned, the bytes above ASCII are above a space too.
+  if (first >= ' ' && first <= '~') {
     cursor_.skip(1);
     return static_cast<char32_t>(first);
   }
