@@ -1,75 +1,183 @@
 // SPDX-License-Identifier: Apache-2.0
-// What an unpacker takes for a message, from bytes to record and on to the body of a reply; without
-// processes and sockets, which host_bench measures. Run from the root of the tree.
+// What a message costs from its bytes to the record and on to the client, without processes and
+// sockets, which host_bench measures. Beside each step what others take for the same contents:
+// protobuf's generated classes, pugixml, and the copying of the texts alone. One thread of one
+// process on a machine that has other work, too: compare rows of one run only. scripts/performance
+// does, and prints the ratios.
+#include "bench/messages.h"
+#include "framework/server/message_memory.h"
 #include "framework/transport/record_coding.h"
-#include "program/service/tables.h"
-#include "program/service/vesp_client_message_unpacker.h"
+#include "messages.pb.h"
+#include "program/payload/vesp_ostrel_payload_unpacker.h"
+#include "program/schema/property_list_decoder.h"
+#include "program/service/vesp_sample_message_unpacker.h"
+#include "program/waymark/waymark_message_unpacker.h"
 
 #include <benchmark/benchmark.h>
 
-#include <cstring>
-#include <fstream>
-#include <iterator>
-#include <string>
-#include <vector>
+#include <pugixml.hpp>
 
-namespace VespKeelgateService {
+namespace VespKeelgateService::Bench {
 
 namespace {
 
-std::vector<char> example(const std::string& name) {
-  std::ifstream in("examples/messages/" + name, std::ios::binary);
-  return {std::istreambuf_iterator<char>(in), {}};
+using Keelgate::Transport::decodeRecord;
+using Keelgate::Transport::encodeRecord;
+
+/// One message after the other; the time is that of one message.
+template <class Input, class Work>
+void measure(const std::string& name, const std::vector<Input>& inputs, Work work) {
+  benchmark::RegisterBenchmark(name.c_str(), [inputs, work](benchmark::State& state) {
+    std::size_t next = 0;
+    for (auto _ : state) {
+      work(inputs[next]);
+      if (++next == inputs.size()) next = 0;
+    }
+  })->Unit(benchmark::kNanosecond);
 }
 
-/// Runs the body on an example's bytes; beside the time, how fast memcpy moves the same bytes.
-template <class Body>
-void measure(benchmark::State& state, const std::string& name, Body body) {
-  const std::vector<char> message = example(name);
-  if (message.empty()) return state.SkipWithError("no such example; run from the root of the tree");
-  const Bytes bytes = std::as_bytes(std::span(message));
-  for (auto _ : state) benchmark::DoNotOptimize(body(bytes));
-  state.SetBytesProcessed(state.iterations() * static_cast<std::int64_t>(bytes.size()));
+/// As a worker does before it reads a message.
+void beginMessage() {
+  Keelgate::MessageMemory::begin(std::size_t{1} << 30);
 }
 
-template <class Unpacker>
-void registerRecord(const std::string& name) {
-  for (const char* form : {".bplist", ".xml"}) {
-    benchmark::RegisterBenchmark(
-        ("unpack/" + name + form).c_str(), [file = name + form](benchmark::State& state) {
-          measure(state, file, [](Bytes from) {
-            return Keelgate::Transport::encodeRecord(Unpacker().unpack(from));
-          });
-        });
+Bytes bytesOf(std::string_view text) {
+  return std::as_bytes(std::span(text));
+}
+
+/// The columns of the table for one kind of message. `unpack(bytes)` gives its record.
+template <class S, class Protobuf, class Unpack>
+void add(const std::string& name, const std::vector<Message>& messages, Unpack unpack) {
+  using benchmark::DoNotOptimize;
+  measure(name + "/copy", messages, [](const Message& message) {
+    for (const auto& text : message.texts) DoNotOptimize(std::vector<std::byte>(text).data());
+  });
+  measure(name + "/protobuf", messages, [](const Message& message) {
+    Protobuf read;
+    DoNotOptimize(read.ParseFromString(message.protobuf));
+  });
+  measure(name + "/protobuf-reply", messages, [](const Message& message) {
+    Protobuf read;
+    DoNotOptimize(read.ParseFromString(message.protobuf));
+    DoNotOptimize(read.SerializeAsString().data());
+  });
+  measure(name + "/check", messages, [](const Message& message) {
+    const PropertyList::Document document(message.binary);
+    DoNotOptimize(document.top().count());
+  });
+  measure(name + "/schema", messages, [](const Message& message) {
+    beginMessage();
+    DoNotOptimize(PropertyListDecoder().decode<S>(message.binary));
+  });
+  measure(name + "/record", messages, [unpack](const Message& message) {
+    beginMessage();
+    DoNotOptimize(unpack(message.binary));
+  });
+  measure(name + "/reply", messages, [unpack](const Message& message) {
+    beginMessage();
+    DoNotOptimize(encodeRecord(unpack(message.binary)).data());
+  });
+  std::vector<Data> replies;
+  for (const Message& message : messages) replies.push_back(encodeRecord(unpack(message.binary)));
+  measure(name + "/client", replies, [](const Data& reply) {
+    using Record = decltype(unpack(Bytes()));
+    DoNotOptimize(decodeRecord<Record>(reply));
+  });
+  measure(name + "/pugixml", messages, [](const Message& message) {
+    pugi::xml_document document;
+    DoNotOptimize(document.load_buffer(message.xml.data(), message.xml.size()).status);
+  });
+  measure(name + "/xml-check", messages, [](const Message& message) {
+    const PropertyList::Document document(bytesOf(message.xml));
+    DoNotOptimize(document.top().count());
+  });
+  measure(name + "/xml-record", messages, [unpack](const Message& message) {
+    beginMessage();
+    DoNotOptimize(unpack(bytesOf(message.xml)));
+  });
+}
+
+template <class Change>
+void addPayloads(const std::string& name, unsigned count, unsigned share, Change change) {
+  add<VespOstrelProtocolPayload, bench::VespOstrelProtocolPayload>(
+      name,
+      manyOf<VespOstrelProtocolPayload, bench::VespOstrelProtocolPayload>(count, share, change),
+      [](Bytes from) { return VespOstrelPayloadUnpacker().unpack(from); });
+}
+
+void addCheckIns(const std::string& name, unsigned count, unsigned share) {
+  add<WaymarkSchema, bench::WaymarkSchema>(
+      name,
+      manyOf<WaymarkSchema, bench::WaymarkSchema>(count, share, [](WaymarkSchema&, unsigned) {}),
+      [](Bytes from) {
+        return WaymarkMessageUnpacker().unpack(
+            from, {.command = 3, .service = "com.tessen.private.braid.waymark"});
+      });
+}
+
+/// Inner payloads with some of the fields, so that a message of them is not all of one kind.
+VespOstrelProtocolPayload innerPayload(unsigned seed) {
+  VespOstrelProtocolPayload inner{};
+  Filler<VespOstrelProtocolPayload>(seed, 5).fill(inner);
+  return inner;
+}
+
+void addNested() {
+  addPayloads("nested", 64, 5, [](VespOstrelProtocolPayload& outer, unsigned seed) {
+    auto& list = outer.ostrelMessageList.emplace();
+    for (unsigned i = 0; i < 20; ++i) list.push_back(innerPayload(1000 * seed + i));
+  });
+  addPayloads("deep", 16, 2, [](VespOstrelProtocolPayload& outer, unsigned seed) {
+    for (unsigned i = 0; i < 100; ++i) {
+      VespOstrelProtocolPayload around{};
+      around.command = static_cast<Int>(seed + i);
+      around.ostrelMessageList.emplace().push_back(std::move(outer));
+      outer = std::move(around);
+    }
+  });
+}
+
+/// Keys that no field takes; the time divided by their number is what each of them costs.
+void addUnknownKeys() {
+  for (const std::size_t count : {1'000, 10'000, 100'000, 1'000'000}) {
+    PropertyList::Dictionary entries{{"c", 1}};
+    for (std::size_t i = 0; i < count; ++i) entries.emplace_back("unknown-" + std::to_string(i), 7);
+    measure("unknown-" + std::to_string(count) + "/record",
+            std::vector<Data>{PropertyList::writeBinary(entries)}, [](const Data& message) {
+              beginMessage();
+              benchmark::DoNotOptimize(VespOstrelPayloadUnpacker().unpack(message));
+            });
   }
 }
 
-void registerClientMessage(const std::string& name, const char* service, UInt64 command) {
-  static const VespClientMessageUnpacker router((ServiceToUnpackerMap(Services())));
-  for (const char* form : {".bplist", ".xml"}) {
-    benchmark::RegisterBenchmark(
-        ("unpack/" + name + form).c_str(), [=, file = name + form](benchmark::State& state) {
-          measure(state, file, [&](Bytes from) {
-            return Keelgate::Transport::encodeRecord(
-                router.unpack(from, {.command = command, .service = service}));
-          });
-        });
-  }
+void addAll() {
+  const auto unchanged = [](auto&, unsigned) {
+  };
+  addPayloads("mixed", 256, 50, unchanged);
+  addPayloads("sparse", 256, 5, unchanged);
+  addNested();
+  addCheckIns("check-in", 256, 100);
+  addCheckIns("check-in-37", 256, 22);
+  add<VespSampleMessageSchema, bench::VespSampleMessageSchema>(
+      "sample", manyOf<VespSampleMessageSchema, bench::VespSampleMessageSchema>(256, 50, unchanged),
+      [](Bytes from) {
+        return VespSampleMessageUnpacker().unpack(
+            from, {.command = 1, .service = "com.tessen.private.braid.rtcengine.rtctester"});
+      });
+  addPayloads("data-4MiB", 1, 0, [](VespOstrelProtocolPayload& payload, unsigned) {
+    payload.payload.emplace(std::size_t{4} << 20, std::byte{7});
+  });
+  addUnknownKeys();
 }
 
 }  // namespace
 
-}  // namespace VespKeelgateService
+}  // namespace VespKeelgateService::Bench
 
 int main(int argc, char** argv) {
-  using namespace VespKeelgateService;
-  registerClientMessage("sample-message", "com.tessen.private.braid.rtcengine.rtctester", 1);
-  registerClientMessage("session-invitation", "com.tessen.private.braid.viso.video", 232);
-  registerClientMessage("check-in", "com.tessen.private.braid.waymark", 3);
-  registerRecord<VespOstrelPayloadUnpacker>("push-payload");
-  registerRecord<VespCommandResponseUnpacker>("command-response");
-  registerRecord<VespInvitationUnpacker>("invitation-home");
+  VespKeelgateService::Bench::addAll();
   benchmark::Initialize(&argc, argv);
+  if (benchmark::ReportUnrecognizedArguments(argc, argv)) return 1;
   benchmark::RunSpecifiedBenchmarks();
   return 0;
 }

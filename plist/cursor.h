@@ -59,6 +59,13 @@ class Cursor {
     if constexpr (std::endian::native == std::endian::little) number = __builtin_bswap64(number);
     return number >> (64 - 8 * width);
   }
+  /// Whether none of the bytes at `offset` is above 0x7f. Requires 8 bytes of message behind them.
+  static bool isAsciiAt(Bytes message, std::size_t offset, std::size_t length) noexcept {
+    std::uint64_t seen = 0;
+    for (; length >= 8; length -= 8, offset += 8) seen |= bigEndianAt(message, offset, 8);
+    if (length > 0) seen |= bigEndianAt(message, offset, length);
+    return (seen & 0x8080'8080'8080'8080) == 0;
+  }
   /// The view of `length` bytes at `offset`; both checked by the caller when the node was made.
   static std::string_view textAt(Bytes message, std::size_t offset, std::size_t length) noexcept {
     return {reinterpret_cast<const char*>(message.data() + offset), length};

@@ -2,7 +2,7 @@
 /// A checked property list, binary or XML, and cheap handles to what is in it.
 ///
 ///   PropertyList::Document document(message);       // throws MalformedDocument
-///   for (auto [key, hash, value] : document.top().entries()) { ... }
+///   for (auto [key, digest, value] : document.top().entries()) { ... }
 ///
 /// The constructor checks everything that the top object reaches, so that no accessor can meet
 /// anything malformed later. It takes time and memory in proportion to the message's length,
@@ -95,7 +95,7 @@ class Value {
 /// What a dictionary holds under one key. Every key occurs once: that was checked.
 struct Entry {
   std::string_view key;  // valid UTF-8
-  std::uint32_t hash;    // keyHash(key), already known
+  std::uint64_t digest;  // keyDigest(key), already known
   Value value;
 };
 
@@ -114,7 +114,7 @@ class Range {
       const Value value(*store_, store_->child(value_), shared_);
       if constexpr (isEntry) {
         const Node& key = store_->nodes[store_->child(key_)];
-        return {store_->text(key), store_->keys[key.key() - 1].hash, value};
+        return {store_->text(key), store_->keys[key.key() - 1].digest, value};
       } else {
         return value;
       }
@@ -174,7 +174,7 @@ class Document {
   Document& operator=(const Document&) = delete;
 
   /// Of any type: that it must be a dictionary is for whoever has a schema.
-  Value top() const noexcept { return {store_, 0, false}; }
+  Value top() const noexcept { return {store_, store_.top, false}; }
 
  private:
   Store store_;

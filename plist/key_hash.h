@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The hash of dictionary keys. The same at compile time, so that tables of fields can be made with
-/// it: whoever looks a key up has its hash from the document.
+/// The digest of dictionary keys. The same at compile time, so that tables of fields can be made
+/// with it: whoever looks a key up has its digest from the document.
 ///
 /// Pure functions; may be used from any thread.
 #pragma once
@@ -13,6 +13,9 @@
 #include <type_traits>
 
 namespace PropertyList {
+
+/// Odd, and without a pattern in its bits.
+inline constexpr std::uint64_t keyFactor = 0x9e37'79b9'7f4a'7c15;
 
 /// The first bytes of the text as a number, least significant first. The text must have them.
 template <std::size_t bytes>
@@ -28,28 +31,42 @@ constexpr std::uint64_t loadWord(std::string_view text) noexcept {
   return word;
 }
 
-/// All of the key has a say in all bits. It has no secret: whoever wants keys with one hash can
-/// have them, and no look-up may rely on there being few.
-constexpr std::uint32_t keyHash(std::string_view key) noexcept {
-  constexpr std::uint64_t factor = 0x9e37'79b9'7f4a'7c15;
-  std::uint64_t hash = key.size() * factor;
+/// What a key is known by. A key of at most seven bytes is its digest: length and bytes, so that
+/// two of them are the same where their digests are. Longer ones are told by the highest bit; they
+/// may share a digest, and are then to be compared. The digest has no secret: whoever wants keys
+/// with one hash can have them, and no look-up may rely on there being few.
+constexpr std::uint64_t keyDigest(std::string_view key) noexcept {
+  const std::size_t size = key.size();
+  if (size < 8) {
+    std::uint64_t word = 0;
+    // Two loads that overlap give each byte its place, whatever the length.
+    if (size >= 4) {
+      word = loadWord<4>(key) | loadWord<4>(key.substr(size - 4)) << (8 * (size - 4));
+    } else if (size > 0) {
+      word = loadWord<1>(key) | loadWord<1>(key.substr(size / 2)) << (8 * (size / 2)) |
+             loadWord<1>(key.substr(size - 1)) << (8 * (size - 1));
+    }
+    return word | std::uint64_t{size} << 56;
+  }
+  std::uint64_t hash = size * keyFactor;
   const auto add = [&hash](std::uint64_t word) {
-    hash = (hash ^ word) * factor;
+    hash = (hash ^ word) * keyFactor;
     hash ^= hash >> 32;
   };
-  const std::size_t size = key.size();
-  if (size >= 8) {
-    for (; key.size() > 8; key.remove_prefix(8)) add(loadWord<8>(key));
-    // What is left, and as much before it as makes a word.
-    add(loadWord<8>({key.data() + key.size() - 8, 8}));
-  } else if (size >= 4) {
-    add(loadWord<4>(key) | loadWord<4>(key.substr(size - 4)) << 32);
-  } else if (size > 0) {
-    add(loadWord<1>(key) | loadWord<1>(key.substr(size / 2)) << 8 |
-        loadWord<1>(key.substr(size - 1)) << 16);
-  }
-  // The upper half, in which all of the last word has a say.
-  return static_cast<std::uint32_t>(hash * factor >> 32);
+  for (; key.size() > 8; key.remove_prefix(8)) add(loadWord<8>(key));
+  // What is left, and as much before it as makes a word.
+  add(loadWord<8>({key.data() + key.size() - 8, 8}));
+  return hash * keyFactor | std::uint64_t{1} << 63;
+}
+
+/// Whether the digest is all of the key.
+constexpr bool isWholeKey(std::uint64_t digest) noexcept {
+  return digest >> 63 == 0;
+}
+
+/// A number of so many bits, 1 to 63, in which all of the digest has a say.
+constexpr std::size_t keyHash(std::uint64_t digest, int bits) noexcept {
+  return static_cast<std::size_t>(digest * keyFactor >> (64 - bits));
 }
 
 }  // namespace PropertyList

@@ -2,7 +2,6 @@
 #include "plist/key_table.h"
 
 #include "plist/key_hash.h"
-#include "plist/malformed_document.h"
 
 #include <bit>
 
@@ -33,45 +32,32 @@ bool KeyTable::Less::operator()(std::string_view left, std::uint32_t right) cons
 }
 
 KeyTable::KeyTable(Store& store) : store_(store), colliding_(Less{&store}) {
-  slots_.zero(64);
+  slots_.zero(std::size_t{1} << bits_);
 }
 
-void KeyTable::check(std::uint32_t dictionary, std::size_t end) {
-  // Once for all of them, and seldom for dictionaries whose keys are known.
-  reserve(store_.keys.size() + store_.nodes[dictionary].count);
-  std::size_t position = store_.firstChild(dictionary);
-  for (std::uint32_t left = store_.nodes[dictionary].count; left > 0; --left) {
-    const std::uint32_t node = store_.child(position);
-    if (store_.nodes[node].key() == 0) store_.nodes[node].setKey(find(node));
-    Key& key = store_.keys[store_.nodes[node].key() - 1];
-    if (key.dictionary == dictionary + 1) {
-      const std::size_t place = store_.place(position);
-      throw MalformedDocument(Problem::duplicateKey, place != 0 ? place : end);
-    }
-    key.dictionary = dictionary + 1;
-    position = store_.nextKey(position);
-  }
+std::uint32_t& KeyTable::slot(std::uint64_t digest, std::uint32_t step) noexcept {
+  return slots_[(keyHash(digest, bits_) + step * (step + 1) / 2) & (slots_.size() - 1)];
 }
 
 /// The number of the key with this node's text, which is new as a rule. There is room for it.
 std::uint32_t KeyTable::find(std::uint32_t node) {
   const std::string_view text = store_.text(store_.nodes[node]);
-  const std::uint32_t hash = keyHash(text);
-  const std::size_t mask = slots_.size() - 1;
+  const std::uint64_t digest = keyDigest(text);
   std::uint32_t* vacant = nullptr;
   for (std::uint32_t step = 0; step < triedSlots && vacant == nullptr; ++step) {
-    std::uint32_t& slot = slots_[(hash + step * (step + 1) / 2) & mask];
-    if (slot == 0) {
-      vacant = &slot;
-    } else if (store_.keys[slot - 1].hash == hash && store_.keyText(slot) == text) {
-      return slot;
+    std::uint32_t& tried = slot(digest, step);
+    if (tried == 0) {
+      vacant = &tried;
+    } else if (store_.keys[tried - 1].digest == digest &&
+               (isWholeKey(digest) || store_.keyText(tried) == text)) {
+      return tried;
     }
   }
   if (!colliding_.empty()) {
     const auto found = colliding_.find(text);
     if (found != colliding_.end()) return *found;
   }
-  store_.keys.push({.node = node, .hash = hash, .dictionary = 0});
+  store_.keys.push({.digest = digest, .node = node, .dictionary = 0});
   const auto number = static_cast<std::uint32_t>(store_.keys.size());
   if (vacant != nullptr) {
     *vacant = number;
@@ -82,20 +68,20 @@ std::uint32_t KeyTable::find(std::uint32_t node) {
 }
 
 /// Makes room for so many keys. Those that are there find new slots.
-void KeyTable::reserve(std::size_t keys) {
-  if (2 * keys <= slots_.size()) return;
-  slots_.zero(std::bit_ceil(4 * keys));
+void KeyTable::grow(std::size_t keys) {
+  const std::size_t size = std::bit_ceil(2 * keys);
+  slots_.zero(size);
+  bits_ = std::countr_zero(size);
   colliding_.clear();
   for (std::uint32_t number = 1; number <= store_.keys.size(); ++number) place(number);
 }
 
 void KeyTable::place(std::uint32_t number) {
-  const std::uint32_t hash = store_.keys[number - 1].hash;
-  const std::size_t mask = slots_.size() - 1;
+  const std::uint64_t digest = store_.keys[number - 1].digest;
   for (std::uint32_t step = 0; step < triedSlots; ++step) {
-    std::uint32_t& slot = slots_[(hash + step * (step + 1) / 2) & mask];
-    if (slot != 0) continue;
-    slot = number;
+    std::uint32_t& tried = slot(digest, step);
+    if (tried != 0) continue;
+    tried = number;
     return;
   }
   colliding_.insert(number);

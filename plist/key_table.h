@@ -25,10 +25,21 @@ class KeyTable {
  public:
   explicit KeyTable(Store& store);
 
-  /// Numbers the keys of this dictionary, which must all be read and be strings, and finds the
-  /// first that was there before. The dictionary ends at `end` in the message. Throws
-  /// MalformedDocument(duplicateKey), std::bad_alloc.
-  void check(std::uint32_t dictionary, std::size_t end);
+  /// Makes room for so many keys beside those that are there. To be called before they are added.
+  /// Throws std::bad_alloc.
+  void reserve(std::size_t more) {
+    if (2 * (store_.keys.size() + more) > slots_.size()) grow(store_.keys.size() + more);
+  }
+  /// Numbers the key of a dictionary that has this node, a string. False if the dictionary has the
+  /// key already: its keys are added one after the other, with those of no other dictionary
+  /// between them. Throws std::bad_alloc.
+  bool add(std::uint32_t dictionary, std::uint32_t node) {
+    if (store_.nodes[node].key() == 0) store_.nodes[node].setKey(find(node));
+    Key& key = store_.keys[store_.nodes[node].key() - 1];
+    const bool isNew = key.dictionary != dictionary + 1;
+    key.dictionary = dictionary + 1;
+    return isNew;
+  }
 
  private:
   struct Less {
@@ -40,12 +51,14 @@ class KeyTable {
   };
 
   std::uint32_t find(std::uint32_t node);
-  void reserve(std::size_t keys);
+  void grow(std::size_t keys);
   void place(std::uint32_t number);
+  std::uint32_t& slot(std::uint64_t digest, std::uint32_t step) noexcept;
 
   Store& store_;
   /// Open addressing; keys' numbers, at most half of them taken. The size is a power of two.
-  SmallBuffer<std::uint32_t, 128> slots_;
+  SmallBuffer<std::uint32_t, 512> slots_;
+  int bits_ = 6;
   /// Keys that found no slot. Empty in any message that was not made to collide, or nearly so.
   std::set<std::uint32_t, Less> colliding_;
 };

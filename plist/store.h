@@ -1,10 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
-/// What a reader fills and a Document shows: one table of 16-byte nodes in the order in which they
-/// were read, the distinct keys, and one side buffer.
+/// What a reader fills and a Document shows: one table of 16-byte nodes, the distinct keys, and one
+/// side buffer.
 ///
-/// Binary: children are the references in the message, which the list of objects leads to nodes.
-/// XML: a container stands before its children and a key before its value; a container knows where
-/// its last descendant ends.
+/// Binary: a node for each object of the message, under its number; children are the references in
+/// the message. XML: nodes in the order of the message, a container before its children and a key
+/// before its value; a container knows where its last descendant ends.
 ///
 /// A resource of its Document; fixed once the reader has returned.
 #pragma once
@@ -44,7 +44,8 @@ struct Node {
     shared = 1,    // referenced more than once
     inSide = 2,    // the bytes are in the side buffer, not in the message
     negative = 4,  // an integer's bits are to be read as signed
-    open = 8       // binary: being walked, so that another reference to it closes a circle
+    open = 8,      // binary: being walked, so that another reference to it closes a circle
+    read = 16      // binary: reached; others are zero
   };
 
   /// A scalar's value. The position of bytes or references, and above it a key's number. An XML
@@ -67,8 +68,8 @@ static_assert(sizeof(Node) == 16);
 
 /// A distinct key of the document. Numbers of keys are counted from 1.
 struct Key {
+  std::uint64_t digest;      // keyDigest of the text
   std::uint32_t node;        // the first with this text
-  std::uint32_t hash;        // keyHash of the text
   std::uint32_t dictionary;  // while reading: the last that has it, counted from 1
 };
 
@@ -76,12 +77,10 @@ struct Key {
 /// whoever walks it asks the members below and never knows which it is.
 struct Store {
   Bytes message;
-  SmallBuffer<Node, 128> nodes;
-  /// Binary: the node of each object, counted from 1; 0 where the object was not reached. Four
-  /// bytes for each that the message claims to have; nodes are for those that it refers to.
-  SmallBuffer<std::uint32_t, 128> objects;
+  SmallBuffer<Node, 512> nodes;
+  std::uint32_t top = 0;        // the node of the top object
   SmallBuffer<char, 512> side;  // unescaped and converted text, decoded base64
-  SmallBuffer<Key, 64> keys;
+  SmallBuffer<Key, 256> keys;
   std::size_t referenceSize = 0;  // bytes; 0 for XML
 
   /// A string's or data's bytes. The view is good until the side buffer grows: readers keep
@@ -103,7 +102,7 @@ struct Store {
   /// The node of a child. The reader has held every reference against the number of objects.
   std::uint32_t child(std::size_t position) const noexcept {
     if (referenceSize == 0) return static_cast<std::uint32_t>(position);
-    return objects[Cursor::bigEndianAt(message, position, referenceSize)] - 1;
+    return static_cast<std::uint32_t>(Cursor::bigEndianAt(message, position, referenceSize));
   }
   /// The next sibling. In XML that is past all descendants.
   std::size_t after(std::size_t position) const noexcept {
@@ -115,14 +114,9 @@ struct Store {
   std::size_t nextKey(std::size_t key) const noexcept {
     return referenceSize != 0 ? key + referenceSize : after(key + 1);
   }
-  /// Where in the message a child is named or begins; 0 where its text was assembled.
-  std::size_t place(std::size_t position) const noexcept {
-    if (referenceSize != 0) return position;
-    return nodes[position].has(Node::inSide) ? 0 : nodes[position].position();
-  }
 };
 
-/// Fill a store whose message is set; the top is node 0. Throw MalformedDocument and
+/// Fill a store whose message is set. Throw MalformedDocument and
 /// std::bad_alloc, and leave the store as it is then: a Document whose constructor throws is never
 /// seen.
 void readBinary(Store& store);

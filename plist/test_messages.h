@@ -67,7 +67,10 @@ inline std::vector<std::string> keysOfOneHash(std::size_t count) {
   for (int i = 0; i < 6; ++i) inverse *= 2 - factor * inverse;
   std::vector<std::string> keys;
   for (std::uint64_t low = 0; keys.size() < count; ++low) {
-    const std::uint64_t mixed = (std::uint64_t{0x1234'5678} << 32 | low) * inverse;
+    const std::uint64_t digest = (std::uint64_t{0x1234'5678} << 32 | low) * inverse;
+    // The highest bit of a digest is set, whatever the key.
+    if (digest >> 63 == 0) continue;
+    const std::uint64_t mixed = digest * inverse;
     const std::uint64_t word = ((mixed ^ mixed >> 32) * inverse) ^ (8 * factor);
     if ((word & 0x8080'8080'8080'8080) != 0) continue;
     std::string key;

@@ -192,7 +192,7 @@ TEST(Invitations, TheStandardDecodersOfTheCaseKeyedFormWantExactlyOneKey) {
     Decoding decoding{budget};
     VespDictionaryContextData contextData;
     try {
-      decodeValue(decoding, document.top(), CodingPath(), contextData);
+      decodeValue<VespDictionaryContextData>(decoding, document.top(), CodingPath(), contextData);
       return String();
     } catch (const Keelgate::DecodingError& error) {
       return std::to_string(error.codingPath.size()) + " " + error.debugDescription;

@@ -26,4 +26,21 @@ R construct(R record) {
   return record;
 }
 
+/// The same for a record that has been filled in its place, and stays there.
+template <Record R>
+void constructInPlace(const R&) {
+  admit(typeName<R>());
+}
+
+/// For each of a list, or for one if it is there. The first that is refused ends the message; no
+/// list is ever shortened.
+template <Record R>
+void constructInPlace(const Array<R>& records) {
+  for (const R& record : records) constructInPlace(record);
+}
+template <Record R>
+void constructInPlace(const Optional<R>& record) {
+  if (record) constructInPlace(*record);
+}
+
 }  // namespace Keelgate

@@ -16,10 +16,10 @@ constexpr std::uint64_t shortMessage = std::uint64_t{256} << 10;
 /// allocator's slack are far below. Untouched, they cost nothing.
 constexpr std::size_t budgetBase = std::size_t{128} << 20;
 
-/// Bytes for each byte of the message. The hungriest message is a list of empty payloads: some 8 KB
-/// for the schema and the record of each, as against 45 bytes of XML or a dozen of binary. A longer
-/// list than the base has room for, 16,000 at least and 26,000 in XML, would not be a push payload
-/// any more, and to grant its factor would let 64 MiB of message ask for the whole machine.
+/// Bytes for each byte of the message. The hungriest message is a list of empty payloads: some 4 KB
+/// for the record of each, as against 45 bytes of XML or a dozen of binary. A longer list than the
+/// base has room for, 26,000 at least, would not be a push payload any more, and to grant its
+/// factor would let 64 MiB of message ask for the whole machine.
 constexpr std::size_t budgetPerByte = 64;
 
 /// Bytes of memory that a message of `length` bytes is worth: resident, in the worker that decodes

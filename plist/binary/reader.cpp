@@ -30,25 +30,28 @@ class BinaryReader {
   void read();
 
  private:
-  /// A container being walked: its references from `next` to `end`, the first ones keys.
+  /// A container being walked: its references to values from `next` to `end`.
   struct Frame {
     std::uint32_t node;
     std::uint16_t highest;  // of the children walked so far
     std::size_t next;
-    std::size_t keysEnd;
     std::size_t end;
   };
 
-  std::uint64_t readTrailer();
-  void follow(Frame& frame);
+  std::uint32_t readTrailer();
+  void walk(Frame& frame);
+  void readKeys(Frame& frame);
   void leave(const Frame& frame);
-  void enter(std::uint64_t number);
+  std::uint32_t reference(std::size_t position) const;
+  Node& load(std::uint32_t number);
+  void open(std::uint32_t number);
+  void revisit(Node& node, std::size_t position);
   Node readObject(Cursor& object);
   Node readInteger(Cursor& object, unsigned width);
   Node readDouble(Cursor& object, Type type, unsigned width);
   Node readBytes(Cursor& object, Type type, std::uint64_t length);
   Node readUtf16(Cursor& object, std::uint64_t units);
-  Node openContainer(Cursor& object, Type type, std::uint64_t count);
+  Node readContainer(Cursor& object, Type type, std::uint64_t count);
   std::uint64_t readCount(Cursor& object, unsigned low);
   Bytes claim(Cursor& object, std::uint64_t length);
 
@@ -64,22 +67,16 @@ class BinaryReader {
 };
 
 void BinaryReader::read() {
-  enter(readTrailer());
-  while (depth_ > 0) {
-    Frame& frame = frames_[depth_ - 1];
-    if (frame.next < frame.end) {
-      follow(frame);
-    } else {
-      leave(frame);
-    }
-  }
+  store_.top = readTrailer();
+  if (load(store_.top).has(Node::open)) open(store_.top);
+  while (depth_ > 0) walk(frames_[depth_ - 1]);
 }
 
 /// Returns the number of the top object.
 ///
 /// Deliberate: the unused bytes are not looked at, nor is what may lie between the offset table and
 /// the trailer: nothing reaches it.
-std::uint64_t BinaryReader::readTrailer() {
+std::uint32_t BinaryReader::readTrailer() {
   const Bytes message = store_.message;
   if (!Cursor(message).skipIf(magic)) throw MalformedDocument(Problem::otherVersion, 0);
   if (message.size() < magic.size() + trailerLength) {
@@ -101,37 +98,64 @@ std::uint64_t BinaryReader::readTrailer() {
     throw MalformedDocument(Problem::trailer, tableEnd);
   }
   tableStart_ = static_cast<std::size_t>(table);
-  store_.objects.zero(static_cast<std::size_t>(objects));
+  store_.nodes.zero(static_cast<std::size_t>(objects));
   claimable_ = Limits::claimedBase + Limits::claimedFactor * message.size();
-  return top;
+  return static_cast<std::uint32_t>(top);
 }
 
-/// Walks one reference. Heights make the limit exact although every object is walked once: a chain
-/// of containers that is joined lower down counts by what it was found to be.
-void BinaryReader::follow(Frame& frame) {
-  const std::size_t position = frame.next;
+/// The number of the object that is named at this position of the message.
+std::uint32_t BinaryReader::reference(std::size_t position) const {
   const std::uint64_t number = Cursor::bigEndianAt(store_.message, position, store_.referenceSize);
-  if (number >= store_.objects.size()) {
+  if (number >= store_.nodes.size()) {
     throw MalformedDocument(Problem::referenceOutOfRange, position);
   }
-  frame.next += store_.referenceSize;
+  return static_cast<std::uint32_t>(number);
+}
 
-  const std::uint32_t& known = store_.objects[static_cast<std::size_t>(number)];
-  if (known == 0) {
-    enter(number);
-  } else {
-    Node& node = store_.nodes[known - 1];
-    // Open is every container on the stack, and none beside.
-    if (node.has(Node::open)) throw MalformedDocument(Problem::selfContaining, position);
-    if (depth_ + node.height > Limits::nestedContainers) {
-      throw MalformedDocument(Problem::tooDeep, position);
+/// Walks the references of the innermost container, as far as one that opens another container.
+void BinaryReader::walk(Frame& frame) {
+  while (frame.next < frame.end) {
+    const std::size_t position = frame.next;
+    const std::uint32_t number = reference(position);
+    frame.next += store_.referenceSize;
+    if (store_.nodes[number].has(Node::read)) {
+      revisit(store_.nodes[number], position);
+    } else if (load(number).has(Node::open)) {
+      return open(number);
     }
-    frame.highest = std::max(frame.highest, node.height);
-    node.set(Node::shared);
   }
-  if (position < frame.keysEnd && store_.nodes[known - 1].type != Type::string) {
-    throw MalformedDocument(Problem::keyNotString, position);
+  leave(frame);
+}
+
+/// All keys of a dictionary, which stand before its values.
+void BinaryReader::readKeys(Frame& frame) {
+  keys_.reserve(store_.nodes[frame.node].count);
+  for (; frame.next < frame.end; frame.next += store_.referenceSize) {
+    const std::uint32_t number = reference(frame.next);
+    Node& node = store_.nodes[number];
+    if (node.has(Node::read)) {
+      revisit(node, frame.next);
+    } else {
+      load(number);
+    }
+    if (node.type != Type::string) throw MalformedDocument(Problem::keyNotString, frame.next);
+    if (!keys_.add(frame.node, number)) {
+      throw MalformedDocument(Problem::duplicateKey, frame.next);
+    }
   }
+}
+
+/// Another reference to what was read before. Heights make the limit exact although every object is
+/// walked once: a chain of containers that is joined lower down counts by what it was found to be.
+void BinaryReader::revisit(Node& node, std::size_t position) {
+  // Open is every container on the stack, and none beside.
+  if (node.has(Node::open)) throw MalformedDocument(Problem::selfContaining, position);
+  if (depth_ + node.height > Limits::nestedContainers) {
+    throw MalformedDocument(Problem::tooDeep, position);
+  }
+  Frame& frame = frames_[depth_ - 1];
+  frame.highest = std::max(frame.highest, node.height);
+  node.set(Node::shared);
 }
 
 /// All children are checked: the container is, too.
@@ -139,23 +163,34 @@ void BinaryReader::leave(const Frame& frame) {
   Node& node = store_.nodes[frame.node];
   node.height = static_cast<std::uint16_t>(frame.highest + 1);
   node.flags = static_cast<std::uint8_t>(node.flags & ~Node::open);
-  if (node.type == Type::dictionary) keys_.check(frame.node, frame.end);
   --depth_;
   if (depth_ > 0) frames_[depth_ - 1].highest = std::max(frames_[depth_ - 1].highest, node.height);
 }
 
-/// Reads the object of this number, for the first time. A container becomes the innermost frame.
-void BinaryReader::enter(std::uint64_t number) {
+/// Reads the object of this number, for the first time.
+Node& BinaryReader::load(std::uint32_t number) {
   // Inside the table, since the number is below the count that the table was checked for.
-  const std::size_t entry = tableStart_ + static_cast<std::size_t>(number) * offsetSize_;
+  const std::size_t entry = tableStart_ + number * offsetSize_;
   const std::uint64_t offset = Cursor::bigEndianAt(store_.message, entry, offsetSize_);
   if (offset < magic.size() || offset >= tableStart_) {
     throw MalformedDocument(Problem::objectOutside, entry);
   }
   Cursor object(store_.message, static_cast<std::size_t>(offset), tableStart_);
-  store_.nodes.push(readObject(object));
-  store_.objects[static_cast<std::size_t>(number)] =
-      static_cast<std::uint32_t>(store_.nodes.size());
+  Node& node = store_.nodes[number];
+  node = readObject(object);
+  node.set(Node::read);
+  return node;
+}
+
+/// Makes a container that was read the innermost frame.
+void BinaryReader::open(std::uint32_t number) {
+  const Node& node = store_.nodes[number];
+  const std::size_t length = node.count * store_.referenceSize;
+  Frame& frame = frames_[depth_++];
+  frame = {.node = number, .highest = 0, .next = node.position(), .end = node.position() + length};
+  if (node.type != Type::dictionary) return;
+  readKeys(frame);
+  frame.end += length;
 }
 
 Node BinaryReader::readObject(Cursor& object) {
@@ -185,11 +220,11 @@ Node BinaryReader::readObject(Cursor& object) {
     case 0x8:
       return readBytes(object, Type::uid, low + 1);
     case 0xA:
-      return openContainer(object, Type::array, readCount(object, low));
+      return readContainer(object, Type::array, readCount(object, low));
     case 0xC:
-      return openContainer(object, Type::set, readCount(object, low));
+      return readContainer(object, Type::set, readCount(object, low));
     case 0xD:
-      return openContainer(object, Type::dictionary, readCount(object, low));
+      return readContainer(object, Type::dictionary, readCount(object, low));
     default:
       break;
   }
@@ -226,7 +261,10 @@ Node BinaryReader::readDouble(Cursor& object, Type type, unsigned width) {
 Node BinaryReader::readBytes(Cursor& object, Type type, std::uint64_t length) {
   const std::size_t start = object.position();
   claim(object, length);
-  if (type == Type::string && !Text::isAscii(object.since(start))) {
+  // The trailer lies behind what is read, so words may be loaded beyond the end of a short text.
+  const bool isShort = length < 64;
+  if (type == Type::string && !(isShort ? Cursor::isAsciiAt(store_.message, start, length)
+                                        : Text::isAscii(object.since(start)))) {
     throw MalformedDocument(Problem::notAscii, start);
   }
   return {.bits = start, .count = static_cast<std::uint32_t>(length), .type = type};
@@ -253,20 +291,14 @@ Node BinaryReader::readUtf16(Cursor& object, std::uint64_t units) {
 }
 
 /// Children are walked later, from the frame; here only their references are known to be there.
-Node BinaryReader::openContainer(Cursor& object, Type type, std::uint64_t count) {
+Node BinaryReader::readContainer(Cursor& object, Type type, std::uint64_t count) {
   const std::size_t start = object.position();
   // Before it is multiplied.
   if (count > object.remaining()) throw MalformedDocument(Problem::objectOutside, start);
   if (depth_ == Limits::nestedContainers) throw MalformedDocument(Problem::tooDeep, start);
-  const bool isDictionary = type == Type::dictionary;
   const std::uint64_t length = count * store_.referenceSize;
-  claim(object, isDictionary ? 2 * length : length);
+  claim(object, type == Type::dictionary ? 2 * length : length);
   // Open until it is left: a reference to it from below closes a circle.
-  frames_[depth_++] = {.node = static_cast<std::uint32_t>(store_.nodes.size()),
-                       .highest = 0,
-                       .next = start,
-                       .keysEnd = isDictionary ? start + static_cast<std::size_t>(length) : start,
-                       .end = object.position()};
   return {
       .bits = start, .count = static_cast<std::uint32_t>(count), .type = type, .flags = Node::open};
 }

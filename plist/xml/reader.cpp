@@ -43,6 +43,7 @@ class XmlReader {
   void readBody(Element element, bool isEmpty);
   void openContainer(Type type, bool isEmpty);
   void closeContainer();
+  void checkKeys(std::uint32_t dictionary, std::size_t end);
   Content content(Element element, bool isEmpty);
   void addText(const Content& text);
   void addData(const Content& text);
@@ -164,7 +165,22 @@ void XmlReader::closeContainer() {
   Node& node = store_.nodes[frame.node];
   node.bits = store_.nodes.size();
   node.count = frame.isDictionary ? frame.children / 2 : frame.children;
-  if (frame.isDictionary) keys_.check(frame.node, end);
+  if (frame.isDictionary) checkKeys(frame.node, end);
+}
+
+/// Once all of the dictionary is read: dictionaries inside have keys of their own.
+void XmlReader::checkKeys(std::uint32_t dictionary, std::size_t end) {
+  keys_.reserve(store_.nodes[dictionary].count);
+  std::size_t key = store_.firstChild(dictionary);
+  for (std::uint32_t left = store_.nodes[dictionary].count; left > 0; --left) {
+    const auto node = static_cast<std::uint32_t>(key);
+    if (!keys_.add(dictionary, node)) {
+      // Assembled text stands nowhere in the message.
+      const bool inSide = store_.nodes[node].has(Node::inSide);
+      scanner_.failAt(Problem::duplicateKey, inSide ? end : store_.nodes[node].position());
+    }
+    key = store_.nextKey(key);
+  }
 }
 
 /// The text of an element and its end tag; nothing where the start tag was all.

@@ -4,7 +4,6 @@
 #include "program/invitation/invitation_conversions.h"
 
 #include "framework/contracts/construct.h"
-#include "program/schema/field_by_field.h"
 
 namespace VespKeelgateService {
 
@@ -62,7 +61,11 @@ VespHearthInviteeSchedule convertSchedule(const VespHearthInviteeScheduleSchema&
 }  // namespace
 
 VespSampleInvitation convertKind(VespSampleInvitationSchema&& schema) {
-  return construct(fieldByField<VespSampleInvitation>(std::move(schema)));
+  return construct<VespSampleInvitation>({
+      .title = std::move(schema.title),
+      .date = schema.date,
+      .reason = std::move(schema.reason),
+  });
 }
 
 VespHearthInvitation convertKind(VespHearthInvitationSchema&& schema) {

@@ -2,14 +2,12 @@
 #include "program/payload/vesp_command_response_unpacker.h"
 
 #include "framework/contracts/construct.h"
-#include "program/schema/field_by_field.h"
 #include "program/schema/property_list_decoder.h"
 
 namespace VespKeelgateService {
 
 Keelgate::VespCommandResponse VespCommandResponseUnpacker::unpack(Bytes from) const {
-  auto schema = PropertyListDecoder().decode<Schema>(from);
-  return Keelgate::construct(fieldByField<SchemaType>(std::move(schema)));
+  return Keelgate::construct(PropertyListDecoder().decode<Schema, SchemaType>(from));
 }
 
 }  // namespace VespKeelgateService

@@ -16,9 +16,8 @@ struct VespOstrelPayloadUnpacker {
   /// which the worker's stack has room for twice over.
   SchemaType unpack(Bytes from) const;
 
-  /// Payloads inside the payload are converted first. Throws only what a record's constructor
-  /// throws.
-  static Keelgate::PulseUserPayload convertPayload(VespOstrelProtocolPayload&& payload);
+  /// The constructors of all records in the payload, and its own. Throws only what they throw.
+  static void constructPayload(const Keelgate::PulseUserPayload& payload);
 };
 
 }  // namespace VespKeelgateService

@@ -23,19 +23,24 @@ namespace VespKeelgateService {
 template <Keelgate::Schema S>
 class KeyTable {
   static constexpr std::size_t count = S::CodingKeys::size;
-  // A power of two, so that a slot is the hash's highest bits.
-  static constexpr std::size_t capacity = std::bit_ceil(4 * count);
-  static constexpr int shift = 32 - std::countr_zero(capacity);
+  // At most a quarter of a power of two.
+  static constexpr int bits = std::bit_width(4 * count);
   // No schema has so many fields.
   static constexpr std::uint16_t vacant = 0xffff;
 
-  static constexpr std::size_t home(std::uint32_t hash) { return shift == 32 ? 0 : hash >> shift; }
+  static constexpr auto digests = [] {
+    std::array<std::uint64_t, count> all{};
+    for (std::size_t i = 0; i < count; ++i)
+      all[i] = PropertyList::keyDigest(S::CodingKeys::keys[i]);
+    return all;
+  }();
 
+  static constexpr std::size_t capacity = std::size_t{1} << bits;
   static constexpr auto slots = [] {
     std::array<std::uint16_t, capacity> all{};
     all.fill(vacant);
     for (std::size_t field = 0; field < count; ++field) {
-      std::size_t at = home(PropertyList::keyHash(S::CodingKeys::keys[field]));
+      std::size_t at = PropertyList::keyHash(digests[field], bits);
       while (all[at] != vacant) at = (at + 1) % capacity;
       all[at] = static_cast<std::uint16_t>(field);
     }
@@ -53,13 +58,16 @@ class KeyTable {
  public:
   static constexpr std::size_t none = vacant;
 
-  /// The position of the field that travels under this key, or `none`. The hash is the key's own,
+  /// The position of the field that travels under this key, or `none`. The digest is the key's own,
   /// which comes with an entry of the document.
-  static constexpr std::size_t find(std::string_view key, std::uint32_t hash) {
+  static constexpr std::size_t find(std::string_view key, std::uint64_t digest) {
     // Ends: at least three slots in four are vacant.
-    for (std::size_t at = home(hash);; at = (at + 1) % capacity) {
+    for (std::size_t at = PropertyList::keyHash(digest, bits);; at = (at + 1) % capacity) {
       const std::uint16_t field = slots[at];
-      if (field == vacant || S::CodingKeys::keys[field] == key) return field;
+      if (field == vacant || (digests[field] == digest && (PropertyList::isWholeKey(digest) ||
+                                                           S::CodingKeys::keys[field] == key))) {
+        return field;
+      }
     }
   }
 };

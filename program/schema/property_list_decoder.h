@@ -1,7 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
-/// Keyed decoding: from the bytes of a property list to a schema.
+/// Keyed decoding: from the bytes of a property list to a schema, or to the record that agrees with
+/// one.
 ///
 ///     auto schema = PropertyListDecoder().decode<VespSampleMessageSchema>(from);
+///     auto record = PropertyListDecoder().decode<VespSampleMessageSchema,
+///     VespSampleMessage>(from);
+///
+/// The second never makes the schema: each field is decoded where the record has it, so that a
+/// message of many records inside one another moves none of them and never holds both.
 ///
 /// The whole document is checked before any field is read. Fields are read in declaration order and
 /// the first failure ends the decoding: what is thrown is a DecodingError (or what a schema's own
@@ -17,11 +23,13 @@
 #include "program/schema/coding_path.h"
 #include "program/schema/decoding_errors.h"
 #include "program/schema/field_set.h"
+#include "program/schema/fields_into.h"
 #include "program/schema/key_table.h"
 #include "program/schema/scalars.h"
 
 #include <keelgate/describe.h>
 
+#include <algorithm>
 #include <array>
 #include <concepts>
 #include <cstddef>
@@ -43,7 +51,8 @@ struct Decoding {
   PropertyList::ExpansionBudget& budget;
 };
 
-template <class T>
+/// A value that a schema describes as W. What is filled is a W, or what W fills.
+template <class W, class T>
 void decodeValue(Decoding& decoding, const PropertyList::Value& value, const CodingPath& path,
                  T& into);
 
@@ -65,7 +74,7 @@ class KeyedContainer {
     for (const PropertyList::Entry entry : value_.entries()) {
       if (entry.key != key) continue;
       T decoded{};
-      decodeValue(decoding_, entry.value, CodingPath(path_, key), decoded);
+      decodeValue<T>(decoding_, entry.value, CodingPath(path_, key), decoded);
       return decoded;
     }
     throw Errors::keyNotFound(path_, key);
@@ -87,22 +96,6 @@ class KeyedContainer {
   const CodingPath& path_;
 };
 
-// Not inlined, so that a struct of 156 fields does not make a frame of 156 fields' temporaries:
-// payloads nest 256 deep, and a sealed worker's stack is small.
-template <class T>
-[[gnu::noinline]] void decodeField(Decoding& decoding, const PropertyList::Value& value,
-                                   const CodingPath& outer, std::string_view key, T& into) {
-  decodeValue(decoding, value, CodingPath(outer, key), into);
-}
-
-template <class T>
-[[gnu::noinline]] void decodeField(Decoding& decoding, const PropertyList::Value& value,
-                                   const CodingPath& outer, std::string_view key,
-                                   Keelgate::Optional<T>& into) {
-  if (value.type() == PropertyList::Type::null) return;
-  decodeValue(decoding, value, CodingPath(outer, key), into.emplace());
-}
-
 /// The values of a dictionary, each at the position of its field. Kept as bare numbers: there is
 /// one of these on the stack for every nested payload.
 template <Keelgate::Schema S>
@@ -113,7 +106,7 @@ class FieldValues {
   explicit FieldValues(const PropertyList::Value& dictionary) : dictionary_(dictionary) {
     for (const PropertyList::Entry entry : dictionary.entries()) {
       // Keys that no field has are passed over: a newer sender may know more of them.
-      const std::size_t field = KeyTable<S>::find(entry.key, entry.hash);
+      const std::size_t field = KeyTable<S>::find(entry.key, entry.digest);
       if (field == KeyTable<S>::none) continue;
       present_.insert(field);
       numbers_[field] = entry.value.number();
@@ -144,38 +137,75 @@ constexpr auto requiredFields = [] {
   return required;
 }();
 
+/// One field of a schema, into a member of R. A function for each type of field and no code for
+/// each field, so that a struct of 156 fields does not make a frame of 156 fields' temporaries:
+/// payloads nest 256 deep, and a sealed worker's stack is small.
+template <Keelgate::Schema S, class R>
+struct FieldDecoder {
+  using Function = void (*)(Decoding&, const PropertyList::Value&, const CodingPath& outer,
+                            std::size_t position, R&);
+
+  template <class W, class V>
+  static void into(Decoding& decoding, const PropertyList::Value& value, const CodingPath& outer,
+                   std::size_t position, R& record) {
+    V& member = record.*membersOf<R, V>[position];
+    const CodingPath path(outer, S::CodingKeys::keys[position]);
+    if constexpr (!Keelgate::isOptional<W>) {
+      decodeValue<W>(decoding, value, path, member);
+    } else if (value.type() != PropertyList::Type::null) {
+      using Present = typename W::value_type;
+      if constexpr (Keelgate::isOptional<V>) {
+        decodeValue<Present>(decoding, value, path, member.emplace());
+      } else {
+        decodeValue<Present>(decoding, value, path, member);
+      }
+    }
+  }
+};
+
 /// In declaration order, whatever the order in the message: the same faults give the same error.
-template <Keelgate::Schema S>
+template <Keelgate::Schema S, class R>
+void decodeFields(Decoding& decoding, const PropertyList::Value& value, const CodingPath& path,
+                  R& into) {
+  constexpr auto& decoders = decodersOf<S, R, FieldDecoder<S, R>>;
+  static_assert(std::ranges::find(decoders, nullptr) == decoders.end(),
+                "a field of the record cannot hold what the schema's field does");
+  const FieldValues<S> values(value);
+  values.present().eachOfEither(requiredFields<S>, [&](std::size_t position) {
+    if (!values.present().contains(position)) {
+      throw Errors::keyNotFound(path, S::CodingKeys::keys[position]);
+    }
+    decoders[position](decoding, values.at(position), path, position, into);
+  });
+}
+
+template <Keelgate::Schema S, class R>
 void decodeSchema(Decoding& decoding, const PropertyList::Value& value, const CodingPath& path,
-                  S& into) {
+                  R& into) {
   const KeyedContainer container(decoding, value, path, Keelgate::typeName<S>());
   // The attack: one dictionary with a million keys that no field takes, named by a thousand array
   // elements. Nothing is made from its entries, but all are looked at each time.
-  decoding.budget.spend(value, sizeof(S) + value.count() * sizeof(PropertyList::Entry));
+  decoding.budget.spend(value, value.count() * sizeof(PropertyList::Entry));
   if constexpr (DecodesItself<S>) {
     into = S::decode(container);
   } else {
-    const FieldValues<S> values(value);
-    values.present().eachOfEither(requiredFields<S>, [&](std::size_t position) {
-      S::CodingKeys::at(position, [&](auto field) {
-        if (!values.present().contains(position)) throw Errors::keyNotFound(path, field.key);
-        decodeField(decoding, values.at(position), path, field.key, into.*field.member);
-      });
-    });
+    decodeFields<S>(decoding, value, path, into);
   }
 }
 
-template <class T>
+template <class W, class T>
 void decodeArray(Decoding& decoding, const PropertyList::Value& value, const CodingPath& path,
                  Keelgate::Array<T>& into) {
   using PropertyList::Type;
   if (value.type() != Type::array) throw Errors::typeMismatch(path, "an array", value.type());
-  // Before the memory is reserved: a shared array costs its message a byte for each reference.
-  decoding.budget.spend(value, value.count() * sizeof(T));
+  // Before the memory is reserved: a shared element costs its message a byte for each reference.
+  for (const PropertyList::Value element : value.elements()) {
+    decoding.budget.spend(element, sizeof(T));
+  }
   into.reserve(value.count());
   std::size_t index = 0;
   for (const PropertyList::Value element : value.elements()) {
-    decodeValue(decoding, element, CodingPath(path, index++), into.emplace_back());
+    decodeValue<W>(decoding, element, CodingPath(path, index++), into.emplace_back());
   }
 }
 
@@ -200,19 +230,19 @@ void decodeCase(Decoding& decoding, const PropertyList::Value& value, const Codi
   if (!named) throw Errors::notOneKey(path);
 }
 
-template <class T>
+template <class W, class T>
 void decodeValue(Decoding& decoding, const PropertyList::Value& value, const CodingPath& path,
                  T& into) {
   if (value.type() == PropertyList::Type::null) {
-    throw Errors::valueNotFound(path, Scalars::expectation<T>());
+    throw Errors::valueNotFound(path, Scalars::expectation<W>());
   }
-  if constexpr (Keelgate::CaseKeyed<T>) {
+  if constexpr (Keelgate::CaseKeyed<W>) {
     decodeCase(decoding, value, path, into,
-               std::make_index_sequence<std::variant_size_v<typename T::variant>>());
-  } else if constexpr (Keelgate::Schema<T>) {
-    decodeSchema(decoding, value, path, into);
-  } else if constexpr (Keelgate::isArray<T>) {
-    decodeArray(decoding, value, path, into);
+               std::make_index_sequence<std::variant_size_v<typename W::variant>>());
+  } else if constexpr (Keelgate::Schema<W>) {
+    decodeSchema<W>(decoding, value, path, into);
+  } else if constexpr (Keelgate::isArray<W>) {
+    decodeArray<typename W::value_type>(decoding, value, path, into);
   } else {
     Scalars::decode(decoding.budget, value, path, into);
   }
@@ -221,14 +251,15 @@ void decodeValue(Decoding& decoding, const PropertyList::Value& value, const Cod
 /// Has no settings and keeps nothing.
 class PropertyListDecoder {
  public:
-  /// Throws DecodingError and std::bad_alloc. The schema owns all that it holds: the bytes may go.
-  template <Keelgate::Schema S>
-  [[nodiscard]] S decode(Keelgate::Bytes from) {
-    S schema{};
+  /// Throws DecodingError and std::bad_alloc. What is given owns all that it holds: the bytes may
+  /// go. No constructor of a record has been asked yet: that is for the unpacker, in its order.
+  template <Keelgate::Schema S, class R = S>
+  [[nodiscard]] R decode(Keelgate::Bytes from) {
+    R decoded{};
     read(from, [&](Decoding& decoding, const PropertyList::Value& top) {
-      decodeSchema(decoding, top, CodingPath(), schema);
+      decodeSchema<S>(decoding, top, CodingPath(), decoded);
     });
-    return schema;
+    return decoded;
   }
 
   /// Calls `body(decoding, top)` with the checked document's top value, which lives as long as the

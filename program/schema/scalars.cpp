@@ -72,7 +72,7 @@ void decode(ExpansionBudget& budget, const Value& value, const CodingPath& path,
   const std::string_view text = value.string();
   // Before the copy: one long string may be referenced a million times.
   budget.spend(value, text.size());
-  into = text;
+  into = String(text);
 }
 
 void decode(ExpansionBudget& budget, const Value& value, const CodingPath& path, Data& into) {

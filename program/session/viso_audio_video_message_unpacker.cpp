@@ -2,7 +2,6 @@
 #include "program/session/viso_audio_video_message_unpacker.h"
 
 #include "framework/contracts/construct.h"
-#include "program/schema/field_by_field.h"
 #include "program/schema/property_list_decoder.h"
 
 namespace VespKeelgateService {
@@ -15,8 +14,8 @@ namespace {
 /// which would let its sender pick the reading that suits best.
 template <class Row>
 VespClientMessageResult unpackAs(Bytes from) {
-  auto schema = PropertyListDecoder().decode<typename Row::Schema>(from);
-  return {.result = construct(fieldByField<typename Row::Record>(std::move(schema)))};
+  return {.result = construct(
+              PropertyListDecoder().decode<typename Row::Schema, typename Row::Record>(from))};
 }
 
 /// A walk over the rows of the table, of which at most one has the number.

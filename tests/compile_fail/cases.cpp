@@ -2,8 +2,7 @@
 // Compiles as it stands. The mistakes in it that must not, and what each must be told, are in
 // run.py.
 #include "framework/contracts/construct.h"
-#include "program/schema/field_by_field.h"
-#include "program/schema/key_table.h"
+#include "program/schema/property_list_decoder.h"
 #include "program/schema/values.h"
 
 namespace VespKeelgateService {
@@ -32,10 +31,10 @@ struct Record {
       (Optional<InnerRecord>, three));
 };
 
-static_assert(KeyTable<Schema>::find("1", PropertyList::keyHash("1")) == 0);
+static_assert(KeyTable<Schema>::find("1", PropertyList::keyDigest("1")) == 0);
 
-Record convert(Schema&& schema) {
-  return fieldByField<Record>(std::move(schema), label<&Record::three> = Optional<InnerRecord>());
+Record decode(Bytes from) {
+  return PropertyListDecoder().decode<Schema, Record>(from);
 }
 
 Record byHand(Schema&& schema) {

@@ -66,14 +66,12 @@ struct VespWeatherUnpacker {
     "program/weather/vesp_weather_unpacker.cpp": """#include "program/weather/vesp_weather_unpacker.h"
 
 #include "framework/contracts/construct.h"
-#include "program/schema/field_by_field.h"
 #include "program/schema/property_list_decoder.h"
 
 namespace VespKeelgateService {
 
 Keelgate::VespWeather VespWeatherUnpacker::unpack(Bytes from) const {
-  auto schema = PropertyListDecoder().decode<Schema>(from);
-  return Keelgate::construct(fieldByField<Keelgate::VespWeather>(std::move(schema)));
+  return Keelgate::construct(PropertyListDecoder().decode<Schema, SchemaType>(from));
 }
 
 }  // namespace VespKeelgateService

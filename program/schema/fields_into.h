@@ -1,0 +1,79 @@
+// SPDX-License-Identifier: Apache-2.0
+/// Where the fields of a schema go: to the members of a record that agree with it, or to the
+/// schema's own.
+///
+/// The two lists are compared at compile time, position by position: they have the same length and
+/// the same names in the same order, and each member can hold what the schema's field says. A field
+/// that moved, went missing or changed its type does not compile.
+///
+/// Constants and pure functions; callable from any thread.
+#pragma once
+
+#include <keelgate/describe.h>
+
+#include <algorithm>
+#include <array>
+#include <concepts>
+#include <cstddef>
+
+namespace VespKeelgateService {
+
+/// Also their order: swapped fields of one type would otherwise be filled crosswise.
+template <class S, class R>
+consteval bool namesAgree() {
+  return std::ranges::equal(Keelgate::FieldsOf<S>::names, Keelgate::FieldsOf<R>::names);
+}
+
+/// Whether a value that a schema describes as From can be decoded into a To: into the same, or into
+/// a record that agrees with the schema.
+template <class From, class To>
+constexpr bool fills = std::same_as<From, To>;
+template <Keelgate::Schema From, Keelgate::Record To>
+constexpr bool fills<From, To> = namesAgree<From, To>();
+/// Absent stays absent: a missing dictionary becomes no record, an empty one becomes a record.
+template <class From, class To>
+constexpr bool fills<Keelgate::Optional<From>, Keelgate::Optional<To>> = fills<From, To>;
+template <class From, class To>
+constexpr bool fills<Keelgate::Array<From>, Keelgate::Array<To>> = fills<From, To>;
+/// Deliberate: the record cannot tell an absent list from an empty one.
+template <class From, class To>
+constexpr bool fills<Keelgate::Optional<Keelgate::Array<From>>, Keelgate::Array<To>> =
+    fills<From, To>;
+
+/// The members of R that are of type V, by the position of their field; null for the others. A
+/// table for each type, so that a function for a type serves all its fields.
+template <class R, class V>
+constexpr auto membersOf = [] {
+  std::array<V R::*, Keelgate::FieldsOf<R>::size> members{};
+  std::size_t position = 0;
+  Keelgate::FieldsOf<R>::each([&]<class Value>(Keelgate::Field<R, Value> field) {
+    if constexpr (std::same_as<Value, V>) members[position] = field.member;
+    ++position;
+  });
+  return members;
+}();
+
+/// For each field of S the function that decodes it into the member of R at its position. `Decode`
+/// gives, as `Decode::template into<W, V>`, the one for a field of type W and a member of type V.
+template <Keelgate::Schema S, class R, class Decode>
+constexpr auto decodersOf = [] {
+  using From = Keelgate::FieldsOf<S>;
+  using To = Keelgate::FieldsOf<R>;
+  static_assert(From::size == To::size,
+                "the schema and the record have different numbers of fields");
+  std::array<typename Decode::Function, From::size> decoders{};
+  if constexpr (From::size == To::size) {
+    static_assert(namesAgree<S, R>(),
+                  "a field of the record has another name than the schema's field at its position");
+    std::size_t position = 0;
+    From::each([&]<class W>(Keelgate::Field<S, W>) {
+      To::at(position, [&]<class V>(Keelgate::Field<R, V>) {
+        if constexpr (fills<W, V>) decoders[position] = Decode::template into<W, V>;
+      });
+      ++position;
+    });
+  }
+  return decoders;
+}();
+
+}  // namespace VespKeelgateService
