@@ -8,20 +8,13 @@
 
 namespace Keelgate::Test {
 
-#ifdef KEELGATE_UNSEALED
-#define NEEDS_SEAL() GTEST_SKIP() << "this build has no seal"
-#else
-#define NEEDS_SEAL() static_cast<void>(0)
-#endif
-
 /// A service that is ready; workers that must go on answering afterwards.
 class Worker : public testing::Test {
  protected:
   void SetUp() override { ASSERT_TRUE(service_.ready()) << service_.refusal(); }
   void TearDown() override {
-    if (!HasFatalFailure() && !IsSkipped()) {
-      EXPECT_EQ(resultOf(service_.obey("answer").first), 0);
-    }
+    if (HasFatalFailure() || IsSkipped()) return;
+    EXPECT_EQ(resultOf(service_.obey("answer").first), 0);
   }
 
   RawClient service_{OBEDIENT_SERVICE};

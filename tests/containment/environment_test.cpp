@@ -12,6 +12,7 @@
 #include <linux/sched.h>
 #include <linux/seccomp.h>
 #include <sched.h>
+#include <sys/mman.h>
 #include <sys/mount.h>
 #include <sys/prctl.h>
 #include <sys/resource.h>
@@ -67,6 +68,11 @@ void becomeUser(const std::vector<gid_t>& with) {
   }
 }
 
+void allowOnly(__rlimit_resource_t what, rlim_t amount) {
+  const rlimit small{.rlim_cur = amount, .rlim_max = amount};
+  setrlimit(what, &small);
+}
+
 /// What an environment takes for granted of the machine; of a container, perhaps, it is not so.
 enum class Needs {
   nothing,
@@ -77,15 +83,6 @@ enum class Needs {
   /// To make namespaces without a user namespace.
   privilege
 };
-
-/// Whether a child in which `trial` runs exits with 0.
-bool succeeds(const std::function<bool()>& trial) {
-  const pid_t child = fork();
-  if (child == 0) _exit(trial() ? 0 : 1);
-  int status = -1;
-  waitpid(child, &status, 0);
-  return status == 0;
-}
 
 /// Goes on in a new process namespace, whose list of processes nobody has mounted.
 void becomeFirstProcess() {
@@ -232,15 +229,13 @@ const std::vector<Environment> environments{
      .refusal = "ulimit -H -s",
      .before =
          [] {
-           const rlimit small{.rlim_cur = 1 << 20, .rlim_max = 1 << 20};
-           setrlimit(RLIMIT_STACK, &small);
+           allowOnly(RLIMIT_STACK, 1 << 20);
          }},
     {.name = "an address space that is too small",
      .refusal = "ulimit -v",
      .before =
          [] {
-           const rlimit small{.rlim_cur = 64 << 20, .rlim_max = 64 << 20};
-           setrlimit(RLIMIT_AS, &small);
+           allowOnly(RLIMIT_AS, 64 << 20);
          }},
 };
 
@@ -271,9 +266,6 @@ std::string seenByClient(const std::string& service) {
 class EnvironmentTest : public testing::TestWithParam<Environment> {
  protected:
   void SetUp() override {
-#ifdef KEELGATE_UNSEALED
-    GTEST_SKIP() << "this build has no seal";
-#endif
     if (geteuid() != 0) GTEST_SKIP() << "only root can imitate every environment";
     if (!has(GetParam().needs)) GTEST_SKIP() << "this machine does not give what it takes away";
     folder();
@@ -284,13 +276,13 @@ class EnvironmentTest : public testing::TestWithParam<Environment> {
       case Needs::userNamespaces:
         return (whole() & layerUserNamespace) != 0;
       case Needs::usersNamespaces:
-        return succeeds([] {
-          becomeUser({});
-          return unshare(CLONE_NEWUSER | CLONE_NEWNS) == 0 &&
-                 mount("", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) == 0;
-        });
+        return Testing::inFork([] {
+                 becomeUser({});
+                 return unshare(CLONE_NEWUSER | CLONE_NEWNS) == 0 &&
+                        mount("", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) == 0;
+               }) == 1;
       case Needs::privilege:
-        return succeeds([] { return unshare(CLONE_NEWNS | CLONE_NEWPID) == 0; });
+        return Testing::inFork([] { return unshare(CLONE_NEWNS | CLONE_NEWPID) == 0; }) == 1;
       case Needs::nothing:
         break;
     }
@@ -309,9 +301,6 @@ class EnvironmentTest : public testing::TestWithParam<Environment> {
 };
 
 TEST(C11, OneDescriptorIsTrueWithoutCloseRange) {
-#ifdef KEELGATE_UNSEALED
-  GTEST_SKIP() << "this build has no seal";
-#endif
   RawOptions options;
   options.before = [] {
     for (const int left : {9, 100, 200}) dup2(STDERR_FILENO, left);
@@ -320,14 +309,12 @@ TEST(C11, OneDescriptorIsTrueWithoutCloseRange) {
   RawClient service(OBEDIENT_SERVICE, options);
   ASSERT_TRUE(service.ready()) << service.refusal();
   const int channel = service.fork(1);
-  std::vector<pid_t> workers;
-  while (workers.empty()) workers = service.workers();
+  const pid_t worker = service.workers(1).at(0);
   try {
-    for (int i = 0; i < 500 && descriptorsOf(workers[0]).size() > 1; ++i) usleep(10'000);
-    EXPECT_EQ(descriptorsOf(workers[0]), std::set<std::string>{"3"});
+    EXPECT_TRUE(Testing::comesTrue([&] { return descriptorsOf(worker).size() == 1; }));
+    EXPECT_EQ(descriptorsOf(worker), std::set<std::string>{"3"});
     // The channel, the tether, and the deaths of its workers; the worker's end goes after the fork.
-    for (int i = 0; i < 500 && descriptorsOf(service.zygote()).size() > 3; ++i) usleep(10'000);
-    EXPECT_EQ(descriptorsOf(service.zygote()).size(), 3u);
+    EXPECT_TRUE(Testing::comesTrue([&] { return descriptorsOf(service.zygote()).size() == 3; }));
   } catch (const std::filesystem::filesystem_error& error) {
     GTEST_SKIP() << error.what();
   }
@@ -337,22 +324,18 @@ TEST(C11, OneDescriptorIsTrueWithoutCloseRange) {
 /// A whole application in that environment, its client included.
 TEST_P(EnvironmentTest, RunsAndReportsOrRefusesWithReason) {
   const Environment& environment = GetParam();
-  int ends[2];
-  ASSERT_EQ(pipe(ends), 0);
-  const pid_t application = fork();
-  if (application == 0) {
-    close(ends[0]);
+  constexpr std::size_t room = 4096;
+  char* const seenThere = static_cast<char*>(
+      mmap(nullptr, room, PROT_READ | PROT_WRITE, MAP_SHARED | MAP_ANONYMOUS, -1, 0));
+  Testing::inFork([&] {
     enter(environment);
     const std::string service = folder() + "/service";
-    const std::string seen =
-        seenByClient(access(service.c_str(), X_OK) == 0 ? service : "/service");
-    _exit(write(ends[1], seen.data(), seen.size()) < 0 ? 1 : 0);
-  }
-  close(ends[1]);
-  std::string seen;
-  for (char byte = 0; read(ends[0], &byte, 1) == 1;) seen += byte;
-  close(ends[0]);
-  waitpid(application, nullptr, 0);
+    seenByClient(access(service.c_str(), X_OK) == 0 ? service : "/service")
+        .copy(seenThere, room - 1);
+    return 0;
+  });
+  const std::string seen = seenThere;
+  munmap(seenThere, room);
   std::string expected;
   for (const NamedLayer& row : namedLayers) {
     if ((whole() & ~std::uint64_t{environment.missing} & row.layer) == 0) continue;

@@ -24,7 +24,6 @@ std::string toEat(std::size_t bytes, std::size_t piece, std::size_t length) {
 constexpr std::size_t piece = 65536;
 
 TEST_F(Worker, C4MemoryIsFixedBeforeTheMessageIsRead) {
-  NEEDS_SEAL();
   // A short one, though its worker was made for any short one; and a longer one.
   for (const std::size_t length : {std::size_t{30}, std::size_t{1} << 20}) {
     constexpr std::size_t slack = 4 << 20;
@@ -39,41 +38,30 @@ TEST_F(Worker, C4MemoryIsFixedBeforeTheMessageIsRead) {
   }
 }
 
-/// Sends orders to one worker that may have many, and checks each reply's result.
-class Reused {
- public:
-  Reused(RawClient& service, std::uint64_t longest) : service_(service), longest_(longest) {}
-  ~Reused() { leave(); }
-  Reused(const Reused&) = delete;
-  Reused& operator=(const Reused&) = delete;
+/// One worker after the other that may have many messages.
+class Reused : public Worker {
+ protected:
+  static RawOptions many() { return {.messages = 1000, .cpuSeconds = 100, .before = {}}; }
 
-  RawReply obey(std::string_view order) {
-    if (channel_ < 0) channel_ = service_.fork(9, longest_);
-    sendOrder(channel_, order, sequence_);
+  RawReply obeyNext(std::string_view order) {
+    if (channel_ < 0) channel_ = reusing_.fork(9, 64 << 20);
+    sendMessage(channel_, order, sequence_);
     return receiveReply(channel_, sequence_++);
   }
   WorkerEnd leave() {
-    if (channel_ < 0) return {};
     close(std::exchange(channel_, -1));
     sequence_ = 0;
-    return service_.end(9);
+    return reusing_.end(9);
   }
 
  private:
-  RawClient& service_;
-  std::uint64_t longest_;
+  RawClient reusing_{OBEDIENT_SERVICE, many()};
   int channel_ = -1;
   std::uint32_t sequence_ = 0;
 };
 
 /// The budget is the message's and not the worker's.
-TEST_F(Worker, C4AMessageHasTheSameMemoryInEveryWorker) {
-  NEEDS_SEAL();
-  RawOptions options;
-  options.messages = 1000;
-  options.cpuSeconds = 100;
-  RawClient service(OBEDIENT_SERVICE, options);
-  Reused reused(service, 64 << 20);
+TEST_F(Reused, C4AMessageHasTheSameMemoryInEveryWorker) {
   // By size of the pieces: of large ones as many as the limit says, of small ones fewer.
   for (const auto& [size, length] : {std::pair(piece, std::size_t{30}),
                                      {piece, std::size_t{300'000}},
@@ -84,31 +72,24 @@ TEST_F(Worker, C4AMessageHasTheSameMemoryInEveryWorker) {
       const bool alone = resultOf(service_.obey(order).first) == 0;
       EXPECT_EQ(alone, part < 100) << part << ' ' << size;
       // After others, of which one has left its memory full of small holes.
-      EXPECT_EQ(resultOf(reused.obey(toEat(4 << 20, 40, 0))), 0);
-      EXPECT_EQ(reused.obey(order).kind.has_value(), alone) << part << ' ' << size;
-      const WorkerEnd end = reused.leave();
+      EXPECT_EQ(resultOf(obeyNext(toEat(4 << 20, 40, 0))), 0);
+      EXPECT_EQ(obeyNext(order).kind.has_value(), alone) << part << ' ' << size;
+      const WorkerEnd end = leave();
       EXPECT_EQ(end.exitStatus(), alone ? 0 : Protocol::resourceExitStatus);
       EXPECT_LT(end.peakBytes, memoryBudget(length));
     }
   }
 }
 
-TEST_F(Worker, C4AWorkerThatHasTakenMuchEndsAndGivesItBack) {
-  NEEDS_SEAL();
-  RawOptions options;
-  options.messages = 1000;
-  options.cpuSeconds = 100;
-  RawClient service(OBEDIENT_SERVICE, options);
-  Reused reused(service, 64 << 20);
-  EXPECT_FALSE(reused.obey(toEat(100 << 20, piece, 0)).last);
-  EXPECT_FALSE(reused.obey("answer").last);
-  EXPECT_TRUE(reused.obey(toEat(130 << 20, piece, 1 << 20)).last);
-  EXPECT_EQ(reused.leave().exitStatus(), 0);
+TEST_F(Reused, C4AWorkerThatHasTakenMuchEndsAndGivesItBack) {
+  EXPECT_FALSE(obeyNext(toEat(100 << 20, piece, 0)).last);
+  EXPECT_FALSE(obeyNext("answer").last);
+  EXPECT_TRUE(obeyNext(toEat(130 << 20, piece, 1 << 20)).last);
+  EXPECT_EQ(leave().exitStatus(), 0);
 }
 
 /// From start to start: of a few dozen addresses every bit that is random has both values.
 TEST_F(Worker, C13AddressesAreRandom) {
-  NEEDS_SEAL();
   std::map<long, std::uint64_t> differences;
   std::map<long, std::uint64_t> first;
   for (int i = 0; i < 40; ++i) {
@@ -127,7 +108,6 @@ TEST_F(Worker, C13AddressesAreRandom) {
 }
 
 TEST_F(Worker, C4AMachineThatHasLessStillAnswers) {
-  NEEDS_SEAL();
   // Of address space, in MiB; the least is hardly more than what the zygote needs.
   for (const rlim_t space : {160U, 200U, 300U, 512U}) {
     RawOptions options;

@@ -8,16 +8,13 @@
 #include "framework/transport/record_coding.h"
 
 #include <fcntl.h>
-#include <keelgate/records.h>
 #include <sys/socket.h>
 #include <sys/wait.h>
 #include <unistd.h>
 #include <array>
-#include <csignal>
-#include <cstring>
 #include <filesystem>
-#include <fstream>
 #include <stdexcept>
+#include <utility>
 
 namespace Keelgate::Test {
 
@@ -25,14 +22,6 @@ using namespace Protocol;
 using namespace Transport;
 
 namespace {
-
-std::vector<pid_t> childrenOf(pid_t process) {
-  const std::string text = std::to_string(process);
-  std::ifstream list("/proc/" + text + "/task/" + text + "/children");
-  std::vector<pid_t> children;
-  for (pid_t child; list >> child;) children.push_back(child);
-  return children;
-}
 
 std::array<int, 2> makePair(int type) {
   std::array<int, 2> ends{};
@@ -78,13 +67,8 @@ RawClient::~RawClient() {
 
 int RawClient::stop() {
   close(control_);
-  return waitForLauncher();
-}
-
-int RawClient::waitForLauncher() {
   int status = 0;
-  waitpid(launcher_, &status, 0);
-  launcher_ = -1;
+  waitpid(std::exchange(launcher_, -1), &status, 0);
   return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
 }
 
@@ -94,11 +78,10 @@ std::string RawClient::refusal() const {
                               static_cast<int>(first_.numbers[1]));
 }
 
-pid_t RawClient::zygote() const {
-  return childrenOf(launcher_).at(0);
-}
-std::vector<pid_t> RawClient::workers() const {
-  return childrenOf(zygote());
+std::vector<pid_t> RawClient::workers(std::size_t count) const {
+  std::set<pid_t> all;
+  Testing::comesTrue([&] { return (all = Testing::children(zygote())).size() >= count; });
+  return {all.begin(), all.end()};
 }
 
 void RawClient::sendFrame(ControlKind kind, std::uint32_t slot, std::vector<std::uint64_t> numbers,
@@ -139,7 +122,7 @@ WorkerEnd RawClient::end(std::uint32_t slot) {
 
 std::pair<RawReply, WorkerEnd> RawClient::obey(std::string_view order) {
   const int channel = fork(0, order.size());
-  sendOrder(channel, order);
+  sendMessage(channel, order);
   RawReply reply = receiveReply(channel);
   close(channel);
   return {std::move(reply), end(0)};
@@ -154,12 +137,8 @@ std::set<std::string> descriptorsOf(pid_t process) {
   return names;
 }
 
-void sendOrder(int channel, std::string_view order, std::uint32_t sequence) {
-  sendMessage(channel, recordNumber<VespCommandResponse>, order, sequence);
-}
-
-void sendMessage(int channel, std::size_t record, std::string_view message,
-                 std::uint32_t sequence) {
+void sendMessage(int channel, std::string_view message, std::uint32_t sequence,
+                 std::size_t record) {
   const RequestHeader header =
       makeRequestHeader(static_cast<std::uint16_t>(record), 0, 0, message.size(), sequence);
   send(channel, &header, sizeof header, MSG_NOSIGNAL);

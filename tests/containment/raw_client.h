@@ -6,8 +6,9 @@
 
 #include "framework/contracts/memory_budget.h"
 #include "framework/protocol/frames.h"
+#include "tests/processes.h"
 
-#include <keelgate/values.h>
+#include <keelgate/records.h>
 #include <sys/types.h>
 #include <functional>
 #include <map>
@@ -56,14 +57,13 @@ class RawClient {
   [[nodiscard]] std::uint64_t layers() const { return first_.numbers[0]; }
   [[nodiscard]] std::string refusal() const;
   [[nodiscard]] pid_t launcher() const { return launcher_; }
-  [[nodiscard]] pid_t zygote() const;
-  /// The living workers, as this process sees them.
-  [[nodiscard]] std::vector<pid_t> workers() const;
+  [[nodiscard]] pid_t zygote() const { return *Testing::children(launcher_).begin(); }
+  /// The living workers, as this process sees them, once there are so many.
+  [[nodiscard]] std::vector<pid_t> workers(std::size_t count) const;
 
-  /// Hangs up and waits for the service's end; returns the launcher's exit status as a shell has
-  /// it.
+  /// Hangs up, or has been hung up on, and waits for the end of the service: the launcher's exit
+  /// status as a shell has it.
   int stop();
-  int waitForLauncher();
 
   /// Sends any control frame, with or without a descriptor, which stays the caller's.
   void sendFrame(Protocol::ControlKind kind, std::uint32_t slot, std::vector<std::uint64_t> numbers,
@@ -90,11 +90,9 @@ class RawClient {
 /// The open descriptors of a process. Throws std::filesystem::filesystem_error.
 std::set<std::string> descriptorsOf(pid_t process);
 
-/// Sends a message as a request for a record.
-void sendMessage(int channel, std::size_t record, std::string_view message,
-                 std::uint32_t sequence = 0);
-/// Sends an order as a request for the record that the obedient service answers.
-void sendOrder(int channel, std::string_view order, std::uint32_t sequence = 0);
+/// Sends a message as a request for a record; by default, an order for the obedient service.
+void sendMessage(int channel, std::string_view message, std::uint32_t sequence = 0,
+                 std::size_t record = recordNumber<VespCommandResponse>);
 /// Reads frames until an answer or the end of the channel; of a malformed reply nothing is left.
 RawReply receiveReply(int channel, std::uint32_t sequence = 0);
 /// The messageId of the answer, which is what a call gave back.

@@ -13,7 +13,6 @@
 #include <sys/stat.h>
 #include <sys/syscall.h>
 #include <unistd.h>
-#include <algorithm>
 #include <csignal>
 #include <filesystem>
 #include <fstream>
@@ -29,9 +28,12 @@ std::string readAll(const std::string& path) {
   return text.str();
 }
 
-void expectStatusLine(pid_t process, const std::string& line) {
-  const std::string text = readAll("/proc/" + std::to_string(process) + "/status");
-  EXPECT_NE(text.find(line), std::string::npos) << line << " is not in\n" << text;
+/// A file of a process has each of these texts.
+void expectIn(pid_t process, const char* file, const std::vector<std::string>& texts) {
+  const std::string text = readAll("/proc/" + std::to_string(process) + "/" + file);
+  for (const std::string& line : texts) {
+    EXPECT_NE(text.find(line), std::string::npos) << line << " is not in\n" << text;
+  }
 }
 
 /// Waits until a file of a process has a text; without end, which the test's time limit notices.
@@ -44,13 +46,12 @@ void waitFor(pid_t process, const std::string& file, const std::string& text) {
 /// What is the same for the zygote and for a worker.
 void expectSealed(pid_t process) {
   const std::string here = "/proc/" + std::to_string(process) + "/";
-  for (const char* line :
-       {"NoNewPrivs:\t1\n", "Seccomp:\t2\n", "CapInh:\t0000000000000000\n",
-        "CapPrm:\t0000000000000000\n", "CapEff:\t0000000000000000\n", "CapBnd:\t0000000000000000\n",
-        "CapAmb:\t0000000000000000\n", "Groups:\t \n", "Uid:\t65534\t65534\t65534\t65534\n",
-        "Gid:\t65534\t65534\t65534\t65534\n", "Threads:\t1\n"}) {
-    expectStatusLine(process, line);
-  }
+  expectIn(
+      process, "status",
+      {"NoNewPrivs:\t1\n", "Seccomp:\t2\n", "CapInh:\t0000000000000000\n",
+       "CapPrm:\t0000000000000000\n", "CapEff:\t0000000000000000\n", "CapBnd:\t0000000000000000\n",
+       "CapAmb:\t0000000000000000\n", "Groups:\t \n", "Uid:\t65534\t65534\t65534\t65534\n",
+       "Gid:\t65534\t65534\t65534\t65534\n", "Threads:\t1\n"});
   for (const char* name : {"user", "mnt", "net", "pid", "ipc", "uts", "cgroup"}) {
     EXPECT_NE(std::filesystem::read_symlink(here + "ns/" + name),
               std::filesystem::read_symlink(std::string("/proc/self/ns/") + name))
@@ -68,7 +69,6 @@ void expectSealed(pid_t process) {
 }
 
 TEST_F(Worker, C3SeenFromOutside) {
-  NEEDS_SEAL();
   if (geteuid() != 0) GTEST_SKIP() << "only root may look into an undumpable process";
   for (const NamedLayer& row : namedLayers) {
     // A chroot never gives the user namespace, nor with it the right to the others.
@@ -83,29 +83,26 @@ TEST_F(Worker, C3SeenFromOutside) {
   const std::string filters = "Seccomp_filters:\t" + std::to_string(std::stoi(own) + 2) + '\n';
   const int waiting = service_.fork(1);
   const int spinning = service_.fork(2);
-  sendOrder(spinning, "spin");
-  std::vector<pid_t> workers;
-  while (workers.size() < 2) workers = service_.workers();
-  std::sort(workers.begin(), workers.end());
+  sendMessage(spinning, "spin");
+  const std::vector<pid_t> workers = service_.workers(2);
+  ASSERT_EQ(workers.size(), 2u);
   // The one waits for a header, in read, for descriptor 3: it is sealed by then.
   waitFor(workers[0], "syscall", std::to_string(SYS_read) + " 0x3 ");
   waitFor(workers[1], "status", filters);
   expectSealed(service_.zygote());
   for (const pid_t worker : workers) {
     expectSealed(worker);
-    expectStatusLine(worker, filters);
+    expectIn(worker, "status", {filters});
     EXPECT_EQ(descriptorsOf(worker), std::set<std::string>{"3"});
-    const std::string limits = readAll("/proc/" + std::to_string(worker) + "/limits");
-    for (const char* line : {"Max core file size        0                    0 ",
-                             "Max file size             0                    0 ",
-                             "Max processes             0                    0 ",
-                             "Max open files            4                    4 ",
-                             "Max locked memory         0                    0 ",
-                             "Max msgqueue size         0                    0 ",
-                             "Max stack size            8388608              8388608 ",
-                             "Max cpu time              5                    6 "}) {
-      EXPECT_NE(limits.find(line), std::string::npos) << line << " is not in\n" << limits;
-    }
+    expectIn(worker, "limits",
+             {"Max core file size        0                    0 ",
+              "Max file size             0                    0 ",
+              "Max processes             0                    0 ",
+              "Max open files            4                    4 ",
+              "Max locked memory         0                    0 ",
+              "Max msgqueue size         0                    0 ",
+              "Max stack size            8388608              8388608 ",
+              "Max cpu time              5                    6 "});
   }
   close(waiting);
   EXPECT_EQ(service_.end(1).exitStatus(), 0);
@@ -115,17 +112,14 @@ TEST_F(Worker, C3SeenFromOutside) {
 }
 
 TEST_F(Worker, GivesWayToOthers) {
-  NEEDS_SEAL();
   const int channel = service_.fork(1);
-  sendOrder(channel, "spin");
-  while (service_.workers().empty()) usleep(1000);
+  sendMessage(channel, "spin");
   const auto niceOf = [](pid_t process) {
     return getpriority(PRIO_PROCESS, static_cast<id_t>(process));
   };
-  const pid_t worker = service_.workers()[0];
+  const pid_t worker = service_.workers(1).at(0);
   // It does so before it is sealed, which is soon.
-  for (int i = 0; i < 5000 && niceOf(worker) != 19; ++i) usleep(1000);
-  EXPECT_EQ(niceOf(worker), 19);
+  EXPECT_TRUE(Testing::comesTrue([&] { return niceOf(worker) == 19; }));
   EXPECT_EQ(niceOf(service_.zygote()), niceOf(getpid()));
   EXPECT_EQ(readAll("/proc/" + std::to_string(worker) + "/oom_score_adj"), "1000\n");
   service_.kill(1);
@@ -142,14 +136,13 @@ TEST(Stack, TheDeepestMessageFits) {
     message += "</array></dict>";
   }
   const int channel = service.fork(0);
-  sendMessage(channel, recordNumber<PulseUserPayload>, "<plist>" + message + "</plist>");
+  sendMessage(channel, "<plist>" + message + "</plist>", 0, recordNumber<PulseUserPayload>);
   EXPECT_EQ(receiveReply(channel).kind, Protocol::ReplyKind::record);
   close(channel);
   EXPECT_EQ(service.end(0).exitStatus(), 0);
 }
 
 TEST_F(Worker, C5ProcessorTimeIsLimitedWithoutTheClient) {
-  NEEDS_SEAL();
   RawOptions options;
   options.cpuSeconds = 1;
   RawClient service(OBEDIENT_SERVICE, options);
@@ -157,7 +150,6 @@ TEST_F(Worker, C5ProcessorTimeIsLimitedWithoutTheClient) {
 }
 
 TEST_F(Worker, EveryFaultEndsOneWorkerAlone) {
-  NEEDS_SEAL();
   for (const auto& [order, signal] : {std::pair("fault", SIGSEGV),
                                       {"trap", trapSignal},
                                       {"recurse", SIGSEGV},
@@ -170,7 +162,7 @@ TEST_F(Worker, EveryFaultEndsOneWorkerAlone) {
     const auto [reply, end] = service_.obey(order);
     EXPECT_EQ(end.signal(), signal) << order;
     EXPECT_FALSE(reply.kind) << order;
-    sendOrder(other, "answer");
+    sendMessage(other, "answer");
     EXPECT_EQ(resultOf(receiveReply(other)), 0) << order;
     close(other);
     EXPECT_EQ(service_.end(7).exitStatus(), 0);
@@ -242,14 +234,12 @@ TEST(Zygote, NobodyOutlivesTheOther) {
     RawClient service(OBEDIENT_SERVICE);
     ASSERT_TRUE(service.ready()) << service.refusal();
     const int channel = service.fork(0);
-    sendOrder(channel, "spin");
+    sendMessage(channel, "spin");
     if (killLauncher) {
       ::kill(service.launcher(), SIGKILL);
       EXPECT_EQ(service.receiveFrame().magic, 0U) << "the control channel ends with the zygote";
-      EXPECT_EQ(service.waitForLauncher(), 128 + SIGKILL);
-    } else {
-      EXPECT_EQ(service.stop(), 0);
     }
+    EXPECT_EQ(service.stop(), killLauncher ? 128 + SIGKILL : 0);
     // The end of its channel is the end of the worker.
     char byte = 0;
     EXPECT_LE(recv(channel, &byte, 1, 0), 0);

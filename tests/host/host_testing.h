@@ -3,18 +3,15 @@
 #pragma once
 
 #include "tests/host/script.h"
+#include "tests/processes.h"
 
 #include <keelgate/client.h>
 
-#include <sys/wait.h>
-#include <unistd.h>
-
 #include <chrono>
-#include <filesystem>
-#include <fstream>
-#include <set>
 
 namespace Keelgate::Host {
+
+using namespace Testing;
 
 using std::chrono::milliseconds;
 using std::chrono::steady_clock;
@@ -78,43 +75,12 @@ inline String outcomeOf(Client& client, Bytes message) {
   return outcomeOf([&] { return client.unpack<VespCommandResponse>(message).command; });
 }
 
-/// What the body returns in a fork of this process; -1 when it ends otherwise.
-template <class Body>
-int inFork(Body body) {
-  const pid_t child = fork();
-  if (child == 0) _exit(static_cast<int>(body()));
-  int status = -1;
-  waitpid(child, &status, 0);
-  return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
-}
-
-template <class Condition>
-bool comesTrue(Condition condition) {
-  for (int i = 0; i < 500; ++i) {
-    if (condition()) return true;
-    usleep(10'000);
-  }
-  return false;
-}
-
 inline std::ptrdiff_t entriesOf(const char* folder) {
   return std::distance(std::filesystem::directory_iterator(folder), {});
 }
 
 inline std::ptrdiff_t openDescriptors() {
   return entriesOf("/proc/self/fd");
-}
-
-/// Zombies too; none where the process has gone.
-inline std::set<pid_t> children(pid_t of = getpid()) {
-  std::set<pid_t> all;
-  std::error_code gone;
-  const auto tasks = "/proc/" + std::to_string(of) + "/task";
-  for (const auto& task : std::filesystem::directory_iterator(tasks, gone)) {
-    std::ifstream list(task.path() / "children");
-    for (pid_t pid; list >> pid;) all.insert(pid);
-  }
-  return all;
 }
 
 }  // namespace Keelgate::Host

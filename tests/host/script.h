@@ -50,10 +50,6 @@ inline Data recordNumbered(Int number) {
   return Transport::encodeRecord(record);
 }
 
-inline Bytes bytesOf(std::string_view text) {
-  return std::as_bytes(std::span(text));
-}
-
 class Script : public Data {
  public:
   Script& then(Op op, std::size_t amount = 0, Bytes behind = {}) {
@@ -67,7 +63,9 @@ class Script : public Data {
   /// An honest record frame around the body.
   Script& answer(Bytes body) { return then(Op::answer, body.size(), body); }
   Script& answer(Int number) { return answer(recordNumbered(number)); }
-  Script& log(std::string_view line) { return then(Op::log, line.size(), bytesOf(line)); }
+  Script& log(std::string_view line) {
+    return then(Op::log, line.size(), std::as_bytes(std::span(line)));
+  }
 };
 
 }  // namespace Keelgate::Host
