@@ -18,7 +18,7 @@ class Filler {
  public:
   /// Lists have so many elements, and none where they are that deep in others. Another start gives
   /// other values, and other cases where there is a choice.
-  explicit Filler(std::size_t elements = 2, int depth = 2, int start = 100, bool lastDate = false)
+  explicit Filler(int elements = 2, int depth = 2, int start = 100, bool lastDate = false)
       : elements_(elements), depth_(depth), last_(start), lastDate_(lastDate) {}
 
   template <class T>
@@ -27,7 +27,7 @@ class Filler {
     if constexpr (isOptional<T>) {
       fill(value.emplace(), depth);
     } else if constexpr (isArray<T>) {
-      if (depth < depth_) value.resize(elements_);
+      if (depth < depth_) value.resize(static_cast<std::size_t>(elements_));
       for (auto& element : value) fill(element, depth + 1);
     } else if constexpr (CaseKeyed<T>) {
       constexpr std::size_t cases = std::variant_size_v<typename T::variant>;
@@ -61,7 +61,7 @@ class Filler {
   }
 
  private:
-  std::size_t elements_;
+  int elements_;
   int depth_;
   int last_;
   bool lastDate_;
