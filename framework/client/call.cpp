@@ -166,7 +166,10 @@ Optional<Wait> Call::stepExplaining() {
 void Call::acceptReply() {
   if (exchange_->isLast()) worker_->finish();
   // Before the reply is read: the next worker is forked meanwhile.
-  if (pool_.isSpent(*worker_)) pool_.tidy();
+  if (pool_.isSpent(*worker_)) {
+    worker_->hangUp();
+    pool_.tidy();
+  }
   std::exception_ptr error;
   try {
     accept_({.kind = exchange_->kind(), .body = exchange_->body(), .deadline = deadline_});

@@ -15,8 +15,9 @@ using std::chrono::milliseconds;
 
 namespace {
 
-/// Workers that have answered may take a moment to end; beside them fit as many as are kept.
-constexpr std::size_t slotsPerPlace = 4;
+/// Workers that have answered may take a moment to end, and their ends are told together; beside
+/// them fit as many as are kept.
+constexpr std::size_t slotsPerPlace = 6;
 
 /// Where no worker is to be had just now, and nobody may tell when one is.
 constexpr milliseconds secondLook{10};

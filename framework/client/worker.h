@@ -32,6 +32,9 @@ class Worker {
   std::uint32_t nextSequence() noexcept { return served_++; }
   /// How many messages it has been given.
   [[nodiscard]] std::uint64_t served() const noexcept { return served_; }
+  /// Nothing more is to come from it. Before the next worker is forked: to close a socket while
+  /// another one is on its way to a process has the kernel look for lost ones.
+  void hangUp() noexcept { channel_.close(); }
   /// It ends by itself: it has had its last message.
   void finish() noexcept { finished_ = true; }
   [[nodiscard]] bool isFinished() const noexcept { return finished_; }

@@ -5,7 +5,6 @@
 #include "framework/contracts/start_step.h"
 
 #include <malloc.h>
-#include <sys/mman.h>
 #include <sys/random.h>
 #include <unistd.h>
 #include <algorithm>
@@ -55,11 +54,6 @@ void prepareHeap() {
     throw StartError(StartStep::reserveHeap);
   }
   randomOffset = random % largestOffset;
-
-  void* const trial =
-      mmap(nullptr, heapFor(0), PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
-  if (trial == MAP_FAILED) throw StartError(StartStep::reserveHeap);
-  munmap(trial, heapFor(0));
 #endif
   try {
     throw StartError(StartStep::reserveHeap, 0);
@@ -82,6 +76,9 @@ void abandonFirstHeap() {
 }
 
 void reserveHeap(std::size_t bytes) {
+  static std::size_t reserved = 0;
+  if (bytes <= reserved) return;
+  reserved = bytes;
   // Two blocks in one piece of memory: the first is kept, and what the second was is the heap.
   void* whole = allocate(randomOffset + bytes);
   while (whole == nullptr && bytes > heapFor(0)) {

@@ -26,11 +26,12 @@ namespace Keelgate::Sandbox {
 #ifndef KEELGATE_UNSEALED
 namespace {
 
-/// Whether the message is there already: then its answer is waited for, and is not to wait for us.
+/// Whether the message comes within a moment: then its answer is not to wait for us. Where messages
+/// come one after the other nothing is touched that they may not need.
 bool isAwaited() {
   pollfd channel{.fd = serviceDescriptor, .events = POLLIN, .revents = 0};
-  constexpr timespec atOnce{};
-  return ppoll(&channel, 1, &atOnce, nullptr) != 0;
+  constexpr timespec moment{.tv_sec = 0, .tv_nsec = 2'000'000};
+  return ppoll(&channel, 1, &moment, nullptr) != 0;
 }
 
 /// In a user namespace the launcher's map decides who nobody is outside; without one, becoming
@@ -86,6 +87,7 @@ ZygoteSeal sealZygote() {
   seal.workerFilter = compile(workerRules());
   enforce(compile(zygoteRules()));
   abandonFirstHeap();
+  reserveHeap(heapFor(shortMessage));
   seal.layers = layers | layerStrictFilter | layerOneDescriptor;
 #else
   static_cast<void>(layers);

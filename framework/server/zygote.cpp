@@ -15,6 +15,7 @@
 #include <unistd.h>
 #include <algorithm>
 #include <csignal>
+#include <ctime>
 
 namespace Keelgate {
 
@@ -35,6 +36,10 @@ ControlFrame exitFrame(std::uint32_t slot, int status, const rusage& used) {
                                      microseconds(used.ru_utime) + microseconds(used.ru_stime), 0});
 }
 
+/// While there is something to do, deaths are not waited for: what has died is looked for with each
+/// frame, or after this time, and the process is not woken for each of them.
+constexpr timespec togetherWithin{.tv_sec = 0, .tv_nsec = 500'000};
+
 /// A client that has gone is not an error here: the next receive tells.
 void send(const ControlFrame& frame) {
   static_cast<void>(Protocol::sendControl(serviceDescriptor, frame, Protocol::noDescriptor,
@@ -46,17 +51,24 @@ void send(const ControlFrame& frame) {
 void Zygote::serve() {
   greet();
   pollfd channels[]{{.fd = serviceDescriptor, .events = POLLIN, .revents = 0},
-                    {.fd = seal_.childDeaths, .events = POLLIN, .revents = 0},
-                    {.fd = seal_.launcher, .events = 0, .revents = 0}};
+                    {.fd = seal_.launcher, .events = 0, .revents = 0},
+                    {.fd = -1, .events = POLLIN, .revents = 0}};
   for (;;) {
+    pollfd& deaths = channels[2];
+    const bool isBusy = deaths.fd < 0;
     // ppoll and not poll: the kernel takes it up again after a stop without a call of its own.
-    if (ppoll(channels, std::size(channels), nullptr, nullptr) < 0) continue;
-    if (channels[2].revents != 0) return;
+    const int ready =
+        ppoll(channels, std::size(channels), isBusy ? &togetherWithin : nullptr, nullptr);
+    if (ready < 0) continue;
+    if (channels[1].revents != 0) return;
     // First what a request waits for.
     if (channels[0].revents != 0 && !takeFrame()) return;
-    if (channels[1].revents == 0) continue;
-    signalfd_siginfo death;
-    if (read(seal_.childDeaths, &death, sizeof death) > 0) reap();
+    if (deaths.revents != 0) {
+      signalfd_siginfo death;
+      static_cast<void>(!read(deaths.fd, &death, sizeof death));
+    }
+    reap();
+    deaths.fd = ready == 0 ? seal_.childDeaths : -1;
   }
 }
 
