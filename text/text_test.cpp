@@ -1,4 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
+#include "text/ascii.h"
 #include "text/base64.h"
 #include "text/date_time.h"
 #include "text/utf8.h"
@@ -82,32 +83,27 @@ TEST(Utf8, EveryCharacterIsReadAsItIsWritten) {
   }
 }
 
+/// The parts of a text between bars.
+std::vector<std::string> split(std::string_view text) {
+  std::vector<std::string> parts(1);
+  for (const char c : text) {
+    if (c == '|') {
+      parts.emplace_back();
+    } else {
+      parts.back() += c;
+    }
+  }
+  return parts;
+}
+
 TEST(Utf8, WhatIsMalformedIsFoundAnywhere) {
   // Overlong in two, three and four bytes; surrogates; beyond U+10FFFF; alone; cut short; not
   // continued.
-  for (const std::string_view bad : {"\xc0\xaf",
-                                     "\xc1\xbf",
-                                     "\xe0\x80\xaf",
-                                     "\xe0\x9f\xbf",
-                                     "\xf0\x80\x80\xaf",
-                                     "\xf0\x8f\xbf\xbf",
-                                     "\xed\xa0\x80",
-                                     "\xed\xbf\xbf",
-                                     "\xf4\x90\x80\x80",
-                                     "\xf5\x80\x80\x80",
-                                     "\x80",
-                                     "\xbf",
-                                     "\xff",
-                                     "\xc3",
-                                     "\xe2\x82",
-                                     "\xf0\x9f\x98",
-                                     "\xc3\x28",
-                                     "\xe2\x28\xa1",
-                                     "\xe2\x82\x28",
-                                     "\xf0\x28\x8c\xbc",
-                                     "\xf0\x90\x28\xbc",
-                                     "\xf0\x90\x8c\x28",
-                                     "\xc3\xc3"}) {
+  for (const std::string& bad :
+       split("\xc0\xaf|\xc1\xbf|\xe0\x80\xaf|\xe0\x9f\xbf|\xf0\x80\x80\xaf|\xf0\x8f\xbf\xbf|"
+             "\xed\xa0\x80|\xed\xbf\xbf|\xf4\x90\x80\x80|\xf5\x80\x80\x80|\x80|\xbf|\xff|\xc3|"
+             "\xe2\x82|\xf0\x9f\x98|\xc3\x28|\xe2\x28\xa1|\xe2\x82\x28|\xf0\x28\x8c\xbc|"
+             "\xf0\x90\x28\xbc|\xf0\x90\x8c\x28|\xc3\xc3")) {
     for (const std::size_t before : {0u, 1u, 63u, 64u, 65u, 200u}) {
       for (const std::size_t after : {0u, 1u, 64u, 100u}) {
         std::string text = std::string(before, 'a').append(bad).append(after, 'b');
@@ -117,6 +113,33 @@ TEST(Utf8, WhatIsMalformedIsFoundAnywhere) {
         EXPECT_TRUE(isUtf8(text)) << before << ' ' << after;
       }
     }
+  }
+}
+
+/// What reads many bytes at a time has a place for each of them.
+TEST(Utf8, NoBlockHidesAByteThatIsNotAscii) {
+  for (std::size_t length = 1; length < 70; ++length) {
+    for (std::size_t at = 0; at < length; ++at) {
+      std::string text(length, 'a');
+      text[at] = '\x80';
+      EXPECT_FALSE(isAscii(text) || isUtf8(text)) << at << " of " << length;
+    }
+  }
+}
+
+TEST(Ascii, ClassesHaveTheirCharactersAndNoOthers) {
+  const std::string_view small = "abcdefghijklmnopqrstuvwxyz", large = "ABCDEFGHIJKLMNOPQRSTUVWXYZ";
+  const auto in = [](std::string_view all, char c) {
+    return all.find(c) != all.npos;
+  };
+  for (int number = 0; number < 256; ++number) {
+    const char c = static_cast<char>(number);
+    EXPECT_EQ(isLetter(c), in(small, c) || in(large, c)) << number;
+    EXPECT_EQ(isDigit(c), in("0123456789", c)) << number;
+    EXPECT_EQ(isSpace(c), in(" \t\r\n", c)) << number;
+    EXPECT_EQ(lowerCase(c), in(large, c) ? small[large.find(c)] : c) << number;
+    const std::size_t digit = std::string_view("0123456789abcdef").find(lowerCase(c));
+    EXPECT_EQ(hexDigit(c), digit == std::string_view::npos ? -1 : static_cast<int>(digit));
   }
 }
 
@@ -154,27 +177,13 @@ TEST(DateTime, FractionsAreRoundedToMicroseconds) {
 }
 
 TEST(DateTime, OtherSpellingsAreRefused) {
-  for (const char* text : {"",
-                           "0000-01-01T00:00:00Z",
-                           "2001-00-01T00:00:00Z",
-                           "2001-13-01T00:00:00Z",
-                           "2001-01-00T00:00:00Z",
-                           "2001-02-29T00:00:00Z",
-                           "1900-02-29T00:00:00Z",
-                           "2001-04-31T00:00:00Z",
-                           "2001-01-01T24:00:00Z",
-                           "2001-01-01T00:60:00Z",
-                           "2001-01-01T00:00:60Z",
-                           "2001-01-01T00:00:00",
-                           "2001-01-01T00:00:00z",
-                           "2001-01-01 00:00:00Z",
-                           "2001-01-01T00:00:00.5Z",
-                           "2001-01-01T00:00:00+00:00",
-                           "+2001-01-01T00:00:00Z",
-                           "2001-1-01T00:00:00Z",
-                           "12001-01-01T00:00:00Z",
-                           "2001-01-01T00:00:0:Z",
-                           "2001-01-01T00:00:00Z "}) {
+  for (const std::string& text :
+       split("|0000-01-01T00:00:00Z|2001-00-01T00:00:00Z|2001-13-01T00:00:00Z|2001-01-00T00:00:00Z|"
+             "2001-02-29T00:00:00Z|1900-02-29T00:00:00Z|2001-04-31T00:00:00Z|2001-01-01T24:00:00Z|"
+             "2001-01-01T00:60:00Z|2001-01-01T00:00:60Z|2001-01-01T00:00:00|2001-01-01T00:00:00z|"
+             "2001-01-01 00:00:00Z|2001-01-01T00:00:00.5Z|2001-01-01T00:00:00+00:00|"
+             "+2001-01-01T00:00:00Z|2001-1-01T00:00:00Z|12001-01-01T00:00:00Z|"
+             "2001-01-01T00:00:0:Z|2001-01-01T00:00:00Z ")) {
     EXPECT_EQ(parseDateTime(text), std::nullopt) << text;
   }
 }
