@@ -49,6 +49,11 @@ std::vector<Attack> attacks() {
   const Bytes whole(good);
   Data twice = good;
   twice.insert(twice.end(), good.begin(), good.end());
+  // Read into a buffer of its size, or the byte would have to wait for the next.
+  VespCommandResponse response{};
+  response.applicationId = String(100'000, 'a');
+  Data longer = frameOf(Transport::encodeRecord(response));
+  longer.push_back({});
   const Data vast = frameSaying(1u << 20);
   const Data large(8u << 20);
   std::vector<Attack> all{
@@ -64,6 +69,7 @@ std::vector<Attack> attacks() {
       {"bytes that mean nothing", Script().then(Op::trickle, forever), "protocolViolation"},
       {"endless", Script().then(Op::endless), "protocolViolation"},
       {"two answers", Script().write(twice), "protocolViolation"},
+      {"a byte behind a long answer", Script().write(longer), "protocolViolation"},
       {"longer than sent", Script().write(frameSaying(good.size() - headerSize + 1)).then(Op::exit),
        "crashed"},
       {"another record", Script().answer(Data(3)), "protocolViolation"},

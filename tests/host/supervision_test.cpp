@@ -9,6 +9,7 @@
 
 #include <pthread.h>
 
+#include <atomic>
 #include <csignal>
 #include <thread>
 
@@ -121,6 +122,24 @@ TEST(C14, OthersKeepTheirMessageWhateverEndsBesideThem) {
   }
 }
 
+TEST(C14, GiantsLeaveAPlaceForSmallMessages) {
+  Client client(fakeOptions());
+  Script giant = Script().then(Op::pause, 1500).answer(0).then(Op::exit);
+  giant.resize(std::size_t{4} << 20);
+  std::atomic<int> done = 0;
+  std::vector<std::thread> giants;
+  for (int i = 0; i < 2; ++i) {
+    giants.emplace_back([&] {
+      EXPECT_EQ(outcomeOf(client, giant), "record 0");
+      ++done;
+    });
+  }
+  usleep(300'000);
+  EXPECT_EQ(outcomeOf(client, Script().answer(1)), "record 1");
+  EXPECT_EQ(done, 0);
+  for (std::thread& thread : giants) thread.join();
+}
+
 /// Each death before a first answer doubles the wait, and an answer ends that.
 TEST(C14, AZygoteThatDiesIsReplacedAtOnceAsLongAsAnswersCome) {
   Client client(fakeOptions());
@@ -163,7 +182,8 @@ class Supervised : public testing::Test {
 TEST_F(Supervised, ALayoutIsGivenUpAfterSoManyReplies) {
   const Supervisor::Service first = running();
   EXPECT_TRUE(supervisor_.isCurrent(first.get()));
-  for (std::uint64_t i = 1; i < repliesPerLayout; ++i) supervisor_.noteReply(*first);
+  // As long as there is no other, this one stays.
+  for (std::uint64_t i = 0; i <= repliesPerLayout; ++i) supervisor_.noteReply(*first);
   supervisor_.tidy();
   EXPECT_EQ(first->state(), State::running);
   EXPECT_TRUE(comesTrue([&] {
