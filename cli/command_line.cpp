@@ -5,6 +5,7 @@
 #include "cli/files.h"
 #include "cli/nearest.h"
 #include "cli/request_line.h"
+#include "cli/table.h"
 #include "text/utf8.h"
 
 #include <fmt/format.h>
@@ -116,7 +117,8 @@ void addHostOptions(::CLI::App& app, CommandLine& line) {
   addSeconds(app, "--time-limit", line.host.timeLimit,
              fmt::format("What a message may take, e.g. 0.5 (default {})",
                          std::chrono::duration<double>(defaults.timeLimit).count()));
-  addNumber(app, "--max-message", line.host.largestMessage, 1, Options::greatestLargestMessage,
+  // 4G itself is a byte too many, and what somebody types who wants the most: the client cuts it.
+  addNumber(app, "--max-message", line.host.largestMessage, 1, UInt64{4} << 30,
             fmt::format("The largest message, e.g. 4K, 2M, 1G (default {}M)",
                         defaults.largestMessage >> 20),
             true);
@@ -334,6 +336,23 @@ Array<String> reversed(Array<String> words) {
   return words;
 }
 
+/// The parser's help, whose lines are as long as they are.
+String fitted(std::string_view help, std::size_t width) {
+  String all;
+  while (!help.empty()) {
+    const std::string_view line = help.substr(0, help.find('\n'));
+    help.remove_prefix(std::min(line.size() + 1, help.size()));
+    if (line.size() <= width) {
+      (all += line) += '\n';
+      continue;
+    }
+    for (const String& part : paragraph({String(line)}, line.find_first_not_of(' '), width)) {
+      all += part + '\n';
+    }
+  }
+  return all;
+}
+
 /// What somebody may have meant with the first word that nobody took.
 String hintFor(const ::CLI::App& app) {
   const auto chosen = app.get_subcommands();
@@ -366,7 +385,8 @@ CommandLine readCommandLine(Array<String> words, Console& console) {
     complete(app, version, arguments);
   } catch (const ::CLI::Success&) {
     const auto chosen = app.get_subcommands();
-    console.print(chosen.empty() ? app.help() : chosen.front()->help("keelgate"));
+    console.print(
+        fitted(chosen.empty() ? app.help() : chosen.front()->help("keelgate"), outputWidth()));
   } catch (const ::CLI::ParseError& error) {
     console.complain(error.what());
     console.complain(hintFor(app));

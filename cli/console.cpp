@@ -27,20 +27,6 @@ namespace {
 /// In columns, of a terminal that does not say.
 constexpr std::size_t usual = 80;
 
-/// As in JSON but without the outer quotes, and with inner ones as they are.
-/// An error's sentence can quote a path or a service that a stranger chose.
-String escaped(std::string_view text) {
-  String all;
-  for (;;) {
-    const std::size_t plain = text.find_first_of("\"\\");
-    const String json = JSON::quote(text.substr(0, plain));
-    all.append(json, 1, json.size() - 2);
-    if (plain == std::string_view::npos) return all;
-    all += text[plain];
-    text.remove_prefix(plain + 1);
-  }
-}
-
 std::string_view variable(const char* name) {
   const char* value = std::getenv(name);
   return value == nullptr ? std::string_view() : std::string_view(value);
@@ -81,11 +67,11 @@ Bool Console::write(std::string_view text) {
 }
 
 void Console::complain(std::string_view sentence) {
-  sayLine(fmt::format("keelgate: {}", escaped(sentence)));
+  sayLine(fmt::format("keelgate: {}", JSON::withoutControls(sentence)));
 }
 
 void Console::log(LogLevel level, std::string_view line) {
-  if (level <= logLevel_) sayLine(escaped(line));
+  if (level <= logLevel_) sayLine(JSON::withoutControls(line));
 }
 
 void Console::remark(std::string_view sentence) {

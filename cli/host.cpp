@@ -24,6 +24,8 @@ Client::Options completed(Client::Options options, Console& console, std::size_t
   // Deliberate: whoever made a message fail does not wait for the answer himself, but all those
   // whose answers come behind it do.
   options.abnormalEndsPerSecond = 0;
+  options.largestMessage =
+      std::min(options.largestMessage, Client::Options::greatestLargestMessage);
   // No more processes than messages: the others would be started for nothing.
   options.processes = static_cast<unsigned>(std::min<std::size_t>(options.processes, mostMessages));
   return options;
@@ -49,8 +51,8 @@ JSON::Reply Host::answer(const JSON::Subject& subject, Bytes message,
 }
 
 Bool Delivery::take(const std::vector<JSON::Reply>& due) noexcept {
+  Bool goOn = true;
   try {
-    Bool goOn = true;
     for (const JSON::Reply& reply : due) {
       ++taken_;
       tally_.count(reply);
@@ -59,11 +61,11 @@ Bool Delivery::take(const std::vector<JSON::Reply>& due) noexcept {
       goOn = goOn && reply.outcome != JSON::Outcome::serviceLost;
       if (!goOn) break;
     }
-    return console_.flush() && goOn;
   } catch (const std::bad_alloc&) {
     console_.note(Status::serviceLost);
     return false;
   }
+  return goOn;
 }
 
 void Delivery::say(const JSON::Reply& reply) {

@@ -13,6 +13,7 @@
 
 #include <keelgate/values.h>
 
+#include <span>
 #include <string_view>
 #include <variant>
 
@@ -36,7 +37,7 @@ struct RequestLine {
 /// Reads one line, without its newline, in its own memory, which holds the message then. Callable
 /// from any thread. A nesting of any depth in the id takes heap and no stack. Throws nothing but
 /// std::bad_alloc.
-RequestLine readRequestLine(String& line);
+RequestLine readRequestLine(std::span<char> line);
 
 /// A decimal number without a sign; nothing when it is not one or does not fit.
 Optional<UInt64> decimal(std::string_view text);

@@ -8,6 +8,7 @@
 #include <fmt/format.h>
 
 #include <system_error>
+#include <utility>
 
 namespace Keelgate::CLI {
 
@@ -52,11 +53,13 @@ void unpack(const Client::Options& options, const UnpackOptions& what, Console& 
   const Host host(options, console, total);
   Tally tally;
   Delivery delivery(console, tally, Delivery::Kind::files, total);
-  OrderedWork work(host.threads(), [&](const auto& due) { return delivery.take(due); });
-  for (const String& path : what.files) {
-    if (!work.add([&, path] { return unpackFile(host, what, path); }, 0)) break;
-  }
-  work.finish();
+  OrderedWork work([&](const auto& due, Bool) { return delivery.take(due) && console.flush(); });
+  work.run(host.threads(), [&, next = what.files.begin()]() mutable -> Optional<OrderedWork::Job> {
+    if (next == what.files.end()) return std::nullopt;
+    return OrderedWork::Job{.next = [&, path = &*next++, isDone = false]() mutable {
+      return std::exchange(isDone, true) ? Optional<JSON::Reply>() : unpackFile(host, what, *path);
+    }};
+  });
   if (console.status() == Status::serviceLost && delivery.taken() < total) {
     console.complain(
         fmt::format("{} of {} messages were not unpacked", total - delivery.taken(), total));

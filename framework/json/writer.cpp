@@ -225,4 +225,21 @@ String quote(std::string_view text) {
   return all;
 }
 
+String withoutControls(std::string_view text) {
+  String all;
+  for (;;) {
+    const std::size_t end = std::min(text.find_first_of("\"\\"), text.size());
+    const std::string_view part = text.substr(0, end);
+    if (plainLength(part) == end) {
+      all += part;
+    } else {
+      const String json = quote(part);
+      all.append(json, 1, json.size() - 2);
+    }
+    if (end == text.size()) return all;
+    all += text[end];
+    text.remove_prefix(end + 1);
+  }
+}
+
 }  // namespace Keelgate::JSON

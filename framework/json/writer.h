@@ -102,4 +102,8 @@ class Writer {
 /// `text` as a JSON string.
 String quote(std::string_view text);
 
+/// `text` with the characters escaped that a terminal would obey, or a reader of lines, as in a JSON
+/// string. Quotes and backslashes stay: what was JSON is that still, and says the same.
+String withoutControls(std::string_view text);
+
 }  // namespace Keelgate::JSON

@@ -6,8 +6,7 @@ import re
 
 # What a file that includes this needs, for libraries that are not ours.
 FOREIGN = {"gtest/": "GTest::gtest_main", "benchmark/": "benchmark::benchmark", "fmt/": "fmt::fmt",
-           "CLI/": "CLI11::CLI11", "rapidjson/": "RapidJSON::RapidJSON",
-           "sodium.h": "PkgConfig::sodium", "expat.h": "EXPAT::EXPAT",
+           "CLI/": "CLI11::CLI11", "sodium.h": "PkgConfig::sodium", "expat.h": "EXPAT::EXPAT",
            "pugixml.hpp": "pugixml::pugixml"}
 
 

@@ -8,6 +8,8 @@
 
 #include <gtest/gtest.h>
 
+#include <poll.h>
+
 #include <algorithm>
 #include <atomic>
 #include <chrono>
@@ -41,7 +43,7 @@ TEST(RequestLine, IsReadStrictly) {
       {R"({"record":"VespInvitation","message":""})", "ok", absent},
       {" {\"id\" : null ,\t\"message\":\"Zg==\",\"command\":0,\"service\":\"\"} \r", "ok", "null"},
       {R"({"service":"s","command":18446744073709551615,"message":"","id":{"b":[1.0,-0,1e5],"a":"\u00e9"}})",
-       "ok", "{\"b\":[1.0,-0,1e5],\"a\":\"\u00e9\"}"},
+       "ok", R"({"b":[1.0,-0,1e5],"a":"\u00e9"})"},
       {R"({"record":"VespInvitation","message":"","id":123456789012345678901234567890.10})", "ok",
        "123456789012345678901234567890.10"},
       {R"({"id":1})", "neither", "1"},
@@ -72,11 +74,21 @@ TEST(RequestLine, IsReadStrictly) {
       {"3", "object", absent},
       {R"({"id":1)", "not readable", absent},
       {R"({"id":1} {})", "not readable", absent},
-      {"{\"id\":1}\0x"sv, "null character", absent},
+      {"{\"id\":1}\0x"sv, "more than one value", absent},
       {"{\"id\":\"\xff\"}", "not readable", absent},
-      {R"({"id":"\udc00","record":"VespInvitation","message":""})", "surrogate", absent},
+      {R"({"id":["\udc00","\u0041\"", [ ], { } ,1E400 ],"record":"VespInvitation","message":""})",
+       "ok", R"(["\udc00","\u0041\"",[],{},1E400])"},
+      {"{\"id\":\"\x7f\u009b\u2028\\n\u00e9\",\"record\":\"VespInvitation\",\"message\":\"\"}",
+       "ok", "\"\\u007f\\u009b\\u2028\\n\u00e9\""},
+      {R"({"record":"\udc00","message":"","id":1})", "surrogate", "1"},
+      {R"({"service":"\ud800\u0041","command":1,"message":"","id":1})", "surrogate", "1"},
       {R"({"id":NaN})", "not readable", absent},
       {R"({"id":1,})", "not readable", absent},
+      {R"({"id":[1,]})", "not readable", absent},
+      {R"({"id":[1}})", "not readable", absent},
+      {R"({"id":{"a":1,}})", "not readable", absent},
+      {R"({"id":{"a" 1}})", "not readable", absent},
+      {R"({"id":01})", "not readable", absent},
   };
   for (const LineCase& entry : table) {
     String text(entry.line);
@@ -105,7 +117,7 @@ TEST(RequestLine, MessagesOfEveryLengthAndSpellingAreDecoded) {
                   R"(","command":245,"service":"com.\u0065xample"})";
     const RequestLine read = readRequestLine(line);
     ASSERT_EQ(problemOf(read), "ok") << spelling;
-    EXPECT_EQ(read.id, "\"A\"");
+    EXPECT_EQ(read.id, R"("\u0041")");
     const auto& [subject, message, typed] = std::get<Request>(read.content);
     EXPECT_TRUE(std::ranges::equal(message, std::as_bytes(std::span(octets)))) << spelling;
     EXPECT_FALSE(typed);
@@ -132,30 +144,51 @@ JSON::Reply numbered(int number) {
   return {.json = {std::to_string(number)}};
 }
 
+using Job = OrderedWork::Job;
 using Due = std::vector<JSON::Reply>;
 
+/// A job of some replies, which `reply` makes of their numbers in it.
+template <class MakeReply>
+Job jobOf(int replies, std::size_t weight, MakeReply reply) {
+  return {.next = [=, next = 0]() mutable -> Optional<JSON::Reply> {
+            if (next == replies) return std::nullopt;
+            return reply(next++);
+          },
+          .weight = weight};
+}
+
+/// The jobs for the numbers below `count`.
+template <class MakeJob>
+OrderedWork::Source jobs(int count, MakeJob make) {
+  return [=, next = 0]() mutable -> Optional<Job> {
+    if (next == count) return std::nullopt;
+    return make(next++);
+  };
+}
+
 TEST(OrderedWork, RepliesComeInOrderHoweverJobsEnd) {
-  constexpr int jobs = 500, threads = 8;
+  static constexpr int count = 200, each = 3, threads = 8;
   Array<String> out;
+  int ended = 0;
   std::latch others(threads - 1);
-  {
-    OrderedWork work(threads, [&](const Due& due) {
-      for (const JSON::Reply& reply : due) out.push_back(reply.json.front());
-      return true;
-    });
-    for (int i = 0; i < jobs; ++i) {
-      // The first is the last to end: all other threads pass it.
-      const auto job = [&others, i] {
-        if (i == 0) others.wait();
-        if (i > 0 && i < threads) others.count_down();
-        return numbered(i);
-      };
-      ASSERT_TRUE(work.add(job, 1));
-    }
-    work.finish();
+  OrderedWork work([&](const Due& due, Bool jobEnded) {
+    for (const JSON::Reply& reply : due) out.push_back(reply.json.front());
+    ended += jobEnded ? 1 : 0;
+    return true;
+  });
+  work.run(threads, jobs(count, [&](int job) {
+             return jobOf(each, 1, [&others, job](int i) {
+               // The first is the last to end: all other threads pass it.
+               if (job == 0 && i == 0) others.wait();
+               if (job > 0 && job < threads && i == 0) others.count_down();
+               return numbered(each * job + i);
+             });
+           }));
+  ASSERT_EQ(out.size(), std::size_t{count * each});
+  EXPECT_EQ(ended, count);
+  for (int i = 0; i < count * each; ++i) {
+    EXPECT_EQ(out[static_cast<std::size_t>(i)], std::to_string(i));
   }
-  ASSERT_EQ(out.size(), std::size_t{jobs});
-  for (int i = 0; i < jobs; ++i) EXPECT_EQ(out[static_cast<std::size_t>(i)], std::to_string(i));
 }
 
 constexpr std::size_t large = std::size_t{48} << 20;
@@ -166,91 +199,59 @@ void letOthersRun() {
 }
 
 TEST(OrderedWork, WhatWaitsIsBoundedInBytesAndGivenBack) {
-  std::binary_semaphore go(0);
-  std::atomic<int> started = 0, added = 0;
-  OrderedWork work(4, [](const Due&) { return true; });
-  std::thread adding([&] {
-    // Many windows full, one after another.
-    for (int i = 0; i < 20; ++i) {
-      const auto job = [&] {
-        ++started;
-        go.acquire();
-        go.release();
-        return numbered(0);
-      };
-      work.add(job, large);
-      ++added;
-    }
-  });
-  while (started == 0) std::this_thread::yield();
-  // Two of them are more than may wait, so the second is not taken while the first is in work.
-  letOthersRun();
-  EXPECT_LE(added, 1);
-  go.release();
-  adding.join();
-  work.finish();
-  EXPECT_EQ(started, 20);
-}
-
-TEST(OrderedWork, LongRepliesBehindASlowMessageKeepOthersFromBeginning) {
-  constexpr int threads = 3, jobs = 8;
-  std::binary_semaphore go(0);
-  std::atomic<int> begun = 0;
-  std::size_t bytes = 0;
-  OrderedWork work(threads, [&](const Due& due) {
-    for (const JSON::Reply& reply : due) bytes += JSON::sizeOf(reply.json);
-    return true;
-  });
-  work.add([&] { return go.acquire(), numbered(0); }, 1);
-  for (int i = 1; i < jobs; ++i) {
-    work.add([&] { return ++begun, JSON::Reply{.json = {String(large, 'x')}}; }, 1);
-  }
-  letOthersRun();
-  // Two of them fill the window, and each of the other threads may be in the middle of one.
-  EXPECT_LE(begun, threads);
-  go.release();
-  work.finish();
-  EXPECT_EQ(begun, jobs - 1);
-  EXPECT_EQ(bytes, 1 + large * (jobs - 1));
-}
-
-TEST(OrderedWork, AWindowThatWasFullIsEmptyAgain) {
-  OrderedWork work(2, [](const Due&) { return true; });
-  for (int i = 0; i < 3; ++i) {
-    // More than the window as a request and most of it as a reply.
-    ASSERT_TRUE(work.add([] { return JSON::Reply{.json = {String(large, 'x')}}; }, 2 * large));
-  }
-  std::binary_semaphore second(0);
-  std::atomic<bool> together = false;
-  const auto first = [&] {
-    together = second.try_acquire_for(std::chrono::seconds(20));
-    return numbered(0);
+  struct Case {
+    int mostTaken;
+    std::size_t request, reply;
   };
-  work.add(first, 1);
-  work.add([&] { return second.release(), numbered(1); }, 1);
-  work.finish();
-  EXPECT_TRUE(together);
+  // Whether it is the requests that fill the window or the replies: each thread may be in the
+  // middle of a job when it is full, and nothing else is taken then.
+  for (const auto& [mostTaken, request, reply] : {Case{2, large, 1}, Case{4, 1, large}}) {
+    constexpr int threads = 3, count = 20;
+    std::binary_semaphore go(0);
+    std::atomic<int> taken = 0;
+    std::size_t bytes = 0;
+    OrderedWork work([&](const Due& due, Bool) {
+      for (const JSON::Reply& reply : due) bytes += JSON::sizeOf(reply.json);
+      return true;
+    });
+    std::thread running([&] {
+      work.run(threads, jobs(count, [&, request = request, reply = reply](int job) {
+                 ++taken;
+                 return jobOf(1, request, [&go, job, reply](int) {
+                   if (job == 0 || reply == 1) {
+                     go.acquire();
+                     go.release();
+                   }
+                   return JSON::Reply{.json = {String(reply, 'x')}};
+                 });
+               }));
+    });
+    while (taken == 0) std::this_thread::yield();
+    letOthersRun();
+    EXPECT_LE(taken, mostTaken);
+    go.release();
+    running.join();
+    EXPECT_EQ(taken, count);
+    EXPECT_EQ(bytes, reply * count);
+  }
 }
 
 TEST(OrderedWork, AJobWithoutMemoryEndsTheWorkAndNotTheProgram) {
-  JSON::Outcome worst = JSON::Outcome::record;
-  OrderedWork work(2, [&](const Due& due) {
-    for (const JSON::Reply& reply : due) worst = std::max(worst, reply.outcome);
-    return worst != JSON::Outcome::serviceLost;
-  });
-  work.add([]() -> JSON::Reply { throw std::bad_alloc(); }, 1);
-  work.finish();
-  EXPECT_EQ(worst, JSON::Outcome::serviceLost);
+  OrderedWork work([](const Due&, Bool) { return true; });
+  const auto job = [](int) {
+    return jobOf(1, 1, [](int) -> JSON::Reply { throw std::bad_alloc(); });
+  };
+  EXPECT_THROW(work.run(2, jobs(1000, job)), std::bad_alloc);
 }
 
 TEST(OrderedWork, EndsWithItsReader) {
-  int seen = 0;
-  OrderedWork work(3, [&](const Due&) { return ++seen < 10; });
-  int added = 0;
-  while (work.add([] { return numbered(0); }, 1)) ++added;
-  work.finish();
+  int seen = 0, taken = 0;
+  OrderedWork work([&](const Due&, Bool) { return ++seen < 10; });
+  work.run(3, jobs(1'000'000, [&](int) { return ++taken, jobOf(1, 1, numbered); }));
   EXPECT_EQ(seen, 10);
-  EXPECT_GE(added, 10);
+  EXPECT_LT(taken, 1000);
+  pollfd entry{.fd = work.endedDescriptor(), .events = POLLIN, .revents = 0};
+  EXPECT_EQ(poll(&entry, 1, 0), 1);
 }
 
 Array<String> wordsIn(const String& text) {

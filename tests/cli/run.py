@@ -66,9 +66,9 @@ def wrong_usage():
                   ["unpack", "--service", b"\xff", "--command", "1"],
                   ["unpack", *record, "--pretty", "--compact"], ["unpack", *record, "-", "-"],
                   ["unpack", *record, "--time-limit", "0"], ["stream", "--time-limit", "nan"],
-                  ["stream", "--processes", "0"], ["stream", "--max-message", "4294967296"],
+                  ["stream", "--processes", "0"], ["stream", "--max-message", "4294967297"],
                   ["stream", "extra"], ["describe", "Nothing"], ["--verbose"],
-                  ["stream", "--max-message", "4G"], ["stream", "--max-message", "1KK"],
+                  ["stream", "--max-message", "5G"], ["stream", "--max-message", "1KK"],
                   ["stream", "--log-level", "all"], ["unpack", *record, "--typed"],
                   ["unpack", *record, "--files0-from", "/nonexistent"],
                   ["unpack", *record, "--files0-from", "/dev/null", "x"],
@@ -83,9 +83,10 @@ def wrong_usage():
                         (["stream", "--processes", "0"], "--processes: \"0\" is not")):
         check(hint in run(*words)[2], f"{words} without a hint")
     for words in (["--help"], ["--version"], ["unpack", "--help"], ["stream", "--help"],
-                  ["describe", "--help"], ["--version", "--verbose"]):
+                  ["describe", "--help"], ["--version", "--verbose"],
+                  ["check", "--max-message", "4g", messages / "check-in.xml"]):
         status, out, err = run(*words)
-        check(status == 0 and out and not err, f"{words}: {status} {err}")
+        check(status == 0 and (out or "4g" in words) and not err, f"{words}: {status} {err}")
 
 
 def many_files():
@@ -352,6 +353,15 @@ def stream():
     status, out, _ = run("stream", "--max-message", "1k", stdin="\n".join(lines).encode())
     check(status == 2 and [r.get("id") for r in objects(out)] == [0, None, 2], f"long lines: {out}")
     check(f"{longest} bytes" in objects(out)[1]["error"]["description"], f"a long line: {out}")
+    # A message that is too long to be kept leaves the rest of its line, in whatever order.
+    long, members = "A" * (2 << 20), ['"record" :"VespInvitation"', '"id":{"message": "\\"{", "n":1E400}']
+    for lines, reason in (([f'{{{members[0]},"message" : "{long}\\/", {members[1]}}}'], "messageTooLarge"),
+                          ([f'{{{members[1]},"message":"{long}", {members[0]}}}'], "messageTooLarge"),
+                          ([f'{{{members[1]},"message":"{long}"}}'], None),
+                          ([f'{{"id":{{"message":"{long}"}}}}'], None)):
+        status, out, _ = run("stream", "--max-message", "1k", stdin="\n".join(lines * 2).encode())
+        check([host_error(reply) for reply in objects(out)] == [reason] * 2, f"long messages: {out}")
+        check(out.count(b'{"id":{"message":"\\"{","n":1E400},') == 2 * ("n" in lines[0]), f"their ids: {out}")
     reply = objects(run("stream", "--max-message", "1K", stdin=request(1, "AAAA" * 342).encode())[1])
     check((reply[0]["id"], host_error(reply[0])) == (1, "messageTooLarge"), f"too large: {reply}")
 
@@ -483,6 +493,7 @@ def terminal():
     compact = on_terminal("unpack", "--compact", "--record", "VespCommandResponse", files[0])
     check(compact.startswith(b'{"record":'), f"compact at a terminal: {compact}")
     check(b"\033[1m" in on_terminal("describe", NO_COLOR=""), "colour")
+    check(all(len(line) <= 60 for line in on_terminal("unpack", "--help", COLUMNS="60").splitlines()), "help")
     check(b"\033" not in on_terminal("describe", NO_COLOR="1"), "NO_COLOR")
 
 
