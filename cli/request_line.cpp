@@ -58,32 +58,33 @@ constexpr bool isDigit(char c) {
   return c >= '0' && c <= '9';
 }
 
-/// The value of an escape's four hexadecimal digits; nothing where they are not that.
-Optional<char32_t> hexadecimal(std::string_view digits) {
+/// The value of four hexadecimal digits; nothing where they are not that.
+Optional<char32_t> hexadecimal(std::string_view text) {
   unsigned value = 0;
-  const auto [end, error] =
-      std::from_chars(digits.data(), digits.data() + digits.size(), value, 16);
-  if (error != std::errc() || digits.size() != 4 || end != digits.data() + 4) return std::nullopt;
-  return value;
+  const char* end = text.data() + std::min<std::size_t>(4, text.size());
+  const bool all = std::from_chars(text.data(), end, value, 16).ptr == text.data() + 4;
+  return all ? Optional<char32_t>(value) : std::nullopt;
 }
 
-/// Decodes one escape, which is well-formed, and gives its length; 0 where it is half of a
-/// surrogate pair. `out` never gets more than that.
+constexpr std::string_view escapeLetters = "\"\\/bfnrt";
+
+/// Decodes one escape, which is well-formed, to where `out` is, and gives its length. Never writes
+/// more than that.
 std::size_t unescape(std::string_view text, char*& out) {
-  constexpr std::string_view letters = "\"\\/bfnrt", characters = "\"\\/\b\f\n\r\t";
   if (text[1] != 'u') {
-    *out++ = characters[letters.find(text[1])];
+    *out++ = "\"\\/\b\f\n\r\t"[escapeLetters.find(text[1])];
     return 2;
   }
-  char32_t character = *hexadecimal(text.substr(2, 4));
+  char32_t character = *hexadecimal(text.substr(2));
   std::size_t length = 6;
   if (character >= 0xd800 && character < 0xdc00 && text.substr(6, 2) == "\\u") {
-    const char32_t low = *hexadecimal(text.substr(8, 4));
-    if (low < 0xdc00 || low > 0xdfff) return 0;
-    character = 0x10000 + ((character - 0xd800) << 10) + (low - 0xdc00);
+    const char32_t low = *hexadecimal(text.substr(8)) - 0xdc00;
+    // Any other than the second half leaves a first half alone.
+    if (low < 0x400) character = 0x10000 + ((character - 0xd800) << 10) + low;
     length = 12;
   }
-  if (Text::isSurrogate(character)) return 0;
+  // There are no characters for it, so it could not be written back.
+  demand(!Text::isSurrogate(character), "a string holds half of a surrogate pair");
   out += Text::encodeUtf8(character, out);
   return length;
 }
@@ -94,14 +95,12 @@ std::string_view unescaped(std::span<char> characters) {
   if (text.find('\\') == std::string_view::npos) return text;
   char* out = characters.data();
   while (!text.empty()) {
-    if (text.front() != '\\') {
+    std::size_t length = 1;
+    if (text.front() == '\\') {
+      length = unescape(text, out);
+    } else {
       *out++ = text.front();
-      text.remove_prefix(1);
-      continue;
     }
-    const std::size_t length = unescape(text, out);
-    // There are no characters for it, so it could not be written back.
-    demand(length > 0, "a string holds half of a surrogate pair");
     text.remove_prefix(length);
   }
   return {characters.data(), out};
@@ -125,6 +124,7 @@ class Reader {
     return true;
   }
   void expect(char c) {
+    skipSpace();
     if (!take(c)) fail(fmt::format("\"{}\" is missing", c));
   }
 
@@ -149,9 +149,7 @@ class Reader {
 
   /// The key of a member, and the colon behind it.
   std::span<char> key() {
-    skipSpace();
     const std::span<char> key = string();
-    skipSpace();
     expect(':');
     skipSpace();
     return key;
@@ -222,11 +220,10 @@ class Reader {
   void skipEscape() {
     ++at_;
     if (take('u')) {
-      if (!hexadecimal(textOf(line_.subspan(at_)).substr(0, 4))) fail("not an escape");
+      if (!hexadecimal(textOf(line_.subspan(at_)))) fail("not an escape");
       at_ += 4;
-    } else if (std::string_view("\"\\/bfnrt").find(peek()) == std::string_view::npos) {
-      fail("not an escape");
     } else {
+      if (escapeLetters.find(peek()) == std::string_view::npos) fail("not an escape");
       ++at_;
     }
   }
