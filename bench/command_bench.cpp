@@ -14,22 +14,22 @@
 namespace Keelgate::CLI {
 namespace {
 
-using PropertyList::Data;
-using PropertyList::Dictionary;
+using ::PropertyList::Data;
+using ::PropertyList::Dictionary;
 
 /// A push payload of 2,136 bytes with payloads in it.
 Keelgate::Data message() {
   const Dictionary inner{{"c", 102}, {"P", Data(320, std::byte{1})}, {"htu", true}};
-  return PropertyList::writeBinary(Dictionary{{"c", 100},
-                                              {"v", 8},
-                                              {"P", Data(1220, std::byte{0xa5})},
-                                              {"i", "42"},
-                                              {"E", "pair"},
-                                              {"qI", "queue-1"},
-                                              {"tP", "mailto:ada@example.org"},
-                                              {"sP", "tel:+15550100"},
-                                              {"e", 1795255200},
-                                              {"mml", PropertyList::Array{inner, inner}}});
+  return ::PropertyList::writeBinary(Dictionary{{"c", 100},
+                                                {"v", 8},
+                                                {"P", Data(1220, std::byte{0xa5})},
+                                                {"i", "42"},
+                                                {"E", "pair"},
+                                                {"qI", "queue-1"},
+                                                {"tP", "mailto:ada@example.org"},
+                                                {"sP", "tel:+15550100"},
+                                                {"e", 1795255200},
+                                                {"mml", ::PropertyList::Array{inner, inner}}});
 }
 
 void readLine(benchmark::State& state) {

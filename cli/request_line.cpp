@@ -332,16 +332,11 @@ class RequestReader {
   bool idIsAmbiguous_ = false;
 };
 
-/// A member that is a string, decoded, or a number.
-String valueOf(const Optional<std::span<char>>& member) {
-  return String(unescaped(*member));
-}
-
 JSON::Subject subjectOf(const Members& members) {
   if (members[record]) {
     demand(!members[service] && !members[command],
            "\"record\" excludes \"service\" and \"command\"");
-    String name = valueOf(members[record]);
+    String name(unescaped(*members[record]));
     if (!JSON::isRecordName(name)) {
       throw Invalid{fmt::format("unknown record {}: one of {}", JSON::quote(name),
                                 fmt::join(JSON::recordNames(), ", "))};
@@ -357,7 +352,8 @@ JSON::Subject subjectOf(const Members& members) {
   // JSON also has -1, 1.5 and 1e3, which are numbers and not commands.
   const Optional<UInt64> number = decimal(textOf(*members[command]));
   demand(number.has_value(), "\"command\" must be an integer from 0 to 18446744073709551615");
-  return VespClientMessageContext{.command = *number, .service = valueOf(members[service])};
+  return VespClientMessageContext{.command = *number,
+                                  .service = String(unescaped(*members[service]))};
 }
 
 Request requestOf(const Members& members) {
