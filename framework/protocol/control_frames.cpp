@@ -104,13 +104,15 @@ Transfer receiveControl(int channel, ControlFrame& frame, int& descriptor,
   const Transfer transfer = receivePacket(channel, frame, &room, packet, waiting);
   if (transfer != Transfer::complete && transfer != Transfer::malformed) return transfer;
   if (const cmsghdr* const item = CMSG_FIRSTHDR(&packet)) {
-    if (item->cmsg_level != SOL_SOCKET || item->cmsg_type != SCM_RIGHTS ||
-        item->cmsg_len != CMSG_LEN(sizeof descriptor)) {
-      return Transfer::malformed;
-    }
-    std::memcpy(&descriptor, CMSG_DATA(item), sizeof descriptor);
+    if (item->cmsg_level != SOL_SOCKET || item->cmsg_type != SCM_RIGHTS) return Transfer::malformed;
+    const auto* const first = reinterpret_cast<const int*>(CMSG_DATA(item));
+    const std::size_t count = (item->cmsg_len - CMSG_LEN(0)) / sizeof descriptor;
+    // In the room for one there is, by its alignment, room for two.
+    for (std::size_t i = 1; i < count; ++i) close(first[i]);
+    if (count > 0) descriptor = first[0];
+    if (count > 1) packet.msg_flags |= MSG_CTRUNC;
   }
-  if (transfer == Transfer::complete &&
+  if (transfer == Transfer::complete && (packet.msg_flags & MSG_CTRUNC) == 0 &&
       (descriptor != noDescriptor) == (frame.kind == ControlKind::fork)) {
     return Transfer::complete;
   }

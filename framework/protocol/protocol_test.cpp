@@ -127,6 +127,12 @@ class Control : public testing::Test {
     for (const int end : ends_) close(end);
   }
 
+  static int nextDescriptor() {
+    const int next = dup(STDERR_FILENO);
+    close(next);
+    return next;
+  }
+
   /// What the client's end, and the zygote's, make of the same packet.
   std::pair<Transfer, Transfer> taken(Bytes packet, const std::vector<int>& descriptors = {}) {
     std::pair<Transfer, Transfer> both{};
@@ -134,9 +140,14 @@ class Control : public testing::Test {
     ControlFrame frame{};
     both.first = receiveControl(ends_[1], frame, Waiting::no);
     send(packet, descriptors);
+    // What comes with a refused frame is closed.
+    const int next = nextDescriptor();
     int descriptor = noDescriptor;
     both.second = receiveControl(ends_[1], frame, descriptor, Waiting::no);
+    EXPECT_EQ(descriptor != noDescriptor,
+              both.second == Transfer::complete && !descriptors.empty());
     if (descriptor != noDescriptor) close(descriptor);
+    EXPECT_EQ(nextDescriptor(), next);
     return both;
   }
 
@@ -222,6 +233,14 @@ TEST_F(Control, PacketsThatAreNotExactlyAFrameAreRefused) {
     change(wrong);
     EXPECT_EQ(taken(bytesOf(wrong)), bothMalformed);
   }
+}
+
+TEST_F(Control, AnEndIsAnEndForWholeReadsAndWritesToo) {
+  std::array<std::byte, 10> bytes{};
+  ASSERT_TRUE(writeAll(ends_[0], bytes));
+  EXPECT_TRUE(readAll(ends_[1], bytes));
+  close(std::exchange(ends_[0], -1));
+  EXPECT_FALSE(readAll(ends_[1], bytes) || writeAll(ends_[1], bytes));
 }
 
 TEST(Version, IsReadBackAsText) {

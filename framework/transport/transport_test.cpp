@@ -204,6 +204,14 @@ void readRecordOf(Bytes body, const ReadLimits& limits) {
   static_cast<void>(decodeRecord<R>(body, limits));
 }
 
+void readError(Bytes body, const ReadLimits& limits) {
+  try {
+    throwError(body, limits);
+  } catch (const Breach&) {
+  } catch (const DecodingError&) {
+  }
+}
+
 std::vector<Hungry> hungryBodies() {
   PulseUserPayload payloads{};
   payloads.ostrelMessageList.resize(500);
@@ -212,16 +220,13 @@ std::vector<Hungry> hungryBodies() {
   for (PulseUserPayload& payload : mixed.ostrelMessageList) payload.ostrelMessageList.resize(20);
   VespCommandResponse text{};
   text.applicationId = String(100'000, 'a');
+  const DecodingError path(DecodingError::Kind::typeMismatch, {}, Array<CodingKey>(512), "");
   const Breach breach(String(100'000, 'b'), "type", String(100, 'c'));
   return {{"payloads", encodeRecord(payloads), readRecordOf<PulseUserPayload>},
           {"payloads in payloads", encodeRecord(mixed), readRecordOf<PulseUserPayload>},
           {"a text", encodeRecord(text), readRecordOf<VespCommandResponse>},
-          {"a breach", encodeError(breach), [](Bytes body, const ReadLimits& limits) {
-             try {
-               throwError(body, limits);
-             } catch (const Breach&) {
-             }
-           }}};
+          {"a breach", encodeError(breach), readError},
+          {"a path", encodeError(path), readError}};
 }
 
 #ifndef KEELGATE_UNSEALED
@@ -256,7 +261,7 @@ TEST(Reply, C12ReadingNeverTakesMoreThanItsMemory) {
         EXPECT_NE(part, 1U) << hungry.name;
       }
       // An error that is thrown makes a sentence as well, which repeats its texts.
-      const std::size_t sentence = hungry.name == std::string_view("a breach") ? 3 * memory : 0;
+      const std::size_t sentence = hungry.read == readError ? 3 * memory : 0;
       EXPECT_LE(peakBytes - before, memory / part + sentence + 1024) << hungry.name << ' ' << part;
     }
   }
@@ -293,6 +298,18 @@ TEST(Reply, C8NestingEndsBeforeTheStackOfTheClientDoes) {
   };
   EXPECT_NO_THROW(decodeRecord<PulseUserPayload>(body(maximumNesting)));
   EXPECT_THROW(decodeRecord<PulseUserPayload>(body(maximumNesting + 2)), MalformedReply);
+  // An entry is part of its dictionary.
+  PropertyList list{};
+  for (int containers = 1; containers <= maximumNesting; ++containers) {
+    Array<PropertyListEntry> entries;
+    entries.push_back({.key = "k", .value = std::move(list.value)});
+    list.value.emplace<Array<PropertyListEntry>>(std::move(entries));
+  }
+  EXPECT_NO_THROW(decodeRecord<PropertyList>(encodeRecord(list)));
+  Array<PropertyListValue> outermost;
+  outermost.push_back(std::move(list.value));
+  list.value.emplace<Array<PropertyListValue>>(std::move(outermost));
+  EXPECT_THROW(decodeRecord<PropertyList>(encodeRecord(list)), MalformedReply);
 }
 
 }  // namespace
