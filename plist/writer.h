@@ -20,8 +20,8 @@ namespace PropertyList {
 std::vector<std::byte> writeBinary(const Tree& tree);
 
 /// XML, indented by tabs, without document type. Refuses also what XML property lists do not have:
-/// null, UIDs, sets, characters that XML forbids, and dates that are no whole second of the years
-/// 1 to 9999.
+/// null, UIDs, sets, characters that XML forbids, and dates that are not a whole second of the
+/// years 1 to 9999.
 std::string writeXml(const Tree& tree);
 
 }  // namespace PropertyList

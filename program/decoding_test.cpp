@@ -27,7 +27,7 @@ TEST(Decoding, ReadsFieldsByTheirKeysAndStopsAtTheFirstFailureInDeclarationOrder
       {"unknown keys are ignored", sample, with({{"x", Dictionary{{"client", 1}}}}, sampleMessage),
        least},
       {"another order", sample, Dictionary{{"client", "a"}, {"command", 7}}, least},
-      {"the field's name is no key", sample, Dictionary{{"command", 7}, {"clientName", "a"}},
+      {"the field's name is not a key", sample, Dictionary{{"command", 7}, {"clientName", "a"}},
        "keyNotFound client @"},
       {"keys are case-sensitive", sample, Dictionary{{"Command", 7}, {"client", "a"}},
        "keyNotFound command @"},

@@ -31,6 +31,15 @@ constexpr Table tableFor(unsigned shift) {
 
 constexpr std::array<Table, 4> tables = {tableFor(18), tableFor(12), tableFor(6), tableFor(0)};
 
+/// What 12 bits become, for each of their values.
+constexpr auto pairs = [] {
+  std::array<std::array<char, 2>, 4096> all{};
+  for (std::size_t bits = 0; bits < all.size(); ++bits) {
+    all[bits] = {alphabet[bits >> 6], alphabet[bits & 63]};
+  }
+  return all;
+}();
+
 constexpr std::uint32_t lookUp(std::size_t place, char c) noexcept {
   return tables[place].data()[static_cast<unsigned char>(c)];
 }
@@ -73,22 +82,28 @@ struct Group {
 
 }  // namespace
 
-std::string encodeBase64(std::span<const std::byte> bytes) {
-  std::string text((bytes.size() + 2) / 3 * 4, '=');
-  char* out = text.data();
+void encodeBase64(std::span<const std::byte> bytes, char* out) noexcept {
   // By address: a check of each index takes as long as the rest.
   const std::byte* in = bytes.data();
-  const auto put = [&](std::size_t length) {
-    std::uint32_t group = 0;
-    for (std::size_t i = 0; i < length; ++i) {
-      group |= std::to_integer<std::uint32_t>(in[i]) << (16 - 8 * i);
-    }
-    for (std::size_t i = 0; i <= length; ++i) out[i] = alphabet.data()[group >> (18 - 6 * i) & 63];
-    in += length;
-    out += 4;
+  const auto octet = [&](std::size_t i) {
+    return std::to_integer<std::uint32_t>(in[i]);
   };
-  for (std::size_t groups = bytes.size() / 3; groups > 0; --groups) put(3);
-  if (bytes.size() % 3 > 0) put(bytes.size() % 3);
+  for (std::size_t groups = bytes.size() / 3; groups > 0; --groups, in += 3, out += 4) {
+    const std::uint32_t group = octet(0) << 16 | octet(1) << 8 | octet(2);
+    std::memcpy(out, pairs.data() + (group >> 12), 2);
+    std::memcpy(out + 2, pairs.data() + (group & 0xfff), 2);
+  }
+  const std::size_t rest = bytes.size() % 3;
+  if (rest == 0) return;
+  const std::uint32_t group = octet(0) << 16 | (rest == 2 ? octet(1) << 8 : 0);
+  std::memcpy(out, pairs.data() + (group >> 12), 2);
+  out[2] = rest == 2 ? alphabet[group >> 6 & 63] : '=';
+  out[3] = '=';
+}
+
+std::string encodeBase64(std::span<const std::byte> bytes) {
+  std::string text(base64Length(bytes.size()), '\0');
+  encodeBase64(bytes, text.data());
   return text;
 }
 

@@ -16,6 +16,13 @@ namespace Keelgate::Text {
 /// value of the bits before the padding that belong to no byte.
 enum class Base64 { strict, spaced };
 
+/// In bytes, of the text for so many bytes.
+constexpr std::size_t base64Length(std::size_t size) noexcept {
+  return (size + 2) / 3 * 4;
+}
+
+/// To where `out` has room for all of the text.
+void encodeBase64(std::span<const std::byte> bytes, char* out) noexcept;
 /// Throws std::bad_alloc.
 std::string encodeBase64(std::span<const std::byte> bytes);
 

@@ -30,7 +30,7 @@ const char* reasonText(HostError::Reason reason) {
     case HostError::Reason::resourcesExhausted:
       return "the message needs more memory than its size justifies";
     case HostError::Reason::protocolViolation:
-      return "the service sent something that is no answer";
+      return "the service sent something that is not an answer";
     case HostError::Reason::startFailed:
       return "the service could not be started";
   }

@@ -23,6 +23,9 @@ namespace {
 /// piece is much longer. Budgets are looked at for every piece.
 constexpr std::size_t pieceSize = std::size_t{64} << 10;
 
+/// Most replies fit.
+constexpr std::size_t usualSize = 4096;
+
 /// A whole number of groups of three bytes, so that the parts of a value join without padding.
 constexpr std::size_t base64Part = pieceSize / 4 * 3;
 
@@ -76,6 +79,14 @@ void Writer::key(std::string_view name) {
   afterKey_ = true;
 }
 
+void Writer::label(std::string_view name) {
+  separate();
+  piece_ += '"';
+  piece_ += name;
+  piece_ += layout_ == Layout::pretty ? "\": " : "\":";
+  afterKey_ = true;
+}
+
 void Writer::string(std::string_view text) {
   separate();
   quoted(text);
@@ -112,7 +123,10 @@ void Writer::data(Bytes bytes) {
   put("\"");
   while (!bytes.empty()) {
     const Bytes part = bytes.first(std::min(base64Part, bytes.size()));
-    put(Text::encodeBase64(part));
+    const std::size_t begin = piece_.size();
+    piece_.resize(begin + Text::base64Length(part.size()));
+    Text::encodeBase64(part, piece_.data() + begin);
+    if (piece_.size() >= pieceSize) next();
     bytes = bytes.subspan(part.size());
   }
   put("\"");
@@ -131,6 +145,7 @@ Pieces Writer::take() && {
 
 void Writer::begin(char bracket) {
   separate();
+  if (depth_ == 0) piece_.reserve(usualSize);
   put({&bracket, 1});
   ++depth_;
   empty_ = true;

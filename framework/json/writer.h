@@ -56,6 +56,8 @@ class Writer {
   void endArray() { end(']'); }
   /// The key of the object's next value.
   void key(std::string_view name);
+  /// The same for one that is known to have nothing to escape in it.
+  void label(std::string_view name);
 
   /// Control characters are escaped up to U+009F and not only up to U+001F: a message must not be
   /// able to drive the terminal that its record is printed on. So are U+2028 and U+2029: many
@@ -102,8 +104,8 @@ class Writer {
 /// `text` as a JSON string.
 String quote(std::string_view text);
 
-/// `text` with the characters escaped that a terminal would obey, or a reader of lines, as in a JSON
-/// string. Quotes and backslashes stay: what was JSON is that still, and says the same.
+/// `text` with the characters escaped that a terminal would obey, or a reader of lines, as in a
+/// JSON string. Quotes and backslashes stay: what was JSON is that still, and says the same.
 String withoutControls(std::string_view text);
 
 }  // namespace Keelgate::JSON

@@ -144,7 +144,7 @@ void read(Reader& from, T& value, int depth) {
   } else if constexpr (std::integral<T>) {
     value = static_cast<T>(from.word());
   } else if constexpr (Enumeration<T>) {
-    // A number that is no case would run past the end of the first switch that meets it.
+    // A number that is not a case would run past the end of the first switch that meets it.
     const Optional<T> known = fromRawValue<T>(from.word());
     if (!known) throw MalformedReply();
     value = *known;

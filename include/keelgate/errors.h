@@ -48,7 +48,7 @@ class KEELGATE_API DecodingError : public Error {
       (typeMismatch, 1),
       /// A null stands where a value is required; `codingPath` leads to it.
       (valueNotFound, 2),
-      /// The bytes are no well-formed property list (`codingPath` is empty), or a value of the right
+      /// The bytes are not a well-formed property list (`codingPath` is empty), or a value of the right
       /// type is none that its field accepts (`codingPath` leads to it).
       (dataCorrupted, 3));
 
@@ -94,7 +94,7 @@ class KEELGATE_API HostError : public Error {
       (messageTooLarge, 2),
       /// Decoding needed more memory than the message's size justifies.
       (resourcesExhausted, 3),
-      /// The service answered with something that is no answer.
+      /// The service answered with something that is not an answer.
       (protocolViolation, 4),
       /// The service could not be started, or cannot be sealed on this system.
       (startFailed, 5));

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The delivery service's answer to a command. Deliberate: its message number is no string.
+/// The delivery service's answer to a command. Deliberate: its message number is not a string.
 #pragma once
 
 #include "program/schema/values.h"

@@ -73,7 +73,7 @@ DecodingError numberDoesNotFit(const CodingPath& path, std::string_view expected
 }
 
 DecodingError invalidRawValue(const CodingPath& path, std::string_view enumeration) {
-  return corrupted(path, "The number is no raw value of " + String(enumeration) + ".");
+  return corrupted(path, "The number is not a raw value of " + String(enumeration) + ".");
 }
 
 DecodingError invalidUUID(const CodingPath& path) {

@@ -33,13 +33,13 @@ DecodingError valueNotFound(const CodingPath& path, std::string_view expected);
 /// The number at `path` does not fit its field.
 DecodingError numberDoesNotFit(const CodingPath& path, std::string_view expected);
 
-/// The number at `path` is no raw value of the enumeration.
+/// The number at `path` is not a raw value of the enumeration.
 DecodingError invalidRawValue(const CodingPath& path, std::string_view enumeration);
 
 /// The string at `path` is no UUID.
 DecodingError invalidUUID(const CodingPath& path);
 
-/// The message is no property list, or expands out of proportion.
+/// The message is not a property list, or expands out of proportion.
 DecodingError malformed(const PropertyList::MalformedDocument& error, Keelgate::Bytes message);
 
 }  // namespace VespKeelgateService::Errors

@@ -11,7 +11,7 @@ using namespace Keelgate;
 
 namespace {
 
-/// Deliberate: the one place where an unknown code is no error. It becomes its enumeration's
+/// Deliberate: the one place where an unknown code is not an error. It becomes its enumeration's
 /// default.
 WaymarkMessage convertMessage(WaymarkSchema&& schema, Array<WaymarkGroupFields>&& groups) {
   return construct<WaymarkMessage>({

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 /// A safety check-in: one flat dictionary that addresses up to 32 groups of recipients. Every key
-/// is spelt like its field. Codes are plain numbers here, so that an unknown one is no error.
+/// is spelt like its field. Codes are plain numbers here, so that an unknown one is not an error.
 #pragma once
 
 #include "program/schema/values.h"

@@ -59,7 +59,7 @@ for path, name in included("program"):
     if re.search(r"schemas?\.h$|protocol_payload\.h$", path.name):
         check(re.fullmatch("[a-z_]+", name) or name.startswith("keelgate/")
               or re.search(r"schemas?\.h$|schema/values\.h$", name),
-              f"{path.relative_to(root)} is no data alone: it includes {name}")
+              f"{path.relative_to(root)} is not data alone: it includes {name}")
 
 # No process that holds privileges has a parser of the network's formats in it.
 for program in ("bin/keelgate", "lib/libkeelgate.so"):

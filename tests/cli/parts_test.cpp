@@ -23,7 +23,7 @@
 namespace Keelgate::CLI {
 namespace {
 
-/// "ok", or why the line is no request.
+/// "ok", or why the line is not a request.
 String problemOf(const RequestLine& line) {
   const auto* problem = std::get_if<String>(&line.content);
   return problem == nullptr ? "ok" : *problem;

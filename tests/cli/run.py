@@ -35,7 +35,7 @@ def check(sound, what):
 
 def heard(said):
     """What the command said, but for the line of a service that lacks a wall on this machine (in a
-    chroot, say), which is no matter of these tests."""
+    chroot, say), which these tests are not about."""
     return b"".join(line for line in said.splitlines(keepends=True)
                     if not line.startswith(b"keelgate: Running without: "))
 

@@ -134,7 +134,7 @@ TEST_P(Hostile, EveryAttackHasItsOutcomeInTimeAndCostsItsLayout) {
   }
 }
 
-/// It had answered: its message is not lost, but what it does next is no accident.
+/// It had answered: its message is not lost, but what it does next is not an accident.
 TEST_P(Hostile, AnEndBehindTheAnswerCostsTheLayoutToo) {
   Client client(options(fakeOptions()));
   for (const int signal : {SIGSEGV, SIGKILL}) {
