@@ -2,6 +2,7 @@
 /// The only file that includes the parser of the command line, which is heavy.
 #include "cli/command_line.h"
 
+#include "cli/commands.h"
 #include "cli/files.h"
 #include "cli/nearest.h"
 #include "cli/request_line.h"
@@ -14,6 +15,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <array>
 #include <cmath>
 #include <cstdlib>
 #include <limits>
@@ -25,7 +27,13 @@ namespace {
 
 /// What the options say, before they are put together.
 struct Arguments {
-  CommandLine line;
+  Client::Options host;
+  UnpackOptions unpack;
+  String metrics;
+  LogLevel logLevel = LogLevel::warning;
+  Bool quiet = false;
+  Bool version = false;
+  Bool verbose = false;
   String record;
   String service;
   UInt64 command = 0;
@@ -90,13 +98,6 @@ void addSeconds(::CLI::App& app, const std::string& name, std::chrono::milliseco
   app.add_option_function<std::string>(name, read, help)->type_name("SECONDS");
 }
 
-Optional<LogLevel> logLevelNamed(std::string_view name) {
-  if (name == "none") return LogLevel::none;
-  if (name == "error") return LogLevel::error;
-  if (name == "warning") return LogLevel::warning;
-  return std::nullopt;
-}
-
 void addServiceOptions(::CLI::App& app, Client::Options& options) {
   auto* path = app.add_option("--service-path", options.servicePath, "The service to start")
                    ->type_name("FILE");
@@ -105,7 +106,7 @@ void addServiceOptions(::CLI::App& app, Client::Options& options) {
       ->excludes(path);
 }
 
-void addHostOptions(::CLI::App& app, CommandLine& line) {
+void addHostOptions(::CLI::App& app, Arguments& line) {
   // The client would cut them to these; here somebody typed them, and is told.
   using Options = Client::Options;
   const Options defaults;
@@ -126,9 +127,10 @@ void addHostOptions(::CLI::App& app, CommandLine& line) {
                "Refuse to run without namespaces, Landlock");
   app.add_flag("--quiet", line.quiet, "Say nothing but errors");
   const auto readLevel = [&line](const std::string& name) {
-    const Optional<LogLevel> level = logLevelNamed(name);
-    if (!level) refuse("--log-level", name, "none, error or warning");
-    line.logLevel = *level;
+    constexpr std::array names = {"none", "error", "warning"};
+    const auto level = std::ranges::find(names, name);
+    if (level == names.end()) refuse("--log-level", name, "none, error or warning");
+    line.logLevel = static_cast<LogLevel>(level - names.begin() + 1);
   };
   app.add_option_function<std::string>("--log-level", readLevel,
                                        "What is logged: none, error or warning (default)")
@@ -155,7 +157,7 @@ void addSubjectOptions(::CLI::App& app, Arguments& arguments) {
   service->needs(command)->check([](const std::string& id) {
     return Text::isUtf8(id) ? std::string() : "the identifier is not UTF-8";
   });
-  app.add_option("FILE", arguments.line.unpack.files, "A message each; -, or none: standard input")
+  app.add_option("FILE", arguments.unpack.files, "A message each; -, or none: standard input")
       ->type_name("");
   app.add_option("--files0-from", arguments.filesFrom,
                  "Read the FILE names from FILE, a null character behind each")
@@ -169,9 +171,9 @@ void addUnpack(::CLI::App& app, Arguments& arguments) {
   auto* pretty = unpack.add_flag("--pretty", arguments.pretty, "Indent, as on a terminal");
   unpack.add_flag("--compact", arguments.compact, "One line for each, as in a pipe")
       ->excludes(pretty);
-  unpack.add_flag("--typed", arguments.line.unpack.typed,
+  unpack.add_flag("--typed", arguments.unpack.typed,
                   "With each value of a PropertyList its type, so that nothing is lost");
-  addHostOptions(unpack, arguments.line);
+  addHostOptions(unpack, arguments);
   unpack.footer(fmt::format(
       "TYPE is one of\n  {}\n"
       "\n"
@@ -187,7 +189,7 @@ void addUnpack(::CLI::App& app, Arguments& arguments) {
 void addCheck(::CLI::App& app, Arguments& arguments) {
   auto& check = *app.add_subcommand("check", "Say which messages would be rejected, and why");
   addSubjectOptions(check, arguments);
-  addHostOptions(check, arguments.line);
+  addHostOptions(check, arguments);
   check.footer(
       "Without --record or --service a message is any PropertyList.\n"
       "\n"
@@ -199,8 +201,8 @@ void addCheck(::CLI::App& app, Arguments& arguments) {
 
 void addStream(::CLI::App& app, Arguments& arguments) {
   auto& stream = *app.add_subcommand("stream", "Answer requests, one JSON object on each line");
-  addHostOptions(stream, arguments.line);
-  stream.add_option("--metrics", arguments.line.metrics, "Keep counters there, for Prometheus")
+  addHostOptions(stream, arguments);
+  stream.add_option("--metrics", arguments.metrics, "Keep counters there, for Prometheus")
       ->type_name("FILE");
   stream.footer(
       "A request:\n"
@@ -229,13 +231,13 @@ void addDescribe(::CLI::App& app, Arguments& arguments) {
       "  keelgate describe --json | jq '.services[].service'");
 }
 
-void build(::CLI::App& app, Arguments& arguments, Bool& version) {
+void build(::CLI::App& app, Arguments& arguments) {
   // None is right with --version alone, which is for checkUsage to see.
   app.require_subcommand(0, 1);
-  app.add_flag("--version", version, "Show the version");
-  app.add_flag("--verbose", arguments.line.verbose, "The service's version and sandbox layers too")
+  app.add_flag("--version", arguments.version, "Show the version");
+  app.add_flag("--verbose", arguments.verbose, "The service's version and sandbox layers too")
       ->needs("--version");
-  addServiceOptions(app, arguments.line.host);
+  addServiceOptions(app, arguments.host);
   addUnpack(app, arguments);
   addCheck(app, arguments);
   addStream(app, arguments);
@@ -273,9 +275,9 @@ JSON::Layout layoutOf(const Arguments& arguments) {
 }
 
 /// What the parser cannot be told of `unpack` and `check`.
-void complete(const ::CLI::App& app, Arguments& arguments) {
+UnpackOptions unpackOptions(const ::CLI::App& app, const Arguments& arguments) {
   const Bool checks = app.get_name() == "check";
-  UnpackOptions& what = arguments.line.unpack;
+  UnpackOptions what = arguments.unpack;
   what.layout = checks ? JSON::Layout::discarded : layoutOf(arguments);
   if (app.count("--service") > 0) {
     what.subject =
@@ -297,29 +299,42 @@ void complete(const ::CLI::App& app, Arguments& arguments) {
     what.files.emplace_back("-");
   }
   if (std::ranges::count(what.files, "-") > 1) refuse("standard input can be read only once");
+  return what;
 }
 
 /// Puts together what was parsed.
-void complete(const ::CLI::App& app, Bool version, Arguments& arguments) {
-  CommandLine& line = arguments.line;
+std::function<void(Console&)> complete(const ::CLI::App& app, const Arguments& arguments,
+                                       std::string_view version) {
+  const Client::Options& host = arguments.host;
   if (app.get_subcommands().empty()) {
-    if (!version) throw ::CLI::RequiredError("A subcommand");
-    line.action = Action::version;
-    return;
+    if (!arguments.version) throw ::CLI::RequiredError("A subcommand");
+    if (arguments.verbose)
+      return [=](Console& console) {
+        reportVersions(version, host, console);
+      };
+    return [=](Console& console) {
+      console.print(fmt::format("keelgate {}\n", version));
+    };
   }
   const ::CLI::App& chosen = *app.get_subcommands().front();
   if (chosen.get_name() == "stream") {
-    line.action = Action::stream;
-  } else if (chosen.get_name() == "describe") {
-    line.action = Action::describe;
-    // Asked for by count: an empty name is a name too, and nothing has it.
-    if (chosen.count("NAME") > 0) line.name = arguments.name;
-    if (arguments.json) line.form = DescribeForm::json;
-    if (arguments.jsonSchema) line.form = DescribeForm::jsonSchema;
-  } else {
-    complete(chosen, arguments);
-    line.action = Action::unpack;
+    return [=, metrics = arguments.metrics](Console& console) {
+      stream(host, metrics, console);
+    };
   }
+  if (chosen.get_name() == "describe") {
+    // Asked for by count: an empty name is a name too, and nothing has it.
+    const auto name = chosen.count("NAME") > 0 ? Optional<String>(arguments.name) : std::nullopt;
+    const DescribeForm form = arguments.json         ? DescribeForm::json
+                              : arguments.jsonSchema ? DescribeForm::jsonSchema
+                                                     : DescribeForm::page;
+    return [=](Console& console) {
+      describe(name, form, console);
+    };
+  }
+  return [=, what = unpackOptions(chosen, arguments)](Console& console) {
+    unpack(host, what, console);
+  };
 }
 
 /// As the parser wants them. It loses the empty value of `--service=`, which is legal here and the
@@ -334,23 +349,6 @@ Array<String> reversed(Array<String> words) {
   }
   std::ranges::reverse(words);
   return words;
-}
-
-/// The parser's help, whose lines are as long as they are.
-String fitted(std::string_view help, std::size_t width) {
-  String all;
-  while (!help.empty()) {
-    const std::string_view line = help.substr(0, help.find('\n'));
-    help.remove_prefix(std::min(line.size() + 1, help.size()));
-    if (line.size() <= width) {
-      (all += line) += '\n';
-      continue;
-    }
-    for (const String& part : paragraph({String(line)}, line.find_first_not_of(' '), width)) {
-      all += part + '\n';
-    }
-  }
-  return all;
 }
 
 /// What somebody may have meant with the first word that nobody took.
@@ -375,14 +373,15 @@ String hintFor(const ::CLI::App& app) {
 
 }  // namespace
 
-CommandLine readCommandLine(Array<String> words, Console& console) {
+CommandLine readCommandLine(Array<String> words, std::string_view version, Console& console) {
   ::CLI::App app("Unpacks untrusted messages in a sandbox and prints their records.", "keelgate");
   Arguments arguments;
-  Bool version = false;
-  build(app, arguments, version);
+  CommandLine line;
+  build(app, arguments);
   try {
     app.parse(reversed(std::move(words)));
-    complete(app, version, arguments);
+    line.run = complete(app, arguments, version);
+    line.logLevel = arguments.quiet ? LogLevel::quiet : arguments.logLevel;
   } catch (const ::CLI::Success&) {
     const auto chosen = app.get_subcommands();
     console.print(
@@ -392,7 +391,7 @@ CommandLine readCommandLine(Array<String> words, Console& console) {
     console.complain(hintFor(app));
     console.note(Status::unusable);
   }
-  return arguments.line;
+  return line;
 }
 
 }  // namespace Keelgate::CLI

@@ -2,40 +2,22 @@
 /// What the command line asks for.
 #pragma once
 
-#include "cli/commands.h"
 #include "cli/console.h"
 
-#include <keelgate/client.h>
 #include <keelgate/values.h>
+
+#include <functional>
 
 namespace Keelgate::CLI {
 
-enum class Action : std::uint8_t {
-  /// Help was printed, or the usage was wrong, which is said and noted.
-  none,
-  unpack,
-  stream,
-  describe,
-  version,
-};
-
-/// Of whichever action was chosen; the others leave it alone.
 struct CommandLine {
-  Action action = Action::none;
-  Client::Options host;
-  UnpackOptions unpack;
-  /// Of `stream`.
-  String metrics;
-  /// Of `describe`.
-  Optional<String> name;
-  DescribeForm form = DescribeForm::page;
-  /// Of `--version`.
-  Bool verbose = false;
+  /// Does what was asked for. Empty: help was printed, or the usage was wrong, which is said and
+  /// noted.
+  std::function<void(Console&)> run;
   LogLevel logLevel = LogLevel::warning;
-  Bool quiet = false;
 };
 
 /// `words` are without the command's own name. Throws nothing but std::bad_alloc.
-CommandLine readCommandLine(Array<String> words, Console& console);
+CommandLine readCommandLine(Array<String> words, std::string_view version, Console& console);
 
 }  // namespace Keelgate::CLI

@@ -1,9 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "cli/command_line.h"
-#include "cli/commands.h"
 #include "cli/console.h"
-
-#include <fmt/format.h>
 
 #include <sys/prctl.h>
 #include <sys/resource.h>
@@ -14,8 +11,6 @@ namespace Keelgate::CLI {
 
 namespace {
 
-constexpr std::string_view version = KEELGATE_VERSION;
-
 /// The messages of many senders are in this process at a time: neither a core file nor a debugger
 /// of the same user may have them.
 void forbidDumps() {
@@ -25,29 +20,12 @@ void forbidDumps() {
   prctl(PR_SET_DUMPABLE, 0);
 }
 
-void run(const CommandLine& line, Console& console) {
-  switch (line.action) {
-    case Action::none:
-      return;
-    case Action::unpack:
-      return unpack(line.host, line.unpack, console);
-    case Action::stream:
-      return stream(line.host, line.metrics, console);
-    case Action::describe:
-      return describe(line.name, line.form, console);
-    case Action::version:
-      break;
-  }
-  if (line.verbose) return reportVersions(version, line.host, console);
-  console.print(fmt::format("keelgate {}\n", version));
-}
-
 Status keelgate(Array<String> words) {
   Console console;
   try {
-    const CommandLine line = readCommandLine(std::move(words), console);
-    console.setLogLevel(line.quiet ? LogLevel::quiet : line.logLevel);
-    run(line, console);
+    const CommandLine line = readCommandLine(std::move(words), KEELGATE_VERSION, console);
+    console.setLogLevel(line.logLevel);
+    if (line.run) line.run(console);
     console.flush();
   } catch (const std::exception& error) {
     console.complain(error.what());

@@ -61,6 +61,22 @@ Array<String> paragraph(const Array<String>& cells, std::size_t indent, std::siz
   return lines;
 }
 
+String fitted(std::string_view text, std::size_t width) {
+  String all;
+  while (!text.empty()) {
+    const std::string_view line = text.substr(0, text.find('\n'));
+    text.remove_prefix(std::min(line.size() + 1, text.size()));
+    if (line.size() <= width) {
+      (all += line) += '\n';
+      continue;
+    }
+    for (const String& part : paragraph({String(line)}, line.find_first_not_of(' '), width)) {
+      all += part + '\n';
+    }
+  }
+  return all;
+}
+
 String emphasised(const String& text, Bool emphasise) {
   return emphasise ? "\033[1m" + text + "\033[0m" : text;
 }

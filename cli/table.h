@@ -23,6 +23,9 @@ namespace Keelgate::CLI {
 /// others by four columns more.
 Array<String> paragraph(const Array<String>& cells, std::size_t indent, std::size_t width);
 
+/// `text` with the lines broken that are too wide, each as a paragraph of its own indent.
+String fitted(std::string_view text, std::size_t width);
+
 /// `text` as it stands out on a terminal, if it shall.
 String emphasised(const String& text, Bool emphasise);
 
