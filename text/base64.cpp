@@ -85,18 +85,29 @@ struct Group {
 void encodeBase64(std::span<const std::byte> bytes, char* out) noexcept {
   // By address: a check of each index takes as long as the rest.
   const std::byte* in = bytes.data();
+  const std::byte* const end = in + bytes.size();
   const auto octet = [&](std::size_t i) {
     return std::to_integer<std::uint32_t>(in[i]);
   };
-  for (std::size_t groups = bytes.size() / 3; groups > 0; --groups, in += 3, out += 4) {
+  const auto putPair = [](std::uint64_t bits, char* to) {
+    std::memcpy(to, pairs.data() + (bits & 0xfff), 2);
+  };
+  // Six bytes of eight that are read at once.
+  for (; end - in >= 8; in += 6, out += 8) {
+    std::uint64_t word;
+    std::memcpy(&word, in, sizeof word);
+    if constexpr (std::endian::native == std::endian::little) word = __builtin_bswap64(word);
+    for (unsigned pair = 0; pair < 4; ++pair) putPair(word >> (52 - 12 * pair), out + 2 * pair);
+  }
+  for (; end - in >= 3; in += 3, out += 4) {
     const std::uint32_t group = octet(0) << 16 | octet(1) << 8 | octet(2);
-    std::memcpy(out, pairs.data() + (group >> 12), 2);
-    std::memcpy(out + 2, pairs.data() + (group & 0xfff), 2);
+    putPair(group >> 12, out);
+    putPair(group, out + 2);
   }
   const std::size_t rest = bytes.size() % 3;
   if (rest == 0) return;
   const std::uint32_t group = octet(0) << 16 | (rest == 2 ? octet(1) << 8 : 0);
-  std::memcpy(out, pairs.data() + (group >> 12), 2);
+  putPair(group >> 12, out);
   out[2] = rest == 2 ? alphabet[group >> 6 & 63] : '=';
   out[3] = '=';
 }
