@@ -138,17 +138,19 @@ Message messageOf(const S& schema) {
   return made;
 }
 
-/// So many messages, each of other fields and values, after `change(schema)`.
+/// Makes so many messages, each of other fields and values, after `change(schema, seed)`.
 template <class S, class Protobuf, class Change>
-std::vector<Message> manyOf(unsigned count, unsigned share, Change change) {
-  std::vector<Message> all;
-  for (unsigned seed = 0; seed < count; ++seed) {
-    S schema{};
-    Filler<S>(seed, share).fill(schema);
-    change(schema, seed);
-    all.push_back(messageOf<S, Protobuf>(schema));
-  }
-  return all;
+auto manyOf(unsigned count, unsigned share, Change change) {
+  return [=] {
+    std::vector<Message> all;
+    for (unsigned seed = 0; seed < count; ++seed) {
+      S schema{};
+      Filler<S>(seed, share).fill(schema);
+      change(schema, seed);
+      all.push_back(messageOf<S, Protobuf>(schema));
+    }
+    return all;
+  };
 }
 
 }  // namespace VespKeelgateService::Bench

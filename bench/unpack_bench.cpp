@@ -15,6 +15,8 @@
 
 #include <benchmark/benchmark.h>
 
+#include <functional>
+#include <memory>
 #include <pugixml.hpp>
 
 namespace VespKeelgateService::Bench {
@@ -24,14 +26,33 @@ namespace {
 using Keelgate::Transport::decodeRecord;
 using Keelgate::Transport::encodeRecord;
 
+/// Inputs of one kind, made when the first benchmark that runs asks for them.
+template <class Input>
+class Inputs {
+ public:
+  explicit Inputs(std::function<std::vector<Input>()> make) : make_(std::move(make)) {}
+  const std::vector<Input>& all() {
+    if (inputs_.empty()) inputs_ = make_();
+    return inputs_;
+  }
+
+ private:
+  std::function<std::vector<Input>()> make_;
+  std::vector<Input> inputs_;
+};
+
+template <class Input>
+using SharedInputs = std::shared_ptr<Inputs<Input>>;
+
 /// One message after the other; the time is that of one message.
 template <class Input, class Work>
-void measure(const std::string& name, const std::vector<Input>& inputs, Work work) {
+void measure(const std::string& name, const SharedInputs<Input>& inputs, Work work) {
   benchmark::RegisterBenchmark(name.c_str(), [inputs, work](benchmark::State& state) {
+    const std::vector<Input>& all = inputs->all();
     std::size_t next = 0;
     for (auto _ : state) {
-      work(inputs[next]);
-      if (++next == inputs.size()) next = 0;
+      work(all[next]);
+      if (++next == all.size()) next = 0;
     }
   })->Unit(benchmark::kNanosecond);
 }
@@ -47,7 +68,8 @@ Bytes bytesOf(std::string_view text) {
 
 /// The columns of the table for one kind of message. `unpack(bytes)` gives its record.
 template <class S, class Protobuf, class Unpack>
-void add(const std::string& name, const std::vector<Message>& messages, Unpack unpack) {
+void add(const std::string& name, std::function<std::vector<Message>()> make, Unpack unpack) {
+  const auto messages = std::make_shared<Inputs<Message>>(std::move(make));
   using benchmark::DoNotOptimize;
   measure(name + "/copy", messages, [](const Message& message) {
     for (const auto& text : message.texts) DoNotOptimize(std::vector<std::byte>(text).data());
@@ -77,8 +99,13 @@ void add(const std::string& name, const std::vector<Message>& messages, Unpack u
     beginMessage();
     DoNotOptimize(encodeRecord(unpack(message.binary)).data());
   });
-  std::vector<Data> replies;
-  for (const Message& message : messages) replies.push_back(encodeRecord(unpack(message.binary)));
+  const auto replies = std::make_shared<Inputs<Data>>([messages, unpack] {
+    std::vector<Data> all;
+    for (const Message& message : messages->all()) {
+      all.push_back(encodeRecord(unpack(message.binary)));
+    }
+    return all;
+  });
   measure(name + "/client", replies, [](const Data& reply) {
     using Record = decltype(unpack(Bytes()));
     DoNotOptimize(decodeRecord<Record>(reply));
@@ -140,13 +167,15 @@ void addNested() {
 /// Keys that no field takes; the time divided by their number is what each of them costs.
 void addUnknownKeys() {
   for (const std::size_t count : {1'000, 10'000, 100'000, 1'000'000}) {
-    PropertyList::Dictionary entries{{"c", 1}};
-    for (std::size_t i = 0; i < count; ++i) entries.emplace_back("unknown-" + std::to_string(i), 7);
-    measure("unknown-" + std::to_string(count) + "/record",
-            std::vector<Data>{PropertyList::writeBinary(entries)}, [](const Data& message) {
-              beginMessage();
-              benchmark::DoNotOptimize(VespOstrelPayloadUnpacker().unpack(message));
-            });
+    const auto message = std::make_shared<Inputs<Data>>([count] {
+      PropertyList::Dictionary keys{{"c", 1}};
+      for (std::size_t i = 0; i < count; ++i) keys.emplace_back("unknown-" + std::to_string(i), 7);
+      return std::vector<Data>{PropertyList::writeBinary(keys)};
+    });
+    measure("unknown-" + std::to_string(count) + "/record", message, [](const Data& bytes) {
+      beginMessage();
+      benchmark::DoNotOptimize(VespOstrelPayloadUnpacker().unpack(bytes));
+    });
   }
 }
 

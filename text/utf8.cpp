@@ -51,6 +51,8 @@ Character firstCharacter(std::string_view text) noexcept {
 }
 
 bool isUtf8(std::string_view text) noexcept {
+  // As most texts are, by words and not by characters.
+  if (text.size() < 64 && isAscii(text)) return true;
   while (!text.empty()) {
     const std::size_t ascii = asciiBlocks(text);
     text.remove_prefix(ascii);
@@ -67,12 +69,18 @@ bool isUtf8(std::string_view text) noexcept {
 bool isAscii(std::string_view text) noexcept {
   if (text.size() >= 64) text.remove_prefix(asciiBlocks(text));
   std::uint64_t seen = 0;
-  for (; text.size() >= sizeof seen; text.remove_prefix(sizeof seen)) {
+  const auto look = [&](std::size_t at) {
     std::uint64_t word;
-    std::memcpy(&word, text.data(), sizeof word);
+    std::memcpy(&word, text.data() + at, sizeof word);
     seen |= word;
+  };
+  if (text.size() >= sizeof seen) {
+    for (std::size_t at = 0; at + sizeof seen < text.size(); at += sizeof seen) look(at);
+    // The last word overlaps the one before it.
+    look(text.size() - sizeof seen);
+  } else {
+    for (const char c : text) seen |= static_cast<unsigned char>(c);
   }
-  for (const char c : text) seen |= static_cast<unsigned char>(c);
   return (seen & 0x8080'8080'8080'8080) == 0;
 }
 

@@ -3,7 +3,9 @@
 
 #include <malloc.h>
 #include <algorithm>
+#include <cstddef>
 #include <cstdlib>
+#include <functional>
 #include <limits>
 #include <new>
 
@@ -16,6 +18,17 @@ std::size_t atBegin = 0;
 std::size_t most = 0;
 std::size_t limit = std::numeric_limits<std::size_t>::max();
 
+/// Where small blocks come from while a message is at hand: cut off one after the other, and all
+/// free at once when the next message begins. Most blocks are short texts, of which a worker for
+/// one message frees none; that is a third of the time from the bytes to the record. It has one
+/// size and is not counted, so that it makes no difference to what a message may take.
+constexpr std::size_t arenaSize = std::size_t{256} << 10;
+constexpr std::size_t smallBlock = 512;
+std::byte* arena = nullptr;
+std::size_t arenaUsed = arenaSize;
+/// Of the arena's blocks, those that were not released.
+std::size_t arenaBlocks = 0;
+
 /// With what the allocator keeps beside each block.
 std::size_t costOf(void* block) noexcept {
   return malloc_usable_size(block) + sizeof(std::size_t);
@@ -27,6 +40,9 @@ void begin(std::size_t bytes) noexcept {
   // A block of this size has the allocator join the small ones that the last message has left.
   constexpr std::size_t joining = 2048;
   std::free(std::malloc(joining));
+  if (arena == nullptr) arena = static_cast<std::byte*>(std::malloc(arenaSize));
+  // What the last message has left behind, in some static object, keeps its place.
+  if (arenaBlocks == 0) arenaUsed = arena == nullptr ? arenaSize : 0;
   atBegin = most = allocated;
   limit = allocated + bytes;
 }
@@ -36,6 +52,14 @@ std::size_t peak() noexcept {
 }
 
 void* allocate(std::size_t size) {
+  constexpr std::size_t alignment = alignof(std::max_align_t);
+  const std::size_t room = (size + alignment - 1) / alignment * alignment;
+  if (size - 1 < smallBlock && room <= arenaSize - arenaUsed) {
+    std::byte* const block = arena + arenaUsed;
+    arenaUsed += room;
+    ++arenaBlocks;
+    return block;
+  }
   // Compared so that nothing can wrap. What is allocated may be above the limit by a block's own
   // overhead.
   if (allocated > limit || size > limit - allocated) throw std::bad_alloc();
@@ -49,6 +73,11 @@ void* allocate(std::size_t size) {
 
 void release(void* block) noexcept {
   if (block == nullptr) return;
+  const std::less<const void*> isBefore;
+  if (!isBefore(block, arena) && isBefore(block, arena + arenaSize)) {
+    --arenaBlocks;
+    return;
+  }
   allocated -= costOf(block);
   std::free(block);
 }

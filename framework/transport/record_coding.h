@@ -1,9 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
 /// Records as the bytes of a reply, both ways, walked from their one description.
 ///
-/// Written: integers and floating-point numbers as their 8 bytes, a boolean and the presence of an
-/// optional as a byte, text and octets behind their length, an array behind its count, an
-/// enumeration as its raw value, a case-keyed one as the case's position and then its record.
+/// Written: integers and floating-point numbers as their 8 bytes, a boolean as a byte, text and
+/// octets behind their length, an array behind its count, an enumeration as its raw value, a
+/// case-keyed one as the case's position and then its record. A record begins with a bit for each
+/// of its optional fields, in words of 8 bytes, the first field lowest; then come the fields that
+/// are there.
 ///
 /// Pure functions; callable from any thread. Writing throws std::bad_alloc alone.
 #pragma once
@@ -14,6 +16,7 @@
 #include <keelgate/describe.h>
 #include <keelgate/records/property_list.h>
 
+#include <array>
 #include <bit>
 #include <cmath>
 #include <cstddef>
@@ -28,10 +31,34 @@ namespace Keelgate::Transport {
 template <class T>
 void write(Writer& to, const T& value);
 
+/// How many optional fields a record has, and how many words their bits take.
 template <class T>
-void write(Writer& to, const Optional<T>& value) {
-  to.byte(value ? 1 : 0);
-  if (value) write(to, *value);
+constexpr std::size_t optionalFields = [] {
+  std::size_t count = 0;
+  FieldsOf<T>::each([&]<class S, class V>(Field<S, V>) { count += isOptional<V>; });
+  return count;
+}();
+template <class T>
+constexpr std::size_t presenceWords = (optionalFields<T> + 63) / 64;
+
+template <class T>
+void writeRecord(Writer& to, const T& record) {
+  std::array<std::uint64_t, presenceWords<T>> present{};
+  std::array<std::size_t, presenceWords<T>> places;
+  for (std::size_t& place : places) place = to.laterWord();
+  std::size_t n = 0;
+  FieldsOf<T>::each([&]<class S, class V>(Field<S, V> field) {
+    const V& value = record.*field.member;
+    if constexpr (isOptional<V>) {
+      const std::size_t bit = n++;
+      if (!value) return;
+      present[bit / 64] |= std::uint64_t{1} << bit % 64;
+      write(to, *value);
+    } else {
+      write(to, value);
+    }
+  });
+  for (std::size_t i = 0; i < places.size(); ++i) to.setWord(places[i], present[i]);
 }
 
 /// Behind its count, which the reader holds against the bytes that follow.
@@ -64,7 +91,7 @@ void write(Writer& to, const T& value) {
     to.byte(static_cast<std::uint8_t>(value.index()));
     std::visit([&](const auto& payload) { write(to, payload); }, value);
   } else {
-    FieldsOf<T>::each([&](auto field) { write(to, value.*field.member); });
+    writeRecord(to, value);
   }
 }
 
@@ -82,12 +109,14 @@ constexpr int containersOf = Record<T> && !std::same_as<T, PropertyListEntry> ? 
 /// The fewest bytes that a value is written as: a count is held against them before room is made.
 template <class T>
 constexpr std::size_t smallestSize() {
-  if constexpr (std::same_as<T, Bool> || isOptional<T> || CaseKeyed<T>) {
+  if constexpr (isOptional<T>) {
+    return 0;
+  } else if constexpr (std::same_as<T, Bool> || CaseKeyed<T>) {
     return 1;
   } else if constexpr (std::same_as<T, UUID>) {
     return sizeof(T);
   } else if constexpr (Record<T>) {
-    std::size_t sum = 0;
+    std::size_t sum = presenceWords<T> * sizeof(std::uint64_t);
     FieldsOf<T>::each([&]<class S, class Value>(Field<S, Value>) { sum += smallestSize<Value>(); });
     return sum;
   } else {
@@ -97,11 +126,6 @@ constexpr std::size_t smallestSize() {
 
 template <class T>
 void read(Reader& from, T& value, int depth);
-
-template <class T>
-void read(Reader& from, Optional<T>& value, int depth) {
-  if (from.flag()) read(from, value.emplace(), depth);
-}
 
 template <class T>
 requires(isArray<Array<T>>) void read(Reader& from, Array<T>& values, int depth) {
@@ -130,9 +154,24 @@ void readCase(Reader& from, T& value, int depth, std::index_sequence<i...>) {
 template <class T>
 void readRecord(Reader& from, T& value, int depth) {
   static_assert(T::Labels::isComplete(), "a member of the record is not in its list of fields");
-  FieldsOf<T>::each([&](auto field) { read(from, value.*field.member, depth); });
+  std::array<std::uint64_t, presenceWords<T>> present;
+  for (std::uint64_t& word : present) word = from.word();
+  // A bit that no field has is a second spelling of the same record.
+  if constexpr (optionalFields<T> % 64 != 0) {
+    if (present.back() >> optionalFields<T> % 64 != 0) throw MalformedReply();
+  }
+  std::size_t n = 0;
+  FieldsOf<T>::each([&]<class S, class V>(Field<S, V> field) {
+    V& member = value.*field.member;
+    if constexpr (isOptional<V>) {
+      const std::size_t bit = n++;
+      if ((present[bit / 64] >> bit % 64 & 1) != 0) read(from, member.emplace(), depth);
+    } else {
+      read(from, member, depth);
+    }
+  });
   // What the framework refuses in the service is refused here too.
-  admit(typeName<T>());
+  constructInPlace(value);
 }
 
 template <class T>

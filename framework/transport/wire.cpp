@@ -3,6 +3,8 @@
 
 #include "text/utf8.h"
 
+#include <algorithm>
+
 namespace Keelgate::Transport {
 
 namespace {
@@ -14,7 +16,25 @@ constexpr std::size_t smallestBlock = 32;
 
 constexpr unsigned readsPerClock = 1024;
 
+constexpr std::size_t copiedOctets = std::size_t{16} << 10;
+
 }  // namespace
+
+void Writer::octets(Bytes value) {
+  word(value.size());
+  if (value.size() <= copiedOctets) {
+    if (!value.empty()) std::memcpy(room(value.size()), value.data(), value.size());
+    return;
+  }
+  // Appended as it is: room for it would be zeroed first.
+  out_.resize(size_);
+  out_.insert(out_.end(), value.begin(), value.end());
+  size_ = out_.size();
+}
+
+void Writer::grow(std::size_t size) {
+  out_.resize(std::max(2 * out_.size(), size_ + size));
+}
 
 Data Reader::octets() {
   const Bytes bytes = take(word());

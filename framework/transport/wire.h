@@ -48,28 +48,39 @@ struct ReadLimits {
 /// client what it wrote.
 class Writer {
  public:
-  /// Room for most replies, in place of growing there byte by byte.
-  Writer() { out_.reserve(512); }
-  void byte(std::uint8_t value) { out_.push_back(std::byte{value}); }
-  void word(std::uint64_t value) { append(&value, sizeof value); }
-  /// Behind their length, so that no octet needs escaping.
-  void octets(Bytes value) {
-    word(value.size());
-    append(value.data(), value.size());
+  void byte(std::uint8_t value) { *room(1) = std::byte{value}; }
+  /// As it lies in memory.
+  void word(std::uint64_t value) { std::memcpy(room(sizeof value), &value, sizeof value); }
+  /// A word that is given later, by the position that this gives.
+  std::size_t laterWord() {
+    word(0);
+    return size_ - sizeof(std::uint64_t);
   }
+  void setWord(std::size_t position, std::uint64_t value) {
+    std::memcpy(out_.data() + position, &value, sizeof value);
+  }
+  /// Behind their length, so that no octet needs escaping.
+  void octets(Bytes value);
   void text(std::string_view value) {
     octets(std::as_bytes(std::span(value.data(), value.size())));
   }
-  [[nodiscard]] Data take() && { return std::move(out_); }
-
- private:
-  // Through void*, so that a number is written as it lies in memory.
-  void append(const void* from, std::size_t size) {
-    const auto* bytes = static_cast<const std::byte*>(from);
-    out_.insert(out_.end(), bytes, bytes + size);
+  [[nodiscard]] Data take() && {
+    out_.resize(size_);
+    return std::move(out_);
   }
 
-  Data out_;
+ private:
+  std::byte* room(std::size_t size) {
+    if (size > out_.size() - size_) grow(size);
+    std::byte* const place = out_.data() + size_;
+    size_ += size;
+    return place;
+  }
+  void grow(std::size_t size);
+
+  /// Most replies have room in what is there at first. What lies behind `size_` is not written yet.
+  Data out_ = Data(4096);
+  std::size_t size_ = 0;
 };
 
 /// Every function that takes something throws MalformedReply where there is not that much, and
