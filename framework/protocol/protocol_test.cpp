@@ -11,6 +11,7 @@
 #include <algorithm>
 #include <array>
 #include <cstring>
+#include <filesystem>
 #include <functional>
 #include <utility>
 #include <vector>
@@ -127,10 +128,8 @@ class Control : public testing::Test {
     for (const int end : ends_) close(end);
   }
 
-  static int nextDescriptor() {
-    const int next = dup(STDERR_FILENO);
-    close(next);
-    return next;
+  static std::ptrdiff_t openDescriptors() {
+    return std::distance(std::filesystem::directory_iterator("/proc/self/fd"), {});
   }
 
   /// What the client's end, and the zygote's, make of the same packet.
@@ -141,13 +140,13 @@ class Control : public testing::Test {
     both.first = receiveControl(ends_[1], frame, Waiting::no);
     send(packet, descriptors);
     // What comes with a refused frame is closed.
-    const int next = nextDescriptor();
+    const std::ptrdiff_t before = openDescriptors();
     int descriptor = noDescriptor;
     both.second = receiveControl(ends_[1], frame, descriptor, Waiting::no);
     EXPECT_EQ(descriptor != noDescriptor,
               both.second == Transfer::complete && !descriptors.empty());
     if (descriptor != noDescriptor) close(descriptor);
-    EXPECT_EQ(nextDescriptor(), next);
+    EXPECT_EQ(openDescriptors(), before);
     return both;
   }
 
