@@ -19,9 +19,9 @@ std::size_t most = 0;
 std::size_t limit = std::numeric_limits<std::size_t>::max();
 
 /// Where small blocks come from while a message is at hand: cut off one after the other, and all
-/// free at once when the next message begins. Most blocks are short texts, of which a worker for
-/// one message frees none; that is a third of the time from the bytes to the record. It has one
-/// size and is not counted, so that it makes no difference to what a message may take.
+/// free at once when the next message begins. Most blocks are short texts, which a worker for one
+/// message has no use in freeing. It has one size and is not counted, so that it makes no
+/// difference to what a message may take.
 constexpr std::size_t arenaSize = std::size_t{256} << 10;
 constexpr std::size_t smallBlock = 512;
 std::byte* arena = nullptr;
