@@ -350,6 +350,7 @@ def stream():
         status, out, _ = run("stream", "--max-message", "1k", stdin="\n".join(lines * 2).encode())
         check([host_error(reply) for reply in objects(out)] == [reason] * 2, f"long messages: {out}")
         check(out.count(b'{"id":{"message":"\\"{","n":1E400},') == 2 * ("n" in lines[0]), f"their ids: {out}")
+        check((b'"id"' in out) == ("n" in lines[0]), f"an id that is not whole: {out}")
     reply = objects(run("stream", "--max-message", "1K", stdin=request(1, "AAAA" * 342).encode())[1])
     check((reply[0]["id"], host_error(reply[0])) == (1, "messageTooLarge"), f"too large: {reply}")
 
