@@ -10,6 +10,7 @@
 #include <keelgate/client.h>
 
 #include <benchmark/benchmark.h>
+#include <sys/resource.h>
 #include <sys/socket.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -17,6 +18,7 @@
 #include <algorithm>
 #include <filesystem>
 #include <fstream>
+#include <initializer_list>
 #include <iterator>
 #include <optional>
 #include <vector>
@@ -157,7 +159,8 @@ void freshWorkerWithoutSpare(benchmark::State& state) {
   measure(state, std::chrono::milliseconds(2), [&] {
     service->readNews();
     Worker worker(service, *service->fork(shortMessage));
-    Exchange exchange(worker.channel(), request, worker.nextSequence());
+    Exchange exchange(worker.channel(), worker.nextSequence());
+    exchange.add(request);
     while (exchange.advance() <= Exchange::State::receiving) {
       waitFor({.descriptor = worker.channel(), .events = POLLIN, .until = Deadline::max()});
     }
@@ -173,6 +176,44 @@ void clientCall(benchmark::State& state, std::size_t messagesPerProcess,
   client.unpack<VespCommandResponse>(bytes);
   measure(state, pause,
           [&] { benchmark::DoNotOptimize(client.unpack<VespCommandResponse>(bytes)); });
+}
+
+double processorMicros() {
+  double sum = 0;
+  for (const auto who : {RUSAGE_SELF, RUSAGE_CHILDREN}) {
+    rusage used{};
+    getrusage(who, &used);
+    for (const timeval& part : {used.ru_utime, used.ru_stime}) {
+      sum += static_cast<double>(part.tv_sec) * 1e6 + static_cast<double>(part.tv_usec);
+    }
+  }
+  return sum;
+}
+
+/// Many messages in one call of one thread: from bytes to records, without JSON.
+void batch(benchmark::State& state, std::size_t messagesPerProcess) {
+  const Data bytes = message();
+  // A fresh process takes a hundred times as long.
+  const std::size_t number = messagesPerProcess == 1 ? 1'000 : 20'000;
+  const std::vector<Client::Request> requests(number, Client::Request{.message = bytes});
+  const auto count = static_cast<double>(requests.size());
+  for ([[maybe_unused]] auto _ : state) {
+    const double used = processorMicros();
+    double wall = 0;
+    {
+      Client client(options(messagesPerProcess));
+      wall = timed([&] {
+        client.unpackBatch<VespCommandResponse>(
+            requests, [](std::size_t, const Outcome<VespCommandResponse>& outcome) {
+              if (!outcome.hasRecord()) std::abort();
+            });
+      });
+    }
+    // The service has ended and been waited for, so that its processes count.
+    state.counters["processor_us"] = (processorMicros() - used) / count;
+    state.counters["wall_us"] = wall / count;
+    state.SetIterationTime(wall / 1e6);
+  }
 }
 
 void coldStart(benchmark::State& state) {
@@ -265,6 +306,8 @@ BENCHMARK_CAPTURE(clientCall, oneAfterTheOther, 1, std::chrono::milliseconds(0))
 BENCHMARK_CAPTURE(clientCall, warm, 1'000'000'000, std::chrono::milliseconds(0))
     ->UseManualTime()
     ->Iterations(5000);
+BENCHMARK_CAPTURE(batch, fresh, 1)->UseManualTime()->Iterations(1);
+BENCHMARK_CAPTURE(batch, reused, 1'000'000'000)->UseManualTime()->Iterations(1);
 BENCHMARK(coldStart)->UseManualTime()->Iterations(50);
 BENCHMARK(idleService)->UseManualTime()->Iterations(1);
 

@@ -53,12 +53,14 @@ HostError outOfMemory() {
 
 }  // namespace
 
-Call::Call(Pool& pool, const ClientRequest& request, Deadline deadline, Accept accept) try
+Call::Call(Pool& pool, const ClientRequest& request, Deadline deadline, bool alone,
+           Accept accept) try
     : pool_(pool),
       request_(request),
       deadline_(deadline),
       accept_(std::move(accept)),
-      place_(pool.places(), pool.isLarge(request.message.size())) {
+      place_(pool.places(), pool.isLarge(request.message.size())),
+      retried_(alone) {
 } catch (const StartFailure& failure) {
   throw HostError(Reason::startFailed, failure.sentence);
 }
@@ -111,7 +113,8 @@ Optional<Wait> Call::stepTaking() {
   worker_.emplace(std::get<Worker>(std::move(taken)));
   // Not sent any more: that it is late is not the worker's doing.
   if (Clock::now() >= deadline_) throw HostError(Reason::timedOut, "no process came free in time");
-  exchange_.emplace(worker_->channel(), request_, worker_->nextSequence());
+  exchange_.emplace(worker_->channel(), worker_->nextSequence());
+  exchange_->add(request_);
   state_ = State::exchanging;
   return std::nullopt;
 }
@@ -186,6 +189,7 @@ void Call::acceptReply() {
     error = std::current_exception();
   }
   exchange_.reset();
+  pool_.noteReply(*worker_);
   pool_.giveBack(std::move(*worker_));
   worker_.reset();
   // A reply can be made to take long to read, too.

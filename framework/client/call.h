@@ -28,8 +28,9 @@ class Call {
   /// else it throws is the outcome of the message.
   using Accept = std::function<void(const ReceivedReply&)>;
 
-  /// The pool and what the request borrows outlive the call. Throws HostError, std::bad_alloc.
-  Call(Pool& pool, const ClientRequest& request, Deadline deadline, Accept accept);
+  /// The pool and what the request borrows outlive the call. `alone`: in a worker that has served
+  /// nobody, and this is its last try. Throws HostError, std::bad_alloc.
+  Call(Pool& pool, const ClientRequest& request, Deadline deadline, bool alone, Accept accept);
 
   /// Goes on as far as it can. Gives what to wait for, or nothing when it is done.
   Optional<Wait> advance() noexcept;
@@ -57,7 +58,7 @@ class Call {
   FairSemaphore::Place place_;
   State state_ = State::queued;
   /// Once an attempt has failed: the next worker is to have no past.
-  bool retried_ = false;
+  bool retried_;
   Optional<Worker> worker_;
   Optional<Exchange> exchange_;
   /// Of `explaining`: how long the service may take to say what happened. Of `slowed`: when the

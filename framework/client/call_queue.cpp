@@ -7,6 +7,10 @@
 
 namespace Keelgate {
 
+CallQueue::CallQueue(Pool& pool) : window_(pool.processes()) {
+  while (pool.sharesWorkers() && pipelines_.size() < window_) pipelines_.emplace_back(pool);
+}
+
 void CallQueue::push(std::unique_ptr<Task> task) {
   const std::lock_guard lock(mutex_);
   const Deadline deadline = task->deadline();
@@ -30,7 +34,17 @@ void CallQueue::run(bool mayWait) {
 /// Those that have their turn, and those whose time is up.
 void CallQueue::begin() {
   const std::lock_guard lock(mutex_);
-  while (!waiting_.empty() && running_.size() < window_) {
+  while (!waiting_.empty()) {
+    Task& next = *waiting_.front();
+    if (next.isShared() && !pipelines_.empty()) {
+      Pipeline* const pipeline = freePipeline();
+      if (pipeline == nullptr) break;
+      if (next.request() != nullptr) {
+        pipeline->add(waiting_);
+        continue;
+      }
+    }
+    if (running_.size() >= window_) break;
     running_.push_back({.task = std::move(waiting_.front())});
     waiting_.pop_front();
   }
@@ -48,9 +62,17 @@ void CallQueue::begin() {
   });
 }
 
+/// The one with the least to do, if it has room.
+Pipeline* CallQueue::freePipeline() noexcept {
+  const auto least = std::min_element(
+      pipelines_.begin(), pipelines_.end(),
+      [](const Pipeline& one, const Pipeline& other) { return one.count() < other.count(); });
+  return least->hasRoom() ? &*least : nullptr;
+}
+
 void CallQueue::advanceReady(bool mayWait) {
   std::vector<pollfd> entries;
-  entries.reserve(running_.size());
+  entries.reserve(running_.size() + pipelines_.size());
   eachWait([&](const Wait& wait) {
     entries.push_back({.fd = wait.descriptor, .events = wait.events, .revents = 0});
   });
@@ -70,6 +92,26 @@ void CallQueue::advanceReady(bool mayWait) {
       at = running_.erase(at);
     }
   }
+  advancePipelines();
+}
+
+/// All of them: one that has nothing to do finds out by one system call.
+void CallQueue::advancePipelines() noexcept {
+  TaskList alone;
+  for (Pipeline& pipeline : pipelines_) {
+    if (pipeline.wait()) pipeline.advance(done_, alone);
+  }
+  {
+    const std::lock_guard lock(mutex_);
+    waiting_.splice(waiting_.begin(), alone);
+  }
+  // Before anything is completed: workers have their next messages meanwhile.
+  begin();
+  for (Pipeline& pipeline : pipelines_) {
+    if (pipeline.wait() && pipeline.wait()->until == Deadline()) pipeline.advance(done_, alone);
+  }
+  const std::lock_guard lock(mutex_);
+  waiting_.splice(waiting_.begin(), alone);
 }
 
 Deadline CallQueue::nextTime() const {

@@ -1,8 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
-/// Many calls that one thread at a time drives: so many are in work, the others wait here.
+/// Many messages that one thread at a time drives: so many are in work, the others wait here. Where
+/// workers are used again, short ones go to them many at a time.
 #pragma once
 
-#include "framework/client/call.h"
+#include "framework/client/pipeline.h"
 
 #include <atomic>
 #include <deque>
@@ -12,29 +13,20 @@
 
 namespace Keelgate {
 
-/// A message in a queue, whatever record it asks for.
-class Task {
- public:
-  virtual ~Task() = default;
-  /// As Call::advance; it begins when it is first called.
-  virtual Optional<Wait> advance() noexcept = 0;
-  /// Tells whoever asked for it. Nothing is done with it afterwards.
-  virtual void complete() = 0;
-  /// When advance() ends it even if it has not begun.
-  [[nodiscard]] virtual Deadline deadline() const noexcept = 0;
-};
-
 /// `push`, `isEmpty` and `count` may be called from any thread at any time, the others by one at a
 /// time.
 class CallQueue {
  public:
-  /// So many tasks are in work at a time.
-  explicit CallQueue(std::size_t window) : window_(window) {}
+  explicit CallQueue(Pool& pool);
 
   void push(std::unique_ptr<Task> task);
   [[nodiscard]] bool isEmpty() const noexcept { return count_ == 0; }
   /// All that has not been completed.
   [[nodiscard]] std::size_t count() const noexcept { return count_; }
+  /// As many as can be in work, and some to follow them.
+  [[nodiscard]] std::size_t window() const noexcept {
+    return window_ + 2 * Pipeline::capacity * pipelines_.size();
+  }
 
   /// Advances what can go on, and completes what is done, in the order in which that happens; if
   /// it `mayWait` for that, it does. What a completion throws comes through, and the next call
@@ -45,6 +37,9 @@ class CallQueue {
   template <class Visitor>
   void eachWait(Visitor visitor) const {
     for (const Running& running : running_) visitor(running.wait);
+    for (const Pipeline& pipeline : pipelines_) {
+      if (pipeline.wait()) visitor(*pipeline.wait());
+    }
   }
   /// When something is to be done, whatever happens until then.
   [[nodiscard]] Deadline nextTime() const;
@@ -57,15 +52,18 @@ class CallQueue {
   };
 
   void begin();
+  Pipeline* freePipeline() noexcept;
   void advanceReady(bool mayWait);
+  void advancePipelines() noexcept;
 
   const std::size_t window_;
   std::atomic<std::size_t> count_ = 0;
   std::list<Running> running_;
-  std::deque<std::unique_ptr<Task>> done_;
+  std::deque<Pipeline> pipelines_;
+  TaskList done_;
 
   mutable std::mutex mutex_;
-  std::deque<std::unique_ptr<Task>> waiting_;
+  TaskList waiting_;
   /// The earliest deadline in `waiting_`, or earlier.
   Deadline earliest_ = Deadline::max();
 };

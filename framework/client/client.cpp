@@ -170,8 +170,34 @@ class Client::Message final : public Task {
         sink_(std::move(sink)),
         deadline_(deadline) {}
 
+  [[nodiscard]] bool isShared() const noexcept override {
+    return !alone_ && request_.message.size() <= Pipeline::longest;
+  }
+  void goAlone() noexcept override { alone_ = true; }
+
+  const ClientRequest* request() noexcept override {
+    if (!sent_ && !error_) begin();
+    if (!sent_) alone_ = true;
+    return sent_ ? &*sent_ : nullptr;
+  }
+
+  bool take(const ReceivedReply& reply) noexcept override try {
+    read(reply);
+    return isInTime();
+  } catch (const Transport::MalformedReply&) {
+    return false;
+  } catch (const Transport::ReadLimitReached&) {
+    return false;
+  } catch (const std::bad_alloc&) {
+    return false;
+  } catch (...) {
+    error_ = std::current_exception();
+    return isInTime();
+  }
+
   Optional<Wait> advance() noexcept override {
-    if (!call_) begin();
+    const ClientRequest* const request = call_ || error_ ? nullptr : this->request();
+    if (request != nullptr) call(*request);
     return call_ ? call_->advance() : std::nullopt;
   }
 
@@ -199,17 +225,29 @@ class Client::Message final : public Task {
     if (!Text::isUtf8(service)) {
       throw VespClientMessageUnpackingError::noUnpackerForService(service);
     }
-    call_.emplace(client_.engine().pool,
-                  ClientRequest{.record = static_cast<std::uint16_t>(recordNumber_),
-                                .command = command,
-                                .service = service,
-                                .message = request_.message},
-                  deadline_, [this](const ReceivedReply& reply) { read(reply); });
+    sent_ = ClientRequest{.record = static_cast<std::uint16_t>(recordNumber_),
+                          .command = command,
+                          .service = service,
+                          .message = request_.message};
+  } catch (...) {
+    error_ = std::current_exception();
+  }
+
+  void call(const ClientRequest& request) noexcept try {
+    call_.emplace(client_.engine().pool, request, deadline_, alone_,
+                  [this](const ReceivedReply& reply) { read(reply); });
   } catch (const std::bad_alloc&) {
     error_ = std::make_exception_ptr(
         HostError(Reason::resourcesExhausted, "this process has no memory for the message"));
   } catch (...) {
     error_ = std::current_exception();
+  }
+
+  /// A reply can be made to take long to read, too.
+  bool isInTime() noexcept {
+    if (Clock::now() < deadline_) return true;
+    error_ = nullptr;
+    return false;
   }
 
   void read(const ReceivedReply& reply) {
@@ -224,6 +262,10 @@ class Client::Message final : public Task {
   const Request request_;
   const std::unique_ptr<Detail::Sink> sink_;
   Deadline deadline_;
+  /// From when it has begun.
+  Optional<ClientRequest> sent_;
+  /// It has shared a worker, and is not to again.
+  bool alone_ = false;
   Optional<Call> call_;
   std::exception_ptr error_;
 };
@@ -246,11 +288,10 @@ void Client::unpackInto(std::size_t recordNumber, Request request, void* record)
 
 void Client::runBatch(std::size_t recordNumber, std::span<const Request> requests,
                       const MakeSink& makeSink) {
-  const std::size_t window = implementation_->engine().pool.processes();
-  CallQueue queue(window);
+  CallQueue queue(implementation_->engine().pool);
   for (std::size_t next = 0; next < requests.size() || !queue.isEmpty();) {
     // Only so many ahead, whatever the length of the batch.
-    for (; next < requests.size() && queue.count() < window; ++next) {
+    for (; next < requests.size() && queue.count() < queue.window(); ++next) {
       queue.push(std::make_unique<Message>(*implementation_, recordNumber, requests[next],
                                            makeSink(next), Deadline::max()));
     }

@@ -10,7 +10,7 @@
 namespace Keelgate {
 
 EventSource::EventSource(Pool& pool)
-    : queue_(pool.processes()),
+    : queue_(pool),
       epoll_(pool.registry(), epoll_create1(EPOLL_CLOEXEC)),
       timer_(pool.registry(), timerfd_create(CLOCK_MONOTONIC, TFD_CLOEXEC | TFD_NONBLOCK)),
       wakeUp_(pool.registry(), eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {

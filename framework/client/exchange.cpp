@@ -4,9 +4,13 @@
 #include "framework/contracts/memory_budget.h"
 
 #include <sys/socket.h>
+#include <sys/uio.h>
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
+#include <cstring>
+#include <new>
 
 namespace Keelgate {
 
@@ -25,7 +29,7 @@ constexpr std::uint64_t replyBase = std::uint64_t{2} << 20;
 constexpr std::uint64_t replyFactor = 128;
 
 /// Most replies fit; room grows twofold from here with the bytes that have arrived.
-constexpr std::size_t firstBuffer = 4096;
+constexpr std::size_t firstBuffer = std::size_t{64} << 10;
 
 /// How often one step may go to the kernel: other messages and the deadline have their turn.
 constexpr int callsPerStep = 16;
@@ -35,22 +39,36 @@ bool wouldBlock() noexcept {
   return errno == EAGAIN || errno == EINTR;
 }
 
-/// Takes `sent` bytes off the front. Gives whether any are left.
-bool dropFront(std::array<iovec, 3>& pieces, std::size_t sent) noexcept {
-  std::size_t left = 0;
-  for (iovec& piece : pieces) {
-    const std::size_t taken = std::min(sent, piece.iov_len);
-    piece.iov_base = static_cast<char*>(piece.iov_base) + taken;
-    piece.iov_len -= taken;
-    sent -= taken;
-    left += piece.iov_len;
+/// What goes to the kernel in one call.
+class Pieces {
+ public:
+  [[nodiscard]] bool hasRoom() const noexcept { return count_ + 3 <= pieces_.size(); }
+  void add(const void* from, std::size_t size) noexcept {
+    // sendmsg only reads through this pointer.
+    pieces_[count_++] = {.iov_base = const_cast<void*>(from), .iov_len = size};
   }
-  return left > 0;
-}
+  void dropFront(std::size_t sent) noexcept {
+    for (std::size_t i = 0; sent > 0; ++i) {
+      const std::size_t taken = std::min(sent, pieces_[i].iov_len);
+      pieces_[i].iov_base = static_cast<char*>(pieces_[i].iov_base) + taken;
+      pieces_[i].iov_len -= taken;
+      sent -= taken;
+    }
+  }
+  [[nodiscard]] msghdr packet() noexcept {
+    msghdr packet{};
+    packet.msg_iov = pieces_.data();
+    packet.msg_iovlen = count_;
+    return packet;
+  }
 
-iovec pieceOf(const void* from, std::size_t size) noexcept {
-  // sendmsg only reads through this pointer.
-  return {.iov_base = const_cast<void*>(from), .iov_len = size};
+ private:
+  std::array<iovec, 3 * 32> pieces_;
+  std::size_t count_ = 0;
+};
+
+std::size_t sizeOf(const Protocol::RequestHeader& header) noexcept {
+  return sizeof header + header.serviceLength + header.bodyLength;
 }
 
 std::uint64_t largestReply(const ClientRequest& request) {
@@ -70,66 +88,108 @@ WorkerSign signOf(int channel) noexcept {
   return n < 0 && wouldBlock() ? WorkerSign::quiet : WorkerSign::gone;
 }
 
-Exchange::Exchange(int channel, const ClientRequest& request, std::uint32_t sequence) noexcept
-    : channel_(channel),
-      header_(Protocol::makeRequestHeader(request.record, request.command, request.service.size(),
-                                          request.message.size(), sequence)),
-      // Three pieces and one call: the message, which may be large, is copied by the kernel alone.
-      pieces_{pieceOf(&header_, sizeof header_),
-              pieceOf(request.service.data(), request.service.size()),
-              pieceOf(request.message.data(), request.message.size())},
-      parser_(sequence, largestReply(request)) {}
-
-Exchange::State Exchange::advance() {
-  return state_ = state_ == State::sending ? send() : receive();
+std::span<std::byte> ReceiveBuffer::room(std::size_t wanted) {
+  const std::size_t used = end_ - begin_;
+  if (begin_ > 0) std::memmove(block_.get(), block_.get() + begin_, used);
+  begin_ = 0;
+  end_ = used;
+  if (used == size_) {
+    const std::size_t size = std::max(firstBuffer, std::min(2 * size_, std::max(wanted, used) + 1));
+    auto* const grown = static_cast<std::byte*>(std::realloc(block_.get(), size));
+    if (grown == nullptr) throw std::bad_alloc();
+    static_cast<void>(block_.release());
+    block_.reset(grown);
+    size_ = size;
+  }
+  return {block_.get() + end_, size_ - end_};
 }
 
-Exchange::State Exchange::send() {
-  msghdr packet{};
-  packet.msg_iov = pieces_.data();
-  packet.msg_iovlen = pieces_.size();
-  for (int i = 0; i < callsPerStep; ++i) {
+void ReceiveBuffer::drop(std::size_t count) noexcept {
+  begin_ += count;
+  if (begin_ == end_) begin_ = end_ = 0;
+}
+
+void Exchange::add(const ClientRequest& request) {
+  pending_.push_back({.header = Protocol::makeRequestHeader(request.record, request.command,
+                                                            request.service.size(),
+                                                            request.message.size(), nextSequence_),
+                      .request = request});
+  ++nextSequence_;
+}
+
+Exchange::State Exchange::advance() {
+  const Pending& oldest = pending_.front();
+  if (!parser_) parser_.emplace(oldest.header.sequence, largestReply(oldest.request));
+  if (hasUnsent() && !isDeaf_) send();
+  return state_ = receive();
+}
+
+void Exchange::send() {
+  for (int i = 0; i < callsPerStep && hasUnsent(); ++i) {
+    // Many pieces and one call: messages, which may be large, are copied by the kernel alone.
+    Pieces pieces;
+    for (std::size_t at = sent_; at < pending_.size() && pieces.hasRoom(); ++at) {
+      const auto& [header, request] = pending_[at];
+      pieces.add(&header, sizeof header);
+      pieces.add(request.service.data(), request.service.size());
+      pieces.add(request.message.data(), request.message.size());
+    }
+    pieces.dropFront(sentBytes_);
+    msghdr packet = pieces.packet();
     const ssize_t n = sendmsg(channel_, &packet, MSG_DONTWAIT | MSG_NOSIGNAL);
-    if (n >= 0 && !dropFront(pieces_, static_cast<std::size_t>(n))) return State::receiving;
-    if (n >= 0) continue;
-    if (!wouldBlock()) return State::died;
-    // A worker that answers before it has the whole request, and then reads no more, would never
-    // make room: so both directions are watched.
-    switch (signOf(channel_)) {
-      case WorkerSign::talking:
-        return State::violated;
-      case WorkerSign::gone:
-        return State::died;
-      case WorkerSign::quiet:
-        return State::sending;
+    if (n < 0) {
+      isDeaf_ = !wouldBlock();
+      return;
+    }
+    sentBytes_ += static_cast<std::size_t>(n);
+    for (; hasUnsent(); ++sent_) {
+      const std::size_t size = sizeOf(pending_[sent_].header);
+      if (sentBytes_ < size) break;
+      sentBytes_ -= size;
     }
   }
-  return State::sending;
 }
 
 Exchange::State Exchange::receive() {
-  if (buffer_.empty()) buffer_.resize(firstBuffer);
-  for (int i = 0; i < callsPerStep; ++i) {
-    // It grows when it is full of bytes that have arrived, and never because a length was
-    // announced; by one byte more than is wanted, so that bytes behind the answer show.
-    if (filled_ == buffer_.size()) {
-      buffer_.resize(std::min(2 * filled_, std::max(parser_.needed(), filled_) + 1));
-    }
-    const ssize_t n =
-        recv(channel_, buffer_.data() + filled_, buffer_.size() - filled_, MSG_DONTWAIT);
-    if (n == 0 || (n < 0 && !wouldBlock())) return State::died;
-    if (n < 0) return State::receiving;
-    filled_ += static_cast<std::size_t>(n);
-    switch (parser_.parse(received())) {
-      case Protocol::ReplyParser::State::complete:
-        return State::answered;
-      case Protocol::ReplyParser::State::malformed:
-        return State::violated;
-      case Protocol::ReplyParser::State::incomplete:
-        break;
-    }
+  // A worker that answers before it has the whole request, and then reads no more, would never make
+  // room: so both directions are watched.
+  if (sent_ == 0) {
+    const WorkerSign sign = isDeaf_ ? WorkerSign::gone : signOf(channel_);
+    if (sign == WorkerSign::talking) return State::violated;
+    return sign == WorkerSign::gone ? State::died : State::sending;
   }
-  return State::receiving;
+  for (int i = 0; i < callsPerStep; ++i) {
+    // What has arrived with the reply before may be all that there is to the next.
+    if (const State state = parse(); state != State::receiving) return state;
+    const std::span<std::byte> room = buffer_.room(parser_->needed());
+    const ssize_t n = recv(channel_, room.data(), room.size(), MSG_DONTWAIT);
+    if (n == 0 || (n < 0 && !wouldBlock())) return State::died;
+    if (n < 0) return hasUnsent() ? State::sending : State::receiving;
+    buffer_.add(static_cast<std::size_t>(n));
+  }
+  const State state = parse();
+  return state == State::receiving && hasUnsent() ? State::sending : state;
+}
+
+Exchange::State Exchange::parse() {
+  using Parsed = Protocol::ReplyParser::State;
+  const Bytes arrived = buffer_.bytes();
+  for (;;) {
+    const std::size_t looked = std::min(arrived.size(), parser_->needed());
+    const Parsed parsed = parser_->parse(arrived.first(looked));
+    if (parsed == Parsed::malformed) return State::violated;
+    if (parsed == Parsed::complete) break;
+    if (parser_->needed() > arrived.size()) return State::receiving;
+  }
+  // What lies behind the answer can only be that to a request which has been sent.
+  return arrived.size() > parser_->needed() && sent_ < 2 ? State::violated : State::answered;
+}
+
+void Exchange::drop() noexcept {
+  buffer_.drop(parser_->needed());
+  parser_.reset();
+  pending_.pop_front();
+  --sent_;
 }
 
 }  // namespace Keelgate

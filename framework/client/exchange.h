@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The client's end of the channel to one worker: one request, then one reply.
+/// The client's end of the channel to one worker: requests, and their replies in the same order.
 ///
 /// The worker may be taken over from the moment that it has read the first byte. So it is never
 /// trusted to read, to answer, to stop answering or to tell the truth about a length.
@@ -10,10 +10,10 @@
 
 #include <keelgate/values.h>
 
-#include <sys/uio.h>
-
-#include <array>
 #include <cstddef>
+#include <cstdlib>
+#include <deque>
+#include <memory>
 #include <string_view>
 
 namespace Keelgate {
@@ -32,20 +32,45 @@ struct ClientRequest {
 enum class WorkerSign { quiet, gone, talking };
 WorkerSign signOf(int channel) noexcept;
 
-/// One thread at a time. It stays where it is: the kernel is given addresses inside of it.
+/// What has arrived and was not dropped. It grows without being filled or, if it is large, copied.
+class ReceiveBuffer {
+ public:
+  [[nodiscard]] Bytes bytes() const noexcept { return {block_.get() + begin_, end_ - begin_}; }
+  /// Room behind them, of at least a byte more than they need to be `wanted` bytes: so that more
+  /// than is wanted shows. At most doubled, whatever is wanted. Throws std::bad_alloc.
+  std::span<std::byte> room(std::size_t wanted);
+  void add(std::size_t count) noexcept { end_ += count; }
+  void drop(std::size_t count) noexcept;
+
+ private:
+  struct Free {
+    void operator()(std::byte* block) const noexcept { std::free(block); }
+  };
+  std::unique_ptr<std::byte[], Free> block_;
+  std::size_t size_ = 0;
+  std::size_t begin_ = 0;
+  std::size_t end_ = 0;
+};
+
+/// One thread at a time.
 class Exchange {
  public:
-  /// `channel` is borrowed. `sequence` counts the requests of the worker from 0: a reply that
-  /// repeats it cannot be one that was prepared for an earlier request.
-  Exchange(int channel, const ClientRequest& request, std::uint32_t sequence) noexcept;
+  /// `channel` is borrowed. `sequence` is that of the first request: a reply that repeats its own
+  /// cannot be one that was prepared for an earlier request.
+  Exchange(int channel, std::uint32_t sequence) noexcept
+      : channel_(channel), nextSequence_(sequence) {}
   Exchange(const Exchange&) = delete;
   Exchange& operator=(const Exchange&) = delete;
+
+  /// Adds a request behind those that have no reply yet. Throws std::bad_alloc.
+  void add(const ClientRequest& request);
 
   enum class State {
     /// To be advanced when the channel is writable, or readable.
     sending,
     /// The same when it is readable.
     receiving,
+    /// The oldest request has its reply: to be dropped before it is advanced again.
     answered,
     /// The worker's end is closed.
     died,
@@ -55,29 +80,41 @@ class Exchange {
   /// Goes on without waiting, and for a bounded time, however much the worker takes or sends.
   /// Throws std::bad_alloc.
   State advance();
+  /// What advance() said last.
   [[nodiscard]] State state() const noexcept { return state_; }
 
-  /// With State::answered.
-  [[nodiscard]] Protocol::ReplyKind kind() const noexcept { return parser_.kind(); }
-  [[nodiscard]] Bytes body() const { return parser_.body(received()); }
+  /// With State::answered, of the oldest request.
+  [[nodiscard]] Protocol::ReplyKind kind() const noexcept { return parser_->kind(); }
+  [[nodiscard]] Bytes body() const { return parser_->body(buffer_.bytes()); }
   /// Whether the worker ends with it.
-  [[nodiscard]] bool isLast() const noexcept { return parser_.isLast(); }
+  [[nodiscard]] bool isLast() const noexcept { return parser_->isLast(); }
   /// As the worker sent them so far: not to be shown before escapeLogLine.
-  [[nodiscard]] const Array<String>& log() const noexcept { return parser_.log(); }
+  [[nodiscard]] const Array<String>& log() const noexcept { return parser_->log(); }
+  /// Is done with that request.
+  void drop() noexcept;
 
  private:
-  State send();
+  struct Pending {
+    Protocol::RequestHeader header;
+    ClientRequest request;
+  };
+
+  [[nodiscard]] bool hasUnsent() const noexcept { return sent_ < pending_.size(); }
+  void send();
   State receive();
-  [[nodiscard]] Bytes received() const { return Bytes(buffer_).first(filled_); }
+  State parse();
 
   int channel_;
-  Protocol::RequestHeader header_;
-  /// What is left to send of header, service identifier and message.
-  std::array<iovec, 3> pieces_;
-  Protocol::ReplyParser parser_;
-  /// All that has arrived, headers and log lines too.
-  Data buffer_;
-  std::size_t filled_ = 0;
+  std::uint32_t nextSequence_;
+  std::deque<Pending> pending_;
+  /// How many of these have been sent whole, and how many bytes of the next.
+  std::size_t sent_ = 0;
+  std::size_t sentBytes_ = 0;
+  /// Nothing can be sent any more; there may be something to be read.
+  bool isDeaf_ = false;
+  /// Of the oldest.
+  Optional<Protocol::ReplyParser> parser_;
+  ReceiveBuffer buffer_;
   State state_ = State::sending;
 };
 

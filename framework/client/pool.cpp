@@ -154,7 +154,6 @@ Optional<Worker> Pool::takeIdle(const Supervisor::Service& service) {
 }
 
 void Pool::giveBack(Worker worker) noexcept {
-  supervisor_.noteReply(worker.service());
   if (isSpent(worker)) {
     worker.finish();
     return;

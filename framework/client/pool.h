@@ -60,7 +60,15 @@ class Pool {
   [[nodiscard]] bool isSpent(const Worker& worker) const noexcept {
     return worker.isFinished() || worker.served() >= messagesPerWorker();
   }
-  /// A worker that has answered. It is used again, or ends.
+  /// Whether a worker is used again.
+  [[nodiscard]] bool sharesWorkers() const noexcept { return messagesPerWorker() > 1; }
+  /// How many more messages it may be given.
+  [[nodiscard]] std::uint64_t messagesLeft(const Worker& worker) const noexcept {
+    return isSpent(worker) ? 0 : messagesPerWorker() - worker.served();
+  }
+  /// It gave a reply that was one.
+  void noteReply(const Worker& worker) noexcept { supervisor_.noteReply(worker.service()); }
+  /// A worker that has answered all that it was given. It is used again, or ends.
   void giveBack(Worker worker) noexcept;
   /// What follows a message, and nobody waits for: workers are forked for those that come next,
   /// services that were replaced are ended.

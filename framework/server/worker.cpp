@@ -12,6 +12,7 @@
 
 #include <unistd.h>
 #include <algorithm>
+#include <cstring>
 #include <memory>
 #include <new>
 
@@ -22,12 +23,73 @@ namespace {
 using Protocol::ReplyKind;
 using Protocol::RequestHeader;
 
-/// The next request's header. The process ends where there is none; a wrong one comes from a client
-/// of another build, which must not get an answer that it misreads.
+/// The worker's end of its channel: a call for as many requests or replies as there are. What it
+/// has to say is said before it waits. Its memory is there from the start, and not the message's.
+class Channel {
+ public:
+  /// A request as long as that is read into the buffer: by its own length alone, so that what a
+  /// message has of its memory does not depend on what came with it.
+  static constexpr std::size_t buffered = std::size_t{64} << 10;
+
+  /// The next `size` bytes, until the next call; at most `buffered`. The process ends where there
+  /// are none.
+  std::span<const std::byte> take(std::size_t size) {
+    if (size > end_ - begin_) fill(size);
+    begin_ += size;
+    return {input_ + begin_ - size, size};
+  }
+
+  void takeInto(std::span<std::byte> bytes) {
+    const auto there = take(std::min(bytes.size(), end_ - begin_));
+    std::copy(there.begin(), there.end(), bytes.begin());
+    flush();
+    if (!Protocol::readAll(serviceDescriptor, bytes.subspan(there.size()))) _exit(0);
+  }
+
+  void give(Bytes bytes) {
+    if (bytes.size() > sizeof output_ - filled_) flush();
+    if (bytes.size() > sizeof output_) return write(bytes);
+    std::copy(bytes.begin(), bytes.end(), output_ + filled_);
+    filled_ += bytes.size();
+  }
+
+  void flush() {
+    write({output_, filled_});
+    filled_ = 0;
+  }
+
+ private:
+  void fill(std::size_t size) {
+    flush();
+    std::copy(input_ + begin_, input_ + end_, input_);
+    end_ -= begin_;
+    begin_ = 0;
+    while (end_ < size) {
+      const ssize_t got = read(serviceDescriptor, input_ + end_, sizeof input_ - end_);
+      if (got <= 0) _exit(0);
+      end_ += static_cast<std::size_t>(got);
+    }
+  }
+  /// Whoever does not listen any more has gone.
+  static void write(Bytes bytes) {
+    if (!Protocol::writeAll(serviceDescriptor, bytes)) _exit(0);
+  }
+
+  std::byte input_[buffered]{};
+  std::size_t begin_ = 0;
+  std::size_t end_ = 0;
+  std::byte output_[buffered]{};
+  std::size_t filled_ = 0;
+};
+
+/// In no memory that a worker would have to take, and none of which it touches before it needs it.
+constinit Channel channel;
+
+/// The next request's header. A wrong one comes from a client of another build, which must not get
+/// an answer that it misreads.
 RequestHeader receiveHeader(std::uint32_t sequence, std::uint64_t longestMessage) {
   RequestHeader header;
-  const auto bytes = std::as_writable_bytes(std::span(&header, 1));
-  if (!Protocol::readAll(serviceDescriptor, bytes)) _exit(0);
+  std::memcpy(&header, channel.take(sizeof header).data(), sizeof header);
   // A message that is longer than the heap was fixed for would end for want of memory.
   if (!Protocol::isExpected(header, sequence, longestMessage)) {
     _exit(Protocol::protocolExitStatus);
@@ -35,28 +97,22 @@ RequestHeader receiveHeader(std::uint32_t sequence, std::uint64_t longestMessage
   return header;
 }
 
-/// Smaller bodies are sent together with their header: a write costs more than a copy.
-constexpr std::size_t copiedBody = 64 * 1024;
+void sendFrame(std::uint32_t sequence, ReplyKind kind, Bytes body, bool last) {
+  const auto header = Protocol::makeReplyHeader(sequence, kind, body.size(), last);
+  channel.give(std::as_bytes(std::span(&header, 1)));
+  channel.give(body);
+}
 
-/// False when the client has gone.
-bool send(const Reply& reply, std::uint32_t sequence, bool last) {
-  Data frames;
+void send(const Reply& reply, std::uint32_t sequence, bool last) {
   std::size_t lines = 0;
   // Cut here so that an honest worker keeps within what its client will take.
   for (const String& line : reply.log) {
     if (++lines > Protocol::maximumLogFrames) break;
     const Bytes bytes = std::as_bytes(std::span(line));
-    Protocol::appendReplyFrame(frames, sequence, ReplyKind::log,
-                               bytes.first(std::min(bytes.size(), Protocol::maximumLogLength)));
+    sendFrame(sequence, ReplyKind::log,
+              bytes.first(std::min(bytes.size(), Protocol::maximumLogLength)), false);
   }
-  if (reply.body.size() <= copiedBody) {
-    Protocol::appendReplyFrame(frames, sequence, reply.kind, reply.body, last);
-    return Protocol::writeAll(serviceDescriptor, frames);
-  }
-  const auto header = Protocol::makeReplyHeader(sequence, reply.kind, reply.body.size(), last);
-  return Protocol::writeAll(serviceDescriptor, frames) &&
-         Protocol::writeAll(serviceDescriptor, std::as_bytes(std::span(&header, 1))) &&
-         Protocol::writeAll(serviceDescriptor, reply.body);
+  sendFrame(sequence, reply.kind, reply.body, last);
 }
 
 /// From the first byte of the body on, this is the part that a stranger may take over. False when
@@ -65,16 +121,24 @@ bool send(const Reply& reply, std::uint32_t sequence, bool last) {
 bool answer(const KeelgateServer& server, const RequestHeader& header) {
   MessageMemory::begin(allocationLimit(header.bodyLength));
   const std::size_t size = header.serviceLength + header.bodyLength;
-  // One piece for both, so one allocation and one read; not zeroed, because it is filled at once.
-  const auto bytes = std::make_unique_for_overwrite<std::byte[]>(size);
-  if (!Protocol::readAll(serviceDescriptor, {bytes.get(), size})) _exit(0);
-  const Reply reply = server.answer(
-      {.record = header.record,
-       .message = {bytes.get() + header.serviceLength, header.bodyLength},
-       .command = header.command,
-       .service = {reinterpret_cast<const char*>(bytes.get()), header.serviceLength}});
+  std::unique_ptr<std::byte[]> large;
+  Bytes bytes;
+  if (size <= Channel::buffered) {
+    bytes = channel.take(size);
+  } else {
+    // Not zeroed, because it is filled at once.
+    large = std::make_unique_for_overwrite<std::byte[]>(size);
+    channel.takeInto({large.get(), size});
+    bytes = {large.get(), size};
+  }
+  const Bytes service = bytes.first(header.serviceLength);
+  const Reply reply =
+      server.answer({.record = header.record,
+                     .message = bytes.subspan(header.serviceLength),
+                     .command = header.command,
+                     .service = {reinterpret_cast<const char*>(service.data()), service.size()}});
   const bool last = MessageMemory::peak() > allocationLimit(0);
-  if (!send(reply, header.sequence, last)) _exit(0);
+  send(reply, header.sequence, last);
   return !last;
 }
 
@@ -86,6 +150,7 @@ void work(const KeelgateServer& server, std::uint64_t messages,
   for (std::uint32_t sequence = 0; sequence != messages; ++sequence) {
     if (!answer(server, receiveHeader(sequence, seal.longestMessage))) break;
   }
+  channel.flush();
   _exit(0);
 } catch (const std::bad_alloc&) {
   // At once: whatever would run at an orderly exit wants memory, and calls that are forbidden.

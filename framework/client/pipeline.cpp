@@ -1,0 +1,155 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "framework/client/pipeline.h"
+
+#include <poll.h>
+
+#include <algorithm>
+
+namespace Keelgate {
+
+namespace {
+
+/// So many messages, and the worker and its place are given back: others wait for them, and
+/// services are replaced from time to time.
+constexpr std::size_t messagesPerTurn = 512;
+
+/// A worker that has several messages may be silent for this part of the time that the oldest has
+/// left. Then they part, and there is time enough for all that did not cause it.
+constexpr int silentPart = 4;
+
+}  // namespace
+
+void Pipeline::add(TaskList& from) noexcept {
+  bytes_ += from.front()->request()->message.size();
+  new_.splice(new_.end(), from, from.begin());
+  // To be sent at once.
+  wait_ = Wait{};
+}
+
+void Pipeline::advance(TaskList& done, TaskList& alone) noexcept {
+  try {
+    wait_ = step(done, alone);
+  } catch (const std::exception&) {
+    // No service, no memory, no descriptor: each message finds out what that means for it.
+    fail(alone);
+    wait_.reset();
+  }
+}
+
+Optional<Wait> Pipeline::step(TaskList& done, TaskList& alone) {
+  if (count() == 0) {
+    leave();
+    return std::nullopt;
+  }
+  if (!worker_) {
+    if (const Optional<Wait> wait = acquire()) return wait;
+  }
+  giveNew();
+  if (!given_.empty()) return exchange(done, alone);
+  // The worker has had its turn, and there are more.
+  leave();
+  return Wait{};
+}
+
+/// A place and a worker, or what to wait for.
+Optional<Wait> Pipeline::acquire() {
+  const Deadline deadline = new_.front()->deadline();
+  if (!place_) place_.emplace(pool_.places(), false);
+  if (Clock::now() >= deadline) {
+    throw HostError(HostError::Reason::timedOut, "no process came free in time");
+  }
+  if (!place_->isAdmitted()) {
+    return Wait{.descriptor = place_->descriptor(), .events = POLLIN, .until = deadline};
+  }
+  auto taken = pool_.take(longest, false, deadline);
+  if (const Wait* wait = std::get_if<Wait>(&taken)) return *wait;
+  worker_.emplace(std::get<Worker>(std::move(taken)));
+  exchange_.emplace(worker_->channel(), static_cast<std::uint32_t>(worker_->served()));
+  turn_ = std::min<std::uint64_t>(messagesPerTurn, pool_.messagesLeft(*worker_));
+  return std::nullopt;
+}
+
+void Pipeline::giveNew() {
+  if (worker_->service().state() != ServiceProcess::State::running) turn_ = 0;
+  if (given_.empty()) lastSign_ = Clock::now();
+  for (; !new_.empty() && turn_ > 0; --turn_) {
+    exchange_->add(*new_.front()->request());
+    worker_->nextSequence();
+    given_.splice(given_.end(), new_, new_.begin());
+  }
+}
+
+Optional<Wait> Pipeline::exchange(TaskList& done, TaskList& alone) {
+  Exchange::State state = exchange_->advance();
+  for (; state == Exchange::State::answered; state = exchange_->advance()) {
+    const bool isLast = exchange_->isLast();
+    if (!takeReply(done)) {
+      state = Exchange::State::violated;
+      break;
+    }
+    // Those that it was given and has not answered are given to the next.
+    if (isLast) {
+      worker_->finish();
+      leave();
+    }
+    if (given_.empty()) return Wait{};
+  }
+  if (state == Exchange::State::died || state == Exchange::State::violated) {
+    worker_->service().retire();
+    fail(alone);
+    return std::nullopt;
+  }
+  const Deadline oldest = given_.front()->deadline();
+  const bool isSingle = count() == 1;
+  const Deadline until = isSingle ? oldest : lastSign_ + (oldest - lastSign_) / silentPart;
+  if (Clock::now() >= until) {
+    if (isSingle) worker_->service().retire();
+    fail(alone);
+    return std::nullopt;
+  }
+  const bool isSending = state == Exchange::State::sending;
+  return Wait{.descriptor = worker_->channel(),
+              .events = static_cast<short>(isSending ? POLLIN | POLLOUT : POLLIN),
+              .until = until};
+}
+
+/// False when the reply is not one.
+bool Pipeline::takeReply(TaskList& done) {
+  for (const String& line : exchange_->log()) logLine(pool_.log(), escapeLogLine(line));
+  Task& task = *given_.front();
+  const ReceivedReply reply{
+      .kind = exchange_->kind(), .body = exchange_->body(), .deadline = task.deadline()};
+  if (!task.take(reply)) return false;
+  bytes_ -= task.request()->message.size();
+  done.splice(done.end(), given_, given_.begin());
+  exchange_->drop();
+  lastSign_ = Clock::now();
+  depth_ = std::min(2 * depth_, capacity);
+  pool_.noteReply(*worker_);
+  return true;
+}
+
+/// Whatever has no reply goes alone.
+void Pipeline::fail(TaskList& alone) noexcept {
+  exchange_.reset();
+  worker_.reset();
+  given_.splice(given_.end(), new_);
+  for (const std::unique_ptr<Task>& task : given_) task->goAlone();
+  alone.splice(alone.end(), given_);
+  bytes_ = 0;
+  depth_ = 1;
+  leave();
+}
+
+/// Gives back the worker and the place. What it was given and has not answered is new again.
+void Pipeline::leave() noexcept {
+  exchange_.reset();
+  new_.splice(new_.begin(), given_);
+  if (worker_) pool_.giveBack(std::move(*worker_));
+  worker_.reset();
+  if (!place_) return;
+  place_.reset();
+  pool_.tidy();
+}
+
+}  // namespace Keelgate
