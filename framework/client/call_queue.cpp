@@ -44,7 +44,7 @@ void CallQueue::begin() {
         continue;
       }
     }
-    if (running_.size() >= window_) break;
+    if (!mayBegin()) break;
     running_.push_back({.task = std::move(waiting_.front())});
     waiting_.pop_front();
   }
@@ -62,12 +62,22 @@ void CallQueue::begin() {
   });
 }
 
+/// As many as there are places: whoever has begun is not to wait for one, because its time counts.
+bool CallQueue::mayBegin() const noexcept {
+  const auto busy = std::count_if(pipelines_.begin(), pipelines_.end(),
+                                  [](const Pipeline& one) { return one.wait().has_value(); });
+  return running_.size() + static_cast<std::size_t>(busy) < window_;
+}
+
 /// The one with the least to do, if it has room.
 Pipeline* CallQueue::freePipeline() noexcept {
-  const auto least = std::min_element(
-      pipelines_.begin(), pipelines_.end(),
-      [](const Pipeline& one, const Pipeline& other) { return one.count() < other.count(); });
-  return least->hasRoom() ? &*least : nullptr;
+  const bool anyOfThem = mayBegin();
+  Pipeline* least = nullptr;
+  for (Pipeline& one : pipelines_) {
+    if (!one.hasRoom() || !(anyOfThem || one.wait())) continue;
+    if (least == nullptr || one.count() < least->count()) least = &one;
+  }
+  return least;
 }
 
 void CallQueue::advanceReady(bool mayWait) {

@@ -52,6 +52,7 @@ class CallQueue {
   };
 
   void begin();
+  [[nodiscard]] bool mayBegin() const noexcept;
   Pipeline* freePipeline() noexcept;
   void advanceReady(bool mayWait);
   void advancePipelines() noexcept;

@@ -174,6 +174,9 @@ class Client::Message final : public Task {
     return !alone_ && request_.message.size() <= Pipeline::longest;
   }
   void goAlone() noexcept override { alone_ = true; }
+  void beginTime() noexcept override {
+    if (deadline_ == Deadline::max()) deadline_ = deadlineAfter(client_.options.timeLimit);
+  }
 
   const ClientRequest* request() noexcept override {
     if (!sent_ && !error_) begin();
@@ -196,6 +199,8 @@ class Client::Message final : public Task {
   }
 
   Optional<Wait> advance() noexcept override {
+    // First of all, so that nothing that follows goes uncounted.
+    beginTime();
     const ClientRequest* const request = call_ || error_ ? nullptr : this->request();
     if (request != nullptr) call(*request);
     return call_ ? call_->advance() : std::nullopt;
@@ -215,8 +220,6 @@ class Client::Message final : public Task {
 
  private:
   void begin() noexcept try {
-    // First of all, so that nothing that follows goes uncounted.
-    if (deadline_ == Deadline::max()) deadline_ = deadlineAfter(client_.options.timeLimit);
     const auto& [command, service] = request_.context;
     requireStack();
     checkSize("the message", request_.message.size(), client_.options.largestMessage);

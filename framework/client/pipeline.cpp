@@ -22,6 +22,7 @@ constexpr int silentPart = 4;
 void Pipeline::add(TaskList& from) noexcept {
   bytes_ += from.front()->request()->message.size();
   new_.splice(new_.end(), from, from.begin());
+  if (count() == 1) oldest().beginTime();
   // To be sent at once.
   wait_ = Wait{};
 }
@@ -53,7 +54,7 @@ Optional<Wait> Pipeline::step(TaskList& done, TaskList& alone) {
 
 /// A place and a worker, or what to wait for.
 Optional<Wait> Pipeline::acquire() {
-  const Deadline deadline = new_.front()->deadline();
+  const Deadline deadline = oldest().deadline();
   if (!place_) place_.emplace(pool_.places(), false);
   if (Clock::now() >= deadline) {
     throw HostError(HostError::Reason::timedOut, "no process came free in time");
@@ -99,9 +100,9 @@ Optional<Wait> Pipeline::exchange(TaskList& done, TaskList& alone) {
     fail(alone);
     return std::nullopt;
   }
-  const Deadline oldest = given_.front()->deadline();
+  const Deadline deadline = oldest().deadline();
   const bool isSingle = count() == 1;
-  const Deadline until = isSingle ? oldest : lastSign_ + (oldest - lastSign_) / silentPart;
+  const Deadline until = isSingle ? deadline : lastSign_ + (deadline - lastSign_) / silentPart;
   if (Clock::now() >= until) {
     if (isSingle) worker_->service().retire();
     fail(alone);
@@ -122,6 +123,7 @@ bool Pipeline::takeReply(TaskList& done) {
   if (!task.take(reply)) return false;
   bytes_ -= task.request()->message.size();
   done.splice(done.end(), given_, given_.begin());
+  if (count() > 0) oldest().beginTime();
   exchange_->drop();
   lastSign_ = Clock::now();
   depth_ = std::min(2 * depth_, capacity);

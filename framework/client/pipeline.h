@@ -23,6 +23,8 @@ class Task {
   [[nodiscard]] virtual bool isShared() const noexcept = 0;
   /// Its request, with which it begins; null where there is none to be sent, and it goes alone.
   virtual const ClientRequest* request() noexcept = 0;
+  /// It is at the head of those that share a worker: from now on its time counts.
+  virtual void beginTime() noexcept = 0;
   /// Takes the reply to that. False: it is to go alone, because what came is not a good reply.
   virtual bool take(const ReceivedReply& reply) noexcept = 0;
   /// It is not shared any more.
@@ -63,6 +65,7 @@ class Pipeline {
  private:
   Optional<Wait> step(TaskList& done, TaskList& alone);
   Optional<Wait> acquire();
+  Task& oldest() noexcept { return *(given_.empty() ? new_ : given_).front(); }
   void giveNew();
   Optional<Wait> exchange(TaskList& done, TaskList& alone);
   bool takeReply(TaskList& done);

@@ -13,9 +13,10 @@
 /// A slot is any number that no living worker has; it is free again with its exit. A kill for a
 /// slot without a worker is ignored: the worker may have ended meanwhile.
 ///
-/// *Data* (client <-> one worker, SOCK_STREAM, half-duplex, one request in flight): a RequestHeader
-/// with the service identifier and the message behind it; then at most `maximumLogFrames` log
-/// frames and exactly one record or error frame, each a ReplyHeader with its body behind it.
+/// *Data* (client <-> one worker, SOCK_STREAM): a RequestHeader with the service identifier and the
+/// message behind it; then at most `maximumLogFrames` log frames and exactly one record or error
+/// frame, each a ReplyHeader with its body behind it. To a worker that is used again requests may
+/// follow each other at once; replies come in the same order, and none before its request is whole.
 ///
 /// Both sides are of one build on one machine, so integers are in the machine's own order, and a
 /// frame that is not exactly right is fatal. The client trusts no reply: a worker may be taken

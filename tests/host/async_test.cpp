@@ -57,13 +57,15 @@ struct Sent {
 };
 
 TEST(Batch, GivesEachMessageItsOwnOutcomeInOrder) {
-  for (const unsigned processes : {1u, 3u}) {
-    Client client(fakeOptions("honest", milliseconds(20'000), processes));
+  for (const auto& [processes, allowed] : {std::pair(1u, 1u), {3u, 1u}, {1u, 100u}, {2u, 9u}}) {
+    Client::Options options = fakeOptions("honest", milliseconds(20'000), processes);
+    options.messagesPerProcess = allowed;
+    Client client(options);
     const Sent sent(50);
     std::vector<Outcome<Response>> outcomes = client.unpackBatch<Response>(sent.requests);
     ASSERT_EQ(outcomes.size(), sent.expected.size());
     for (std::size_t i = 0; i < outcomes.size(); ++i) {
-      EXPECT_EQ(outcomeOf(outcomes[i]), sent.expected[i]) << i;
+      EXPECT_EQ(outcomeOf(outcomes[i]), sent.expected[i]) << i << " of " << allowed;
     }
     EXPECT_TRUE(client.unpackBatch<Response>({}).empty());
   }
@@ -83,14 +85,18 @@ TEST(Batch, TellsOutcomesAsTheyCome) {
 
 /// Each message has its own time limit; the batch as a whole may take longer.
 TEST(Batch, HoldsEachMessageToItsTimeLimit) {
-  Client client(fakeOptions("honest", milliseconds(1500)));
-  std::vector<Script> scripts(6, answer(1, 700));
-  scripts[1] = Script().then(Op::pause, 60'000);
-  std::vector<Client::Request> requests;
-  for (const Script& script : scripts) requests.push_back({.message = script});
-  std::vector<Outcome<Response>> outcomes = client.unpackBatch<Response>(requests);
-  for (std::size_t i = 0; i < outcomes.size(); ++i) {
-    EXPECT_EQ(outcomeOf(outcomes[i]), i == 1 ? "timedOut" : "record 1") << i;
+  for (const std::size_t allowed : {1, 100}) {
+    Client::Options options = fakeOptions("honest", milliseconds(1500));
+    options.messagesPerProcess = allowed;
+    Client client(options);
+    std::vector<Script> scripts(6, answer(1, 700));
+    scripts[1] = Script().then(Op::pause, 60'000);
+    std::vector<Client::Request> requests;
+    for (const Script& script : scripts) requests.push_back({.message = script});
+    std::vector<Outcome<Response>> outcomes = client.unpackBatch<Response>(requests);
+    for (std::size_t i = 0; i < outcomes.size(); ++i) {
+      EXPECT_EQ(outcomeOf(outcomes[i]), i == 1 ? "timedOut" : "record 1") << i;
+    }
   }
 }
 
@@ -108,7 +114,9 @@ TEST(Batch, IsEndedByAVisitorThatThrows) {
 }
 
 TEST(Async, CompletesEachMessageOnce) {
-  Client client(fakeOptions());
+  Client::Options options = fakeOptions();
+  options.messagesPerProcess = 30;
+  Client client(options);
   const Sent sent(50);
   std::vector<std::vector<String>> seen(50);
   std::size_t completed = 0;
