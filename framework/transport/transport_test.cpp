@@ -24,6 +24,11 @@ std::size_t peakBytes = 0;
 std::size_t costOf(void* block) {
   return malloc_usable_size(block) + sizeof(std::size_t);
 }
+
+void giveBack(void* block) noexcept {
+  if (block != nullptr) liveBytes -= costOf(block);
+  std::free(block);
+}
 }  // namespace
 
 void* operator new(std::size_t size) {
@@ -34,11 +39,10 @@ void* operator new(std::size_t size) {
   return block;
 }
 void operator delete(void* block) noexcept {
-  if (block != nullptr) liveBytes -= costOf(block);
-  std::free(block);
+  giveBack(block);
 }
 void operator delete(void* block, std::size_t) noexcept {
-  operator delete(block);
+  giveBack(block);
 }
 
 namespace Keelgate::Transport {

@@ -27,16 +27,23 @@ cat >"$machine/etc/systemd/system/inside.service" <<'UNIT'
 [Service]
 Type=oneshot
 ExecStart=/usr/bin/python3 /opt/inside.py
-StandardOutput=file:/opt/result
+StandardOutput=append:/opt/result
 StandardError=journal
 ExecStopPost=-/usr/bin/systemctl --no-block poweroff
 UNIT
 
-# Landlock is not among what a container may call by default.
-timeout 180 systemd-nspawn --quiet --boot --register=no --keep-unit --private-network \
-  --link-journal=no --console=read-only --directory="$machine" \
-  --system-call-filter="landlock_create_ruleset landlock_add_rule landlock_restrict_self" \
-  systemd.wants=inside.service </dev/null >"$work/console.log" 2>&1 || true
-[ -e "$machine/opt/result" ] || { cat "$work/console.log"; exit 1; }
-cat "$machine/opt/result"
-tail -n 1 "$machine/opt/result" | grep -q ' passed, 0 failed$'
+# Landlock is not among what a container may call by default. The second boot finds what the first one
+# has set up.
+cp -a "$machine" "$machine.fresh"
+for log in first second; do
+  timeout 180 systemd-nspawn --quiet --boot --register=no --keep-unit --private-network \
+    --link-journal=no --console=read-only --directory="$machine" \
+    --system-call-filter="landlock_create_ruleset landlock_add_rule landlock_restrict_self" \
+    systemd.wants=inside.service </dev/null >"$work/$log.log" 2>&1 || true
+  [ -e "$machine/opt/result" ] || { cat "$work/$log.log"; exit 1; }
+done
+result=$(cat "$machine/opt/result")
+echo "$result"
+rm -rf "$machine"
+mv "$machine.fresh" "$machine"
+[ "$(echo "$result" | grep -c ' passed, 0 failed$')" = 2 ]

@@ -1,5 +1,6 @@
 # SPDX-License-Identifier: Apache-2.0
 """Run by systemd inside the machine that boot.sh made: the units as an administrator meets them."""
+import json
 import os
 import pathlib
 import socket
@@ -105,6 +106,26 @@ def groups_and_users():
         client.communicate()
 
 
+def crowds_and_kills():
+    crowd = [subprocess.Popen(UNPACK + [SHARED, "--time-limit", "100", "--processes", "1"],
+                              stdout=subprocess.PIPE, stderr=subprocess.STDOUT, text=True)
+             for _ in range(100)]
+    answers = [client.communicate()[0] for client in crowd]
+    served = [text for text in answers if text.startswith('{"record"')]
+    # Above MaxConnectionsPerSource a client is told that there is no service for it.
+    refused = [text for text in answers if text.startswith("keelgate: the service could not be")]
+    check(len(served) >= 4 and len(served) + len(refused) == 100,
+          f"a hundred clients at once: {len(served)} served, {set(answers)}")
+    client = idle(SHARED)
+    run("systemctl", "kill", "--signal=KILL", instances()[0])
+    request = json.dumps({"record": "PropertyList", "message": "PHBsaXN0Pjx0cnVlLz48L3BsaXN0Pg=="})
+    text = client.communicate(f"{request}\n{request}\n")[0]
+    # The first may have been given to the service that was killed.
+    check(text.endswith('{"record":"PropertyList","value":true}\n') and text.count("\n") == 2,
+          f"a client whose service was killed: {text}")
+    check(unpacks(SHARED), "another client after it")
+
+
 def packages():
     client = idle(SHARED)
     again = run("dpkg", "-i", *pathlib.Path("/opt/packages").glob("keelgate_*.deb"))
@@ -122,12 +143,23 @@ def packages():
     client.kill()
 
 
-check(run("systemctl", "is-active", "keelgate.socket").stdout.strip() == "inactive",
-      "nothing listens before somebody wants it")
-run("systemctl", "enable", "--now", "keelgate.socket", "keelgate@bob.socket")
-for test in (layers_and_root, bursts, groups_and_users, packages):
+def first_boot():
+    check(run("systemctl", "is-active", "keelgate.socket").stdout.strip() == "inactive",
+          "nothing listens before somebody wants it")
+    run("systemctl", "enable", "--now", "keelgate.socket", "keelgate@bob.socket")
+
+
+def second_boot():
+    check(unpacks(SHARED, "--require-layers"), "the socket after a reboot")
+
+
+REBOOTED = pathlib.Path("/opt/rebooted")
+tests = ((second_boot, packages) if REBOOTED.exists() else
+         (first_boot, layers_and_root, bursts, groups_and_users, crowds_and_kills))
+for test in tests:
     try:
         test()
     except Exception as error:  # The others are worth seeing all the same.
         check(False, f"{test.__name__}: {error!r}")
 print(f"{counts[True]} passed, {counts[False]} failed")
+REBOOTED.touch()
