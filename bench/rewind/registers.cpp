@@ -1,0 +1,66 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "bench/rewind/registers.h"
+
+#include <elf.h>
+#include <sys/ptrace.h>
+#include <sys/uio.h>
+
+#include <cstring>
+
+namespace Keelgate::Rewind {
+
+namespace {
+
+/// More than any processor has.
+constexpr std::size_t largestExtended = std::size_t{16} << 10;
+
+bool getSet(pid_t process, unsigned which, iovec& set) {
+  return ptrace(PTRACE_GETREGSET, process, reinterpret_cast<void*>(std::size_t{which}), &set) == 0;
+}
+
+bool putSet(pid_t process, unsigned which, const void* from, std::size_t size) {
+  // The kernel only reads it.
+  iovec set{.iov_base = const_cast<void*>(from), .iov_len = size};
+  return ptrace(PTRACE_SETREGSET, process, reinterpret_cast<void*>(std::size_t{which}), &set) == 0;
+}
+
+bool readGeneral(pid_t process, user_regs_struct& general) {
+  iovec set{.iov_base = &general, .iov_len = sizeof general};
+  return getSet(process, NT_PRSTATUS, set) && set.iov_len == sizeof general;
+}
+
+}  // namespace
+
+bool Registers::operator==(const Registers& other) const noexcept {
+  return std::memcmp(&general, &other.general, sizeof general) == 0 && extended == other.extended;
+}
+
+bool readRegisters(pid_t process, Registers& registers) {
+  registers.extended.resize(largestExtended);
+  iovec set{.iov_base = registers.extended.data(), .iov_len = registers.extended.size()};
+  if (!getSet(process, NT_X86_XSTATE, set)) return false;
+  registers.extended.resize(set.iov_len);
+  return readGeneral(process, registers.general);
+}
+
+bool writeRegisters(pid_t process, const Registers& registers) {
+  user_regs_struct now;
+  // Before anything is written: the sets of 32-bit code have other sizes.
+  if (!readGeneral(process, now)) return false;
+  if (!putSet(process, NT_PRSTATUS, &registers.general, sizeof registers.general)) return false;
+  if (!putSet(process, NT_X86_XSTATE, registers.extended.data(), registers.extended.size())) {
+    return false;
+  }
+  return readGeneral(process, now) && std::memcmp(&now, &registers.general, sizeof now) == 0;
+}
+
+Registers beforeCall(Registers atEntry) {
+  constexpr unsigned long long lengthOfCall = 2;
+  atEntry.general.rip -= lengthOfCall;
+  atEntry.general.rax = atEntry.general.orig_rax;
+  // Not in a call: or the kernel would start it over by itself.
+  atEntry.general.orig_rax = ~0ULL;
+  return atEntry;
+}
+
+}  // namespace Keelgate::Rewind
