@@ -53,7 +53,8 @@ void growStack() {
 [[noreturn]] void live(const std::function<void()>& body) {
   prctl(PR_SET_DUMPABLE, 1, 0, 0, 0);
   const long tracking = syscall(SYS_userfaultfd, O_CLOEXEC | UFFD_USER_MODE_ONLY);
-  if (tracking < 0 || dup2(static_cast<int>(tracking), trackingDescriptor) < 0) _exit(ownEnd);
+  if (tracking < 0 || dup3(static_cast<int>(tracking), trackingDescriptor, O_CLOEXEC) < 0)
+    _exit(ownEnd);
   growStack();
   kill(getpid(), SIGSTOP);
   prctl(PR_SET_DUMPABLE, 0, 0, 0, 0);

@@ -118,6 +118,8 @@ bool RewindingZygote::takeFrame() {
 /// Workers for long messages are forked and end: they dirty more than it pays to put back.
 void RewindingZygote::fork(std::uint32_t slot, int channel) {
   const bool rewinding = messages_ == 1 && workerSeal_.longestMessage <= shortMessage;
+  // One worker serves all of these, so it is made for the longest.
+  if (rewinding) workerSeal_.longestMessage = shortMessage;
   if (rewinding && (rewindOne(slot, channel) || startOne(slot, channel))) return;
   forkOnce(slot, channel);
 }

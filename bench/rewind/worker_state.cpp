@@ -23,6 +23,7 @@ namespace {
 
 /// What counts and cannot be read by the process itself.
 constexpr std::array counting{"State:",
+                              "SigQ:",
                               "VmHWM:",
                               "VmRSS:",
                               "RssAnon:",
