@@ -145,14 +145,14 @@ TEST(Pool, WhatCannotBeAnsweredIsNotSent) {
   Client client(options);
   EXPECT_EQ(outcomeOf(client, Data(1001)), "messageTooLarge");
   EXPECT_EQ(outcomeOf(client, Data(1000)), "crashed");
-  for (const auto& [length, outcome] :
-       {std::pair(65'536u, "crashed"), {65'537u, "messageTooLarge"}}) {
-    EXPECT_EQ(outcomeOf([&] {
-                client.unpackClientMessage({}, {.command = 1, .service = String(length, 's')});
-                return 0;
-              }),
-              outcome);
-  }
+  const auto naming = [&](std::size_t length) {
+    return outcomeOf([&] {
+      client.unpackClientMessage({}, {.command = 1, .service = String(length, 's')});
+      return 0;
+    });
+  };
+  EXPECT_EQ(naming(65'536), "crashed");
+  EXPECT_EQ(naming(65'537), "messageTooLarge");
   using VespKeelgateService::VespClientMessageUnpackingError;
   EXPECT_THROW(client.unpackClientMessage({}, {.command = 1, .service = "\xff"}),
                VespClientMessageUnpackingError);

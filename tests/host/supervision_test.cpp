@@ -309,9 +309,9 @@ TEST(Stack, WhatIsPromisedIsEnoughAndLessIsRefused) {
     pthread_attr_setstacksize(&attributes, stack);
     pthread_t thread;
     const auto run = [](void* of) -> void* {
-      auto& [client, reply, outcome] = *static_cast<Trial*>(of);
-      outcome = outcomeOf(
-          [&] { return client.unpack<PulseUserPayload>(Script().answer(reply)).command; });
+      Trial& its = *static_cast<Trial*>(of);
+      its.outcome = outcomeOf(
+          [&] { return its.client.unpack<PulseUserPayload>(Script().answer(its.reply)).command; });
       return nullptr;
     };
     EXPECT_EQ(pthread_create(&thread, &attributes, run, &trial), 0);
