@@ -9,8 +9,6 @@
 
 #include <filesystem>
 #include <fstream>
-#include <functional>
-#include <vector>
 
 namespace Keelgate {
 namespace {
@@ -65,32 +63,31 @@ TEST_F(ServiceLocation, FollowsLinksDotsAndRelativePaths) {
 }
 
 TEST_F(ServiceLocation, RefusesWhatOthersCanReplaceAndSaysWhere) {
-  struct Row {
-    const char* what;
+  const uid_t self = geteuid();
+  const struct {
     const char* place;
     mode_t mode;
     uid_t owner;
     const char* sentence;
+  } rows[] = {
+      {"outer/inner/service", 0775, self, "/inner/service may be written"},
+      {"outer/inner/service", 0757, self, "/inner/service may be written"},
+      {"outer/inner", 0777, self, "/inner may be written by others"},
+      {"outer", 0775, self, "outer may be written by others"},
+      {"outer", 01777, self, "found"},
+      {"outer/inner/service", 0755, stranger, "belongs to user 12345"},
+      {"outer/inner", 0755, stranger, "/inner belongs to user 12345"},
+      {"outer", 0755, stranger, "outer belongs to user 12345"},
+      {"outer", 01777, stranger, "outer belongs to user 12345"},
   };
-  const uid_t self = geteuid();
-  const Row rows[] = {
-      {"a file for its group", "outer/inner/service", 0775, self, "/inner/service may be written"},
-      {"a file for all", "outer/inner/service", 0757, self, "/inner/service may be written"},
-      {"its folder", "outer/inner", 0777, self, "/inner may be written by others"},
-      {"a folder above", "outer", 0775, self, "outer may be written by others"},
-      {"a sticky folder", "outer", 01777, self, "found"},
-      {"a stranger's file", "outer/inner/service", 0755, stranger, "belongs to user 12345"},
-      {"a stranger's folder", "outer/inner", 0755, stranger, "/inner belongs to user 12345"},
-      {"a stranger's folder above", "outer", 0755, stranger, "outer belongs to user 12345"},
-      {"a stranger's sticky folder", "outer", 01777, stranger, "outer belongs to user 12345"},
-  };
-  for (const Row& row : rows) {
+  for (const auto& row : rows) {
     if (row.owner != self && self != 0) continue;
     const fs::path place = root_ / row.place;
     ASSERT_EQ(chown(place.c_str(), row.owner, static_cast<gid_t>(-1)), 0);
     ASSERT_EQ(chmod(place.c_str(), row.mode), 0);
     for (const char* path : {"outer/inner/service", "link/inner/service"}) {
-      EXPECT_NE(outcome(path).find(row.sentence), String::npos) << row.what << outcome(path);
+      EXPECT_NE(outcome(path).find(row.sentence), String::npos)
+          << row.place << row.mode << outcome(path);
     }
     ASSERT_EQ(chown(place.c_str(), self, static_cast<gid_t>(-1)), 0);
     ASSERT_EQ(chmod(place.c_str(), 0755), 0);

@@ -68,22 +68,6 @@ void becomeUser(const std::vector<gid_t>& with) {
   }
 }
 
-void allowOnly(__rlimit_resource_t what, rlim_t amount) {
-  const rlimit small{.rlim_cur = amount, .rlim_max = amount};
-  setrlimit(what, &small);
-}
-
-/// What an environment takes for granted of the machine; of a container, perhaps, it is not so.
-enum class Needs {
-  nothing,
-  /// For root.
-  userNamespaces,
-  /// For others, with the rights that they bring: security modules take these away.
-  usersNamespaces,
-  /// To make namespaces without a user namespace.
-  privilege
-};
-
 /// Goes on in a new process namespace, whose list of processes nobody has mounted.
 void becomeFirstProcess() {
   if (unshare(CLONE_NEWPID) != 0) _exit(126);
@@ -96,147 +80,135 @@ void becomeFirstProcess() {
   _exit(WIFEXITED(status) ? WEXITSTATUS(status) : 126);
 }
 
-constexpr unsigned inner = layerMountNamespace | layerNetworkNamespace | layerIpcNamespace |
-                           layerUtsNamespace | layerCgroupNamespace | layerEmptyRoot;
-constexpr unsigned namespaces = inner | layerUserNamespace | layerPidNamespace;
+constexpr unsigned namespaces = layerUserNamespace | layerPidNamespace | layerMountNamespace |
+                                layerNetworkNamespace | layerIpcNamespace | layerUtsNamespace |
+                                layerCgroupNamespace | layerEmptyRoot;
 constexpr unsigned allNamespaceFlags = CLONE_NEWUSER | CLONE_NEWPID | CLONE_NEWNS | CLONE_NEWNET |
                                        CLONE_NEWIPC | CLONE_NEWUTS | CLONE_NEWCGROUP;
 
+const Refused noClone{SYS_clone, EPERM, allNamespaceFlags};
+const Refused noUnshare{SYS_unshare, EPERM};
+const Refused noMaps{SYS_openat, EACCES, O_WRONLY, 2};
+
+using Groups = Optional<std::vector<gid_t>>;
+const Groups root = std::nullopt;
+const Groups noGroups = std::vector<gid_t>();
+const Groups groups = std::vector<gid_t>{1000, 27};
+
+/// Holds a copy of the service where a user may read it, and inside the chroot. No mount point, or
+/// the chroot would be like any other root.
+const std::string folder = "/var/tmp/keelgate-" + std::to_string(getpid());
+
+std::uint64_t whole() {
+  static const std::uint64_t layers = RawClient(OBEDIENT_SERVICE).layers();
+  return layers;
+}
+
+// What an environment takes for granted of the machine; of a container, perhaps, it is not so.
+bool nothing() {
+  return true;
+}
+bool userNamespaces() {
+  return (whole() & layerUserNamespace) != 0;
+}
+/// With the rights that they bring: security modules take these away.
+bool usersNamespaces() {
+  return Testing::inFork([] {
+           becomeUser({});
+           return unshare(CLONE_NEWUSER | CLONE_NEWNS) == 0 &&
+                  mount("", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) == 0;
+         }) == 1;
+}
+/// To make namespaces without a user namespace.
+bool privilege() {
+  return Testing::inFork([] { return unshare(CLONE_NEWNS | CLONE_NEWPID) == 0; }) == 1;
+}
+
+void nothingTaken() {}
 struct Environment {
   std::string name;
   std::vector<Refused> refused = {};
   /// Second walls that are missing then.
   unsigned missing = 0;
-  /// Or part of the sentence of a service that refuses.
-  std::string refusal = {};
   /// The caller is a user with these groups, and not root.
-  Optional<std::vector<gid_t>> user = {};
-  std::function<void()> before = [] {
-  };
+  Groups user = root;
   /// Without it this environment is another.
-  Needs needs = Needs::nothing;
+  bool (*needs)() = nothing;
+  void (*before)() = nothingTaken;
+  /// Part of the sentence of a service that refuses.
+  std::string refusal = {};
 };
 
-const std::vector<gid_t> groups{1000, 27};
+void enterRoot() {
+  if (chroot(folder.c_str()) != 0 || chdir("/") != 0) _exit(126);
+}
+void ignoreSignals() {
+  for (int number = 1; number < NSIG; ++number) std::signal(number, SIG_IGN);
+}
 
-/// Holds a copy of the service where a user may read it, and inside the chroot. No mount point, or
-/// the chroot would be like any other root.
-const std::string& folder() {
-  struct Folder {
-    std::string path = "/var/tmp/keelgate-" + std::to_string(getpid());
-    pid_t owner = getpid();
-    Folder() {
-      using std::filesystem::perms;
-      std::filesystem::remove_all(path);
-      std::filesystem::create_directory(path);
-      std::filesystem::copy_file(OBEDIENT_SERVICE, path + "/service");
-      for (const std::string& made : {path, path + "/service"}) {
-        std::filesystem::permissions(made, perms(0755));
-      }
-    }
-    ~Folder() {
-      if (getpid() == owner) std::filesystem::remove_all(path);
-    }
-    Folder(const Folder&) = delete;
-    Folder& operator=(const Folder&) = delete;
-  };
-  static const Folder made;
-  return made.path;
+template <__rlimit_resource what, rlim_t amount>
+void allowOnly() {
+  const rlimit small{.rlim_cur = amount, .rlim_max = amount};
+  setrlimit(what, &small);
+}
+
+/// A service that refuses with this sentence.
+Environment refusing(std::string name, const char* sentence, std::vector<Refused> refused,
+                     void (*before)() = nothingTaken) {
+  return {std::move(name), std::move(refused), 0, root, nothing, before, sentence};
 }
 
 const std::vector<Environment> environments{
-    {.name = "nothing taken away"},
-    {.name = "a container's profile, as root",
-     .refused = {{SYS_clone, EPERM, allNamespaceFlags},
-                 {SYS_unshare, EPERM},
-                 {SYS_mount, EPERM},
-                 {SYS_pivot_root, EPERM}},
-     .missing = namespaces},
-    {.name = "a container's profile, as a user with groups",
-     .refused = {{SYS_clone, EPERM, allNamespaceFlags}, {SYS_unshare, EPERM}},
-     .missing = namespaces | layerNoSupplementaryGroups,
-     .user = groups},
-    {.name = "a user", .user = std::vector<gid_t>(), .needs = Needs::usersNamespaces},
-    {.name = "a user with his groups",
-     .missing = layerNoSupplementaryGroups,
-     .user = groups,
-     .needs = Needs::usersNamespaces},
-    {.name = "user namespaces switched off, as root",
-     .refused = {{SYS_clone, ENOSPC, CLONE_NEWUSER}},
-     .missing = layerUserNamespace,
-     .needs = Needs::privilege},
-    {.name = "user namespaces switched off, as a user",
-     .refused = {{SYS_clone, EPERM, CLONE_NEWUSER}},
-     .missing = namespaces,
-     .user = std::vector<gid_t>()},
-    {.name = "maps refused, as root",
-     .refused = {{SYS_openat, EACCES, O_WRONLY, 2}},
-     .missing = layerUserNamespace,
-     .needs = Needs::privilege},
-    {.name = "maps refused, as a user",
-     .refused = {{SYS_openat, EACCES, O_WRONLY, 2}},
-     .missing = layerUserNamespace,
-     .user = std::vector<gid_t>(),
-     .needs = Needs::usersNamespaces},
-    {.name = "the process list of another process namespace",
-     .missing = layerUserNamespace,
-     .before = becomeFirstProcess,
-     .needs = Needs::privilege},
-    {.name = "no process namespace",
-     .refused = {{SYS_clone, EINVAL, CLONE_NEWPID}},
-     .missing = layerPidNamespace},
-    {.name = "namespaces given, mounting refused by a security module",
-     .refused = {{SYS_mount, EACCES}},
-     .missing = layerEmptyRoot},
-    {.name = "one namespace unknown to the kernel",
-     .refused = {{SYS_unshare, EINVAL, CLONE_NEWCGROUP}},
-     .missing = layerCgroupNamespace},
-    {.name = "root that may not change its identifiers, and no namespaces",
-     .refused = {{SYS_clone, EPERM, allNamespaceFlags},
-                 {SYS_unshare, EPERM},
-                 {SYS_setresuid, EPERM},
-                 {SYS_setresgid, EPERM}},
-     .missing = namespaces | layerNotRoot},
-    {.name = "a kernel without Landlock",
-     .refused = {{SYS_landlock_create_ruleset, ENOSYS}},
-     .missing = layerLandlock},
-    {.name = "Landlock switched off",
-     .refused = {{SYS_landlock_create_ruleset, EOPNOTSUPP}},
-     .missing = layerLandlock},
-    {.name = "a kernel without close_range", .refused = {{SYS_close_range, ENOSYS}}},
+    {"nothing taken away"},
+    {"a container's profile, as root",
+     {noClone, noUnshare, {SYS_mount, EPERM}, {SYS_pivot_root, EPERM}},
+     namespaces},
+    {"a container's profile, as a user with groups",
+     {noClone, noUnshare},
+     namespaces | layerNoSupplementaryGroups,
+     groups},
+    {"a user", {}, 0, noGroups, usersNamespaces},
+    {"a user with his groups", {}, layerNoSupplementaryGroups, groups, usersNamespaces},
+    {"user namespaces switched off, as root",
+     {{SYS_clone, ENOSPC, CLONE_NEWUSER}},
+     layerUserNamespace,
+     root,
+     privilege},
+    {"user namespaces switched off, as a user",
+     {{SYS_clone, EPERM, CLONE_NEWUSER}},
+     namespaces,
+     noGroups},
+    {"maps refused, as root", {noMaps}, layerUserNamespace, root, privilege},
+    {"maps refused, as a user", {noMaps}, layerUserNamespace, noGroups, usersNamespaces},
+    {"the process list of another process namespace",
+     {},
+     layerUserNamespace,
+     root,
+     privilege,
+     becomeFirstProcess},
+    {"no process namespace", {{SYS_clone, EINVAL, CLONE_NEWPID}}, layerPidNamespace},
+    {"namespaces given, mounting refused by a security module",
+     {{SYS_mount, EACCES}},
+     layerEmptyRoot},
+    {"one namespace unknown to the kernel",
+     {{SYS_unshare, EINVAL, CLONE_NEWCGROUP}},
+     layerCgroupNamespace},
+    {"root that may not change its identifiers, and no namespaces",
+     {noClone, noUnshare, {SYS_setresuid, EPERM}, {SYS_setresgid, EPERM}},
+     namespaces | layerNotRoot},
+    {"a kernel without Landlock", {{SYS_landlock_create_ruleset, ENOSYS}}, layerLandlock},
+    {"Landlock switched off", {{SYS_landlock_create_ruleset, EOPNOTSUPP}}, layerLandlock},
+    {"a kernel without close_range", {{SYS_close_range, ENOSYS}}},
     // A user namespace is refused in there; the process still becomes nobody.
-    {.name = "chroot",
-     .missing = layerUserNamespace | layerEmptyRoot,
-     .before =
-         [] {
-           if (chroot(folder().c_str()) != 0 || chdir("/") != 0) _exit(126);
-         },
-     .needs = Needs::privilege},
-    {.name = "signals ignored by the one who starts it",
-     .before =
-         [] {
-           for (int number = 1; number < NSIG; ++number) std::signal(number, SIG_IGN);
-         }},
-    {.name = "seccomp refused", .refused = {{SYS_seccomp, EPERM}}, .refusal = "allow seccomp"},
-    {.name = "limits refused", .refused = {{SYS_prlimit64, EPERM}}, .refusal = "resource limits"},
-    {.name = "prctl refused", .refused = {{SYS_prctl, EPERM}}, .refusal = "allow prctl"},
-    {.name = "capabilities kept",
-     .refused = {{SYS_capset, EPERM}},
-     .refusal = "capset",
-     .needs = Needs::userNamespaces},
-    {.name = "no process to be had", .refused = {{SYS_clone, EAGAIN}}, .refusal = "ulimit -u"},
-    {.name = "too little stack",
-     .refusal = "ulimit -H -s",
-     .before =
-         [] {
-           allowOnly(RLIMIT_STACK, 1 << 20);
-         }},
-    {.name = "an address space that is too small",
-     .refusal = "ulimit -v",
-     .before =
-         [] {
-           allowOnly(RLIMIT_AS, 64 << 20);
-         }},
+    {"chroot", {}, layerUserNamespace | layerEmptyRoot, root, privilege, enterRoot},
+    {"signals ignored by the one who starts it", {}, 0, root, nothing, ignoreSignals},
+    refusing("seccomp refused", "allow seccomp", {{SYS_seccomp, EPERM}}),
+    refusing("limits refused", "resource limits", {{SYS_prlimit64, EPERM}}),
+    refusing("prctl refused", "allow prctl", {{SYS_prctl, EPERM}}),
+    {"capabilities kept", {{SYS_capset, EPERM}}, 0, root, userNamespaces, nothingTaken, "capset"},
+    refusing("no process to be had", "ulimit -u", {{SYS_clone, EAGAIN}}),
+    refusing("too little stack", "ulimit -H -s", {}, allowOnly<RLIMIT_STACK, 1 << 20>),
+    refusing("an address space that is too small", "ulimit -v", {}, allowOnly<RLIMIT_AS, 64 << 20>),
 };
 
 /// In the environment of the calling process, for good: what its client's service has and answers,
@@ -267,37 +239,16 @@ class EnvironmentTest : public testing::TestWithParam<Environment> {
  protected:
   void SetUp() override {
     if (geteuid() != 0) GTEST_SKIP() << "only root can imitate every environment";
-    if (!has(GetParam().needs)) GTEST_SKIP() << "this machine does not give what it takes away";
-    folder();
+    if (!GetParam().needs()) GTEST_SKIP() << "this machine does not give what it takes away";
   }
-
-  static bool has(Needs needs) {
-    switch (needs) {
-      case Needs::userNamespaces:
-        return (whole() & layerUserNamespace) != 0;
-      case Needs::usersNamespaces:
-        return Testing::inFork([] {
-                 becomeUser({});
-                 return unshare(CLONE_NEWUSER | CLONE_NEWNS) == 0 &&
-                        mount("", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) == 0;
-               }) == 1;
-      case Needs::privilege:
-        return Testing::inFork([] { return unshare(CLONE_NEWNS | CLONE_NEWPID) == 0; }) == 1;
-      case Needs::nothing:
-        break;
+  static void SetUpTestSuite() {
+    std::filesystem::create_directory(folder);
+    std::filesystem::copy_file(OBEDIENT_SERVICE, folder + "/service");
+    for (const std::string& made : {folder, folder + "/service"}) {
+      std::filesystem::permissions(made, std::filesystem::perms(0755));
     }
-    return true;
   }
-
-  static std::uint64_t whole() {
-    static const std::uint64_t layers = RawClient(OBEDIENT_SERVICE).layers();
-    return layers;
-  }
-  static void enter(const Environment& environment) {
-    environment.before();
-    if (!environment.refused.empty()) refuseCalls(environment.refused);
-    if (environment.user) becomeUser(*environment.user);
-  }
+  static void TearDownTestSuite() { std::filesystem::remove_all(folder); }
 };
 
 TEST(C11, OneDescriptorIsTrueWithoutCloseRange) {
@@ -328,8 +279,10 @@ TEST_P(EnvironmentTest, RunsAndReportsOrRefusesWithReason) {
   char* const seenThere = static_cast<char*>(
       mmap(nullptr, room, PROT_READ | PROT_WRITE, MAP_SHARED | MAP_ANONYMOUS, -1, 0));
   Testing::inFork([&] {
-    enter(environment);
-    const std::string service = folder() + "/service";
+    environment.before();
+    if (!environment.refused.empty()) refuseCalls(environment.refused);
+    if (environment.user) becomeUser(*environment.user);
+    const std::string service = folder + "/service";
     seenByClient(access(service.c_str(), X_OK) == 0 ? service : "/service")
         .copy(seenThere, room - 1);
     return 0;

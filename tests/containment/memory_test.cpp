@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 /// How much memory a message gets, and where it lies.
 #include "framework/contracts/memory_budget.h"
-#include "tests/containment/containment_testing.h"
+#include "tests/containment/raw_client.h"
 
 #include <gtest/gtest.h>
 #include <sys/resource.h>

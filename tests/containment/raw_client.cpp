@@ -114,8 +114,7 @@ WorkerEnd RawClient::end(std::uint32_t slot) {
     const ControlFrame frame = receiveFrame();
     if (frame.kind != ControlKind::exit) throw std::runtime_error("the service has gone");
     ended_[frame.slot] = {.status = static_cast<int>(frame.numbers[0]),
-                          .peakBytes = frame.numbers[1],
-                          .cpuMicroseconds = frame.numbers[2]};
+                          .peakBytes = frame.numbers[1]};
   }
   return ended_.extract(slot).mapped();
 }

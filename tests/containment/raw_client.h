@@ -8,6 +8,7 @@
 #include "framework/protocol/frames.h"
 #include "tests/processes.h"
 
+#include <gtest/gtest.h>
 #include <keelgate/records.h>
 #include <sys/types.h>
 #include <functional>
@@ -23,7 +24,6 @@ namespace Keelgate::Test {
 struct WorkerEnd {
   int status;
   std::uint64_t peakBytes;
-  std::uint64_t cpuMicroseconds;
 
   [[nodiscard]] int signal() const;
   /// -1 when a signal ended it.
@@ -97,5 +97,17 @@ void sendMessage(int channel, std::string_view message, std::uint32_t sequence =
 RawReply receiveReply(int channel, std::uint32_t sequence = 0);
 /// The messageId of the answer, which is what a call gave back.
 Optional<Int64> resultOf(const RawReply& reply);
+
+/// A service that is ready; workers that must go on answering afterwards.
+class Worker : public testing::Test {
+ protected:
+  void SetUp() override { ASSERT_TRUE(service_.ready()) << service_.refusal(); }
+  void TearDown() override {
+    if (HasFatalFailure() || IsSkipped()) return;
+    EXPECT_EQ(resultOf(service_.obey("answer").first), 0);
+  }
+
+  RawClient service_{OBEDIENT_SERVICE};
+};
 
 }  // namespace Keelgate::Test

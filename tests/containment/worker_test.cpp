@@ -3,8 +3,8 @@
 #include "framework/contracts/layers.h"
 #include "framework/contracts/start_step.h"
 #include "framework/protocol/data_frames.h"
-#include "tests/containment/containment_testing.h"
 #include "tests/containment/machine.h"
+#include "tests/containment/raw_client.h"
 
 #include <gtest/gtest.h>
 #include <keelgate/records.h>
