@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 /// The heap of a worker: all of it is there before the first byte from outside is read, and no more
-/// comes. That of a short message is mapped once, in the zygote, and copied by each fork; as long as
-/// nobody writes to it that costs nothing.
+/// comes. That of a short message is mapped once, in the zygote, and copied by each fork; as long
+/// as nobody writes to it that costs nothing.
 ///
 /// It lies in a mapping that the kernel places, and begins at a random point of it. The area that
 /// the C library grows by itself, next to where a static program ends, has 18 bits of randomness:
