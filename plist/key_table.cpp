@@ -1,8 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "plist/key_table.h"
 
-#include "plist/key_hash.h"
-
 #include <bit>
 
 namespace PropertyList {
@@ -35,35 +33,25 @@ KeyTable::KeyTable(Store& store) : store_(store), colliding_(Less{&store}) {
   slots_.zero(std::size_t{1} << bits_);
 }
 
-std::uint32_t& KeyTable::slot(std::uint64_t digest, std::uint32_t step) noexcept {
-  return slots_[(keyHash(digest, bits_) + step * (step + 1) / 2) & (slots_.size() - 1)];
-}
-
-/// The number of the key with this node's text, which is new as a rule. There is room for it.
-std::uint32_t KeyTable::find(std::uint32_t node) {
-  const std::string_view text = store_.text(store_.nodes[node]);
-  const std::uint64_t digest = keyDigest(text);
-  std::uint32_t* vacant = nullptr;
-  for (std::uint32_t step = 0; step < triedSlots && vacant == nullptr; ++step) {
-    std::uint32_t& tried = slot(digest, step);
-    if (tried == 0) {
-      vacant = &tried;
-    } else if (store_.keys[tried - 1].digest == digest &&
-               (isWholeKey(digest) || store_.keyText(tried) == text)) {
-      return tried;
+/// The number of the key with this node's text. There is room for it.
+std::uint32_t KeyTable::find(std::uint32_t node, std::uint64_t digest) {
+  for (std::uint32_t step = 0; step < triedSlots; ++step) {
+    Slot& tried = slot(digest, step);
+    if (tried.number == 0) return append(node, digest, tried);
+    if (tried.tag == tagOf(digest) && store_.keys[tried.number - 1].digest == digest &&
+        (isWholeKey(digest) || store_.keyText(tried.number) == store_.text(store_.nodes[node]))) {
+      return tried.number;
     }
   }
-  if (!colliding_.empty()) {
-    const auto found = colliding_.find(text);
-    if (found != colliding_.end()) return *found;
-  }
-  store_.keys.push({.digest = digest, .node = node, .dictionary = 0});
-  const auto number = static_cast<std::uint32_t>(store_.keys.size());
-  if (vacant != nullptr) {
-    *vacant = number;
-  } else {
-    colliding_.insert(number);
-  }
+  return findColliding(node, digest);
+}
+
+/// Of a key for which no slot was vacant, now or when it came.
+std::uint32_t KeyTable::findColliding(std::uint32_t node, std::uint64_t digest) {
+  const auto found = colliding_.find(store_.text(store_.nodes[node]));
+  if (found != colliding_.end()) return *found;
+  const std::uint32_t number = append(node, digest);
+  colliding_.insert(number);
   return number;
 }
 
@@ -79,9 +67,9 @@ void KeyTable::grow(std::size_t keys) {
 void KeyTable::place(std::uint32_t number) {
   const std::uint64_t digest = store_.keys[number - 1].digest;
   for (std::uint32_t step = 0; step < triedSlots; ++step) {
-    std::uint32_t& tried = slot(digest, step);
-    if (tried != 0) continue;
-    tried = number;
+    Slot& tried = slot(digest, step);
+    if (tried.number != 0) continue;
+    tried = {number, tagOf(digest)};
     return;
   }
   colliding_.insert(number);

@@ -11,6 +11,7 @@
 /// A resource of one reading; one thread.
 #pragma once
 
+#include "plist/key_hash.h"
 #include "plist/small_buffer.h"
 #include "plist/store.h"
 
@@ -30,11 +31,24 @@ class KeyTable {
   void reserve(std::size_t more) {
     if (2 * (store_.keys.size() + more) > slots_.size()) grow(store_.keys.size() + more);
   }
+  /// The digest of a node's text, for `add`, unless it has its number: no text is hashed twice. The
+  /// slot where it will be looked for is fetched meanwhile: of a large table the cache has few.
+  std::uint64_t digest(std::uint32_t node) const noexcept {
+    if (store_.nodes[node].key() != 0) return 0;
+    const std::uint64_t digest = keyDigest(store_.text(store_.nodes[node]));
+    __builtin_prefetch(&slots_[keyHash(digest, bits_)], 1);
+    return digest;
+  }
   /// Numbers the key of a dictionary that has this node, a string. False if the dictionary has the
   /// key already: its keys are added one after the other, with those of no other dictionary
   /// between them. Throws std::bad_alloc.
-  bool add(std::uint32_t dictionary, std::uint32_t node) {
-    if (store_.nodes[node].key() == 0) store_.nodes[node].setKey(find(node));
+  bool add(std::uint32_t dictionary, std::uint32_t node, std::uint64_t digest) {
+    if (store_.nodes[node].key() == 0) {
+      Slot& first = slot(digest, 0);
+      // As a rule a key is new, and nothing is where it would be.
+      const bool isVacant = first.number == 0;
+      store_.nodes[node].setKey(isVacant ? append(node, digest, first) : find(node, digest));
+    }
     Key& key = store_.keys[store_.nodes[node].key() - 1];
     const bool isNew = key.dictionary != dictionary + 1;
     key.dictionary = dictionary + 1;
@@ -50,14 +64,37 @@ class KeyTable {
     bool operator()(std::string_view left, std::uint32_t right) const noexcept;
   };
 
-  std::uint32_t find(std::uint32_t node);
+  /// 0 is vacant. A part of the digest stands beside the number, so that a key that has another is
+  /// passed over without a look at it.
+  struct Slot {
+    std::uint32_t number;
+    std::uint32_t tag;
+  };
+
+  /// The bits between those that choose the slot and the lowest, in which little of the key has a
+  /// say.
+  static std::uint32_t tagOf(std::uint64_t digest) noexcept {
+    return static_cast<std::uint32_t>(keyHash(digest, 48));
+  }
+  Slot& slot(std::uint64_t digest, std::uint32_t step) noexcept {
+    return slots_[(keyHash(digest, bits_) + step * (step + 1) / 2) & (slots_.size() - 1)];
+  }
+  std::uint32_t append(std::uint32_t node, std::uint64_t digest) {
+    store_.keys.push({.digest = digest, .node = node, .dictionary = 0});
+    return static_cast<std::uint32_t>(store_.keys.size());
+  }
+  std::uint32_t append(std::uint32_t node, std::uint64_t digest, Slot& vacant) {
+    vacant = {append(node, digest), tagOf(digest)};
+    return vacant.number;
+  }
+  std::uint32_t find(std::uint32_t node, std::uint64_t digest);
+  std::uint32_t findColliding(std::uint32_t node, std::uint64_t digest);
   void grow(std::size_t keys);
   void place(std::uint32_t number);
-  std::uint32_t& slot(std::uint64_t digest, std::uint32_t step) noexcept;
 
   Store& store_;
-  /// Open addressing; keys' numbers, at most half of them taken. The size is a power of two.
-  SmallBuffer<std::uint32_t, 512> slots_;
+  /// Open addressing, at most half of them taken. The size is a power of two.
+  SmallBuffer<Slot, 256> slots_;
   int bits_ = 6;
   /// Keys that found no slot. Empty in any message that was not made to collide, or nearly so.
   std::set<std::uint32_t, Less> colliding_;

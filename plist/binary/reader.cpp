@@ -44,9 +44,10 @@ class BinaryReader {
   void leave(const Frame& frame);
   std::uint32_t reference(std::size_t position) const;
   Node& load(std::uint32_t number);
+  bool readShort(std::size_t offset, Node& node) noexcept;
   void open(std::uint32_t number);
   void revisit(Node& node, std::size_t position);
-  Node readObject(Cursor& object);
+  Node readObject(std::size_t offset);
   Node readInteger(Cursor& object, unsigned width);
   Node readDouble(Cursor& object, Type type, unsigned width);
   Node readBytes(Cursor& object, Type type, std::uint64_t length);
@@ -127,20 +128,34 @@ void BinaryReader::walk(Frame& frame) {
   leave(frame);
 }
 
-/// All keys of a dictionary, which stand before its values.
+/// All keys of a dictionary, which stand before its values. Some at a time, so that the memory of
+/// many look-ups is fetched at once: one after the other, a million keys would wait a million
+/// times.
 void BinaryReader::readKeys(Frame& frame) {
   keys_.reserve(store_.nodes[frame.node].count);
-  for (; frame.next < frame.end; frame.next += store_.referenceSize) {
-    const std::uint32_t number = reference(frame.next);
-    Node& node = store_.nodes[number];
-    if (node.has(Node::read)) {
-      revisit(node, frame.next);
-    } else {
-      load(number);
+  struct Found {
+    std::uint32_t number;
+    std::uint64_t digest;
+  };
+  std::array<Found, 16> found;
+  while (frame.next < frame.end) {
+    const std::size_t first = frame.next;
+    std::size_t count = 0;
+    for (; count < found.size() && frame.next < frame.end; frame.next += store_.referenceSize) {
+      const std::uint32_t number = reference(frame.next);
+      Node& node = store_.nodes[number];
+      if (node.has(Node::read)) {
+        revisit(node, frame.next);
+      } else {
+        load(number);
+      }
+      if (node.type != Type::string) throw MalformedDocument(Problem::keyNotString, frame.next);
+      found[count++] = {number, keys_.digest(number)};
     }
-    if (node.type != Type::string) throw MalformedDocument(Problem::keyNotString, frame.next);
-    if (!keys_.add(frame.node, number)) {
-      throw MalformedDocument(Problem::duplicateKey, frame.next);
+    for (std::size_t i = 0; i < count; ++i) {
+      if (!keys_.add(frame.node, found[i].number, found[i].digest)) {
+        throw MalformedDocument(Problem::duplicateKey, first + i * store_.referenceSize);
+      }
     }
   }
 }
@@ -175,11 +190,34 @@ Node& BinaryReader::load(std::uint32_t number) {
   if (offset < magic.size() || offset >= tableStart_) {
     throw MalformedDocument(Problem::objectOutside, entry);
   }
-  Cursor object(store_.message, static_cast<std::size_t>(offset), tableStart_);
   Node& node = store_.nodes[number];
-  node = readObject(object);
+  if (readShort(static_cast<std::size_t>(offset), node)) return node;
+  node = readObject(static_cast<std::size_t>(offset));
   node.set(Node::read);
   return node;
+}
+
+/// The commonest objects in few instructions: texts of up to 14 bytes of ASCII, and integers. False
+/// for any other, and for what is wrong with one of these: that is for readObject to tell.
+bool BinaryReader::readShort(std::size_t offset, Node& node) noexcept {
+  const unsigned marker = std::to_integer<unsigned>(store_.message[offset]);
+  const unsigned low = marker & 0xf;
+  const std::size_t start = offset + 1;
+  const std::size_t left = tableStart_ - start;
+  if (marker >> 4 == 0x5 && low != 0xf) {
+    if (low > left || low > claimable_ || !Cursor::isAsciiAt(store_.message, start, low)) {
+      return false;
+    }
+    claimable_ -= low;
+    node = {.bits = start, .count = low, .type = Type::string, .flags = Node::read};
+    return true;
+  }
+  if (marker >> 4 != 0x1 || low > 3 || std::size_t{1} << low > left) return false;
+  node = {.bits = Cursor::bigEndianAt(store_.message, start, std::size_t{1} << low),
+          .type = Type::integer,
+          .flags = Node::read};
+  if (low == 3 && node.bits >> 63 != 0) node.set(Node::negative);
+  return true;
 }
 
 /// Makes a container that was read the innermost frame.
@@ -193,8 +231,9 @@ void BinaryReader::open(std::uint32_t number) {
   frame.end += length;
 }
 
-Node BinaryReader::readObject(Cursor& object) {
-  const std::size_t start = object.position();
+/// Apart, so that what short objects take stays small enough to be inlined.
+[[gnu::noinline]] Node BinaryReader::readObject(std::size_t offset) {
+  Cursor object(store_.message, offset, tableStart_);
   const unsigned marker = object.byte();
   const unsigned low = marker & 0xf;
   switch (marker >> 4) {
@@ -228,7 +267,7 @@ Node BinaryReader::readObject(Cursor& object) {
     default:
       break;
   }
-  throw MalformedDocument(Problem::unknownMarker, start);
+  throw MalformedDocument(Problem::unknownMarker, offset);
 }
 
 /// 1, 2, 4, 8 or 16 bytes. The narrow ones have no sign, 8 and 16 bytes do.

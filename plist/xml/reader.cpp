@@ -174,7 +174,7 @@ void XmlReader::checkKeys(std::uint32_t dictionary, std::size_t end) {
   std::size_t key = store_.firstChild(dictionary);
   for (std::uint32_t left = store_.nodes[dictionary].count; left > 0; --left) {
     const auto node = static_cast<std::uint32_t>(key);
-    if (!keys_.add(dictionary, node)) {
+    if (!keys_.add(dictionary, node, keys_.digest(node))) {
       // Assembled text stands nowhere in the message.
       const bool inSide = store_.nodes[node].has(Node::inSide);
       scanner_.failAt(Problem::duplicateKey, inSide ? end : store_.nodes[node].position());
