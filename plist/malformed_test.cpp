@@ -5,101 +5,74 @@
 namespace PropertyList {
 namespace {
 
-struct Case {
-  const char* name;
-  std::string message;
-  std::optional<Problem> problem = std::nullopt;
-};
-
-void check(const std::vector<Case>& cases) {
-  for (const Case& c : cases) {
-    EXPECT_EQ(problemIn(c.message), c.problem) << c.name;
+/// The problem that each of these messages has.
+void all(std::optional<Problem> problem, const std::vector<std::string>& messages) {
+  for (const std::string& message : messages) {
+    EXPECT_EQ(problemIn(message), problem) << testing::PrintToString(message);
   }
 }
 
 std::string withTrailer(std::size_t offsetSize, std::size_t referenceSize, std::uint64_t objects,
-                        std::uint64_t top, std::uint64_t table) {
-  return bytes("bplist00\x09\x08unused") + bigEndian(offsetSize, 1) + bigEndian(referenceSize, 1) +
+                        std::uint64_t top, std::uint64_t table,
+                        const std::string& before = bytes("bplist00\x09\x08")) {
+  return before + "unused" + bigEndian(offsetSize, 1) + bigEndian(referenceSize, 1) +
          bigEndian(objects, 8) + bigEndian(top, 8) + bigEndian(table, 8);
 }
 
 TEST(Malformed, Trailer) {
-  check(
-      {{"sound", withTrailer(1, 1, 1, 0, 9)},
-       {"empty", "", Problem::empty},
-       {"only magic", "bplist00", Problem::truncated},
-       {"other version", "bplist01" + withTrailer(1, 1, 1, 0, 9).substr(8), Problem::otherVersion},
-       {"one byte too short", "bplist00" + std::string(31, '\1'), Problem::truncated},
-       {"no room for an object", "bplist00" + withTrailer(1, 1, 1, 0, 8).substr(10),
-        Problem::trailer},
-       {"offset size 0", withTrailer(0, 1, 1, 0, 9), Problem::trailer},
-       {"offset size 9", withTrailer(9, 1, 1, 0, 9), Problem::trailer},
-       {"reference size 0", withTrailer(1, 0, 1, 0, 9), Problem::trailer},
-       {"reference size 9", withTrailer(1, 9, 1, 0, 9), Problem::trailer},
-       {"no objects", withTrailer(1, 1, 0, 0, 9), Problem::trailer},
-       {"top out of range", withTrailer(1, 1, 1, 1, 9), Problem::trailer},
-       {"table over the trailer", withTrailer(1, 1, 1, 0, 10), Problem::trailer},
-       {"table before the objects", withTrailer(1, 1, 1, 0, 7), Problem::trailer},
-       {"table beyond the end", withTrailer(1, 1, 1, 0, ~0ull), Problem::trailer},
-       {"overflowing table", withTrailer(8, 1, 0x2000'0000'0000'0001, 0, 9), Problem::trailer},
-       {"table in the trailer", withTrailer(1, 1, 1, 0, 11), Problem::trailer},
-       {"9-byte offsets that are there",
-        "bplist00" + std::string(9, '\x08') + withTrailer(9, 1, 1, 0, 8).substr(10),
-        Problem::trailer},
-       {"9-byte references that are there",
-        "bplist00\xA1" + std::string(9, '\0') + "\x08" + withTrailer(1, 9, 1, 0, 18).substr(10),
-        Problem::trailer},
-       {"object in the magic", bytes("bplist00\x09\x00") + withTrailer(1, 1, 1, 0, 9).substr(10),
-        Problem::objectOutside},
-       {"object in the table", withTrailer(1, 1, 1, 0, 8), Problem::objectOutside}});
+  all(std::nullopt, {withTrailer(1, 1, 1, 0, 9)});
+  all(Problem::empty, {""});
+  all(Problem::truncated, {"bplist00", "bplist00" + std::string(31, '\1')});
+  all(Problem::otherVersion, {withTrailer(1, 1, 1, 0, 9, bytes("bplist01\x09\x08"))});
+  // No room for an object, widths of 0 and 9, with what they promise and without, no objects, a top
+  // that is none of them.
+  all(Problem::trailer,
+      {withTrailer(1, 1, 1, 0, 8, "bplist00"), withTrailer(0, 1, 1, 0, 9),
+       withTrailer(9, 1, 1, 0, 9), withTrailer(1, 0, 1, 0, 9), withTrailer(1, 9, 1, 0, 9),
+       withTrailer(9, 1, 1, 0, 8, "bplist00" + std::string(9, '\x08')),
+       withTrailer(1, 9, 1, 0, 18, "bplist00\xA1" + std::string(9, '\0') + "\x08"),
+       withTrailer(1, 1, 0, 0, 9), withTrailer(1, 1, 1, 1, 9)});
+  // Tables over the trailer, before the objects, beyond the end, overflowing, in the trailer.
+  all(Problem::trailer,
+      {withTrailer(1, 1, 1, 0, 10), withTrailer(1, 1, 1, 0, 7), withTrailer(1, 1, 1, 0, ~0ull),
+       withTrailer(8, 1, 0x2000'0000'0000'0001, 0, 9), withTrailer(1, 1, 1, 0, 11)});
+  // In the magic and in the table.
+  all(Problem::objectOutside,
+      {withTrailer(1, 1, 1, 0, 9, bytes("bplist00\x09\x00")), withTrailer(1, 1, 1, 0, 8)});
 }
 
 TEST(Malformed, BinaryObjects) {
-  check(
-      {{"fill byte", binary({"\x0F"}), Problem::unknownMarker},
-       {"marker 7", binary({"\x70"}), Problem::unknownMarker},
-       {"marker B", binary({"\xB0"}), Problem::unknownMarker},
-       {"32-byte integer", binary({"\x15" + std::string(32, '\0')}), Problem::unknownMarker},
-       {"2-byte real", binary({bytes("\x21\0\0")}), Problem::unknownMarker},
-       {"4-byte date", binary({bytes("\x32\0\0\0\0")}), Problem::unknownMarker},
-       {"marker 7 of the singletons", binary({"\x07"}), Problem::unknownMarker},
-       {"marker 10 of the singletons", binary({"\x0A"}), Problem::unknownMarker},
-       {"marker 9", binary({"\x90x"}), Problem::unknownMarker},
-       {"marker E", binary({"\xE0"}), Problem::unknownMarker},
-       {"8-byte integer cut off", binary({"\x13" + std::string(7, '\0')}), Problem::objectOutside},
-       {"UID cut off", binary({"\x81x"}), Problem::objectOutside},
-       {"UTF-16 cut off", binary({bytes("\x61\0")}), Problem::objectOutside},
-       {"references cut off", binary({"\xA2\x01"}), Problem::objectOutside},
-       {"values cut off", binary({"\xD1\x01"}), Problem::objectOutside},
-       {"integer cut off", binary({bytes("\x13\0\0\0")}), Problem::objectOutside},
-       {"string over the table", binary({"\x52y"}), Problem::objectOutside},
-       {"count is a real", binary({bytes("\x5F\x22\0\0\0\0")}), Problem::badCount},
-       {"count is null", binary({bytes("\x5F\x00\x01x")}), Problem::badCount},
-       {"count of 16 bytes", binary({"\x5F\x14" + std::string(16, '\0')}), Problem::badCount},
-       {"8-byte count", binary({"\x5F\x13" + bigEndian(1, 8) + "x"})},
-       {"vast string", binary({"\x5F\x13" + bigEndian(~0ull, 8)}), Problem::objectOutside},
-       {"vast UTF-16", binary({"\x6F\x13" + bigEndian(1ull << 63, 8)}), Problem::objectOutside},
-       {"vast dictionary", binary({"\xDF\x13" + bigEndian(1ull << 63, 8)}), Problem::objectOutside},
-       {"not ASCII", binary({"\x52x\x80"}), Problem::notAscii},
-       {"not ASCII, far in", binary({"\x5F\x10\x64" + std::string(99, 'x') + "\xFF"}),
-        Problem::notAscii},
-       {"date NaN", binary({"\x33\x7F\xF8" + std::string(6, '\0')}), Problem::dateNotFinite},
-       {"date infinite", binary({"\x33\xFF\xF0" + std::string(6, '\0')}), Problem::dateNotFinite},
-       {"reference out of range", binary({"\xA1\x01"}), Problem::referenceOutOfRange},
-       {"key is an integer", binary({"\xD1\x01\x01", "\x10\x01"}), Problem::keyNotString},
-       {"key is an integer that was read before",
-        binary({"\xA2\x01\x02", "\x10\x01", "\xD1\x01\x03", "\x51x"}), Problem::keyNotString},
-       {"key is the container itself", binary({bytes("\xD1\x00\x01"), "\x09"}),
-        Problem::selfContaining},
-       {"second key is an integer",
-        binary({"\xD2\x01\x02\x03\x03", "\x51\x61", "\x10\x01", "\x09"}), Problem::keyNotString},
-       {"key is a container", binary({"\xD1\x01\x01", "\xA0"}), Problem::keyNotString},
-       {"itself", binary({bytes("\xA1\x00")}), Problem::selfContaining},
-       {"itself by a set", binary({"\xA1\x01", bytes("\xC1\x00")}), Problem::selfContaining},
-       {"damage under an unread key",
-        binary({"\xD2\x01\x02\x03\x04", "\x51\x61", "\x51\x62", "\x09", "\x51\x80"}),
-        Problem::notAscii},
-       {"damage in an object nobody references", binary({"\xA0", "\x51\x80"})}});
+  const std::string a = "\x51\x61", one = "\x10\x01", yes = "\x09";
+  // An 8-byte count is sound, and so is damage in what nobody references.
+  all(std::nullopt, {binary({"\x5F\x13" + bigEndian(1, 8) + "x"}), binary({"\xA0", "\x51\x80"})});
+  all(Problem::unknownMarker,
+      {binary({"\x0F"}), binary({"\x70"}), binary({"\xB0"}),
+       binary({"\x15" + std::string(32, '\0')}), binary({bytes("\x21\0\0")}),
+       binary({bytes("\x32\0\0\0\0")}), binary({"\x07"}), binary({"\x0A"}), binary({"\x90x"}),
+       binary({"\xE0"})});
+  // Numbers, text, references and values that are cut off; vast counts.
+  all(Problem::objectOutside,
+      {binary({"\x13" + std::string(7, '\0')}), binary({bytes("\x13\0\0\0")}), binary({"\x81x"}),
+       binary({bytes("\x61\0")}), binary({"\x52y"}), binary({"\xA2\x01"}), binary({"\xD1\x01"}),
+       binary({"\x5F\x13" + bigEndian(~0ull, 8)}), binary({"\x6F\x13" + bigEndian(1ull << 63, 8)}),
+       binary({"\xDF\x13" + bigEndian(1ull << 63, 8)})});
+  // A real, null, an integer of 16 bytes.
+  all(Problem::badCount, {binary({bytes("\x5F\x22\0\0\0\0")}), binary({bytes("\x5F\x00\x01x")}),
+                          binary({"\x5F\x14" + std::string(16, '\0')})});
+  // The last stands under a key that nobody reads.
+  all(Problem::notAscii,
+      {binary({"\x52x\x80"}), binary({"\x5F\x10\x64" + std::string(99, 'x') + "\xFF"}),
+       binary({"\xD2\x01\x02\x03\x04", a, "\x51\x62", yes, "\x51\x80"})});
+  all(Problem::dateNotFinite, {binary({"\x33\x7F\xF8" + std::string(6, '\0')}),
+                               binary({"\x33\xFF\xF0" + std::string(6, '\0')})});
+  all(Problem::referenceOutOfRange, {binary({"\xA1\x01"})});
+  // Integers, of which the second was read before, and a container.
+  all(Problem::keyNotString,
+      {binary({"\xD1\x01\x01", one}), binary({"\xA2\x01\x02", one, "\xD1\x01\x03", "\x51x"}),
+       binary({"\xD2\x01\x02\x03\x03", a, one, yes}), binary({"\xD1\x01\x01", "\xA0"})});
+  // As a key, as an element, by a set.
+  all(Problem::selfContaining, {binary({bytes("\xD1\x00\x01"), yes}), binary({bytes("\xA1\x00")}),
+                                binary({"\xA1\x01", bytes("\xC1\x00")})});
 }
 
 TEST(Malformed, Objects8BytesWide) {
@@ -115,10 +88,6 @@ TEST(Malformed, Objects8BytesWide) {
 
 const std::string sound = "<plist><true/></plist>";
 const std::string type = "<!DOCTYPE plist PUBLIC \"-//Tessen//DTD PLIST 1.0//EN\" 'tessen.dtd'>";
-
-void all(std::optional<Problem> problem, const std::vector<std::string>& messages) {
-  for (const std::string& message : messages) EXPECT_EQ(problemIn(message), problem) << message;
-}
 
 TEST(Malformed, XmlMarkup) {
   all(std::nullopt,

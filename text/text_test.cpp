@@ -42,31 +42,23 @@ TEST(Base64, EveryLengthReadsBackWhereverALineEnds) {
 }
 
 TEST(Base64, SpellingsAreTakenAsTheFormSays) {
-  struct Case {
-    const char* text;
-    std::optional<std::string> strict, spaced;
-  };
-  const std::optional<std::string> refused;
-  for (const Case& c : std::initializer_list<Case>{{"", "", ""},
-                                                   {"Zg==", "f", "f"},
-                                                   {"Zm8=", "fo", "fo"},
-                                                   {"Zm9v", "foo", "foo"},
-                                                   {"Zm9vYg==", "foob", "foob"},
-                                                   {"+/+/", "\xfb\xff\xbf", "\xfb\xff\xbf"},
-                                                   {"Zh==", refused, "f"},
-                                                   {"Zm9=", refused, "fo"},
-                                                   {" Zg= =\n", refused, "f"},
-                                                   {"Z\tm\r9\nv", refused, "foo"},
-                                                   {" \n", refused, ""},
-                                                   {"Zg== ", refused, "f"}}) {
-    EXPECT_EQ(decoded(c.text, Base64::strict), c.strict) << c.text;
-    EXPECT_EQ(decoded(c.text, Base64::spaced), c.spaced) << c.text;
+  using Spelling = std::pair<const char*, std::string>;
+  const Spelling strict[] = {{"", ""},        {"Zg==", "f"},        {"Zm8=", "fo"},
+                             {"Zm9v", "foo"}, {"Zm9vYg==", "foob"}, {"+/+/", "\xfb\xff\xbf"}};
+  for (const auto& [text, bytes] : strict) {
+    EXPECT_EQ(decoded(text, Base64::strict), bytes) << text;
+    EXPECT_EQ(decoded(text, Base64::spaced), bytes) << text;
+  }
+  const Spelling spaced[] = {{"Zh==", "f"},         {"Zm9=", "fo"}, {" Zg= =\n", "f"},
+                             {"Z\tm\r9\nv", "foo"}, {" \n", ""},    {"Zg== ", "f"}};
+  for (const auto& [text, bytes] : spaced) {
+    EXPECT_EQ(decoded(text, Base64::strict), std::nullopt) << text;
+    EXPECT_EQ(decoded(text, Base64::spaced), bytes) << text;
   }
   for (const std::string_view text : {"Z", "Zg", "Zg=", "Zm9", "Z===", "=", "====", "Zg==Zg==",
                                       "Zg=v", "Zg===", "Zm9v=", "Zm9vZg==Zm9v", "Zm-_", "Zm9*",
                                       "Zm9vZ\xc3\xa9==", "Zm9vZm9vZm9vZm9v\x80m9v", "Zm9v\vZm9v"}) {
-    EXPECT_EQ(decoded(text, Base64::strict), refused) << text;
-    EXPECT_EQ(decoded(text, Base64::spaced), refused) << text;
+    EXPECT_FALSE(decoded(text, Base64::strict) || decoded(text, Base64::spaced)) << text;
   }
 }
 
@@ -199,8 +191,8 @@ TEST(Uuid, IsReadInEitherCaseAndWrittenInUpperCase) {
   EXPECT_EQ(parseUuid(text + "0"), std::nullopt);
   for (std::size_t at = 0; at < text.size(); ++at) {
     for (const char other : {'-', 'G', 'g', '/', ':', '`', '@', ' ', '\0', '0'}) {
-      if (text[at] != '-' && other == '0') continue;
-      if (text[at] == other) continue;
+      // A digit may stand where there is no dash.
+      if (text[at] == other || (text[at] != '-' && other == '0')) continue;
       std::string changed = text;
       changed[at] = other;
       EXPECT_EQ(parseUuid(changed), std::nullopt) << changed;

@@ -39,7 +39,7 @@ struct LineCase {
 TEST(RequestLine, IsReadStrictly) {
   constexpr auto absent = std::nullopt;
   using namespace std::string_view_literals;
-  const LineCase table[] = {
+  std::vector<LineCase> table = {
       {R"({"record":"VespInvitation","message":""})", "ok", absent},
       {" {\"id\" : null ,\t\"message\":\"Zg==\",\"command\":0,\"service\":\"\"} \r", "ok", "null"},
       {R"({"service":"s","command":18446744073709551615,"message":"","id":{"b":[1.0,-0,1e5],"a":"\u00e9"}})",
@@ -58,24 +58,15 @@ TEST(RequestLine, IsReadStrictly) {
       {R"({"service":"s","message":""})", "needs \"command\"", absent},
       {R"({"command":1,"message":""})", "needs \"service\"", absent},
       {R"({"service":"s","command":"1","message":""})", "must be a number", absent},
-      {R"({"service":"s","command":-1,"message":""})", "must be an integer", absent},
-      {R"({"service":"s","command":1.0,"message":""})", "must be an integer", absent},
-      {R"({"service":"s","command":1e0,"message":""})", "must be an integer", absent},
-      {R"({"service":"s","command":18446744073709551616,"message":""})", "integer", absent},
       {R"({"record":"VespInvitation","message":"Zg"})", "not base64", absent},
       {R"({"record":"VespInvitation","message":"","extra":[{"id":7}],"id":[]})", "unknown key",
        "[]"},
       {R"({"record":"VespInvitation","record":"VespInvitation","message":"","id":1})",
        "stands twice", "1"},
       {R"({"record":"VespInvitation","message":"","id":1,"id":2})", "stands twice", absent},
-      {"", "not readable", absent},
-      {"\r", "not readable", absent},
       {"[]", "object", absent},
       {"3", "object", absent},
-      {R"({"id":1)", "not readable", absent},
-      {R"({"id":1} {})", "not readable", absent},
       {"{\"id\":1}\0x"sv, "more than one value", absent},
-      {"{\"id\":\"\xff\"}", "not readable", absent},
       {R"({"id":["\udc00","\u0041\"", [ ], { } ,1E400 ],"record":"VespInvitation","message":""})",
        "ok", R"(["\udc00","\u0041\"",[],{},1E400])"},
       {"{\"id\":\"\x7f\u009b\u2028\\n\u00e9\",\"record\":\"VespInvitation\",\"message\":\"\"}",
@@ -83,14 +74,17 @@ TEST(RequestLine, IsReadStrictly) {
       {R"({"record":"\udc00","message":"","id":1})", "surrogate", "1"},
       {R"({"service":"\ud800\u0041","command":1,"message":"","id":1})", "surrogate", "1"},
       {"{\"id\":\"0123456789012345678901234567890\x1f\"}", "control character", absent},
-      {R"({"id":NaN})", "not readable", absent},
-      {R"({"id":1,})", "not readable", absent},
-      {R"({"id":[1,]})", "not readable", absent},
-      {R"({"id":[1}})", "not readable", absent},
-      {R"({"id":{"a":1,}})", "not readable", absent},
-      {R"({"id":{"a" 1}})", "not readable", absent},
-      {R"({"id":01})", "not readable", absent},
   };
+  for (const char* line : {"", "\r", R"({"id":1)", R"({"id":1} {})", "{\"id\":\"\xff\"}",
+                           R"({"id":NaN})", R"({"id":1,})", R"({"id":[1,]})", R"({"id":[1}})",
+                           R"({"id":{"a":1,}})", R"({"id":{"a" 1}})", R"({"id":01})"}) {
+    table.push_back({line, "not readable", absent});
+  }
+  Array<String> lines;
+  for (const char* number : {"-1", "1.0", "1e0", "18446744073709551616"}) {
+    lines.push_back(R"({"service":"s","message":"","command":)" + String(number) + "}");
+  }
+  for (const String& line : lines) table.push_back({line, "must be an integer", absent});
   for (const LineCase& entry : table) {
     String text(entry.line);
     const RequestLine line = readRequestLine(text);

@@ -7,76 +7,17 @@ usage: run.py ROOT FOLDER [cmake arguments]
 """
 import json
 import pathlib
+import re
 import shutil
 import subprocess
 import sys
 
 root, copy = pathlib.Path(sys.argv[1]), pathlib.Path(sys.argv[2])
-LICENCE = "// SPDX-License-Identifier: Apache-2.0\n"
-
-FILES = {
-    "include/keelgate/records/vesp_weather.h": """#pragma once
-
-#include <keelgate/describe.h>
-#include <keelgate/values.h>
-
-namespace Keelgate {
-
-struct VespWeather {
-  KEELGATE_RECORD(VespWeather,
-      (String, place),
-      (Optional<Double>, degrees));
-};
-
-}  // namespace Keelgate
-""",
-    "program/weather/vesp_weather_schema.h": """#pragma once
-
-#include "program/schema/values.h"
-
-#include <keelgate/describe.h>
-
-namespace VespKeelgateService {
-
-struct VespWeatherSchema {
-  KEELGATE_SCHEMA(VespWeatherSchema,
-      (String, place, "p"),
-      (Optional<Double>, degrees, "d"));
-};
-
-}  // namespace VespKeelgateService
-""",
-    "program/weather/vesp_weather_unpacker.h": """#pragma once
-
-#include "program/weather/vesp_weather_schema.h"
-
-#include <keelgate/records/vesp_weather.h>
-
-namespace VespKeelgateService {
-
-struct VespWeatherUnpacker {
-  using SchemaType = Keelgate::VespWeather;
-  using Schema = VespWeatherSchema;
-
-  SchemaType unpack(Bytes from) const;
-};
-
-}  // namespace VespKeelgateService
-""",
-    "program/weather/vesp_weather_unpacker.cpp": """#include "program/weather/vesp_weather_unpacker.h"
-
-#include "framework/contracts/construct.h"
-#include "program/schema/property_list_decoder.h"
-
-namespace VespKeelgateService {
-
-Keelgate::VespWeather VespWeatherUnpacker::unpack(Bytes from) const {
-  return Keelgate::construct(PropertyListDecoder().decode<Schema, SchemaType>(from));
-}
-
-}  // namespace VespKeelgateService
-""",
-}
+# Steps 1 to 3 are those of a kind that exists, under another name and with other fields.
+KIND = "vesp_command_response"
+FIELDS = {"include/keelgate/records/{}.h": "(String, place),\n      (Optional<Double>, degrees)",
+          "program/{}_schema.h": '(String, place, "p"),\n      (Optional<Double>, degrees, "d")',
+          "program/{}_unpacker.h": None, "program/{}_unpacker.cpp": None}
 
 # A file, what stands there, and what takes its place.
 EDITS = [
@@ -111,9 +52,17 @@ for name in run("git", "-C", root, "ls-files", "-co", "--exclude-standard").spli
     if (root / name).is_file():
         (copy / name).parent.mkdir(parents=True, exist_ok=True)
         shutil.copy2(root / name, copy / name)
-for name, text in FILES.items():
-    (copy / name).parent.mkdir(parents=True, exist_ok=True)
-    (copy / name).write_text(LICENCE + text)
+for pattern, fields in FIELDS.items():
+    text = (root / pattern.format(KIND).replace("program/", "program/payload/")).read_text()
+    for there, then in ((KIND, "vesp_weather"), ("VespCommandResponse", "VespWeather"),
+                        ("program/payload/", "program/weather/")):
+        text = text.replace(there, then)
+    if fields:
+        text = re.sub(r"(VespWeather\w*,\n +)\(.*\)(?=\);\n};)", lambda m: m[1] + fields, text,
+                      flags=re.S)
+    made = copy / pattern.format("vesp_weather").replace("program/", "program/weather/")
+    made.parent.mkdir(exist_ok=True)
+    made.write_text(text)
 for name, there, then in EDITS:
     text = (copy / name).read_text()
     if text.count(there) != 1:
