@@ -355,7 +355,7 @@ Array<String> reversed(Array<String> words) {
 String hintFor(const ::CLI::App& app) {
   const auto chosen = app.get_subcommands();
   const ::CLI::App& asked = chosen.empty() ? app : *chosen.front();
-  const String help =
+  String help =
       fmt::format("see `keelgate {}--help`", chosen.empty() ? "" : asked.get_name() + " ");
   const auto left = app.remaining(true);
   if (left.empty()) return help;

@@ -53,22 +53,32 @@ constexpr auto membersOf = [] {
   return members;
 }();
 
-/// For each field of S the function that decodes it into the member of R at its position. `Decode`
-/// gives, as `Decode::template into<W, V>`, the one for a field of type W and a member of type V.
+/// For each field of a schema the function that decodes it.
+template <class Function, std::size_t size>
+struct Decoders {
+  std::array<Function, size> functions{};
+  /// Whether each member can hold what its field does. A function cannot be compared with null at
+  /// compile time where sanitizers are on.
+  bool fit = true;
+};
+
+/// Into the member of R at the position of the field of S. `Decode` gives, as `Decode::template
+/// into<W, V>`, the function for a field of type W and a member of type V.
 template <Keelgate::Schema S, class R, class Decode>
 constexpr auto decodersOf = [] {
   using From = Keelgate::FieldsOf<S>;
   using To = Keelgate::FieldsOf<R>;
   static_assert(From::size == To::size,
                 "the schema and the record have different numbers of fields");
-  std::array<typename Decode::Function, From::size> decoders{};
+  Decoders<typename Decode::Function, From::size> decoders;
   if constexpr (From::size == To::size) {
     static_assert(namesAgree<S, R>(),
                   "a field of the record has another name than the schema's field at its position");
     std::size_t position = 0;
     From::each([&]<class W>(Keelgate::Field<S, W>) {
       To::at(position, [&]<class V>(Keelgate::Field<R, V>) {
-        if constexpr (fills<W, V>) decoders[position] = Decode::template into<W, V>;
+        decoders.fit = decoders.fit && fills<W, V>;
+        if constexpr (fills<W, V>) decoders.functions[position] = Decode::template into<W, V>;
       });
       ++position;
     });

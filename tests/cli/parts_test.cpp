@@ -189,7 +189,7 @@ TEST(OrderedWork, WhatWaitsIsBoundedInBytesAndGivenBack) {
   };
   // Whether it is the requests that fill the window or the replies: each thread may be in the
   // middle of a job when it is full, and nothing else is taken then.
-  for (const auto& [mostTaken, request, reply] : {Case{2, large, 1}, Case{4, 1, large}}) {
+  for (const Case& row : {Case{2, large, 1}, Case{4, 1, large}}) {
     constexpr int threads = 3, count = 20;
     std::binary_semaphore go(0);
     std::atomic<int> taken = 0;
@@ -199,9 +199,9 @@ TEST(OrderedWork, WhatWaitsIsBoundedInBytesAndGivenBack) {
       return true;
     });
     std::thread running([&] {
-      work.run(threads, jobs(count, [&, request = request, reply = reply](int job) {
+      work.run(threads, jobs(count, [&](int job) {
                  ++taken;
-                 return jobOf(1, request, [&go, job, reply](int) {
+                 return jobOf(1, row.request, [&go, job, reply = row.reply](int) {
                    if (job == 0 || reply == 1) {
                      go.acquire();
                      go.release();
@@ -212,11 +212,11 @@ TEST(OrderedWork, WhatWaitsIsBoundedInBytesAndGivenBack) {
     });
     while (taken == 0) std::this_thread::yield();
     letOthersRun();
-    EXPECT_LE(taken, mostTaken);
+    EXPECT_LE(taken, row.mostTaken);
     go.release();
     running.join();
     EXPECT_EQ(taken, count);
-    EXPECT_EQ(bytes, reply * count);
+    EXPECT_EQ(bytes, row.reply * count);
   }
 }
 

@@ -8,6 +8,7 @@
 #include <unistd.h>
 #include <algorithm>
 #include <bit>
+#include <filesystem>
 #include <fstream>
 #include <map>
 #include <utility>
@@ -105,11 +106,12 @@ TEST_F(Worker, C13AddressesAreRandom) {
       differences[what] |= first.try_emplace(what, address).first->second ^ address;
     }
   }
-#ifndef NDEBUG
-  // Some kernels place programs of 2 MiB and more on bounds of 2 MiB. What is shipped is smaller.
-  differences.erase(0);
-#endif
-  for (const auto& [what, seen] : differences) EXPECT_GE(std::popcount(seen), 28) << what;
+  // Some kernels place programs of 2 MiB and more, as this one is, on bounds of 2 MiB instead of
+  // pages. What is shipped is smaller, which the test of the packages sees to.
+  const int ofProgram = std::filesystem::file_size(OBEDIENT_SERVICE) < (2U << 20) ? 28 : 19;
+  for (const auto& [what, seen] : differences) {
+    EXPECT_GE(std::popcount(seen), what == 0 ? ofProgram : 28) << what;
+  }
 }
 
 TEST_F(Worker, C4AMachineThatHasLessStillAnswers) {
