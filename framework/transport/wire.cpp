@@ -26,10 +26,14 @@ void Writer::octets(Bytes value) {
     if (!value.empty()) std::memcpy(room(value.size()), value.data(), value.size());
     return;
   }
-  // Appended as it is: room for it would be zeroed first.
+  // Appended as it is: room for it would be zeroed first. With room for what follows, so that a few
+  // words behind a large body do not have it moved once more.
   out_.resize(size_);
+  const std::size_t needed = size_ + value.size() + firstRoom;
+  if (needed > out_.capacity()) out_.reserve(std::max(needed, 2 * out_.capacity()));
   out_.insert(out_.end(), value.begin(), value.end());
   size_ = out_.size();
+  out_.resize(size_ + firstRoom);
 }
 
 void Writer::grow(std::size_t size) {

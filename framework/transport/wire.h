@@ -78,8 +78,11 @@ class Writer {
   }
   void grow(std::size_t size);
 
-  /// Most replies have room in what is there at first. What lies behind `size_` is not written yet.
-  Data out_ = Data(4096);
+  /// Most replies have room in what is there at first.
+  static constexpr std::size_t firstRoom = 4096;
+
+  /// What lies behind `size_` is not written yet.
+  Data out_ = Data(firstRoom);
   std::size_t size_ = 0;
 };
 
