@@ -238,6 +238,7 @@ class KEELGATE_API Client {
   /// The completion may call the client. Throws HostError (startFailed) when there are no
   /// descriptors left.
   template <OutputRecord R>
+  // NOLINTNEXTLINE(performance-unnecessary-value-param): it is moved on, unseen in a template.
   void start(Request request, std::function<void(Outcome<R> outcome)> completion,
              Optional<std::chrono::milliseconds> timeLimit = std::nullopt) {
     startTask(recordNumber<R>, std::move(request),
