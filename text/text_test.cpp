@@ -9,6 +9,7 @@
 
 #include <array>
 #include <cmath>
+#include <cstdint>
 #include <limits>
 #include <random>
 #include <vector>
@@ -149,8 +150,8 @@ TEST(DateTime, IsSpeltAsTheCalendarHasIt) {
     EXPECT_EQ(dateTimeText(seconds), text);
     EXPECT_EQ(parseDateTime(text), seconds);
   }
-  for (double day = -730'485; day <= 2'921'573; day += 97) {
-    const double noon = day * 86'400 + 43'200;
+  for (std::int64_t day = -730'485; day <= 2'921'573; day += 97) {
+    const auto noon = static_cast<double>(day * 86'400 + 43'200);
     EXPECT_EQ(parseDateTime(*dateTimeText(noon)), noon) << day;
   }
 }

@@ -137,7 +137,7 @@ TEST(JSON, PropertyListsAreTreesAndTypedOnesLoseNothing) {
       {Value(std::in_place_index<3>, largest), "18446744073709551615",
        R"({"type":"integer","value":18446744073709551615})"},
       {Double{2}, "2.0", R"({"type":"real","value":2.0})"},
-      {Double{-INFINITY}, R"("-inf")", R"({"type":"real","value":"-inf"})"},
+      {-std::numeric_limits<Double>::infinity(), R"("-inf")", R"({"type":"real","value":"-inf"})"},
       {Date{0.1234567}, R"("2001-01-01T00:00:00.123457Z")", R"({"type":"date","value":0.1234567})"},
       {String("a\n"), R"("a\n")", R"({"type":"string","value":"a\n"})"},
       {dataOf("f"), R"("Zg==")", R"({"type":"data","value":"Zg=="})"},
