@@ -178,32 +178,32 @@ TEST(Invitations, TheMirrorOfAContextIsCaseKeyedAndDoesNotComeBack) {
 }
 
 TEST(Invitations, TheStandardDecodersOfTheCaseKeyedFormWantExactlyOneKey) {
-  const auto decoded = [](const Tree& tree) {
+  const Dictionary body{{"_0", Dictionary{}}};
+  const std::string notOne = "Invalid number of keys found, expected one.";
+  const auto form = [](Dictionary kind) {
+    return Dictionary{{"dictionaryContext", Dictionary{{"_0", std::move(kind)}}}};
+  };
+  const std::pair<Dictionary, std::string> rows[] = {
+      {form({{"vespSampleInvitation", body}}), ""},
+      {{}, "0 " + notOne},
+      {form({}), "2 " + notOne},
+      {form({{"vespSampleInvitation", body}, {"vespHearthInvitation", body}}), "2 " + notOne},
+      {form({{"vespOtherInvitation", body}}), "2 " + notOne},
+      {form({{"vespSampleInvitation", Dictionary{}}}), "3 No value associated with key \"_0\"."}};
+  for (const auto& [tree, expected] : rows) {
     const auto bytes = PropertyList::writeBinary(tree);
     const PropertyList::Document document(bytes);
     PropertyList::ExpansionBudget budget(bytes.size());
     Decoding decoding{budget};
     VespDictionaryContextData contextData;
+    std::string told;
     try {
       decodeValue<VespDictionaryContextData>(decoding, document.top(), CodingPath(), contextData);
-      return String();
     } catch (const Keelgate::DecodingError& error) {
-      return std::to_string(error.codingPath.size()) + " " + error.debugDescription;
+      told = std::to_string(error.codingPath.size()) + " " + error.debugDescription;
     }
-  };
-  const auto form = [](Dictionary kind) {
-    return Dictionary{{"dictionaryContext", Dictionary{{"_0", std::move(kind)}}}};
-  };
-  const Dictionary body{{"_0", Dictionary{}}};
-  EXPECT_EQ(decoded(form({{"vespSampleInvitation", body}})), "");
-  const String notOne = "Invalid number of keys found, expected one.";
-  EXPECT_EQ(decoded(Dictionary{}), "0 " + notOne);
-  EXPECT_EQ(decoded(form({})), "2 " + notOne);
-  EXPECT_EQ(decoded(form({{"vespSampleInvitation", body}, {"vespHearthInvitation", body}})),
-            "2 " + notOne);
-  EXPECT_EQ(decoded(form({{"vespOtherInvitation", body}})), "2 " + notOne);
-  EXPECT_EQ(decoded(form({{"vespSampleInvitation", Dictionary{}}})),
-            "3 No value associated with key \"_0\".");
+    EXPECT_EQ(told, expected);
+  }
 }
 
 TEST(CheckIns, FoldTheirGroupsAndTolerateUnknownCodes) {

@@ -50,8 +50,9 @@ TEST(Base64, SpellingsAreTakenAsTheFormSays) {
     EXPECT_EQ(decoded(text, Base64::strict), bytes) << text;
     EXPECT_EQ(decoded(text, Base64::spaced), bytes) << text;
   }
-  const Spelling spaced[] = {{"Zh==", "f"},         {"Zm9=", "fo"}, {" Zg= =\n", "f"},
-                             {"Z\tm\r9\nv", "foo"}, {" \n", ""},    {"Zg== ", "f"}};
+  const Spelling spaced[] = {{"Zh==", "f"},     {"Zm+=", "fo"},        {"Zm9=", "fo"},
+                             {" Zg= =\n", "f"}, {"Z\tm\r9\nv", "foo"}, {" \n", ""},
+                             {"Zg== ", "f"}};
   for (const auto& [text, bytes] : spaced) {
     EXPECT_EQ(decoded(text, Base64::strict), std::nullopt) << text;
     EXPECT_EQ(decoded(text, Base64::spaced), bytes) << text;
@@ -89,6 +90,7 @@ std::vector<std::string> split(std::string_view text) {
   return parts;
 }
 
+/// What reads many bytes at a time has a place for each of them.
 TEST(Utf8, WhatIsMalformedIsFoundAnywhere) {
   // Overlong in two, three and four bytes; surrogates; beyond U+10FFFF; alone; cut short; not
   // continued.
@@ -97,7 +99,7 @@ TEST(Utf8, WhatIsMalformedIsFoundAnywhere) {
              "\xed\xa0\x80|\xed\xbf\xbf|\xf4\x90\x80\x80|\xf5\x80\x80\x80|\x80|\xbf|\xff|\xc3|"
              "\xe2\x82|\xf0\x9f\x98|\xc3\x28|\xe2\x28\xa1|\xe2\x82\x28|\xf0\x28\x8c\xbc|"
              "\xf0\x90\x28\xbc|\xf0\x90\x8c\x28|\xc3\xc3")) {
-    for (const std::size_t before : {0u, 1u, 63u, 64u, 65u, 200u}) {
+    for (std::size_t before = 0; before < 70; ++before) {
       for (const std::size_t after : {0u, 1u, 64u, 100u}) {
         std::string text = std::string(before, 'a').append(bad).append(after, 'b');
         EXPECT_FALSE(isUtf8(text)) << bad << before << ' ' << after;
@@ -105,17 +107,6 @@ TEST(Utf8, WhatIsMalformedIsFoundAnywhere) {
         text.replace(before, bad.size(), "\xf0\x9f\x98\x80");
         EXPECT_TRUE(isUtf8(text)) << before << ' ' << after;
       }
-    }
-  }
-}
-
-/// What reads many bytes at a time has a place for each of them.
-TEST(Utf8, NoBlockHidesAByteThatIsNotAscii) {
-  for (std::size_t length = 1; length < 70; ++length) {
-    for (std::size_t at = 0; at < length; ++at) {
-      std::string text(length, 'a');
-      text[at] = '\x80';
-      EXPECT_FALSE(isAscii(text) || isUtf8(text)) << at << " of " << length;
     }
   }
 }
@@ -158,9 +149,12 @@ TEST(DateTime, IsSpeltAsTheCalendarHasIt) {
 
 TEST(DateTime, FractionsAreRoundedToMicroseconds) {
   const std::pair<double, const char*> spellings[] = {
-      {0.5, "2001-01-01T00:00:00.5Z"},        {0.000'001, "2001-01-01T00:00:00.000001Z"},
-      {0.000'000'4, "2001-01-01T00:00:00Z"},  {-0.25, "2000-12-31T23:59:59.75Z"},
-      {59.999'999'9, "2001-01-01T00:01:00Z"}, {-1e-20, "2001-01-01T00:00:00Z"}};
+      {0.000'001, "2001-01-01T00:00:00.000001Z"},
+      {0.000'000'4, "2001-01-01T00:00:00Z"},
+      {-0.25, "2000-12-31T23:59:59.75Z"},
+      {59.999'999'9, "2001-01-01T00:01:00Z"},
+      {-1e-20, "2001-01-01T00:00:00Z"},
+      {252'423'993'599.999'97, "9999-12-31T23:59:59.999969Z"}};
   for (const auto& [seconds, text] : spellings) EXPECT_EQ(dateTimeText(seconds), text);
   constexpr double infinity = std::numeric_limits<double>::infinity();
   for (const double seconds : {-63'113'904'000.5, 252'423'993'600.0, 252'423'993'599.999'999'9,
