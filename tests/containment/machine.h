@@ -47,17 +47,6 @@ inline long callVsyscall(long slot) {
       0, 0);
 }
 
-inline std::uint64_t ticks() {
-  return __builtin_ia32_rdtsc();
-}
-/// About: long enough if it is one on a slow machine.
-inline std::uint64_t ticksPerSecond() {
-  return 3'000'000'000;
-}
-inline void relax() {
-  __builtin_ia32_pause();
-}
-
 #elif defined __aarch64__
 
 inline constexpr bool hasOtherGates = false;
@@ -84,20 +73,6 @@ inline long callKernel(const RawCall& a) {
 }
 [[noreturn]] inline long callVsyscall(long) {
   __builtin_trap();
-}
-
-inline std::uint64_t ticks() {
-  std::uint64_t now = 0;
-  asm volatile("mrs %0, cntvct_el0" : "=r"(now));
-  return now;
-}
-inline std::uint64_t ticksPerSecond() {
-  std::uint64_t frequency = 0;
-  asm("mrs %0, cntfrq_el0" : "=r"(frequency));
-  return frequency;
-}
-inline void relax() {
-  asm volatile("yield");
 }
 
 #endif

@@ -25,21 +25,6 @@ std::string toEat(std::size_t bytes, std::size_t piece, std::size_t length) {
 
 constexpr std::size_t piece = 65536;
 
-TEST_F(Worker, C4MemoryIsFixedBeforeTheMessageIsRead) {
-  // A short one, though its worker was made for any short one; and a longer one.
-  for (const std::size_t length : {std::size_t{30}, std::size_t{1} << 20}) {
-    constexpr std::size_t slack = 4 << 20;
-    const std::size_t limit = allocationLimit(length);
-    EXPECT_EQ(resultOf(service_.obey(toEat(limit - slack, piece, length)).first), 0);
-    for (const std::size_t bytes : {limit + slack, std::size_t{1} << 40}) {
-      const auto [reply, end] = service_.obey(toEat(bytes, piece, length));
-      EXPECT_FALSE(reply.kind);
-      EXPECT_EQ(end.exitStatus(), Protocol::resourceExitStatus);
-      EXPECT_LT(end.peakBytes, memoryBudget(length));
-    }
-  }
-}
-
 /// One worker after the other that may have many messages.
 class Reused : public Worker {
  protected:
@@ -66,7 +51,7 @@ class Reused : public Worker {
 TEST_F(Reused, C4AMessageHasTheSameMemoryInEveryWorker) {
   // By size of the pieces: of large ones as many as the limit says, of small ones fewer.
   for (const auto& [size, length] : {std::pair(piece, std::size_t{30}),
-                                     {piece, std::size_t{300'000}},
+                                     {piece, std::size_t{1} << 20},
                                      {std::size_t{3000}, std::size_t{30}}}) {
     const std::size_t most = allocationLimit(length);
     for (const std::size_t part : {90U, 98U, 102U}) {

@@ -8,13 +8,13 @@
 ///                      messageId
 ///     int80 N A        the same by x86-64's old 32-bit gate
 ///     vsyscall N       slot N of the vsyscall page
-///     say HEX          writes these bytes to the channel, and answers afterwards
-///     drip HEX         the same, one byte a second
 ///     eat BYTES PIECE  takes and touches that much memory in pieces of so many bytes, 64 KiB
 ///                      without PIECE, and keeps it until it has answered
 ///     address WHAT     where the program (0), its stack (1), a small block (2), a large one (3)
-///     lie count            how many of these this process has been given log N LENGTH     logs N
-///     lines of that length, and answers fault | trap | abort | recurse | spin | throw | execute
+///                      lie
+///     count            how many of these this process has been given
+///     log N LENGTH     logs N lines of that length, and answers
+///     fault | trap | abort | recurse | spin | throw | execute
 ///     answer           behaves
 #include "framework/contracts/log.h"
 #include "framework/contracts/process.h"
@@ -23,7 +23,6 @@
 
 #include <unistd.h>
 #include <algorithm>
-#include <charconv>
 #include <cstdlib>
 #include <cstring>
 #include <memory>
@@ -42,21 +41,6 @@ long call(const std::vector<long>& numbers) {
   RawCall whole{};
   std::copy(numbers.begin(), numbers.end(), whole.begin());
   return callKernel(whole);
-}
-
-/// A sealed process cannot sleep.
-void passSecond() {
-  const std::uint64_t start = ticks();
-  while (ticks() - start < ticksPerSecond()) relax();
-}
-
-void say(const std::string& hex, bool slowly) {
-  for (std::size_t at = 0; at + 1 < hex.size(); at += 2) {
-    unsigned char byte = 0;
-    std::from_chars(hex.data() + at, hex.data() + at + 2, byte, 16);
-    if (write(serviceDescriptor, &byte, 1) != 1) return;
-    if (slowly) passSecond();
-  }
 }
 
 void eat(std::size_t bytes, std::size_t piece) {
@@ -104,7 +88,7 @@ void misbehave(const std::string& how) {
   if (how == "abort") std::abort();
   if (how == "recurse") recurse(1'000'000);
   if (how == "throw") throw 1;
-  while (how == "spin") relax();
+  while (how == "spin") asm volatile("");
   if (how == "execute") {
     // In memory that can be written.
     volatile unsigned code = returnInstruction;
@@ -120,12 +104,6 @@ long obey(const std::string& order) {
   std::istringstream words(order);
   std::string verb;
   words >> verb;
-  if (verb == "say" || verb == "drip") {
-    std::string hex;
-    words >> hex;
-    say(hex, verb == "drip");
-    return 0;
-  }
   std::vector<long> numbers;
   for (long number; numbers.size() < 7 && words >> number;) numbers.push_back(number);
   if (verb == "log") {

@@ -131,11 +131,6 @@ TEST(Async, CompletesEachMessageOnce) {
   for (std::size_t i = 0; i < seen.size(); ++i) {
     EXPECT_EQ(seen[i], std::vector<String>{sent.expected[i]}) << i;
   }
-  const Statistics figures = client.statistics();
-  EXPECT_EQ(figures.messages, 50u);
-  EXPECT_EQ(figures.crashed, 7u);
-  EXPECT_EQ(figures.protocolViolations, 7u);
-  EXPECT_EQ(figures.records, 36u);
 }
 
 TEST(Async, IsCancelledAtItsDeadlineAlsoBeforeItsTurn) {
@@ -201,36 +196,6 @@ TEST(Async, ManyThreadsShareAClientInEveryWay) {
   }
   for (std::thread& thread : threads) thread.join();
   EXPECT_EQ(right, 240);
-}
-
-TEST(Async, EndsWithItsClient) {
-  const auto descriptors = openDescriptors();
-  const Script stays = Script().then(Op::pause, 60'000);
-  bool told = false;
-  {
-    Client client(fakeOptions());
-    client.start<Response>({.message = stays}, [&](const Outcome<Response>&) { told = true; });
-    client.dispatch();
-    usleep(50'000);
-  }
-  EXPECT_FALSE(told);
-  EXPECT_TRUE(children().empty());
-  EXPECT_EQ(openDescriptors(), descriptors);
-}
-
-TEST(Async, AForkHasItsOwn) {
-  Client client(fakeOptions());
-  bool told = false;
-  const Script script = answer(1);
-  client.start<Response>({.message = script}, [&](const Outcome<Response>&) { told = true; });
-  EXPECT_EQ(inFork([&] {
-              int mine = 0;
-              client.start<Response>({.message = script},
-                                     [&](const Outcome<Response>&) { ++mine; });
-              return loopUntil(client, [&] { return mine == 1; }) && !told ? 0 : 1;
-            }),
-            0);
-  EXPECT_TRUE(loopUntil(client, [&] { return told; }));
 }
 
 TEST(Statistics, CountEveryOutcomeOfEveryKindOfCall) {

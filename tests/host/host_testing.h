@@ -75,6 +75,12 @@ inline String outcomeOf(Client& client, Bytes message) {
   return outcomeOf([&] { return client.unpack<VespCommandResponse>(message).command; });
 }
 
+/// The process that the workers of a client are forked from just now.
+inline pid_t zygoteOf(Client& client) {
+  const Script script = Script().then(Op::answerZygote);
+  return static_cast<pid_t>(client.unpack<VespCommandResponse>(script).command);
+}
+
 inline std::ptrdiff_t entriesOf(const char* folder) {
   return std::distance(std::filesystem::directory_iterator(folder), {});
 }

@@ -177,18 +177,25 @@ TEST(Application, MayIgnoreOrReapChildren) {
   }
 }
 
-TEST(Application, ItsForkHasAServiceOfItsOwn) {
+TEST(Application, ItsForkHasAServiceAndCallsOfItsOwn) {
   Client client(fakeOptions());
   EXPECT_EQ(outcomeOf(client, good), "record 7");
   const std::set<pid_t> before = children();
+  int told = 0;
+  const auto note = [&](const Outcome<VespCommandResponse>&) {
+    ++told;
+  };
+  client.start<VespCommandResponse>({.message = good}, note);
   EXPECT_EQ(inFork([&] {
               const auto inherited = openDescriptors();
+              client.start<VespCommandResponse>({.message = good}, note);
+              const bool answered = comesTrue([&] { return client.dispatch(), told > 0; });
               const bool right = outcomeOf(client, Script().answer(2)) == "record 2" &&
                                  children().size() == 1 && openDescriptors() == inherited;
-              return right ? 0 : 1;
+              return answered && told == 1 && right ? 0 : 1;
             }),
             0);
-  EXPECT_EQ(outcomeOf(client, good), "record 7");
+  EXPECT_TRUE(comesTrue([&] { return client.dispatch(), told == 1; }));
   const std::set<pid_t> after = children();
   EXPECT_TRUE(std::includes(after.begin(), after.end(), before.begin(), before.end()));
 }
@@ -230,7 +237,14 @@ TEST(Application, IsToldFromItsForkWhateverTheirNumbers) {
 TEST(Application, GetsBackWhatItHadWhenTheClientEnds) {
   const auto descriptors = openDescriptors();
   for (const char* manner : {"honest", "stuck"}) {
-    { const Client client(fakeOptions(manner)); }
+    {
+      Client client(fakeOptions(manner));
+      // What is under way then is never told.
+      client.start<VespCommandResponse>({.message = good},
+                                        [](const auto&) { ADD_FAILURE() << "told"; });
+      client.dispatch();
+      usleep(50'000);
+    }
     EXPECT_TRUE(children().empty());
     EXPECT_EQ(openDescriptors(), descriptors);
   }

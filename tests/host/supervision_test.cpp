@@ -11,6 +11,8 @@
 
 #include <atomic>
 #include <csignal>
+#include <functional>
+#include <memory>
 #include <thread>
 
 namespace Keelgate::Host {
@@ -20,14 +22,8 @@ using std::chrono::seconds;
 using Place = FairSemaphore::Place;
 using State = ServiceProcess::State;
 
-const Script zygote = Script().then(Op::answerZygote);
 const Script fault = Script().then(Op::raise, SIGSEGV);
 constexpr int strikes[] = {SIGKILL, SIGSEGV, SIGSTOP};
-
-/// The process that the workers of a client are forked from just now.
-pid_t zygoteOf(Client& client) {
-  return static_cast<pid_t>(client.unpack<VespCommandResponse>(zygote).command);
-}
 
 /// More than a single call, and time for what is started behind them to get ready.
 void settle(Client& client) {
@@ -47,20 +43,6 @@ bool recovers(Client& client, Bytes message, milliseconds limit) {
     EXPECT_TRUE(outcome == "crashed" || outcome == "timedOut") << outcome;
   }
   return false;
-}
-
-TEST(C9, AZygoteThatIsHitIsReplaced) {
-  constexpr milliseconds limit(400);
-  for (const int signal : strikes) {
-    for (const Script& step : {Script(), Script().write(Data(10)), Script().answer(7)}) {
-      Client client(fakeOptions("honest", limit, 1));
-      Script script = step;
-      script.then(Op::hitZygote, static_cast<unsigned>(signal)).then(Op::pause, 50);
-      const String outcome = outcomeOf(client, script);
-      EXPECT_TRUE(outcome == "record 7" || outcome == "crashed") << signal << ": " << outcome;
-      EXPECT_TRUE(recovers(client, Script().answer(1), limit)) << signal;
-    }
-  }
 }
 
 /// The real service: its launcher, its zygote, its spare workers.
@@ -145,12 +127,12 @@ TEST(C14, AZygoteThatDiesIsReplacedAtOnceAsLongAsAnswersCome) {
   Client client(fakeOptions());
   const auto start = Clock::now();
   for (int i = 0; i < 6; ++i) {
-    const String old = outcomeOf(client, zygote);
-    kill(zygoteOf(client), SIGKILL);
+    const pid_t old = zygoteOf(client);
+    kill(old, SIGKILL);
     // Its workers may outlive it for a moment.
     EXPECT_TRUE(comesTrue([&] {
-      const String next = outcomeOf(client, zygote);
-      return next.starts_with("record") && next != old;
+      const String next = outcomeOf([&] { return zygoteOf(client); });
+      return next.starts_with("record") && next != "record " + std::to_string(old);
     }));
   }
   EXPECT_LT(Clock::now() - start, seconds(8));
@@ -291,33 +273,30 @@ TEST(Places, AreGivenInTurnAndSomeAreKeptForSmallOnes) {
 
 /// The deepest reply that there is, on the least stack that is promised to do.
 TEST(Stack, WhatIsPromisedIsEnoughAndLessIsRefused) {
-  struct Trial {
-    Client client{fakeOptions()};
-    Data reply;
-    String outcome;
-  } trial;
+  Client client(fakeOptions());
   PulseUserPayload nested{};
   for (std::size_t i = 0; i < Transport::maximumNesting / 2; ++i) {
     PulseUserPayload outer{};
     outer.ostrelMessageList.push_back(std::move(nested));
     nested = std::move(outer);
   }
-  trial.reply = Transport::encodeRecord(nested);
+  const Script deepest = Script().answer(Transport::encodeRecord(nested));
+  std::function<String()> body = [&] {
+    return outcomeOf([&] { return client.unpack<PulseUserPayload>(deepest).command; });
+  };
   const auto runWith = [&](std::size_t stack) {
     pthread_attr_t attributes;
     pthread_attr_init(&attributes);
     pthread_attr_setstacksize(&attributes, stack);
     pthread_t thread;
     const auto run = [](void* of) -> void* {
-      Trial& its = *static_cast<Trial*>(of);
-      its.outcome = outcomeOf(
-          [&] { return its.client.unpack<PulseUserPayload>(Script().answer(its.reply)).command; });
-      return nullptr;
+      return new String((*static_cast<std::function<String()>*>(of))());
     };
-    EXPECT_EQ(pthread_create(&thread, &attributes, run, &trial), 0);
-    pthread_join(thread, nullptr);
+    EXPECT_EQ(pthread_create(&thread, &attributes, run, &body), 0);
+    void* told = nullptr;
+    pthread_join(thread, &told);
     pthread_attr_destroy(&attributes);
-    return trial.outcome;
+    return *std::unique_ptr<String>(static_cast<String*>(told));
   };
   // In this order: the C library gives a thread the stack of one before it that had more.
   EXPECT_EQ(runWith(leastStack - (32u << 10)), "resourcesExhausted");
