@@ -4,25 +4,19 @@
 #include "framework/contracts/layers.h"
 #include "tests/containment/raw_client.h"
 
-#include <fcntl.h>
-#include <grp.h>
-#include <gtest/gtest.h>
 #include <keelgate/client.h>
+
+#include <grp.h>
 #include <linux/filter.h>
 #include <linux/sched.h>
 #include <linux/seccomp.h>
-#include <sched.h>
 #include <sys/mman.h>
 #include <sys/mount.h>
 #include <sys/prctl.h>
 #include <sys/resource.h>
 #include <sys/syscall.h>
-#include <sys/wait.h>
-#include <unistd.h>
-#include <cerrno>
+
 #include <csignal>
-#include <cstddef>
-#include <filesystem>
 
 namespace Keelgate::Test {
 namespace {

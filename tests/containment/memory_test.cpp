@@ -1,17 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
 /// How much memory a message gets, and where it lies.
-#include "framework/contracts/memory_budget.h"
 #include "tests/containment/raw_client.h"
 
-#include <gtest/gtest.h>
 #include <sys/resource.h>
-#include <unistd.h>
-#include <algorithm>
+
 #include <bit>
-#include <filesystem>
 #include <fstream>
-#include <map>
-#include <utility>
 
 namespace Keelgate::Test {
 namespace {
@@ -56,10 +50,10 @@ TEST_F(Reused, C4AMessageHasTheSameMemoryInEveryWorker) {
     const std::size_t most = allocationLimit(length);
     for (const std::size_t part : {90U, 98U, 102U}) {
       const std::string order = toEat(most / 100 * part, size, length);
-      const bool alone = resultOf(service_.obey(order).first) == 0;
+      const bool alone = service_.obey(order).first.result() == 0;
       EXPECT_EQ(alone, part < 100) << part << ' ' << size;
       // After others, of which one has left its memory full of small holes.
-      EXPECT_EQ(resultOf(obeyNext(toEat(4 << 20, 40, 0))), 0);
+      EXPECT_EQ(obeyNext(toEat(4 << 20, 40, 0)).result(), 0);
       EXPECT_EQ(obeyNext(order).kind.has_value(), alone) << part << ' ' << size;
       const WorkerEnd end = leave();
       EXPECT_EQ(end.exitStatus(), alone ? 0 : Protocol::resourceExitStatus);
@@ -86,7 +80,7 @@ TEST_F(Worker, C13AddressesAreRandom) {
   for (int i = 0; i < 40; ++i) {
     RawClient service(OBEDIENT_SERVICE);
     for (const long what : {0L, 1L, 2L, 3L}) {
-      const auto result = resultOf(service.obey("address " + std::to_string(what)).first);
+      const auto result = service.obey("address " + std::to_string(what)).first.result();
       const auto address = static_cast<std::uint64_t>(result.value());
       differences[what] |= first.try_emplace(what, address).first->second ^ address;
     }
@@ -111,7 +105,7 @@ TEST_F(Worker, C4AMachineThatHasLessStillAnswers) {
     for (const std::size_t length : {6U, 1U << 18, 1U << 20, 3U << 20, 8U << 20}) {
       std::string order = "answer";
       order.resize(length, ' ');
-      EXPECT_EQ(resultOf(service.obey(order).first), 0) << space << " for " << length;
+      EXPECT_EQ(service.obey(order).first.result(), 0) << space << " for " << length;
     }
   }
 }
