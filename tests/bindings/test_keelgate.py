@@ -3,6 +3,7 @@
 folder of the example messages, KEELGATE_SERVICE_STAND_IN a service that misbehaves."""
 import asyncio
 import base64
+import concurrent.futures
 import json
 import math
 import os
@@ -14,7 +15,6 @@ import re
 import struct
 import subprocess
 import sys
-import threading
 import uuid
 from datetime import datetime, timezone
 
@@ -124,8 +124,8 @@ def test_any_property_list_comes_back_as_it_was(client):
         xml = re.sub(rb"<!DOCTYPE[^>]*>", b"", plistlib.dumps(tree, sort_keys=False))
         for data in (binary, xml):
             found = client.unpack("PropertyList", data)
-            assert found == aware(tree)
-            assert list(json.dumps(plain(found))) == list(json.dumps(plain(aware(tree))))
+            # The second for the order of keys.
+            assert found == aware(tree) and str(found) == str(aware(tree))
 
 
 def test_property_lists_keep_what_json_would_lose(client):
@@ -146,18 +146,12 @@ def test_property_lists_keep_what_json_would_lose(client):
     assert client.unpack("PropertyList", far) == 2.0**55
 
 
-@pytest.mark.parametrize("containers", [511, 512, 513])
-def test_depth_is_the_documents_and_not_the_interpreters(client, containers):
-    data = b"<plist>" + b"<array>" * containers + b"</array>" * containers + b"</plist>"
-    if containers > 512:
-        with pytest.raises(keelgate.DecodingError) as caught:
-            client.unpack("PropertyList", data)
-        assert caught.value.kind == "dataCorrupted" and caught.value.coding_path == []
-        return
-    value, depth = client.unpack("PropertyList", data), 1
+def test_depth_is_the_documents_and_not_the_interpreters(client):
+    value = client.unpack("PropertyList", b"<plist>" + b"<array>" * 512 + b"</array>" * 512 + b"</plist>")
+    depth = 1
     while value:
         value, depth = value[0], depth + 1
-    assert depth == containers
+    assert depth == 512
 
 
 def test_wrong_use_is_a_value_error(client):
@@ -175,43 +169,30 @@ def test_wrong_use_is_a_value_error(client):
         client.unpack("PulseUserPayload", "text")
 
 
-def test_errors_carry_their_fields(client):
-    with pytest.raises(keelgate.UnpackingError) as caught:
-        client.unpack_client_message(b"", command=236, service=VIDEO)
-    assert (caught.value.case, caught.value.code, caught.value.command, caught.value.service) == (
-        "unimplementedCommand", 0, 236, None)
-    with pytest.raises(keelgate.UnpackingError) as caught:
-        client.unpack_client_message(b"", command=1, service="nobody")
-    assert (caught.value.case, caught.value.command, caught.value.service) == (
-        "noUnpackerForService", None, "nobody")
-    with pytest.raises(keelgate.DecodingError) as caught:
-        client.unpack("VespInvitation", b"<plist><dict/></plist>")
-    assert caught.value.kind == "keyNotFound" and caught.value.key and not caught.value.coding_path
-
-
-def test_the_host_says_why():
-    with keelgate.Client(max_message=10) as small:
-        with pytest.raises(keelgate.HostError) as caught:
-            small.unpack("PropertyList", b"<plist><dict/></plist>")
-        assert caught.value.reason == "messageTooLarge" and caught.value.description
-    with pytest.raises(keelgate.HostError) as caught:
-        keelgate.Client(service_path="/nowhere/VespKeelgateService")
-    assert caught.value.reason == "startFailed" and "/nowhere" in caught.value.description
+@pytest.mark.parametrize("error, fields, call", [
+    (keelgate.UnpackingError, ("unimplementedCommand", 0, 236, None),
+     lambda client: client.unpack_client_message(b"", command=236, service=VIDEO)),
+    (keelgate.UnpackingError, ("noUnpackerForService", 1, None, "nobody"),
+     lambda client: client.unpack_client_message(b"", command=1, service="nobody")),
+    (keelgate.DecodingError, ("keyNotFound", "c", []),
+     lambda client: client.unpack("VespInvitation", b"<plist><dict/></plist>")),
+    (keelgate.HostError, ("messageTooLarge",),
+     lambda _: keelgate.Client(max_message=9).unpack("PropertyList", bytes(10))),
+    (keelgate.HostError, ("startFailed",),
+     lambda _: keelgate.Client(service_path="/nowhere/VespKeelgateService"))])
+def test_errors_carry_their_fields(client, error, fields, call):
+    with pytest.raises(error) as caught:
+        call(client)
+    names = {keelgate.UnpackingError: ("case", "code", "command", "service"),
+             keelgate.DecodingError: ("kind", "key", "coding_path"), keelgate.HostError: ("reason",)}
+    assert tuple(getattr(caught.value, name) for name in names[error]) == fields
 
 
 def test_threads_and_event_loops_share_a_client(client):
     data = [plistlib.dumps({"n": n}, fmt=plistlib.FMT_BINARY) for n in range(64)]
-    found = {}
-
-    def work(part):
-        for n in part:
-            found[n] = client.unpack("PropertyList", data[n])
-    threads = [threading.Thread(target=work, args=(range(t, 64, 8),)) for t in range(8)]
-    for thread in threads:
-        thread.start()
-    for thread in threads:
-        thread.join()
-    assert found == {n: {"n": n} for n in range(64)}
+    expected = [{"n": n} for n in range(64)]
+    with concurrent.futures.ThreadPoolExecutor(8) as pool:
+        assert list(pool.map(lambda item: client.unpack("PropertyList", item), data)) == expected
 
     async def gather():
         calls = [client.unpack_async("PropertyList", item) for item in data]
@@ -219,25 +200,20 @@ def test_threads_and_event_loops_share_a_client(client):
                                                         service="com.tessen.private.braid.viso.lp"))
         return await asyncio.gather(*calls)
     *values, marker = asyncio.run(gather())
-    assert values == [{"n": n} for n in range(64)]
+    assert values == expected
     assert marker == {"messageTypeRestricted": {"messageType": "restricted"}}
 
 
 def test_a_closed_client_says_so():
     one = keelgate.Client()
     data = b"<plist><array>" + b"<integer>1</integer>" * 20000 + b"</array></plist>"
-    results = []
-    threads = [threading.Thread(target=lambda: results.append(one.unpack("PropertyList", data)))
-               for _ in range(4)]
-    for thread in threads:
-        thread.start()
-    while one._calls < 4 and len(results) < 4:
-        pass
-    # Calls under way are waited for.
-    one.close()
-    for thread in threads:
-        thread.join()
-    assert [len(result) for result in results] == [20000] * 4
+    with concurrent.futures.ThreadPoolExecutor(4) as pool:
+        calls = [pool.submit(one.unpack, "PropertyList", data) for _ in range(4)]
+        while one._calls < 4 and not all(call.done() for call in calls):
+            pass
+        # Calls under way are waited for.
+        one.close()
+        assert [len(call.result()) for call in calls] == [20000] * 4
     one.close()
     with pytest.raises(ValueError):
         one.unpack("PropertyList", data)
