@@ -63,10 +63,14 @@ TEST(Document, Utf16) {
     for (const std::uint64_t unit : units) text += bigEndian(unit, 2);
     return binary({text});
   };
-  EXPECT_EQ(read(utf16({0x7F, 0x80, 0x7FF, 0x800, 0xD7FF, 0xE000, 0xFFFF, 0})),
-            Tree(bytes("\x7F\xC2\x80\xDF\xBF\xE0\xA0\x80\xED\x9F\xBF\xEE\x80\x80\xEF\xBF\xBF\0")));
-  EXPECT_EQ(read(utf16({0xD800, 0xDC00, 0xDBFF, 0xDFFF})),
-            Tree("\xF0\x90\x80\x80\xF4\x8F\xBF\xBF"));
+  const std::pair<std::string, Tree> sound[] = {
+      {utf16({0x7F, 0x80, 0x7FF, 0x800, 0xD7FF, 0xE000, 0xFFFF, 0}),
+       bytes("\x7F\xC2\x80\xDF\xBF\xE0\xA0\x80\xED\x9F\xBF\xEE\x80\x80\xEF\xBF\xBF\0")},
+      {utf16({0xD800, 0xDC00, 0xDBFF, 0xDFFF}), "\xF0\x90\x80\x80\xF4\x8F\xBF\xBF"}};
+  for (const auto& [message, text] : sound) {
+    EXPECT_EQ(read(message), text);
+    EXPECT_EQ(treeOf(writeBinary(text)), text);
+  }
   for (const std::string& message :
        {utf16({0xDC00}), utf16({0xD800}), utf16({0xDBFF}), utf16({0xDFFF, 0x41}),
         utf16({0xD800, 0x41}), utf16({0xD800, 0xDBFF}), utf16({0xD800, 0xE000}),

@@ -56,8 +56,8 @@ TEST(Malformed, BinaryObjects) {
        binary({bytes("\x61\0")}), binary({"\x52y"}), binary({"\xA2\x01"}), binary({"\xD1\x01"}),
        binary({"\x5F\x13" + bigEndian(~0ull, 8)}), binary({"\x6F\x13" + bigEndian(1ull << 63, 8)}),
        binary({"\xDF\x13" + bigEndian(1ull << 63, 8)})});
-  // A real, null, an integer of 16 bytes.
-  all(Problem::badCount, {binary({bytes("\x5F\x22\0\0\0\0")}), binary({bytes("\x5F\x00\x01x")}),
+  // A real, a marker of no type, an integer of 16 bytes.
+  all(Problem::badCount, {binary({bytes("\x5F\x22\0\0\0\0")}), binary({bytes("\x5F\x0F\x01x")}),
                           binary({"\x5F\x14" + std::string(16, '\0')})});
   // The last stands under a key that nobody reads.
   all(Problem::notAscii,

@@ -36,6 +36,9 @@ TEST(Decoding, ReadsFieldsByTheirKeysAndStopsAtTheFirstFailureInDeclarationOrder
       {"the first of two mismatches", sample,
        Dictionary{{"version", "3"}, {"date", 1}, {"command", 7}, {"client", "a"}},
        "typeMismatch @date"},
+      {"zero", sample, with({{"command", 0}, {"version", -1}}, sampleMessage),
+       sampleRecord + ".command=0 " + sampleRecord + ".clientName=a " + sampleRecord +
+           ".version=-1"},
       {"no boolean for an integer", sample, with({{"command", true}}, sampleMessage),
        "typeMismatch @command"},
       {"no real for an integer", sample, with({{"command", 7.0}}, sampleMessage),

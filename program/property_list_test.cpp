@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // Any property list comes out as the tree that went in.
+#include "plist/limits.h"
 #include "plist/test_messages.h"
 #include "program/property_list/property_list_unpacker.h"
 #include "program/test_support.h"
@@ -72,10 +73,14 @@ TEST(PropertyLists, ComeOutAsTheTreeThatTheyAreInBothEncodings) {
   EXPECT_GT(inBoth, 50u);
 }
 
-TEST(PropertyLists, KeepUidsOf128Bits) {
-  const std::string message = ::PropertyList::binary({"\x8f" + std::string("0123456789abcdef")});
-  EXPECT_EQ(unpacked(::PropertyList::bytesOf(message)),
-            PropertyListValue((PropertyListUID{0x3031323334353637, 0x3839616263646566})));
+TEST(PropertyLists, KeepUidsOf128BitsAndIntegersOfEitherSign) {
+  const std::pair<std::string, PropertyListValue> rows[] = {
+      {"\x8f" + std::string("0123456789abcdef"),
+       PropertyListUID{0x3031323334353637, 0x3839616263646566}},
+      {"\x13" + std::string(8, '\xff'), Keelgate::Int64{-1}}};
+  for (const auto& [object, value] : rows) {
+    EXPECT_EQ(unpacked(::PropertyList::bytesOf(::PropertyList::binary({object}))), value);
+  }
 }
 
 TEST(PropertyLists, NestToTheLimitAndNoFurther) {
@@ -109,13 +114,18 @@ TEST(PropertyLists, SharedObjectsAreRefusedBeforeTheyTakeMemory) {
     const std::string message = raw.message();
     return errorOf([&] { unpacked(::PropertyList::bytesOf(message)); });
   };
+  constexpr std::size_t length = 60'000;
   const std::string text =
-      "\x5f\x12" + ::PropertyList::bigEndian(60'000, 4) + std::string(60'000, 'x');
-  const auto bytes = ::PropertyList::bytes("\xa1\x00\x01");
-  EXPECT_EQ(shared(text, bytes, 10), "");
-  EXPECT_EQ(shared(text, bytes, 1000), "dataCorrupted @");
-  EXPECT_EQ(shared(text, ::PropertyList::bytes("\xd1\x00\x01\x00\x02"), 10), "");
-  EXPECT_EQ(shared(text, ::PropertyList::bytes("\xd1\x00\x01\x00\x02"), 1000), "dataCorrupted @");
+      "\x5f\x12" + ::PropertyList::bigEndian(length, 4) + std::string(length, 'x');
+  // What is made counts twice, since it is written into the reply too.
+  namespace Limits = ::PropertyList::Limits;
+  const std::size_t allowed =
+      (Limits::expansionBase + Limits::expansionFactor * text.size()) / (2 * length);
+  for (const std::string& marker :
+       {::PropertyList::bytes("\xa1\x00\x01"), ::PropertyList::bytes("\xd1\x00\x01\x00\x02")}) {
+    EXPECT_EQ(shared(text, marker, allowed * 4 / 5), "");
+    EXPECT_EQ(shared(text, marker, allowed * 6 / 5), "dataCorrupted @");
+  }
 
   std::vector<std::string> doubling;
   for (char i = 1; i < 60; ++i) doubling.push_back({'\xa2', i, i});
