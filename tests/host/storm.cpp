@@ -24,7 +24,7 @@ namespace {
 
 struct Holdings {
   std::ptrdiff_t descriptors = openDescriptors();
-  std::size_t children = Host::children().size();
+  std::ptrdiff_t children = std::ssize(Host::children());
   std::ptrdiff_t threads = [] {
     // One that was joined may be listed for a moment more.
     comesTrue([] { return entriesOf("/proc/self/task") == 1; });
@@ -38,12 +38,12 @@ struct Holdings {
     rollup >> resident;
     return resident;
   }();
-
-  void print(const char* when) const {
-    std::cout << when << ": " << descriptors << " descriptors, " << children << " children, "
-              << threads << " threads, " << residentKiB << " KiB\n";
-  }
 };
+
+std::ostream& operator<<(std::ostream& out, const Holdings& held) {
+  return out << held.descriptors << " descriptors, " << held.children << " children, "
+             << held.threads << " threads, " << held.residentKiB << " KiB\n";
+}
 
 class Storm {
  public:
@@ -52,7 +52,6 @@ class Storm {
 
   /// Whether every outcome was one that is allowed.
   bool send(Int messages) {
-    next_ = records_ = 0;
     messages_ = messages;
     done_ = !order_.empty();
     std::thread killer([this] { killAtRandom(); });
@@ -63,11 +62,10 @@ class Storm {
     killer.join();
     for (const auto& [outcome, count] : outcomes_) std::cout << outcome << ": " << count << '\n';
     std::cout << "signals sent: " << signals_ << ", longest: " << longest_.count() << " ms\n";
-    const auto grace = milliseconds(1000);
-    if (wrong_ > 0 || longest_ > limit + grace) return false;
     // A signal takes the messages along that are in work, and no other.
-    const auto lost = static_cast<std::size_t>(outcomes_["crashed"] + outcomes_["timedOut"]);
-    return !order_.empty() || (records_ > messages / 2 && lost <= signals_ * threads_);
+    const Int lost = outcomes_["crashed"] + outcomes_["timedOut"];
+    return wrong_ == 0 && longest_ <= limit + milliseconds(1000) &&
+           (!order_.empty() || (records_ > messages / 2 && lost <= signals_ * Int{threads_}));
   }
 
   static constexpr milliseconds limit{500};
@@ -123,7 +121,7 @@ class Storm {
   std::atomic<Int> next_ = 0;
   std::atomic<Int> records_ = 0;
   std::atomic<bool> done_ = false;
-  std::size_t signals_ = 0;
+  Int signals_ = 0;
 
   std::mutex mutex_;
   std::map<String, Int> outcomes_;
@@ -132,34 +130,33 @@ class Storm {
 };
 
 bool runStorm(const String& service, Int messages, unsigned threads, const String& order) {
-  constexpr Int warmUp = 100;
   const auto limit = order.empty() ? Storm::limit : milliseconds(20'000);
   const Client::Options options = optionsFor(service, limit, threads);
   // As pid 1 of a container: what the service leaves behind would be found among our children.
   // Where launchers are killed, that is what they were there for.
   if (!order.empty()) prctl(PR_SET_CHILD_SUBREAPER, 1);
+  const auto warmUp = [&](Client& client) {
+    Storm(client, threads, order).send(100);
+  };
   {
     Client client(options);
-    Storm(client, threads, order).send(warmUp);
+    warmUp(client);
   }
   const Holdings before;
   bool sound = false;
   {
     Client client(options);
-    Storm(client, threads, order).send(warmUp);
+    warmUp(client);
     const Holdings early;
     sound = Storm(client, threads, order).send(messages);
     const Holdings late;
-    early.print("after the first");
-    late.print("after the last");
+    std::cout << "after the first: " << early << "after the last: " << late;
     // Workers come and go: two that are kept ready for each thread, and a service that ends.
-    const auto more = late.descriptors - early.descriptors +
-                      static_cast<std::ptrdiff_t>(late.children - early.children);
-    sound = sound && more <= 2 * static_cast<std::ptrdiff_t>(threads) + 3;
+    const auto more = late.descriptors - early.descriptors + late.children - early.children;
+    sound = sound && more <= 2 * std::ptrdiff_t{threads} + 3;
   }
   const Holdings after;
-  before.print("before");
-  after.print("after");
+  std::cout << "before: " << before << "after: " << after;
 #ifdef KEELGATE_UNSEALED
   // A sanitizer remembers what was freed.
   constexpr std::size_t slack = 65'536;
@@ -174,10 +171,9 @@ bool runStorm(const String& service, Int messages, unsigned threads, const Strin
 }  // namespace Keelgate::Host
 
 int main(int count, char** arguments) {
-  if (count < 4) return 2;
-  return Keelgate::Host::runStorm(arguments[1], std::stol(arguments[2]),
-                                  static_cast<unsigned>(std::stoul(arguments[3])),
-                                  count > 4 ? arguments[4] : "")
+  const auto threads = static_cast<unsigned>(std::stoul(arguments[3]));
+  const Keelgate::Int messages = std::stol(arguments[2]);
+  return Keelgate::Host::runStorm(arguments[1], messages, threads, count > 4 ? arguments[4] : "")
              ? 0
              : 1;
 }
