@@ -102,13 +102,6 @@ TEST(Document, AskingForAnotherTypeIsRefused) {
   EXPECT_THROW(top.elements(), std::logic_error);
 }
 
-TEST(Document, StringsAreViewsIntoTheMessage) {
-  const std::string message = xml("<array><string>plain</string></array>");
-  const Document document(bytesOf(message));
-  const std::string_view text = (*document.top().elements().begin()).string();
-  EXPECT_EQ(text.data(), message.data() + message.find("plain"));
-}
-
 TEST(Writers, WidthsOfReferencesAndOffsets) {
   for (const std::size_t count : {254u, 255u, 256u, 257u, 65'534u, 65'535u, 65'536u, 65'537u}) {
     Array elements;
@@ -131,14 +124,6 @@ TEST(Writers, RefuseWhatTheFormatHasNot) {
   }
   EXPECT_THROW(writeBinary("\xC0\x80"), std::invalid_argument);
   EXPECT_THROW(writeBinary(Date{std::numeric_limits<double>::infinity()}), std::invalid_argument);
-}
-
-TEST(Writers, ShareEqualScalarsAndUseNarrowWidths) {
-  const auto message = writeBinary(Array{"x", "x", 1, 1u, Dictionary{{"x", 1}}, -1});
-  const std::string expected = bytes("bplist00\xA6\1\1\2\2\3\4\x51x\x10\1\xD1\1\2\x13") +
-                               bigEndian(~0ull, 8) + bytes("\x08\x0F\x11\x13\x16\0\0\0\0\0\0") +
-                               bytes("\1\1") + bigEndian(5, 8) + bigEndian(0, 8) + bigEndian(31, 8);
-  EXPECT_EQ(std::string(reinterpret_cast<const char*>(message.data()), message.size()), expected);
 }
 
 }  // namespace

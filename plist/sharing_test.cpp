@@ -45,15 +45,10 @@ TEST(Depth, CountsEveryPathThroughSharedContainers) {
   };
   EXPECT_EQ(joined(300, 211), std::nullopt);
   EXPECT_EQ(joined(300, 212), Problem::tooDeep);
-  EXPECT_EQ(joined(1, 511), Problem::tooDeep);
   EXPECT_EQ(joined(0, 511), std::nullopt);
   EXPECT_EQ(joined(0, 10'000), Problem::tooDeep);
-}
-
-/// The list has a height only because what it holds was read before.
-TEST(Depth, IsPassedOnThroughWhatWasReadBefore) {
-  const auto problemOf = [](std::size_t chain, std::size_t tail) {
-    // [tail, [tail], chain of that list]
+  // [tail, [tail], chain of that list], which has a height only because of what was read before.
+  const auto passedOn = [](std::size_t chain, std::size_t tail) {
     const std::size_t list = tail + 1;
     Raw raw{{"\xA3" + bigEndian(1, 2) + bigEndian(list, 2) + bigEndian(list + 1, 2)}, 2, 4};
     appendChain(raw, tail, 0);
@@ -61,8 +56,8 @@ TEST(Depth, IsPassedOnThroughWhatWasReadBefore) {
     appendChain(raw, chain, list);
     return problemIn(raw.message());
   };
-  EXPECT_EQ(problemOf(200, 310), std::nullopt);
-  EXPECT_EQ(problemOf(200, 311), Problem::tooDeep);
+  EXPECT_EQ(passedOn(200, 310), std::nullopt);
+  EXPECT_EQ(passedOn(200, 311), Problem::tooDeep);
 }
 
 std::string doubling(std::size_t levels) {
@@ -73,25 +68,9 @@ std::string doubling(std::size_t levels) {
   return binary(objects);
 }
 
-std::optional<Problem> problemInReading(const std::string& message) {
-  try {
-    read(message);
-    return std::nullopt;
-  } catch (const MalformedDocument& error) {
-    return error.problem();
-  }
-}
-
-TEST(Sharing, IsCheckedInLinearTimeAndPaidForWhenRead) {
+/// What is made of it is paid for by whoever reads it.
+TEST(Sharing, IsCheckedInLinearTime) {
   EXPECT_EQ(problemIn(doubling(64)), std::nullopt);
-  EXPECT_EQ(problemInReading(doubling(64)), Problem::excessiveExpansion);
-  EXPECT_EQ(problemInReading(doubling(8)), std::nullopt);
-
-  // One long string and many references to it.
-  Raw raw{{"\xAF\x12" + bigEndian(60'000, 4) + std::string(60'000, '\1'),
-           "\x5F\x12" + bigEndian(60'000, 4) + std::string(60'000, 'x')}};
-  EXPECT_EQ(problemIn(raw.message()), std::nullopt);
-  EXPECT_EQ(problemInReading(raw.message()), Problem::excessiveExpansion);
 }
 
 TEST(Sharing, IsInheritedDownwards) {

@@ -100,13 +100,6 @@ TEST(Payloads, SharedOnesAreRefusedBeforeTheyTakeMemoryOrTime) {
   EXPECT_TRUE(shared("mml", 100, 20).ends_with("[99].command=1"));
 }
 
-TEST(Payloads, LargeOnesAreOrdinary) {
-  Dictionary large{{"c", 1}, {"P", PropertyList::Data(4u << 20, std::byte{7})}};
-  for (int i = 0; i < 10'000; ++i) large.emplace_back("unknown-" + std::to_string(i), i);
-  const std::string got = outcome(payload, large);
-  EXPECT_EQ(got.size(), std::string(".command=1 .payload=").size() + (4u << 20));
-}
-
 TEST(Invitations, FailInTheOrderOfTheirFields) {
   const auto envelope = [](Dictionary context) {
     return Dictionary{{"c", std::move(context)}, {"s", -5}, {"uID", "u"}};

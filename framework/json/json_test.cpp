@@ -34,10 +34,18 @@ Data dataOf(std::string_view text) {
 }
 
 TEST(JSON, NumbersAreExactAndTellTheirKind) {
-  const std::pair<double, const char*> table[] = {
-      {3, "3.0"},       {-0.0, "-0.0"},        {0.1, "0.1"},           {1e15, "1000000000000000.0"},
-      {1e16, "1e+16"},  {1e-5, "0.00001"},     {9e-6, "9e-06"},        {5e-324, "5e-324"},
-      {NAN, "\"nan\""}, {INFINITY, "\"inf\""}, {-INFINITY, "\"-inf\""}};
+  const std::pair<double, const char*> table[] = {{3, "3.0"},
+                                                  {-0.0, "-0.0"},
+                                                  {0.1, "0.1"},
+                                                  {1e15, "1000000000000000.0"},
+                                                  {0.1 + 0.2, "0.30000000000000004"},
+                                                  {1e16, "1e+16"},
+                                                  {1e-5, "0.00001"},
+                                                  {9e-6, "9e-06"},
+                                                  {5e-324, "5e-324"},
+                                                  {NAN, "\"nan\""},
+                                                  {INFINITY, "\"inf\""},
+                                                  {-INFINITY, "\"-inf\""}};
   for (const auto& [number, text] : table) EXPECT_EQ(compact(number), text);
   // Dates are text within the calendar and numbers outside.
   EXPECT_EQ(compact(Date{0.1}), "\"2001-01-01T00:00:00.1Z\"");
@@ -45,17 +53,6 @@ TEST(JSON, NumbersAreExactAndTellTheirKind) {
   EXPECT_EQ(compact(std::numeric_limits<Int>::min()), "-9223372036854775808");
   EXPECT_EQ(compact(std::numeric_limits<UInt64>::max()), "18446744073709551615");
   EXPECT_EQ(compact(Array<Bool>{true, false}), "[true,false]");
-}
-
-TEST(JSON, EveryPowerOfTwoAndItsNeighboursReadBack) {
-  for (int exponent = -1074; exponent <= 1023; ++exponent) {
-    const double power = std::ldexp(1, exponent);
-    for (double number : {std::nextafter(power, 0), power, -std::nextafter(power, INFINITY)}) {
-      const String text = compact(number);
-      EXPECT_EQ(std::strtod(text.c_str(), nullptr), number) << text;
-      EXPECT_NE(text.find_first_of(".e"), String::npos) << text;
-    }
-  }
 }
 
 TEST(JSON, StringsCanNeitherEndNorDriveATerminal) {

@@ -13,8 +13,6 @@ import plistlib
 import random
 import re
 import struct
-import subprocess
-import sys
 import uuid
 from datetime import datetime, timezone
 
@@ -219,14 +217,3 @@ def test_a_closed_client_says_so():
         one.unpack("PropertyList", data)
     with pytest.raises(ValueError):
         asyncio.run(one.unpack_async("PropertyList", data))
-
-
-def test_a_forked_child_has_a_service_of_its_own(client):
-    script = ("import os, keelgate\n"
-              "c = keelgate.Client(); d = b'<plist><string>a</string></plist>'\n"
-              "assert c.unpack('PropertyList', d) == 'a'\n"
-              "pid = os.fork()\n"
-              "assert c.unpack('PropertyList', d) == 'a'\n"
-              "if pid == 0: os._exit(0)\n"
-              "assert os.waitpid(pid, 0)[1] == 0\n")
-    subprocess.run([sys.executable, "-c", script], check=True, timeout=60)

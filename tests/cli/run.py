@@ -77,9 +77,11 @@ def wrong_usage():
         check(done.stderr.startswith(b"keelgate: "), f"{words}: {done.stderr}")
     for words, hint in ((["describe", "VespInvitatoin"], "VespInvitation"),
                         (["unpak", "x"], "did you mean unpack?"),
+                        (["Stream"], "did you mean stream?"), (["desc"], "did you mean describe?"),
                         (["stream", "--proceses=3"], "did you mean --processes?"),
                         (["stream", "--processes", "0"], "--processes: \"0\" is not")):
         check(hint in run(*words)[2], f"{words} without a hint")
+    check("did you mean" not in run("install")[2], "a hint that nobody needs")
     for words in (["--help"], ["--version"], ["unpack", "--help"], ["stream", "--help"],
                   ["describe", "--help"], ["--version", "--verbose"],
                   ["check", "--max-message", "4g", messages / "check-in.xml"]):
@@ -343,10 +345,6 @@ def stream():
     process.stdout.close()
     check(process.wait(60) == 0 and heard(process.stderr.read()) == b"", "the reader goes away")
     process.stdin.close()
-    process = subprocess.Popen(f"yes '{request(1)}' | '{keelgate}' stream | head -3", shell=True,
-                               stdout=subprocess.PIPE, stderr=subprocess.PIPE)
-    out, err = process.communicate(timeout=60)
-    check(len(objects(out)) == 3 and heard(err) == b"", f"a short reader: {err}")
 
 
 def long_stream():
@@ -377,8 +375,8 @@ def described():
         check(max(map(len, whole.splitlines())) > 20, f"describe {words} is wrapped without need")
         for width in (48, 60, 80, 132, 1000):
             out = on_terminal("describe", *words, NO_COLOR="1", COLUMNS=str(width)).decode()
-            check(all(len(line) <= width for line in out.splitlines()) and out.split() and
-                  set(out.split()) == letters, f"describe {words} in {width} columns")
+            check(all(len(line) <= width and line == line.rstrip() for line in out.splitlines())
+                  and out.split() and set(out.split()) == letters, f"describe {words} in {width}")
         check(out.replace("\r", "") == whole, f"describe {words} in a wide terminal")
     answered = json.loads(run("describe", "245", "--json")[1])
     check([row["name"] for row in answered["commands"]] == ["livePhoto"] and
@@ -458,7 +456,7 @@ def completed(shell, *words):
 
 def completion():
     for words, expected in (
-            (["d"], ["describe"]), (["st"], ["stream"]),
+            (["st"], ["stream"]),
             (["unpack", "--ti"], ["--time-limit"]), (["describe", "--json-"], ["--json-schema"]),
             (["unpack", "--files"], ["--files0-from"]),
             (["stream", "--log-level", "w"], ["warning"]),

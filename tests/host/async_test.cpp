@@ -6,12 +6,6 @@
 
 #include <gtest/gtest.h>
 
-#include <poll.h>
-
-#include <algorithm>
-#include <csignal>
-#include <thread>
-
 namespace Keelgate::Host {
 namespace {
 

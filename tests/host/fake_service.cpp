@@ -17,7 +17,6 @@
 #include <unistd.h>
 
 #include <array>
-#include <chrono>
 #include <csignal>
 #include <map>
 #include <string_view>
@@ -46,14 +45,6 @@ void die(int signal) {
   raise(signal);
 }
 
-void trickle(std::uint32_t milliseconds) {
-  const auto end = std::chrono::steady_clock::now() + std::chrono::milliseconds(milliseconds);
-  while (std::chrono::steady_clock::now() < end) {
-    write(std::array<std::byte, 1>());
-    usleep(100);
-  }
-}
-
 /// A service is given its channel and nothing else.
 bool hasOnlyChannel() {
   for (int other = 0; other < 64; ++other) {
@@ -77,7 +68,7 @@ void obey(Bytes script, std::uint32_t sequence) {
     if (step.op == Op::raiseIfUsed && sequence > 0) die(static_cast<int>(step.amount));
     if (step.op == Op::hitZygote) kill(getppid(), static_cast<int>(step.amount));
     if (step.op == Op::answerZygote) writeFrame(sequence, recordNumbered(getppid()));
-    if (step.op == Op::trickle) trickle(step.amount);
+    for (; step.op == Op::trickle; usleep(100)) write(std::array<std::byte, 1>());
     if (step.op == Op::exit) _exit(static_cast<int>(step.amount));
     while (step.op == Op::endless) write(std::array<std::byte, 4096>());
   }

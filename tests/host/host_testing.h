@@ -7,7 +7,14 @@
 
 #include <keelgate/client.h>
 
+#include <fcntl.h>
+#include <poll.h>
+
+#include <algorithm>
+#include <atomic>
 #include <chrono>
+#include <csignal>
+#include <thread>
 
 namespace Keelgate::Host {
 

@@ -5,15 +5,12 @@
 
 #include <gtest/gtest.h>
 
-#include <fcntl.h>
 #include <sched.h>
 #include <sys/resource.h>
 #include <sys/socket.h>
 #include <sys/un.h>
 
-#include <algorithm>
 #include <array>
-#include <csignal>
 
 namespace Keelgate::Host {
 namespace {

@@ -12,8 +12,8 @@
 namespace Keelgate::Host {
 
 /// The first three have bytes behind their step, the others milliseconds, a signal or a status in
-/// it. `answerZygote` gives the number of the process that the worker was forked from; `trickle`
-/// sends a byte after the other for so long.
+/// it, or nothing. `answerZygote` gives the number of the process that the worker was forked from;
+/// `trickle` sends a byte after the other for ever.
 enum class Op : std::uint32_t {
   write,
   answer,

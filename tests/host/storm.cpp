@@ -10,14 +10,10 @@
 
 #include <sys/prctl.h>
 
-#include <algorithm>
-#include <atomic>
-#include <csignal>
 #include <iostream>
 #include <map>
 #include <mutex>
 #include <random>
-#include <thread>
 
 namespace Keelgate::Host {
 namespace {

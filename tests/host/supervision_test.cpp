@@ -9,12 +9,6 @@
 
 #include <pthread.h>
 
-#include <atomic>
-#include <csignal>
-#include <functional>
-#include <memory>
-#include <thread>
-
 namespace Keelgate::Host {
 namespace {
 
