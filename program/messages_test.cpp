@@ -116,37 +116,35 @@ TEST(Invitations, FailInTheOrderOfTheirFields) {
       {"groupID", "g"}, {"shareURL", "u"}, {"invitationToken", data("t")}, {"inviteeHandle", "h"}};
   const char* const cofferSchema = "com.tessen.coffersharingmessagingd";
   const std::string token = "breach com.tessen.Keelgate.SkyvaultSharingToken: ";
-  check({
-      {"another context type", invitation, envelope(with({{"cT", 2}}, vitals)),
-       "dataCorrupted @c.cT"},
-      {"context type before schema", invitation, envelope(Dictionary{{"cS", "x"}, {"cT", 2}}),
-       "dataCorrupted @c.cT"},
-      {"schema before data", invitation, envelope(Dictionary{{"cS", "x"}, {"cT", 1}}),
-       unknown("x")},
-      {"letter case", invitation, kind("Stride-sharing-invite", Dictionary{}),
+  const auto home = [&](const char* key, Tree value) {
+    return kind("ht-invite-v1", Dictionary{{key, std::move(value)}});
+  };
+  const std::tuple<const char*, Tree, std::string> rows[] = {
+      {"another context type", envelope(with({{"cT", 2}}, vitals)), "dataCorrupted @c.cT"},
+      {"type before schema", envelope(Dictionary{{"cS", "x"}, {"cT", 2}}), "dataCorrupted @c.cT"},
+      {"schema before data", envelope(Dictionary{{"cS", "x"}, {"cT", 1}}), unknown("x")},
+      {"letter case", kind("Stride-sharing-invite", Dictionary{}),
        unknown("Stride-sharing-invite")},
-      {"no data", invitation, envelope(Dictionary{{"cS", "1"}, {"cT", 1}}), "keyNotFound cD @c"},
-      {"context before state", invitation, Dictionary{{"c", Dictionary{}}}, "keyNotFound cS @c"},
-      {"data of another type", invitation, kind("1", "text"), "typeMismatch @c.cD"},
-      {"text for octets", invitation, kind("1", Dictionary{{"ObjectDataKey", "x"}}),
+      {"no data", envelope(Dictionary{{"cS", "1"}, {"cT", 1}}), "keyNotFound cD @c"},
+      {"context before state", Dictionary{{"c", Dictionary{}}}, "keyNotFound cS @c"},
+      {"data of another type", kind("1", "text"), "typeMismatch @c.cD"},
+      {"text for octets", kind("1", Dictionary{{"ObjectDataKey", "x"}}),
        "typeMismatch @c.cD.ObjectDataKey"},
-      {"a UUID without dashes", invitation,
-       kind("ht-invite-v1", Dictionary{{"kHomeUUID", "0f8fad5bd9cb469fa16570867728950e"}}),
+      {"a UUID without dashes", home("kHomeUUID", "0f8fad5bd9cb469fa16570867728950e"),
        "dataCorrupted @c.cD.kHomeUUID"},
-      {"a UUID in either case", invitation,
-       kind("ht-invite-v1", Dictionary{{"kHomeUUID", "0f8FAD5b-d9cb-469f-A165-70867728950e"}}),
+      {"a UUID in either case", home("kHomeUUID", "0f8FAD5b-d9cb-469f-A165-70867728950e"),
        ".context.schema=ht-invite-v1 .context.contextType=1 "
        ".context.context.dictionary.vespHearthInvitation.homeUUID="
        "15:143:173:91:217:203:70:159:161:101:112:134:119:40:149:14: .state=-5 .identifier=u"},
-      {"an empty home token", invitation,
-       kind("ht-invite-v1", Dictionary{{"HRDHomeInvitationShareTokenKey", data("")}}),
+      {"an empty home token", home("HRDHomeInvitationShareTokenKey", data("")),
        token + "Empty sharing token"},
-      {"an empty coffer token", invitation,
-       kind(cofferSchema, with({{"invitationToken", data("")}}, coffer)),
+      {"an empty coffer token", kind(cofferSchema, with({{"invitationToken", data("")}}, coffer)),
        token + "Empty sharing token"},
-      {"an empty share URL", invitation, kind(cofferSchema, with({{"shareURL", ""}}, coffer)),
-       token + "Empty share URL"},
-  });
+      {"an empty share URL", kind(cofferSchema, with({{"shareURL", ""}}, coffer)),
+       token + "Empty share URL"}};
+  for (const auto& [name, message, expected] : rows) {
+    EXPECT_EQ(outcome(invitation, message), expected) << name;
+  }
 }
 
 TEST(Invitations, TheMirrorOfAContextIsCaseKeyedAndDoesNotComeBack) {

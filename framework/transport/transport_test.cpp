@@ -4,7 +4,6 @@
 #include "framework/transport/error_coding.h"
 #include "framework/transport/record_coding.h"
 #include "tests/filler.h"
-#include "text/utf8.h"
 
 #include <keelgate/records.h>
 
@@ -64,36 +63,9 @@ Data errorAgain(Bytes body) {
   }
 }
 
-/// What a record of an honest service has not.
-template <class T>
-bool isHonest(const T& value) {
-  if constexpr (isOptional<T>) {
-    return !value || isHonest(*value);
-  } else if constexpr (isArray<T>) {
-    return std::ranges::all_of(value, [](const auto& element) { return isHonest(element); });
-  } else if constexpr (CaseKeyed<T>) {
-    return std::visit([](const auto& of) { return isHonest(of); }, value);
-  } else if constexpr (Described<T>) {
-    bool all = true;
-    FieldsOf<T>::each([&](auto field) { all = all && isHonest(value.*field.member); });
-    return all;
-  } else if constexpr (std::same_as<T, Date>) {
-    return std::isfinite(value.secondsSinceReferenceDate);
-  } else if constexpr (std::same_as<T, String>) {
-    return Text::isUtf8(value);
-  } else if constexpr (Enumeration<T>) {
-    return std::ranges::any_of(
-        casesOf<T>, [&](const auto& known) { return known.rawValue == rawValueOf(value); });
-  } else {
-    return true;
-  }
-}
-
 template <Record R>
 Data recordAgain(Bytes body) {
-  const R record = decodeRecord<R>(body);
-  EXPECT_TRUE(isHonest(record));
-  return encodeRecord(record);
+  return encodeRecord(decodeRecord<R>(body));
 }
 
 struct Sample {
@@ -144,6 +116,7 @@ TEST(Reply, EveryBodyIsReadBackAndNoOtherLengthIs) {
 /// With any one byte changed it is known to be a lie, or is the one spelling of another record or
 /// error that an honest service might send.
 TEST(Reply, NoChangedByteDoesMore) {
+  // In a slow build one bit of each byte.
 #ifdef NDEBUG
   constexpr bool isFast = true;
 #else
@@ -152,11 +125,7 @@ TEST(Reply, NoChangedByteDoesMore) {
   for (const Sample& sample : samples()) {
     Data other = sample.body;
     for (std::size_t i = 0; i < other.size(); ++i) {
-      // All that a byte can be; in a slow build what flips one bit, any or, of many bytes, one.
-      const bool isLong = !isFast && other.size() > 1000;
-      for (int change = isLong ? 1 << i % 8 : 1; change < 256; change += isFast   ? 1
-                                                                         : isLong ? 256
-                                                                                  : change) {
+      for (int change = isFast ? 1 : 1 << i % 8; change < 256; change += isFast ? 1 : 256) {
         other[i] = sample.body[i] ^ static_cast<std::byte>(change);
         try {
           EXPECT_EQ(sample.readAgain(other), other) << sample.name << ' ' << i << ": " << change;
@@ -193,6 +162,20 @@ TEST(Reply, ErrorsKeepTheirFields) {
         DecodingError(Kind::typeMismatch, {}, Array<CodingKey>(513), "")}) {
     EXPECT_THROW(throwError(encodeError(wrong)), MalformedReply) << wrong.what();
   }
+}
+
+TEST(Reply, WhatNoHonestRecordHasIsRefused) {
+  PropertyList list{};
+  for (const double seconds : {std::nan(""), HUGE_VAL, -HUGE_VAL}) {
+    list.value = Date{seconds};
+    EXPECT_THROW(decodeRecord<PropertyList>(encodeRecord(list)), MalformedReply) << seconds;
+  }
+  list.value = String("\xff");
+  EXPECT_THROW(decodeRecord<PropertyList>(encodeRecord(list)), MalformedReply);
+  WaymarkMessage message{};
+  message.messageType = static_cast<WMMessageType>(casesOf<WMMessageType>.back().rawValue + 1);
+  const VespClientMessageResult result{.result = message};
+  EXPECT_THROW(decodeRecord<VespClientMessageResult>(encodeRecord(result)), MalformedReply);
 }
 
 /// A body that takes far more memory than it has bytes, and what reads it.
