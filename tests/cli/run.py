@@ -341,6 +341,9 @@ def stream():
         process.stdin.write(request(identity).encode() + b"\n")
         process.stdin.flush()
         check(json.loads(process.stdout.readline())["id"] == identity, "a reply while input is open")
+    process.stdin.write(b"\xef\xbb\xbf" + request(3).encode() + b"\n")
+    process.stdin.flush()
+    check(b'"kind":"request"' in process.stdout.readline(), "a byte order mark before another line")
     # The reader goes away while the input stays open and silent.
     process.stdout.close()
     check(process.wait(60) == 0 and heard(process.stderr.read()) == b"", "the reader goes away")

@@ -34,12 +34,15 @@ TEST(Start, AFailureSaysWhatIsWrong) {
   noProgram.servicePath = "/etc/passwd";
   Client::Options noSocket = fakeOptions();
   noSocket.socket = "/nowhere/socket";
+  Client::Options longSocket = fakeOptions();
+  longSocket.socket = String(sizeof sockaddr_un::sun_path, 's');
   Client::Options layers = fakeOptions("bare");
   layers.requireLayers = true;
   const std::pair<Client::Options, const char*> rows[] = {
       {missing, "/nowhere/service could not be started: No such file"},
       {noProgram, "/etc/passwd could not be started: Permission denied"},
       {noSocket, "No service answers on the socket /nowhere/socket: No such file"},
+      {longSocket, "The socket's path is longer than the system allows: sss"},
       {layers, "Running without: user namespace, mount namespace"},
 #ifndef KEELGATE_UNSEALED
       {fakeOptions("unsealed"), "built without its seal"},
