@@ -59,11 +59,21 @@ class Cursor {
     if constexpr (std::endian::native == std::endian::little) number = __builtin_bswap64(number);
     return number >> (64 - 8 * width);
   }
+  /// The eight bytes at `offset`, the first one lowest.
+  static std::uint64_t wordAt(Bytes message, std::size_t offset) noexcept {
+    return __builtin_bswap64(bigEndianAt(message, offset, 8));
+  }
   /// Whether none of the bytes at `offset` is above 0x7f. Requires 8 bytes of message behind them.
   static bool isAsciiAt(Bytes message, std::size_t offset, std::size_t length) noexcept {
-    std::uint64_t seen = 0;
-    for (; length >= 8; length -= 8, offset += 8) seen |= bigEndianAt(message, offset, 8);
-    if (length > 0) seen |= bigEndianAt(message, offset, length);
+    if (length < 8) {
+      // Shifted in two steps: of no bytes, by all 64 bits.
+      const std::uint64_t word = bigEndianAt(message, offset, 8);
+      return (word >> 1 >> (63 - 8 * length) & 0x8080'8080'8080'8080) == 0;
+    }
+    // The last word overlaps the one before it.
+    const std::size_t last = offset + length - 8;
+    std::uint64_t seen = bigEndianAt(message, last, 8);
+    for (; offset < last; offset += 8) seen |= bigEndianAt(message, offset, 8);
     return (seen & 0x8080'8080'8080'8080) == 0;
   }
   /// The view of `length` bytes at `offset`; both checked by the caller when the node was made.

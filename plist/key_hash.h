@@ -59,6 +59,12 @@ constexpr std::uint64_t keyDigest(std::string_view key) noexcept {
   return hash * keyFactor | std::uint64_t{1} << 63;
 }
 
+/// The same of a key of at most seven bytes, given as the lowest bytes of a number, first byte
+/// lowest. What stands above them does not matter.
+constexpr std::uint64_t shortKeyDigest(std::uint64_t bytes, std::size_t size) noexcept {
+  return (bytes & ~(~std::uint64_t{0} << 8 * size)) | std::uint64_t{size} << 56;
+}
+
 /// Whether the digest is all of the key.
 constexpr bool isWholeKey(std::uint64_t digest) noexcept {
   return digest >> 63 == 0;

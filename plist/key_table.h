@@ -18,6 +18,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <set>
+#include <span>
 #include <string_view>
 
 namespace PropertyList {
@@ -31,29 +32,26 @@ class KeyTable {
   void reserve(std::size_t more) {
     if (2 * (store_.keys.size() + more) > slots_.size()) grow(store_.keys.size() + more);
   }
-  /// The digest of a node's text, for `add`, unless it has its number: no text is hashed twice. The
-  /// slot where it will be looked for is fetched meanwhile: of a large table the cache has few.
-  std::uint64_t digest(std::uint32_t node) const noexcept {
-    if (store_.nodes[node].key() != 0) return 0;
-    const std::uint64_t digest = keyDigest(store_.text(store_.nodes[node]));
+  /// A key of a dictionary by its node, a string, and the digest of its text.
+  struct Named {
+    std::uint32_t node;
+    std::uint64_t digest;
+  };
+
+  /// For `add`; no text is hashed twice. The slot where the key will be looked for is fetched
+  /// meanwhile: of a large table the cache has few.
+  Named named(std::uint32_t node) const noexcept {
+    if (store_.nodes[node].key() != 0) return {node, 0};
+    return named(node, keyDigest(store_.text(store_.nodes[node])));
+  }
+  Named named(std::uint32_t node, std::uint64_t digest) const noexcept {
     __builtin_prefetch(&slots_[keyHash(digest, bits_)], 1);
-    return digest;
+    return {node, digest};
   }
-  /// Numbers the key of a dictionary that has this node, a string. False if the dictionary has the
-  /// key already: its keys are added one after the other, with those of no other dictionary
-  /// between them. Throws std::bad_alloc.
-  bool add(std::uint32_t dictionary, std::uint32_t node, std::uint64_t digest) {
-    if (store_.nodes[node].key() == 0) {
-      Slot& first = slot(digest, 0);
-      // As a rule a key is new, and nothing is where it would be.
-      const bool isVacant = first.number == 0;
-      store_.nodes[node].setKey(isVacant ? append(node, digest, first) : find(node, digest));
-    }
-    Key& key = store_.keys[store_.nodes[node].key() - 1];
-    const bool isNew = key.dictionary != dictionary + 1;
-    key.dictionary = dictionary + 1;
-    return isNew;
-  }
+  /// Numbers keys of one dictionary. Returns how many come before the first that the dictionary has
+  /// already: its keys are added one after the other, with those of no other dictionary between
+  /// them. Throws std::bad_alloc.
+  std::size_t add(std::uint32_t dictionary, std::span<const Named> keys);
 
  private:
   struct Less {
@@ -79,16 +77,7 @@ class KeyTable {
   Slot& slot(std::uint64_t digest, std::uint32_t step) noexcept {
     return slots_[(keyHash(digest, bits_) + step * (step + 1) / 2) & (slots_.size() - 1)];
   }
-  std::uint32_t append(std::uint32_t node, std::uint64_t digest) {
-    store_.keys.push({.digest = digest, .node = node, .dictionary = 0});
-    return static_cast<std::uint32_t>(store_.keys.size());
-  }
-  std::uint32_t append(std::uint32_t node, std::uint64_t digest, Slot& vacant) {
-    vacant = {append(node, digest), tagOf(digest)};
-    return vacant.number;
-  }
-  std::uint32_t find(std::uint32_t node, std::uint64_t digest);
-  std::uint32_t findColliding(std::uint32_t node, std::uint64_t digest);
+  std::uint32_t find(const Named& key, std::uint32_t count);
   void grow(std::size_t keys);
   void place(std::uint32_t number);
 

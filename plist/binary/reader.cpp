@@ -23,6 +23,34 @@ constexpr std::string_view magic = "bplist00";
 constexpr std::size_t trailerLength = 32;
 constexpr std::size_t trailerUnused = 6;
 
+/// Where the objects stand, and their nodes. A loop takes a copy: what it writes to nodes cannot
+/// change the copy, so that all of it stays in registers.
+struct Objects {
+  Bytes message;
+  std::size_t offsetSize = 0;
+  std::size_t referenceSize = 0;
+  std::size_t tableStart = 0;
+  Node* nodes = nullptr;
+  std::size_t count = 0;
+
+  /// The number of the object that is named at this position of the message.
+  std::uint32_t reference(std::size_t position) const {
+    const std::uint64_t number = Cursor::bigEndianAt(message, position, referenceSize);
+    if (number >= count) throw MalformedDocument(Problem::referenceOutOfRange, position);
+    return static_cast<std::uint32_t>(number);
+  }
+  /// Where the object of this number begins.
+  std::size_t offset(std::uint32_t number) const {
+    // Inside the table, since the number is below the count that the table was checked for.
+    const std::size_t entry = tableStart + number * offsetSize;
+    const std::uint64_t offset = Cursor::bigEndianAt(message, entry, offsetSize);
+    if (offset < magic.size() || offset >= tableStart) {
+      throw MalformedDocument(Problem::objectOutside, entry);
+    }
+    return static_cast<std::size_t>(offset);
+  }
+};
+
 class BinaryReader {
  public:
   explicit BinaryReader(Store& store) : store_(store), keys_(store) {}
@@ -42,9 +70,11 @@ class BinaryReader {
   void walk(Frame& frame);
   void readKeys(Frame& frame);
   void leave(const Frame& frame);
-  std::uint32_t reference(std::size_t position) const;
-  Node& load(std::uint32_t number);
-  bool readShort(std::size_t offset, Node& node) noexcept;
+  [[gnu::always_inline]] inline KeyTable::Named readKey(const Objects& objects,
+                                                        std::size_t position);
+  [[gnu::always_inline]] inline void load(const Objects& objects, std::uint32_t number);
+  [[gnu::always_inline]] inline bool readShort(const Objects& objects, std::size_t offset,
+                                               Node& node) noexcept;
   void open(std::uint32_t number);
   void revisit(Node& node, std::size_t position);
   Node readObject(std::size_t offset);
@@ -58,8 +88,7 @@ class BinaryReader {
 
   Store& store_;
   KeyTable keys_;
-  std::size_t offsetSize_ = 0;
-  std::size_t tableStart_ = 0;
+  Objects objects_;
   /// What is left of the bytes that objects may claim.
   std::uint64_t claimable_ = 0;
   std::size_t depth_ = 0;
@@ -69,7 +98,8 @@ class BinaryReader {
 
 void BinaryReader::read() {
   store_.top = readTrailer();
-  if (load(store_.top).has(Node::open)) open(store_.top);
+  load(objects_, store_.top);
+  if (store_.nodes[store_.top].has(Node::open)) open(store_.top);
   while (depth_ > 0) walk(frames_[depth_ - 1]);
 }
 
@@ -85,45 +115,46 @@ std::uint32_t BinaryReader::readTrailer() {
   }
   const std::size_t tableEnd = message.size() - trailerLength;
   Cursor trailer(message, tableEnd + trailerUnused, message.size());
-  offsetSize_ = trailer.byte();
-  store_.referenceSize = trailer.byte();
+  const std::size_t offsetSize = trailer.byte();
+  const std::size_t referenceSize = trailer.byte();
   const std::uint64_t objects = trailer.bigEndian(8);
   const std::uint64_t top = trailer.bigEndian(8);
   const std::uint64_t table = trailer.bigEndian(8);
-  const bool sizesFit = offsetSize_ >= 1 && offsetSize_ <= 8 && store_.referenceSize >= 1 &&
-                        store_.referenceSize <= 8;
+  const bool sizesFit =
+      offsetSize >= 1 && offsetSize <= 8 && referenceSize >= 1 && referenceSize <= 8;
   // Divided, because a product of two of these could wrap. What passes has no more objects than the
   // message has bytes, so their numbers fit 32 bits.
   if (!sizesFit || top >= objects || table < magic.size() || table > tableEnd ||
-      objects > (tableEnd - table) / offsetSize_) {
+      objects > (tableEnd - table) / offsetSize) {
     throw MalformedDocument(Problem::trailer, tableEnd);
   }
-  tableStart_ = static_cast<std::size_t>(table);
+  store_.referenceSize = referenceSize;
   store_.nodes.zero(static_cast<std::size_t>(objects));
+  objects_ = {.message = message,
+              .offsetSize = offsetSize,
+              .referenceSize = referenceSize,
+              .tableStart = static_cast<std::size_t>(table),
+              .nodes = store_.nodes.data(),
+              .count = store_.nodes.size()};
   claimable_ = Limits::claimedBase + Limits::claimedFactor * message.size();
   return static_cast<std::uint32_t>(top);
 }
 
-/// The number of the object that is named at this position of the message.
-std::uint32_t BinaryReader::reference(std::size_t position) const {
-  const std::uint64_t number = Cursor::bigEndianAt(store_.message, position, store_.referenceSize);
-  if (number >= store_.nodes.size()) {
-    throw MalformedDocument(Problem::referenceOutOfRange, position);
-  }
-  return static_cast<std::uint32_t>(number);
-}
-
 /// Walks the references of the innermost container, as far as one that opens another container.
 void BinaryReader::walk(Frame& frame) {
-  while (frame.next < frame.end) {
-    const std::size_t position = frame.next;
-    const std::uint32_t number = reference(position);
-    frame.next += store_.referenceSize;
-    if (store_.nodes[number].has(Node::read)) {
-      revisit(store_.nodes[number], position);
-    } else if (load(number).has(Node::open)) {
-      return open(number);
+  const Objects objects = objects_;
+  const std::size_t end = frame.end;
+  for (std::size_t next = frame.next; next < end; next += objects.referenceSize) {
+    const std::uint32_t number = objects.reference(next);
+    Node& node = objects.nodes[number];
+    if (node.has(Node::read)) {
+      revisit(node, next);
+      continue;
     }
+    load(objects, number);
+    if (!node.has(Node::open)) continue;
+    frame.next = next + objects.referenceSize;
+    return open(number);
   }
   leave(frame);
 }
@@ -132,32 +163,48 @@ void BinaryReader::walk(Frame& frame) {
 /// many look-ups is fetched at once: one after the other, a million keys would wait a million
 /// times.
 void BinaryReader::readKeys(Frame& frame) {
-  keys_.reserve(store_.nodes[frame.node].count);
-  struct Found {
-    std::uint32_t number;
-    std::uint64_t digest;
-  };
-  std::array<Found, 16> found;
-  while (frame.next < frame.end) {
-    const std::size_t first = frame.next;
+  const Objects objects = objects_;
+  keys_.reserve(objects.nodes[frame.node].count);
+  std::array<KeyTable::Named, 16> named;
+  const std::size_t end = frame.end;
+  for (std::size_t next = frame.next; next < end;) {
+    const std::size_t first = next;
     std::size_t count = 0;
-    for (; count < found.size() && frame.next < frame.end; frame.next += store_.referenceSize) {
-      const std::uint32_t number = reference(frame.next);
-      Node& node = store_.nodes[number];
-      if (node.has(Node::read)) {
-        revisit(node, frame.next);
-      } else {
-        load(number);
-      }
-      if (node.type != Type::string) throw MalformedDocument(Problem::keyNotString, frame.next);
-      found[count++] = {number, keys_.digest(number)};
+    for (; count < named.size() && next < end; next += objects.referenceSize) {
+      named[count++] = readKey(objects, next);
     }
-    for (std::size_t i = 0; i < count; ++i) {
-      if (!keys_.add(frame.node, found[i].number, found[i].digest)) {
-        throw MalformedDocument(Problem::duplicateKey, first + i * store_.referenceSize);
-      }
+    const std::size_t distinct = keys_.add(frame.node, {named.data(), count});
+    if (distinct < count) {
+      throw MalformedDocument(Problem::duplicateKey, first + distinct * objects.referenceSize);
     }
   }
+  frame.next = end;
+}
+
+/// The key that is named at this position.
+KeyTable::Named BinaryReader::readKey(const Objects& objects, std::size_t position) {
+  const std::uint32_t number = objects.reference(position);
+  Node& node = objects.nodes[number];
+  if (node.has(Node::read)) {
+    revisit(node, position);
+  } else {
+    const std::size_t offset = objects.offset(number);
+    // With a text of up to 7 bytes, all of the object.
+    const std::uint64_t object = Cursor::wordAt(objects.message, offset);
+    const std::uint32_t length = object & 7;
+    if ((object & 0xf8) == 0x50 && offset + 1 + length <= objects.tableStart &&
+        length <= claimable_) {
+      const std::uint64_t digest = shortKeyDigest(object >> 8, length);
+      if ((digest & 0x80'8080'8080'8080) == 0) {
+        claimable_ -= length;
+        node = {.bits = offset + 1, .count = length, .type = Type::string, .flags = Node::read};
+        return keys_.named(number, digest);
+      }
+    }
+    load(objects, number);
+  }
+  if (node.type != Type::string) throw MalformedDocument(Problem::keyNotString, position);
+  return keys_.named(number);
 }
 
 /// Another reference to what was read before. Heights make the limit exact although every object is
@@ -183,47 +230,57 @@ void BinaryReader::leave(const Frame& frame) {
 }
 
 /// Reads the object of this number, for the first time.
-Node& BinaryReader::load(std::uint32_t number) {
-  // Inside the table, since the number is below the count that the table was checked for.
-  const std::size_t entry = tableStart_ + number * offsetSize_;
-  const std::uint64_t offset = Cursor::bigEndianAt(store_.message, entry, offsetSize_);
-  if (offset < magic.size() || offset >= tableStart_) {
-    throw MalformedDocument(Problem::objectOutside, entry);
-  }
-  Node& node = store_.nodes[number];
-  if (readShort(static_cast<std::size_t>(offset), node)) return node;
-  node = readObject(static_cast<std::size_t>(offset));
+void BinaryReader::load(const Objects& objects, std::uint32_t number) {
+  const std::size_t offset = objects.offset(number);
+  Node& node = objects.nodes[number];
+  if (readShort(objects, offset, node)) return;
+  node = readObject(offset);
   node.set(Node::read);
-  return node;
 }
 
-/// The commonest objects in few instructions: texts of up to 14 bytes of ASCII, and integers. False
-/// for any other, and for what is wrong with one of these: that is for readObject to tell.
-bool BinaryReader::readShort(std::size_t offset, Node& node) noexcept {
-  const unsigned marker = std::to_integer<unsigned>(store_.message[offset]);
-  const unsigned low = marker & 0xf;
-  const std::size_t start = offset + 1;
-  const std::size_t left = tableStart_ - start;
-  if (marker >> 4 == 0x5 && low != 0xf) {
-    if (low > left || low > claimable_ || !Cursor::isAsciiAt(store_.message, start, low)) {
-      return false;
+/// The commonest objects in few instructions: texts and data of a length below 256, integers, and
+/// booleans. False for any other, and for what is wrong with one of these: that is for readObject
+/// to tell.
+bool BinaryReader::readShort(const Objects& objects, std::size_t offset, Node& node) noexcept {
+  const std::uint64_t head = Cursor::bigEndianAt(objects.message, offset, 8);
+  const unsigned kind = static_cast<unsigned>(head >> 60);
+  const unsigned low = static_cast<unsigned>(head >> 56) & 0xf;
+  if (kind == 0x5 || kind == 0x4) {
+    std::size_t start = offset + 1;
+    std::uint32_t length = low;
+    if (low == 0xf) {
+      // The length follows, here as an integer of one byte.
+      if ((head >> 48 & 0xff) != 0x10) return false;
+      start = offset + 3;
+      length = static_cast<std::uint32_t>(head >> 40 & 0xff);
     }
-    claimable_ -= low;
-    node = {.bits = start, .count = low, .type = Type::string, .flags = Node::read};
+    if (start + length > objects.tableStart || length > claimable_) return false;
+    if (kind == 0x5 && !Cursor::isAsciiAt(objects.message, start, length)) return false;
+    claimable_ -= length;
+    node = {.bits = start,
+            .count = length,
+            .type = kind == 0x5 ? Type::string : Type::data,
+            .flags = Node::read};
     return true;
   }
-  if (marker >> 4 != 0x1 || low > 3 || std::size_t{1} << low > left) return false;
-  node = {.bits = Cursor::bigEndianAt(store_.message, start, std::size_t{1} << low),
-          .type = Type::integer,
-          .flags = Node::read};
-  if (low == 3 && node.bits >> 63 != 0) node.set(Node::negative);
+  if (kind == 0x1 && low <= 3) {
+    const std::size_t width = std::size_t{1} << low;
+    if (offset + 1 + width > objects.tableStart) return false;
+    node = {.bits = Cursor::bigEndianAt(objects.message, offset + 1, width),
+            .type = Type::integer,
+            .flags = Node::read};
+    if (low == 3 && node.bits >> 63 != 0) node.set(Node::negative);
+    return true;
+  }
+  if (kind != 0x0 || low - 8 > 1) return false;
+  node = {.bits = low - 8, .type = Type::boolean, .flags = Node::read};
   return true;
 }
 
 /// Makes a container that was read the innermost frame.
 void BinaryReader::open(std::uint32_t number) {
-  const Node& node = store_.nodes[number];
-  const std::size_t length = node.count * store_.referenceSize;
+  const Node& node = objects_.nodes[number];
+  const std::size_t length = node.count * objects_.referenceSize;
   Frame& frame = frames_[depth_++];
   frame = {.node = number, .highest = 0, .next = node.position(), .end = node.position() + length};
   if (node.type != Type::dictionary) return;
@@ -233,7 +290,7 @@ void BinaryReader::open(std::uint32_t number) {
 
 /// Apart, so that what short objects take stays small enough to be inlined.
 [[gnu::noinline]] Node BinaryReader::readObject(std::size_t offset) {
-  Cursor object(store_.message, offset, tableStart_);
+  Cursor object(store_.message, offset, objects_.tableStart);
   const unsigned marker = object.byte();
   const unsigned low = marker & 0xf;
   switch (marker >> 4) {
@@ -300,10 +357,7 @@ Node BinaryReader::readDouble(Cursor& object, Type type, unsigned width) {
 Node BinaryReader::readBytes(Cursor& object, Type type, std::uint64_t length) {
   const std::size_t start = object.position();
   claim(object, length);
-  // The trailer lies behind what is read, so words may be loaded beyond the end of a short text.
-  const bool isShort = length < 64;
-  if (type == Type::string && !(isShort ? Cursor::isAsciiAt(store_.message, start, length)
-                                        : Text::isAscii(object.since(start)))) {
+  if (type == Type::string && !Text::isAscii(object.since(start))) {
     throw MalformedDocument(Problem::notAscii, start);
   }
   return {.bits = start, .count = static_cast<std::uint32_t>(length), .type = type};

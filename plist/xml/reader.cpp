@@ -171,15 +171,20 @@ void XmlReader::closeContainer() {
 /// Once all of the dictionary is read: dictionaries inside have keys of their own.
 void XmlReader::checkKeys(std::uint32_t dictionary, std::size_t end) {
   keys_.reserve(store_.nodes[dictionary].count);
+  std::array<KeyTable::Named, 16> named;
   std::size_t key = store_.firstChild(dictionary);
-  for (std::uint32_t left = store_.nodes[dictionary].count; left > 0; --left) {
-    const auto node = static_cast<std::uint32_t>(key);
-    if (!keys_.add(dictionary, node, keys_.digest(node))) {
-      // Assembled text stands nowhere in the message.
-      const bool inSide = store_.nodes[node].has(Node::inSide);
-      scanner_.failAt(Problem::duplicateKey, inSide ? end : store_.nodes[node].position());
+  for (std::size_t left = store_.nodes[dictionary].count; left > 0;) {
+    const std::size_t count = std::min(left, named.size());
+    for (std::size_t i = 0; i < count; ++i, key = store_.nextKey(key)) {
+      named[i] = keys_.named(static_cast<std::uint32_t>(key));
     }
-    key = store_.nextKey(key);
+    const std::size_t distinct = keys_.add(dictionary, {named.data(), count});
+    if (distinct < count) {
+      const Node& node = store_.nodes[named[distinct].node];
+      // Assembled text stands nowhere in the message.
+      scanner_.failAt(Problem::duplicateKey, node.has(Node::inSide) ? end : node.position());
+    }
+    left -= count;
   }
 }
 
