@@ -4,7 +4,6 @@
 
 #include "plist/limits.h"
 
-#include <bit>
 #include <stdexcept>
 
 namespace PropertyList {
@@ -34,31 +33,6 @@ void Value::refuse() {
   throw std::logic_error("A property-list value was asked for another type");
 }
 
-Integer Value::integer() const {
-  const Node& node = expect(Type::integer);
-  return {node.bits, node.has(Node::negative)};
-}
-
-double Value::real() const {
-  return std::bit_cast<double>(expect(Type::real).bits);
-}
-
-double Value::date() const {
-  return std::bit_cast<double>(expect(Type::date).bits);
-}
-
-std::string_view Value::string() const {
-  return store_->text(expect(Type::string));
-}
-
-Bytes Value::data() const {
-  return std::as_bytes(std::span(store_->text(expect(Type::data))));
-}
-
-Bytes Value::uid() const {
-  return std::as_bytes(std::span(store_->text(expect(Type::uid))));
-}
-
 std::size_t Value::count() const {
   if (!isContainer(type())) refuse();
   return node().count;
@@ -73,7 +47,7 @@ std::size_t Value::position() const noexcept {
 ArrayRange Value::elements() const {
   // A set has an order here: that of the message.
   if (type() != Type::array && type() != Type::set) refuse();
-  return {*store_, 0, store_->firstChild(number_), node().count, shared_};
+  return {*store_, 0, store_->firstChild(number_), node().count, isShared()};
 }
 
 EntryRange Value::entries() const {
@@ -81,7 +55,7 @@ EntryRange Value::entries() const {
   const std::size_t key = store_->firstChild(number_);
   // From a key to its value: in binary all keys come first.
   const std::size_t apart = store_->referenceSize == 0 ? 1 : store_->referenceSize * count;
-  return {*store_, key, key + apart, count, shared_};
+  return {*store_, key, key + apart, count, isShared()};
 }
 
 /// The first bytes decide; a binary one of another version is refused there, never tried as XML.

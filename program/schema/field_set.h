@@ -15,16 +15,23 @@ template <std::size_t size>
 class FieldSet {
  public:
   constexpr void insert(std::size_t field) { words_[field / 64] |= std::uint64_t{1} << field % 64; }
-  [[nodiscard]] constexpr bool contains(std::size_t field) const {
-    return (words_[field / 64] >> field % 64 & 1) != 0;
+  /// The first field that the other set has and this one lacks, or `size`.
+  [[nodiscard]] constexpr std::size_t firstMissing(const FieldSet& other) const {
+    for (std::size_t i = 0; i < words_.size(); ++i) {
+      const std::uint64_t missing = other.words_[i] & ~words_[i];
+      if (missing != 0) return 64 * i + static_cast<std::size_t>(std::countr_zero(missing));
+    }
+    return size;
   }
 
-  /// Calls `visitor(field)` for the fields of either set, in ascending order.
+  /// Calls `visitor(field)` for the fields below `end`, in ascending order.
   template <class Visitor>
-  constexpr void eachOfEither(const FieldSet& other, Visitor&& visitor) const {
+  constexpr void eachBelow(std::size_t end, Visitor&& visitor) const {
     for (std::size_t i = 0; i < words_.size(); ++i) {
-      for (std::uint64_t left = words_[i] | other.words_[i]; left != 0; left &= left - 1) {
-        visitor(64 * i + static_cast<std::size_t>(std::countr_zero(left)));
+      for (std::uint64_t left = words_[i]; left != 0; left &= left - 1) {
+        const std::size_t field = 64 * i + static_cast<std::size_t>(std::countr_zero(left));
+        if (field >= end) return;
+        visitor(field);
       }
     }
   }

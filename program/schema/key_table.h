@@ -58,14 +58,16 @@ class KeyTable {
  public:
   static constexpr std::size_t none = vacant;
 
-  /// The position of the field that travels under this key, or `none`. The digest is the key's own,
-  /// which comes with an entry of the document.
-  static constexpr std::size_t find(std::string_view key, std::uint64_t digest) {
+  /// The position of the field that travels under the key with this digest, or `none`. `key()` is
+  /// asked for the key's text only where another key may have its digest.
+  template <class Key>
+  static constexpr std::size_t find(std::uint64_t digest, Key&& key) {
     // Ends: at least three slots in four are vacant.
     for (std::size_t at = PropertyList::keyHash(digest, bits);; at = (at + 1) % capacity) {
       const std::uint16_t field = slots[at];
-      if (field == vacant || (digests[field] == digest && (PropertyList::isWholeKey(digest) ||
-                                                           S::CodingKeys::keys[field] == key))) {
+      if (field == vacant ||
+          (digests.data()[field] == digest &&
+           (PropertyList::isWholeKey(digest) || S::CodingKeys::keys[field] == key()))) {
         return field;
       }
     }

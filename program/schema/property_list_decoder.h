@@ -45,6 +45,10 @@ concept DecodesItself = requires(const KeyedContainer& container) {
   { S::decode(container) } -> std::same_as<S>;
 };
 
+/// What is decoded from a single value.
+template <class T>
+constexpr bool isScalar = !Keelgate::CaseKeyed<T> && !Keelgate::Schema<T> && !Keelgate::isArray<T>;
+
 /// What the readers of one message share. Handed down by reference; lives as long as the decoding.
 struct Decoding {
   PropertyList::ExpansionBudget& budget;
@@ -103,13 +107,14 @@ class FieldValues {
   using Fields = FieldSet<S::CodingKeys::size>;
 
   explicit FieldValues(const PropertyList::Value& dictionary) : dictionary_(dictionary) {
-    for (const PropertyList::Entry entry : dictionary.entries()) {
+    dictionary.eachEntry([&](std::uint32_t key, std::uint64_t digest, std::uint32_t value) {
+      const std::size_t field =
+          KeyTable<S>::find(digest, [&] { return dictionary_.child(key).string(); });
       // Keys that no field has are passed over: a newer sender may know more of them.
-      const std::size_t field = KeyTable<S>::find(entry.key, entry.digest);
-      if (field == KeyTable<S>::none) continue;
+      if (field == KeyTable<S>::none) return;
       present_.insert(field);
-      numbers_[field] = entry.value.number();
-    }
+      numbers_[field] = value;
+    });
   }
 
   [[nodiscard]] const Fields& present() const { return present_; }
@@ -141,23 +146,42 @@ constexpr auto requiredFields = [] {
 /// payloads nest 256 deep, and a sealed worker's stack is small.
 template <Keelgate::Schema S, class R>
 struct FieldDecoder {
-  using Function = void (*)(Decoding&, const PropertyList::Value&, const CodingPath& outer,
+  using Function = void (*)(Decoding&, PropertyList::Value, const CodingPath& outer,
                             std::size_t position, R&);
 
   template <class W, class V>
-  static void into(Decoding& decoding, const PropertyList::Value& value, const CodingPath& outer,
+  static void into(Decoding& decoding, PropertyList::Value value, const CodingPath& outer,
                    std::size_t position, R& record) {
-    V& member = record.*membersOf<R, V>[position];
-    const CodingPath path(outer, S::CodingKeys::keys[position]);
-    if constexpr (!Keelgate::isOptional<W>) {
-      decodeValue<W>(decoding, value, path, member);
-    } else if (value.type() != PropertyList::Type::null) {
-      using Present = typename W::value_type;
-      if constexpr (Keelgate::isOptional<V>) {
-        decodeValue<Present>(decoding, value, path, member.emplace());
-      } else {
-        decodeValue<Present>(decoding, value, path, member);
+    if constexpr (Keelgate::isOptional<W>) {
+      if (value.type() != PropertyList::Type::null) {
+        present<typename W::value_type>(decoding, value, outer, position,
+                                        madeIn(record.*membersOf<R, V>[position]));
       }
+    } else {
+      present<W>(decoding, value, outer, position, record.*membersOf<R, V>[position]);
+    }
+  }
+
+ private:
+  template <class T>
+  static T& madeIn(Keelgate::Optional<T>& member) {
+    return member.emplace();
+  }
+  template <class T>
+  static T& madeIn(T& member) {
+    return member;
+  }
+
+  template <class W, class T>
+  static void present(Decoding& decoding, PropertyList::Value value, const CodingPath& outer,
+                      std::size_t position, T& into) {
+    const std::string_view key = S::CodingKeys::keys[position];
+    if constexpr (isScalar<W>) {
+      const Scalars::Fault fault = Scalars::decode(decoding.budget, value, into);
+      if (fault == Scalars::Fault::none) return;
+      Scalars::refuse(fault, outer, key, Scalars::expectation<W>(), value.type());
+    } else {
+      decodeValue<W>(decoding, value, CodingPath(outer, key), into);
     }
   }
 };
@@ -169,13 +193,13 @@ void decodeFields(Decoding& decoding, const PropertyList::Value& value, const Co
   constexpr auto& decoders = decodersOf<S, R, FieldDecoder<S, R>>;
   static_assert(decoders.fit, "a field of the record cannot hold what the schema's field does");
   const FieldValues<S> values(value);
-  values.present().eachOfEither(requiredFields<S>, [&](std::size_t position) {
-    if (!values.present().contains(position)) {
-      throw Errors::keyNotFound(path, S::CodingKeys::keys[position]);
-    }
+  // What stands before the first field that is missing may be wrong, too.
+  const std::size_t end = values.present().firstMissing(requiredFields<S>);
+  values.present().eachBelow(end, [&](std::size_t position) {
     // NOLINTNEXTLINE(clang-analyzer-core.CallAndMessage): none is null, which was asserted.
     decoders.functions[position](decoding, values.at(position), path, position, into);
   });
+  if (end < S::CodingKeys::size) throw Errors::keyNotFound(path, S::CodingKeys::keys[end]);
 }
 
 template <Keelgate::Schema S, class R>
@@ -232,18 +256,19 @@ void decodeCase(Decoding& decoding, const PropertyList::Value& value, const Codi
 template <class W, class T>
 void decodeValue(Decoding& decoding, const PropertyList::Value& value, const CodingPath& path,
                  T& into) {
-  if (value.type() == PropertyList::Type::null) {
+  if constexpr (isScalar<W>) {
+    const Scalars::Fault fault = Scalars::decode(decoding.budget, value, into);
+    if (fault == Scalars::Fault::none) return;
+    Scalars::refuse(fault, path, Scalars::expectation<W>(), value.type());
+  } else if (value.type() == PropertyList::Type::null) {
     throw Errors::valueNotFound(path, Scalars::expectation<W>());
-  }
-  if constexpr (Keelgate::CaseKeyed<W>) {
+  } else if constexpr (Keelgate::CaseKeyed<W>) {
     decodeCase(decoding, value, path, into,
                std::make_index_sequence<std::variant_size_v<typename W::variant>>());
   } else if constexpr (Keelgate::Schema<W>) {
     decodeSchema<W>(decoding, value, path, into);
-  } else if constexpr (Keelgate::isArray<W>) {
-    decodeArray<typename W::value_type>(decoding, value, path, into);
   } else {
-    Scalars::decode(decoding.budget, value, path, into);
+    decodeArray<typename W::value_type>(decoding, value, path, into);
   }
 }
 

@@ -1,9 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
 /// The single values of a property list as the types that fields have: no conversions but the ones
-/// that are listed with each.
+/// that are listed with each. No value is rounded, cut or read as another type to make it fit: what
+/// a record says is what the message said.
 ///
-/// Pure but for the budget, which belongs to one decoding. Each throws DecodingError with `path`,
-/// and MalformedDocument where the budget is used up.
+/// Pure but for the budget, which belongs to one decoding. Each tells what is wrong with a value,
+/// and throws MalformedDocument where the budget is used up. An error is made apart, by `refuse`:
+/// where a value stands is told only where something is wrong with it.
 #pragma once
 
 #include "plist/document.h"
@@ -13,11 +15,13 @@
 
 #include <keelgate/describe.h>
 
+#include <concepts>
 #include <string_view>
 
 namespace VespKeelgateService::Scalars {
 
 using PropertyList::ExpansionBudget;
+using PropertyList::Type;
 using PropertyList::Value;
 
 /// What an error says was expected.
@@ -45,56 +49,78 @@ constexpr std::string_view expectation() {
     return Keelgate::typeName<T>();
 }
 
-/// An integer fills any integer field that it fits in. A real or a boolean never does.
-Keelgate::Int64 decodeSigned(const Value& value, const CodingPath& path, std::string_view expected);
-Keelgate::UInt64 decodeUnsigned(const Value& value, const CodingPath& path,
-                                std::string_view expected);
+enum class Fault { none, otherType, doesNotFit, noRawValue, noUuid };
 
-/// Numbers have a fixed size and are part of what their record was paid for: no budget is asked.
-inline void decode(ExpansionBudget&, const Value& value, const CodingPath& path,
-                   Keelgate::Int& into) {
-  into = static_cast<Keelgate::Int>(decodeSigned(value, path, "Int"));
+/// Throws the DecodingError for a value of the type `found` at `path`.
+[[noreturn]] void refuse(Fault fault, const CodingPath& path, std::string_view expected,
+                         Type found);
+/// The same for what stands under a key.
+[[noreturn]] void refuse(Fault fault, const CodingPath& outer, std::string_view key,
+                         std::string_view expected, Type found);
+
+/// An integer fills any integer field that it fits in. A real or a boolean never does. Numbers have
+/// a fixed size and are part of what their record was paid for: no budget is asked.
+template <std::integral T>
+Fault decode(ExpansionBudget&, Value value, T& into) {
+  if (value.type() != Type::integer) return Fault::otherType;
+  const PropertyList::Integer integer = value.integer();
+  into = static_cast<T>(integer.bits);
+  // Read as signed, a number from 2^63 on would turn negative.
+  const bool fits = std::signed_integral<T> ? integer.negative == (into < 0) : !integer.negative;
+  return fits ? Fault::none : Fault::doesNotFit;
 }
-inline void decode(ExpansionBudget&, const Value& value, const CodingPath& path,
-                   Keelgate::Int64& into) {
-  into = decodeSigned(value, path, "Int64");
-}
-inline void decode(ExpansionBudget&, const Value& value, const CodingPath& path,
-                   Keelgate::UInt& into) {
-  into = static_cast<Keelgate::UInt>(decodeUnsigned(value, path, "UInt"));
-}
-inline void decode(ExpansionBudget&, const Value& value, const CodingPath& path,
-                   Keelgate::UInt64& into) {
-  into = decodeUnsigned(value, path, "UInt64");
+
+inline Fault decode(ExpansionBudget&, Value value, Keelgate::Bool& into) {
+  if (value.type() != Type::boolean) return Fault::otherType;
+  into = value.boolean();
+  return Fault::none;
 }
 
 /// A real, or an integer that a double holds exactly.
-void decode(ExpansionBudget& budget, const Value& value, const CodingPath& path,
-            Keelgate::Double& into);
-void decode(ExpansionBudget& budget, const Value& value, const CodingPath& path,
-            Keelgate::Bool& into);
-void decode(ExpansionBudget& budget, const Value& value, const CodingPath& path,
-            Keelgate::String& into);
-void decode(ExpansionBudget& budget, const Value& value, const CodingPath& path,
-            Keelgate::Data& into);
-void decode(ExpansionBudget& budget, const Value& value, const CodingPath& path,
-            Keelgate::Date& into);
+Fault decodeInteger(PropertyList::Integer integer, Keelgate::Double& into);
+inline Fault decode(ExpansionBudget&, Value value, Keelgate::Double& into) {
+  if (value.type() == Type::integer) return decodeInteger(value.integer(), into);
+  if (value.type() != Type::real) return Fault::otherType;
+  into = value.real();
+  return Fault::none;
+}
+
+inline Fault decode(ExpansionBudget&, Value value, Keelgate::Date& into) {
+  if (value.type() != Type::date) return Fault::otherType;
+  into.secondsSinceReferenceDate = value.date();
+  return Fault::none;
+}
+
+inline Fault decode(ExpansionBudget& budget, Value value, Keelgate::String& into) {
+  if (value.type() != Type::string) return Fault::otherType;
+  const std::string_view text = value.string();
+  // Before the copy: one long string may be referenced a million times.
+  budget.spend(value, text.size());
+  into = Keelgate::String(text);
+  return Fault::none;
+}
+
+inline Fault decode(ExpansionBudget& budget, Value value, Keelgate::Data& into) {
+  if (value.type() != Type::data) return Fault::otherType;
+  const PropertyList::Bytes bytes = value.data();
+  budget.spend(value, bytes.size());
+  into = Keelgate::Data(bytes.begin(), bytes.end());
+  return Fault::none;
+}
+
 /// A string of the form 8-4-4-4-12 hexadecimal digits, in either case.
-void decode(ExpansionBudget& budget, const Value& value, const CodingPath& path,
-            Keelgate::UUID& into);
+Fault decode(ExpansionBudget& budget, Value value, Keelgate::UUID& into);
 
 /// An integer that is one of the enumeration's raw values. A negative integer is none of them,
 /// rather than one that is out of range.
 template <Keelgate::Enumeration E>
-void decode(ExpansionBudget&, const Value& value, const CodingPath& path, E& into) {
-  const Keelgate::Optional<Keelgate::UInt64> number =
-      PropertyList::Type::integer == value.type() && value.integer().negative
-          ? Keelgate::Optional<Keelgate::UInt64>()
-          : decodeUnsigned(value, path, Keelgate::typeName<E>());
-  const Keelgate::Optional<E> known =
-      number ? Keelgate::fromRawValue<E>(*number) : Keelgate::Optional<E>();
-  if (!known) throw Errors::invalidRawValue(path, Keelgate::typeName<E>());
+Fault decode(ExpansionBudget&, Value value, E& into) {
+  if (value.type() != Type::integer) return Fault::otherType;
+  const PropertyList::Integer integer = value.integer();
+  const Keelgate::Optional<E> known = Keelgate::fromRawValue<E>(integer.bits);
+  if (integer.negative || !known) return Fault::noRawValue;
   into = *known;
+  return Fault::none;
 }
 
 }  // namespace VespKeelgateService::Scalars
