@@ -69,15 +69,17 @@ bool isUtf8(std::string_view text) noexcept {
 bool isAscii(std::string_view text) noexcept {
   if (text.size() >= 64) text.remove_prefix(asciiBlocks(text));
   std::uint64_t seen = 0;
-  const auto look = [&](std::size_t at) {
-    std::uint64_t word;
+  const auto look = [&]<class Word>(std::size_t at, Word word) {
     std::memcpy(&word, text.data() + at, sizeof word);
     seen |= word;
   };
-  if (text.size() >= sizeof seen) {
-    for (std::size_t at = 0; at + sizeof seen < text.size(); at += sizeof seen) look(at);
-    // The last word overlaps the one before it.
-    look(text.size() - sizeof seen);
+  // In both, the last word overlaps the one before it.
+  if (text.size() >= 8) {
+    for (std::size_t at = 0; at + 8 < text.size(); at += 8) look(at, std::uint64_t());
+    look(text.size() - 8, std::uint64_t());
+  } else if (text.size() >= 4) {
+    look(0, std::uint32_t());
+    look(text.size() - 4, std::uint32_t());
   } else {
     for (const char c : text) seen |= static_cast<unsigned char>(c);
   }

@@ -3,20 +3,20 @@
 ///
 /// Written: integers and floating-point numbers as their 8 bytes, a boolean as a byte, text and
 /// octets behind their length, an array behind its count, an enumeration as its raw value, a
-/// case-keyed one as the case's position and then its record. A record begins with a bit for each
-/// of its optional fields, in words of 8 bytes, the first field lowest; then come the fields that
-/// are there.
+/// case-keyed one as the case's position and then its record. A record that may lack a field begins
+/// with a bit for each field, in words of 8 bytes, the first field lowest; then come the fields
+/// that are there. An optional without a value is not there, nor is an empty list.
 ///
 /// Pure functions; callable from any thread. Writing throws std::bad_alloc alone.
 #pragma once
 
 #include "framework/contracts/construct.h"
+#include "framework/contracts/field_set.h"
 #include "framework/transport/wire.h"
 
 #include <keelgate/describe.h>
 #include <keelgate/records/property_list.h>
 
-#include <array>
 #include <bit>
 #include <cmath>
 #include <cstddef>
@@ -31,34 +31,62 @@ namespace Keelgate::Transport {
 template <class T>
 void write(Writer& to, const T& value);
 
-/// How many optional fields a record has, and how many words their bits take.
+/// Whether a field may be absent.
+template <class V>
+constexpr bool mayLack = isOptional<V> || isArray<V>;
+
+/// The fields that every record of the type has.
 template <class T>
-constexpr std::size_t optionalFields = [] {
-  std::size_t count = 0;
-  FieldsOf<T>::each([&]<class S, class V>(Field<S, V>) { count += isOptional<V>; });
-  return count;
+constexpr auto requiredFields = [] {
+  FieldSet<FieldsOf<T>::size> required;
+  std::size_t position = 0;
+  FieldsOf<T>::each([&]<class S, class V>(Field<S, V>) {
+    if (!mayLack<V>) required.insert(position);
+    ++position;
+  });
+  return required;
 }();
 template <class T>
-constexpr std::size_t presenceWords = (optionalFields<T> + 63) / 64;
+constexpr auto allFields = [] {
+  FieldSet<FieldsOf<T>::size> all;
+  for (std::size_t i = 0; i < FieldsOf<T>::size; ++i) all.insert(i);
+  return all;
+}();
+
+/// The fields that are there. Nothing is written of it where none may be absent.
+template <class T>
+constexpr std::size_t presenceWords = requiredFields<T>.words() == allFields<T>.words()
+                                          ? 0
+                                          : allFields<T>.words().size();
+
+template <class T>
+FieldSet<FieldsOf<T>::size> presentIn(const T& record) {
+  typename FieldSet<FieldsOf<T>::size>::Words words{};
+  std::size_t n = 0;
+  FieldsOf<T>::eachValue(
+      record, [&]<class V>(const V& value) __attribute__((always_inline)) {
+        bool isPresent = true;
+        if constexpr (isOptional<V>) isPresent = value.has_value();
+        if constexpr (isArray<V>) isPresent = !value.empty();
+        words[n / 64] |= std::uint64_t{isPresent} << n % 64;
+        ++n;
+      });
+  return FieldSet<FieldsOf<T>::size>(words);
+}
 
 template <class T>
 void writeRecord(Writer& to, const T& record) {
-  std::array<std::uint64_t, presenceWords<T>> present{};
-  std::array<std::size_t, presenceWords<T>> places;
-  for (std::size_t& place : places) place = to.laterWord();
-  std::size_t n = 0;
-  FieldsOf<T>::each([&]<class S, class V>(Field<S, V> field) {
-    const V& value = record.*field.member;
-    if constexpr (isOptional<V>) {
-      const std::size_t bit = n++;
-      if (!value) return;
-      present[bit / 64] |= std::uint64_t{1} << bit % 64;
-      write(to, *value);
-    } else {
-      write(to, value);
-    }
+  const auto present = presentIn(record);
+  for (std::size_t i = 0; i < presenceWords<T>; ++i) to.word(present.words()[i]);
+  present.eachBelow(FieldsOf<T>::size, [&](std::size_t position) {
+    FieldsOf<T>::at(position, [&]<class S, class V>(Field<S, V> field) {
+      if constexpr (isOptional<V>) {
+        write(to, *(record.*field.member));
+      } else {
+        write(to, record.*field.member);
+      }
+    });
   });
-  for (std::size_t i = 0; i < places.size(); ++i) to.setWord(places[i], present[i]);
 }
 
 /// Behind its count, which the reader holds against the bytes that follow.
@@ -109,15 +137,15 @@ constexpr int containersOf = Record<T> && !std::same_as<T, PropertyListEntry> ? 
 /// The fewest bytes that a value is written as: a count is held against them before room is made.
 template <class T>
 constexpr std::size_t smallestSize() {
-  if constexpr (isOptional<T>) {
-    return 0;
-  } else if constexpr (std::same_as<T, Bool> || CaseKeyed<T>) {
+  if constexpr (std::same_as<T, Bool> || CaseKeyed<T>) {
     return 1;
   } else if constexpr (std::same_as<T, UUID>) {
     return sizeof(T);
   } else if constexpr (Record<T>) {
     std::size_t sum = presenceWords<T> * sizeof(std::uint64_t);
-    FieldsOf<T>::each([&]<class S, class Value>(Field<S, Value>) { sum += smallestSize<Value>(); });
+    FieldsOf<T>::each([&]<class S, class Value>(Field<S, Value>) {
+      if constexpr (!mayLack<Value>) sum += smallestSize<Value>();
+    });
     return sum;
   } else {
     return sizeof(std::uint64_t);
@@ -154,21 +182,26 @@ void readCase(Reader& from, T& value, int depth, std::index_sequence<i...>) {
 template <class T>
 void readRecord(Reader& from, T& value, int depth) {
   static_assert(T::Labels::isComplete(), "a member of the record is not in its list of fields");
-  std::array<std::uint64_t, presenceWords<T>> present;
-  for (std::uint64_t& word : present) word = from.word();
+  constexpr std::size_t size = FieldsOf<T>::size;
+  auto words = allFields<T>.words();
+  for (std::size_t i = 0; i < presenceWords<T>; ++i) words[i] = from.word();
+  const FieldSet<size> present(words);
   // A bit that no field has is a second spelling of the same record.
-  if constexpr (optionalFields<T> % 64 != 0) {
-    if (present.back() >> optionalFields<T> % 64 != 0) throw MalformedReply();
-  }
-  std::size_t n = 0;
-  FieldsOf<T>::each([&]<class S, class V>(Field<S, V> field) {
-    V& member = value.*field.member;
-    if constexpr (isOptional<V>) {
-      const std::size_t bit = n++;
-      if ((present[bit / 64] >> bit % 64 & 1) != 0) read(from, member.emplace(), depth);
-    } else {
-      read(from, member, depth);
-    }
+  const bool isSpeltOtherwise = (words.back() & ~allFields<T>.words().back()) != 0;
+  if (isSpeltOtherwise || present.firstMissing(requiredFields<T>) < size) throw MalformedReply();
+  present.eachBelow(size, [&](std::size_t position) {
+    FieldsOf<T>::at(position, [&]<class S, class V>(Field<S, V> field) {
+      V& member = value.*field.member;
+      if constexpr (isOptional<V>) {
+        read(from, member.emplace(), depth);
+      } else {
+        read(from, member, depth);
+      }
+      // So is an empty list that is there.
+      if constexpr (isArray<V>) {
+        if (member.empty()) throw MalformedReply();
+      }
+    });
   });
   // What the framework refuses in the service is refused here too.
   constructInPlace(value);

@@ -74,15 +74,6 @@ void Reader::charge(std::size_t size) {
   throw ReadLimitReached(ReadLimitReached::Limit::memory);
 }
 
-Bytes Reader::take(std::uint64_t size) {
-  // Compared, not added to a position: no length that a liar announces can wrap.
-  if (size > rest_.size()) throw MalformedReply();
-  if (untilClock_-- == 0) checkTime();
-  const Bytes taken = rest_.first(size);
-  rest_ = rest_.subspan(size);
-  return taken;
-}
-
 void Reader::checkTime() {
   untilClock_ = readsPerClock;
   if (std::chrono::steady_clock::now() >= limits_.deadline) {

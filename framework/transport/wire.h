@@ -51,14 +51,6 @@ class Writer {
   void byte(std::uint8_t value) { *room(1) = std::byte{value}; }
   /// As it lies in memory.
   void word(std::uint64_t value) { std::memcpy(room(sizeof value), &value, sizeof value); }
-  /// A word that is given later, by the position that this gives.
-  std::size_t laterWord() {
-    word(0);
-    return size_ - sizeof(std::uint64_t);
-  }
-  void setWord(std::size_t position, std::uint64_t value) {
-    std::memcpy(out_.data() + position, &value, sizeof value);
-  }
   /// Behind their length, so that no octet needs escaping.
   void octets(Bytes value);
   void text(std::string_view value) {
@@ -122,7 +114,14 @@ class Reader {
 
  private:
   /// Everything that is read comes through here.
-  Bytes take(std::uint64_t size);
+  Bytes take(std::uint64_t size) {
+    // Compared, not added to a position: no length that a liar announces can wrap.
+    if (size > rest_.size()) throw MalformedReply();
+    if (untilClock_-- == 0) checkTime();
+    const Bytes taken = rest_.first(size);
+    rest_ = rest_.subspan(size);
+    return taken;
+  }
   void checkTime();
 
   Bytes rest_;

@@ -18,11 +18,11 @@
 /// A decoder is used for one message and by one thread.
 #pragma once
 
+#include "framework/contracts/field_set.h"
 #include "plist/document.h"
 #include "plist/expansion_budget.h"
 #include "program/schema/coding_path.h"
 #include "program/schema/decoding_errors.h"
-#include "program/schema/field_set.h"
 #include "program/schema/fields_into.h"
 #include "program/schema/key_table.h"
 #include "program/schema/scalars.h"
@@ -104,7 +104,7 @@ class KeyedContainer {
 template <Keelgate::Schema S>
 class FieldValues {
  public:
-  using Fields = FieldSet<S::CodingKeys::size>;
+  using Fields = Keelgate::FieldSet<S::CodingKeys::size>;
 
   explicit FieldValues(const PropertyList::Value& dictionary) : dictionary_(dictionary) {
     dictionary.eachEntry([&](std::uint32_t key, std::uint64_t digest, std::uint32_t value) {
@@ -132,7 +132,7 @@ class FieldValues {
 
 template <Keelgate::Schema S>
 constexpr auto requiredFields = [] {
-  FieldSet<S::CodingKeys::size> required;
+  Keelgate::FieldSet<S::CodingKeys::size> required;
   std::size_t position = 0;
   S::CodingKeys::each([&](auto field) {
     if (!Keelgate::isOptional<typename decltype(field)::Value>) required.insert(position);

@@ -4,8 +4,10 @@
 #include "program/waymark/waymark_group_fold.h"
 
 #include "framework/contracts/construct.h"
+#include "program/schema/fields_into.h"
 
 #include <array>
+#include <iterator>
 #include <string_view>
 #include <utility>
 
@@ -42,50 +44,44 @@ constexpr Optional<UInt> groupNumber(std::string_view name) {
   return number;
 }
 
-/// Where a field of a check-in goes: to a field of a group, or nowhere.
+/// Where a numbered field of a check-in goes: from the schema to a field of a group.
 struct Place {
+  Optional<String> WaymarkSchema::*from = nullptr;
   UInt group = 0;
-  Optional<String> WaymarkGroupFields::*member = nullptr;
+  Optional<String> WaymarkGroupFields::*to = nullptr;
 };
 
-/// By the position of the field; made by the compiler.
+constexpr UInt first = 2;
+constexpr UInt last = 32;
+
+/// In the order of the fields; made by the compiler.
 constexpr auto places = [] {
   constexpr auto& names = WaymarkSchema::CodingKeys::names;
-  std::array<Place, names.size()> all{};
+  std::array<Place, (last - first + 1) * std::size(families)> all{};
+  std::size_t count = 0;
   for (std::size_t i = 0; i < names.size(); ++i) {
     for (const Family& family : families) {
       if (!names[i].starts_with(family.prefix)) continue;
       // The unnumbered field is the first group, which lives in the message's own record.
       const Optional<UInt> number = groupNumber(names[i]);
-      if (number) all[i] = {*number, family.member};
+      if (!number) continue;
+      all.at(count++) = {membersOf<WaymarkSchema, Optional<String>>[i], *number, family.member};
     }
   }
   return all;
 }();
+static_assert(places.back().to != nullptr, "there are fewer numbered fields than groups have");
 
 }  // namespace
 
 Array<WaymarkGroupFields> foldGroups(WaymarkSchema& schema) {
-  constexpr UInt first = 2;
-  constexpr UInt last = 32;
-  Array<WaymarkGroupFields> groups;
-  groups.reserve(last - first + 1);
-  for (UInt number = first; number <= last; ++number) {
-    groups.push_back(Keelgate::construct<WaymarkGroupFields>({.groupNumber = number,
-                                                              .receiverHandle = {},
-                                                              .sharingInvitationData = {},
-                                                              .shareURL = {},
-                                                              .participantID = {}}));
+  Array<WaymarkGroupFields> groups(last - first + 1);
+  for (UInt number = first; number <= last; ++number) groups[number - first].groupNumber = number;
+  for (const Place& place : places) {
+    Optional<String>& text = schema.*place.from;
+    if (text) groups[place.group - first].*place.to = std::move(text);
   }
-  std::size_t position = 0;
-  WaymarkSchema::CodingKeys::each([&](auto field) {
-    const Place& place = places[position++];
-    // Always so for a field that has a place. The others only have to compile.
-    if constexpr (std::same_as<typename decltype(field)::Value, Optional<String>>) {
-      if (place.member == nullptr) return;
-      groups[place.group - first].*place.member = std::move(schema.*field.member);
-    }
-  });
+  Keelgate::constructInPlace(groups);
   return groups;
 }
 

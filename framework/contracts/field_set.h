@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-/// Some of a schema's fields, by position: a bit for each, so that a walk over the few that a
+/// Some of a struct's fields, by position: a bit for each, so that a walk over the few that a
 /// message has does not ask for all 156.
 #pragma once
 
@@ -8,13 +8,21 @@
 #include <cstddef>
 #include <cstdint>
 
-namespace VespKeelgateService {
+namespace Keelgate {
 
 /// A value; usable at compile time. Positions are less than `size`.
 template <std::size_t size>
 class FieldSet {
  public:
+  /// Lowest position first, in the lowest bit of the first word.
+  using Words = std::array<std::uint64_t, (size + 63) / 64>;
+
+  constexpr FieldSet() = default;
+  constexpr explicit FieldSet(const Words& words) : words_(words) {}
+  [[nodiscard]] constexpr const Words& words() const { return words_; }
+
   constexpr void insert(std::size_t field) { words_[field / 64] |= std::uint64_t{1} << field % 64; }
+
   /// The first field that the other set has and this one lacks, or `size`.
   [[nodiscard]] constexpr std::size_t firstMissing(const FieldSet& other) const {
     for (std::size_t i = 0; i < words_.size(); ++i) {
@@ -37,7 +45,7 @@ class FieldSet {
   }
 
  private:
-  std::array<std::uint64_t, (size + 63) / 64> words_{};
+  Words words_{};
 };
 
-}  // namespace VespKeelgateService
+}  // namespace Keelgate
