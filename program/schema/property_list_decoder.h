@@ -152,38 +152,28 @@ struct FieldDecoder {
   template <class W, class V>
   static void into(Decoding& decoding, PropertyList::Value value, const CodingPath& outer,
                    std::size_t position, R& record) {
-    if constexpr (Keelgate::isOptional<W>) {
-      if (value.type() != PropertyList::Type::null) {
-        present<typename W::value_type>(decoding, value, outer, position,
-                                        madeIn(record.*membersOf<R, V>[position]));
-      }
+    V& member = record.*membersOf<R, V>[position];
+    const std::string_view key = S::CodingKeys::keys[position];
+    using Present = PresentOf<W>;
+    if (Keelgate::isOptional<W> && value.type() == PropertyList::Type::null) return;
+    if constexpr (isScalar<Present>) {
+      const Scalars::Fault fault = Scalars::decode(decoding.budget, value, member);
+      if (fault == Scalars::Fault::none) return;
+      Scalars::refuse(fault, outer, key, Scalars::expectation<Present>(), value.type());
+    } else if constexpr (Keelgate::isOptional<V>) {
+      decodeValue<Present>(decoding, value, CodingPath(outer, key), member.emplace());
     } else {
-      present<W>(decoding, value, outer, position, record.*membersOf<R, V>[position]);
+      decodeValue<Present>(decoding, value, CodingPath(outer, key), member);
     }
   }
 
  private:
-  template <class T>
-  static T& madeIn(Keelgate::Optional<T>& member) {
-    return member.emplace();
-  }
-  template <class T>
-  static T& madeIn(T& member) {
-    return member;
-  }
-
-  template <class W, class T>
-  static void present(Decoding& decoding, PropertyList::Value value, const CodingPath& outer,
-                      std::size_t position, T& into) {
-    const std::string_view key = S::CodingKeys::keys[position];
-    if constexpr (isScalar<W>) {
-      const Scalars::Fault fault = Scalars::decode(decoding.budget, value, into);
-      if (fault == Scalars::Fault::none) return;
-      Scalars::refuse(fault, outer, key, Scalars::expectation<W>(), value.type());
-    } else {
-      decodeValue<W>(decoding, value, CodingPath(outer, key), into);
-    }
-  }
+  template <class W>
+  static W presentOf(const Keelgate::Optional<W>*);
+  template <class W>
+  static W presentOf(const W*);
+  template <class W>
+  using PresentOf = decltype(presentOf(static_cast<const W*>(nullptr)));
 };
 
 /// In declaration order, whatever the order in the message: the same faults give the same error.

@@ -17,6 +17,7 @@
 
 #include <concepts>
 #include <string_view>
+#include <utility>
 
 namespace VespKeelgateService::Scalars {
 
@@ -91,21 +92,33 @@ inline Fault decode(ExpansionBudget&, Value value, Keelgate::Date& into) {
   return Fault::none;
 }
 
-inline Fault decode(ExpansionBudget& budget, Value value, Keelgate::String& into) {
+/// Texts and data are made where they stay.
+inline Fault decode(ExpansionBudget& budget, Value value,
+                    Keelgate::Optional<Keelgate::String>& into) {
   if (value.type() != Type::string) return Fault::otherType;
   const std::string_view text = value.string();
   // Before the copy: one long string may be referenced a million times.
   budget.spend(value, text.size());
-  into = Keelgate::String(text);
+  into.emplace(text);
   return Fault::none;
 }
 
-inline Fault decode(ExpansionBudget& budget, Value value, Keelgate::Data& into) {
+inline Fault decode(ExpansionBudget& budget, Value value,
+                    Keelgate::Optional<Keelgate::Data>& into) {
   if (value.type() != Type::data) return Fault::otherType;
   const PropertyList::Bytes bytes = value.data();
   budget.spend(value, bytes.size());
-  into = Keelgate::Data(bytes.begin(), bytes.end());
+  into.emplace(bytes.begin(), bytes.end());
   return Fault::none;
+}
+
+template <class T>
+requires std::same_as<T, Keelgate::String> || std::same_as<T, Keelgate::Data> Fault
+decode(ExpansionBudget& budget, Value value, T& into) {
+  Keelgate::Optional<T> made;
+  const Fault fault = decode(budget, value, made);
+  if (fault == Fault::none) into = std::move(*made);
+  return fault;
 }
 
 /// A string of the form 8-4-4-4-12 hexadecimal digits, in either case.
@@ -121,6 +134,11 @@ Fault decode(ExpansionBudget&, Value value, E& into) {
   if (integer.negative || !known) return Fault::noRawValue;
   into = *known;
   return Fault::none;
+}
+
+template <class T>
+Fault decode(ExpansionBudget& budget, Value value, Keelgate::Optional<T>& into) {
+  return decode(budget, value, into.emplace());
 }
 
 }  // namespace VespKeelgateService::Scalars
