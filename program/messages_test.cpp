@@ -54,19 +54,6 @@ TEST(Payloads, AreStrictAtEveryDepth) {
   });
 }
 
-TEST(Payloads, NestAsDeepAsPropertyListsDo) {
-  const auto nested = [](int payloads) {
-    Tree tree = Dictionary{{"c", payloads}, {"qal", Array{}}};
-    for (int n = payloads - 1; n > 0; --n) {
-      tree = Dictionary{{"c", n}, {n % 2 == 0 ? "mml" : "dtl", Array{std::move(tree)}}};
-    }
-    return outcome(payload, tree);
-  };
-  // Each payload is a dictionary and an array: 512 containers.
-  EXPECT_TRUE(nested(256).ends_with(".command=256")) << nested(256).substr(0, 200);
-  EXPECT_EQ(nested(257), "dataCorrupted @");
-}
-
 TEST(Payloads, SharedOnesAreRefusedBeforeTheyTakeMemoryOrTime) {
   // Many references to one payload are cheap to make. Each would be a record of 156 fields; and one
   // with a thousand keys that no field takes would be looked through each time: the square of the

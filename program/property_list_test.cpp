@@ -83,22 +83,6 @@ TEST(PropertyLists, KeepUidsOf128BitsAndIntegersOfEitherSign) {
   }
 }
 
-TEST(PropertyLists, NestToTheLimitAndNoFurther) {
-  const auto nested = [](std::size_t containers) {
-    Tree tree = ::PropertyList::Array{};
-    for (std::size_t n = 1; n < containers; ++n) {
-      tree = n % 2 == 0 ? Tree(::PropertyList::Array{std::move(tree)})
-                        : Tree(::PropertyList::Dictionary{{"k", std::move(tree)}});
-    }
-    return tree;
-  };
-  PropertyListValue deepest = unpacked(::PropertyList::writeBinary(nested(512)));
-  EXPECT_EQ(treeOf(deepest), nested(512));
-  EXPECT_EQ(errorOf([&] { unpacked(::PropertyList::writeBinary(nested(513))); }),
-            "dataCorrupted @");
-  EXPECT_EQ(errorOf([&] { unpacked({}); }), "dataCorrupted @");
-}
-
 TEST(PropertyLists, SharedObjectsAreRefusedBeforeTheyTakeMemory) {
   // One long text, as a value or as a key, and a level of containers that doubles at each step.
   const auto shared = [](const std::string& object, const std::string& marker,

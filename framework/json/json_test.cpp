@@ -90,25 +90,6 @@ TEST(JSON, LongValuesAreWholeWhateverPiecesTheyAreMadeIn) {
   EXPECT_EQ(compact(dataOf("\xfb\xff")), "\"+/8=\"");
 }
 
-TEST(JSON, LayoutsDifferInWhiteSpaceAlone) {
-  const auto text = [](Layout layout) {
-    Writer out(layout);
-    out.beginObject();
-    writeField(out, "a", Array<Int>{1, -2});
-    writeField(out, "none", Optional<Int>());
-    writeField(out, "empty", Array<Int>());
-    out.key("b");
-    out.beginObject();
-    out.endObject();
-    out.endObject();
-    return joined(std::move(out).take());
-  };
-  EXPECT_EQ(text(Layout::compact), "{\"a\":[1,-2],\"empty\":[],\"b\":{}}\n");
-  EXPECT_EQ(text(Layout::pretty),
-            "{\n  \"a\": [\n    1,\n    -2\n  ],\n  \"empty\": [],\n  \"b\": {}\n}\n");
-  EXPECT_EQ(text(Layout::discarded), "");
-}
-
 TEST(JSON, PropertyListsAreTreesAndTypedOnesLoseNothing) {
   using Value = PropertyListValue;
   const auto typed = [](const Value& value) {

@@ -88,24 +88,6 @@ TEST(RequestLine, IsReadStrictly) {
   }
 }
 
-TEST(RequestLine, MessagesOfEveryLengthAndSpellingAreDecoded) {
-  const std::pair<const char*, std::string_view> table[] = {
-      {"", ""}, {"Zg==", "f"}, {"Zm8=", "fo"}, {"Zm9v", "foo"}, {R"(+\/\u0038=)", "\xfb\xff"}};
-  for (const auto& [spelling, octets] : table) {
-    String line = R"({"id":"\u0041","message":")" + String(spelling) +
-                  R"(","command":245,"service":"com.\u0065xample"})";
-    const RequestLine read = readRequestLine(line);
-    ASSERT_EQ(problemOf(read), "ok") << spelling;
-    EXPECT_EQ(read.id, R"("\u0041")");
-    const auto& [subject, message, typed] = std::get<Request>(read.content);
-    EXPECT_TRUE(std::ranges::equal(message, std::as_bytes(std::span(octets)))) << spelling;
-    EXPECT_FALSE(typed);
-    const auto& context = std::get<VespClientMessageContext>(subject);
-    EXPECT_EQ(context.service, "com.example");
-    EXPECT_EQ(context.command, 245U);
-  }
-}
-
 TEST(RequestLine, NestingOfAnyDepthTakesNoStack) {
   const String nest = String(1'000'000, '[') + String(1'000'000, ']');
   String text = R"({"record":"VespInvitation","message":"","id":)" + nest + "}";

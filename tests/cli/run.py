@@ -301,7 +301,9 @@ def request(identity, message=good_message):
 
 
 def stream():
-    lines = [request(0), "", request({"a": [1, None]}), request(2, "!"),
+    # However a string is spelt.
+    spelt = request(0).replace("A", "\\u0041").replace("/", "\\/")
+    lines = [spelt, "", request({"a": [1, None]}), request(2, "!"),
              '{"service": "none", "command": 1, "message": "", "id": 3.50}', request(4, "") + "\r"]
     status, out, err = run("stream", stdin="\n".join(lines).encode())
     replies = objects(out)
@@ -346,7 +348,7 @@ def stream():
     check(b'"kind":"request"' in process.stdout.readline(), "a byte order mark before another line")
     # The reader goes away while the input stays open and silent.
     process.stdout.close()
-    check(process.wait(60) == 0 and heard(process.stderr.read()) == b"", "the reader goes away")
+    check(process.wait(60) == 2 and heard(process.stderr.read()) == b"", "the reader goes away")
     process.stdin.close()
 
 

@@ -138,9 +138,8 @@ class RawClient {
 
   /// Sends any control frame, with or without a descriptor, which stays the caller's.
   void sendFrame(ControlKind kind, std::uint32_t slot, std::vector<std::uint64_t> numbers,
-                 int descriptor = -1, std::uint32_t magic = Protocol::magic) {
+                 int descriptor = -1) {
     ControlFrame frame = Protocol::makeControlFrame(kind, slot);
-    frame.magic = magic;
     std::copy(numbers.begin(), numbers.end(), frame.numbers.begin());
     static_cast<void>(sendControl(control_, frame, descriptor, Protocol::Waiting::yes));
   }

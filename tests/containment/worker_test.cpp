@@ -269,8 +269,6 @@ TEST(Zygote, RefusesEveryFrameThatIsNotExactlyRight) {
       [](RawClient& service) { service.sendFrame(ControlKind::exit, 0, {}); },
       [](RawClient& service) { service.sendFrame(ControlKind{99}, 0, {}); },
       [](RawClient& service) { service.sendFrame(ControlKind::fork, 0, {}); },
-      [](RawClient& service) { service.sendFrame(ControlKind::kill, 0, {}, STDIN_FILENO); },
-      [](RawClient& service) { service.sendFrame(ControlKind::kill, 0, {}, -1, 1); },
       [](RawClient& service) {
         close(service.fork(3)), close(service.fork(3));
       }};

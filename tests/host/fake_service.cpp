@@ -11,7 +11,6 @@
 #include <fcntl.h>
 #include <poll.h>
 #include <sys/prctl.h>
-#include <sys/signalfd.h>
 #include <sys/socket.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -104,34 +103,18 @@ struct Zygote {
   std::map<pid_t, std::uint32_t> slots{};
 
   void serve() {
-    sigset_t child;
-    sigemptyset(&child);
-    sigaddset(&child, SIGCHLD);
-    sigaddset(&child, SIGTERM);
-    sigprocmask(SIG_BLOCK, &child, nullptr);
-    pollfd entries[] = {{channel, POLLIN, 0}, {signalfd(-1, &child, SFD_NONBLOCK), POLLIN, 0}};
-    for (;;) {
-      poll(entries, 2, -1);
-      signalfd_siginfo signal;
-      if (::read(entries[1].fd, &signal, sizeof signal) > 0) {
-        if (signal.ssi_signo == SIGTERM) end();
-        reportExits();
-      }
-      if (entries[0].revents == 0) continue;
+    pollfd entry{.fd = channel, .events = POLLIN, .revents = 0};
+    for (;; reportExits()) {
+      if (poll(&entry, 1, 2) == 0) continue;
       ControlFrame frame;
       int descriptor;
-      if (!receive(frame, descriptor)) end();
+      // Its workers follow it.
+      if (!receive(frame, descriptor)) _exit(0);
       if (frame.kind == ControlKind::fork) fork(frame.slot, descriptor);
       if (frame.kind == ControlKind::kill) kill(frame.slot);
     }
   }
 
-  /// Leaves nobody behind, as a launcher does.
-  [[noreturn]] void end() {
-    for (const auto& [pid, slot] : slots) ::kill(pid, SIGKILL);
-    while (wait(nullptr) > 0) continue;
-    _exit(0);
-  }
   void fork(std::uint32_t slot, int descriptor) {
     if (manner == "barren") {
       close(descriptor);
