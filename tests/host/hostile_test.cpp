@@ -181,7 +181,7 @@ TEST(C8, LogLinesSteerNoTerminal) {
 TEST(C8, LogLinesReachStandardErrorAndCannotEndTheApplication) {
   EXPECT_EQ(inFork([] {
               int ends[2];
-              if (pipe(ends) != 0 || dup2(ends[1], STDERR_FILENO) < 0) return 2;
+              if (pipe2(ends, O_NONBLOCK) != 0 || dup2(ends[1], STDERR_FILENO) < 0) return 2;
               signal(SIGPIPE, SIG_DFL);
               Client::Options options = fakeOptions();
               options.log = nullptr;

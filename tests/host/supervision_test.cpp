@@ -224,8 +224,9 @@ TEST(Supervision, APeakIsForgottenAfterAWhile) {
   const Deadline now = Clock::now();
   RecentPeak peak;
   EXPECT_EQ(peak.value(), 1u);
-  const std::tuple<int, std::size_t, std::size_t> rows[] = {
-      {0, 5, 5}, {1, 2, 5}, {2, 3, 5}, {4, 1, 3}, {6, 1, 1}, {7, 9, 9}, {20, 2, 2}, {40, 0, 1}};
+  const std::tuple<int, std::size_t, std::size_t> rows[] = {{0, 5, 5},  {1, 2, 5},  {2, 3, 5},
+                                                            {4, 1, 3},  {6, 1, 1},  {7, 9, 9},
+                                                            {20, 2, 2}, {40, 0, 1}, {42, 0, 1}};
   for (const auto& [second, calls, expected] : rows) {
     peak.note(calls, now + seconds(second));
     EXPECT_EQ(peak.value(), expected) << second;
