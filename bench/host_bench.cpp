@@ -56,8 +56,11 @@ double medianOf(int n, Call call) {
   return median(std::move(samples));
 }
 
-Client::Options options(std::size_t messagesPerProcess) {
+using Isolation = Client::Isolation;
+
+Client::Options options(std::size_t messagesPerProcess, Isolation isolation = Isolation::fork) {
   Client::Options options;
+  options.isolation = isolation;
   options.processes = 1;
   options.messagesPerProcess = messagesPerProcess;
   options.servicePath = KEELGATE_SERVICE;
@@ -148,6 +151,7 @@ void freshWorkerWithoutSpare(benchmark::State& state) {
                                  .socket = {},
                                  .socketUser = {},
                                  .requireLayers = false,
+                                 .forks = true,
                                  .messagesPerWorker = 1,
                                  .cpuSecondsPerWorker = 5,
                                  .maximumWorkers = 8};
@@ -169,9 +173,9 @@ void freshWorkerWithoutSpare(benchmark::State& state) {
   });
 }
 
-void clientCall(benchmark::State& state, std::size_t messagesPerProcess,
+void clientCall(benchmark::State& state, std::size_t messagesPerProcess, Isolation isolation,
                 std::chrono::microseconds pause) {
-  Client client(options(messagesPerProcess));
+  Client client(options(messagesPerProcess, isolation));
   const Data bytes = message();
   client.unpack<VespCommandResponse>(bytes);
   measure(state, pause,
@@ -191,17 +195,17 @@ double processorMicros() {
 }
 
 /// Many messages in one call of one thread: from bytes to records, without JSON.
-void batch(benchmark::State& state, std::size_t messagesPerProcess) {
+void batch(benchmark::State& state, std::size_t messagesPerProcess, Isolation isolation) {
   const Data bytes = message();
   // A fresh process takes a hundred times as long.
-  const std::size_t number = messagesPerProcess == 1 ? 1'000 : 20'000;
+  const std::size_t number = messagesPerProcess == 1 ? 2'000 : 20'000;
   const std::vector<Client::Request> requests(number, Client::Request{.message = bytes});
   const auto count = static_cast<double>(requests.size());
   for ([[maybe_unused]] auto _ : state) {
     const double used = processorMicros();
     double wall = 0;
     {
-      Client client(options(messagesPerProcess));
+      Client client(options(messagesPerProcess, isolation));
       wall = timed([&] {
         client.unpackBatch<VespCommandResponse>(
             requests, [](std::size_t, const Outcome<VespCommandResponse>& outcome) {
@@ -297,17 +301,23 @@ void idleService(benchmark::State& state) {
 
 BENCHMARK(bareForkExitWait)->UseManualTime()->Iterations(500);
 BENCHMARK(freshWorkerWithoutSpare)->UseManualTime()->Iterations(500);
-BENCHMARK_CAPTURE(clientCall, spareForkedAhead, 1, std::chrono::milliseconds(2))
-    ->UseManualTime()
-    ->Iterations(500);
-BENCHMARK_CAPTURE(clientCall, oneAfterTheOther, 1, std::chrono::milliseconds(0))
+constexpr auto forked = Isolation::fork;
+constexpr auto setBack = Isolation::rewind;
+constexpr std::chrono::milliseconds pause{2};
+constexpr std::chrono::milliseconds none{0};
+constexpr std::size_t endless = 1'000'000'000;
+BENCHMARK_CAPTURE(clientCall, spareForkedAhead, 1, forked, pause)->UseManualTime()->Iterations(500);
+BENCHMARK_CAPTURE(clientCall, spareSetBack, 1, setBack, pause)->UseManualTime()->Iterations(500);
+BENCHMARK_CAPTURE(clientCall, oneAfterTheOtherForked, 1, forked, none)
     ->UseManualTime()
     ->Iterations(2000);
-BENCHMARK_CAPTURE(clientCall, warm, 1'000'000'000, std::chrono::milliseconds(0))
+BENCHMARK_CAPTURE(clientCall, oneAfterTheOtherSetBack, 1, setBack, none)
     ->UseManualTime()
-    ->Iterations(5000);
-BENCHMARK_CAPTURE(batch, fresh, 1)->UseManualTime()->Iterations(1);
-BENCHMARK_CAPTURE(batch, reused, 1'000'000'000)->UseManualTime()->Iterations(1);
+    ->Iterations(2000);
+BENCHMARK_CAPTURE(clientCall, warm, endless, forked, none)->UseManualTime()->Iterations(5000);
+BENCHMARK_CAPTURE(batch, forked, 1, forked)->UseManualTime()->Iterations(1);
+BENCHMARK_CAPTURE(batch, setBack, 1, setBack)->UseManualTime()->Iterations(1);
+BENCHMARK_CAPTURE(batch, reused, endless, forked)->UseManualTime()->Iterations(1);
 BENCHMARK(coldStart)->UseManualTime()->Iterations(50);
 BENCHMARK(idleService)->UseManualTime()->Iterations(1);
 

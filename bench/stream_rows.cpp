@@ -119,7 +119,13 @@ double median(std::vector<double> values) {
   return values[values.size() / 2];
 }
 
-void stream(benchmark::State& state, const char* messagesPerProcess, int processors) {
+/// How the messages get their processes.
+struct Way {
+  const char* messagesPerProcess;
+  const char* isolation;
+};
+
+void stream(benchmark::State& state, Way way, int processors) {
   constexpr int count = 10'000;
   static const std::string input = requests(count);
   // What a run costs that has one message: starting and ending the service.
@@ -128,9 +134,14 @@ void stream(benchmark::State& state, const char* messagesPerProcess, int process
   std::ofstream(figures).close();
   const OnProcessors pinned(processors);
   const std::string processes = std::to_string(processors);
-  const std::vector<const char*> command{
-      KEELGATE_COMMAND,         "stream",          "--processes", processes.c_str(),
-      "--messages-per-process", messagesPerProcess};
+  const std::vector<const char*> command{KEELGATE_COMMAND,
+                                         "stream",
+                                         "--processes",
+                                         processes.c_str(),
+                                         "--messages-per-process",
+                                         way.messagesPerProcess,
+                                         "--isolation",
+                                         way.isolation};
   std::map<std::string, std::vector<double>> columns;
   for ([[maybe_unused]] auto _ : state) {
     run({KEELGATE_BARE_COSTS}, "/dev/null", figures.c_str());
@@ -155,11 +166,14 @@ void stream(benchmark::State& state, const char* messagesPerProcess, int process
   unlink(figures.c_str());
 }
 
-constexpr const char* fresh = "1";
-constexpr const char* reused = "1000000000";
-BENCHMARK_CAPTURE(stream, freshOnOneProcessor, fresh, 1)->UseManualTime()->Iterations(5);
+constexpr Way forked{"1", "fork"};
+constexpr Way setBack{"1", "rewind"};
+constexpr Way reused{"1000000000", "fork"};
+BENCHMARK_CAPTURE(stream, forkedOnOneProcessor, forked, 1)->UseManualTime()->Iterations(5);
+BENCHMARK_CAPTURE(stream, setBackOnOneProcessor, setBack, 1)->UseManualTime()->Iterations(5);
 BENCHMARK_CAPTURE(stream, reusedOnOneProcessor, reused, 1)->UseManualTime()->Iterations(5);
-BENCHMARK_CAPTURE(stream, freshOnTwoProcessors, fresh, 2)->UseManualTime()->Iterations(5);
+BENCHMARK_CAPTURE(stream, forkedOnTwoProcessors, forked, 2)->UseManualTime()->Iterations(5);
+BENCHMARK_CAPTURE(stream, setBackOnTwoProcessors, setBack, 2)->UseManualTime()->Iterations(5);
 BENCHMARK_CAPTURE(stream, reusedOnTwoProcessors, reused, 2)->UseManualTime()->Iterations(5);
 
 }  // namespace

@@ -15,7 +15,6 @@
 #include <unistd.h>
 
 #include <algorithm>
-#include <array>
 #include <cmath>
 #include <cstdlib>
 #include <limits>
@@ -98,6 +97,17 @@ void addSeconds(::CLI::App& app, const std::string& name, std::chrono::milliseco
   app.add_option_function<std::string>(name, read, help)->type_name("SECONDS");
 }
 
+template <class Choice>
+void addChoice(::CLI::App& app, const std::string& name, const Array<String>& words, Choice& to,
+               Choice first, const std::string& help) {
+  const auto read = [name, words, first, &to](const std::string& word) {
+    const auto found = std::ranges::find(words, word);
+    if (found == words.end()) refuse(name, word, fmt::format("one of {}", fmt::join(words, ", ")));
+    to = static_cast<Choice>(found - words.begin() + static_cast<Int>(first));
+  };
+  app.add_option_function<std::string>(name, read, help)->type_name("WORD");
+}
+
 void addServiceOptions(::CLI::App& app, Client::Options& options) {
   auto* path = app.add_option("--service-path", options.servicePath, "The service to start")
                    ->type_name("FILE");
@@ -108,10 +118,9 @@ void addServiceOptions(::CLI::App& app, Client::Options& options) {
 
 void addHostOptions(::CLI::App& app, Arguments& line) {
   // The client would cut them to these; here somebody typed them, and is told.
-  using Options = Client::Options;
-  const Options defaults;
+  const Client::Options defaults;
   constexpr UInt64 most = std::numeric_limits<std::uint32_t>::max();
-  addNumber(app, "--processes", line.host.processes, 1, Options::mostProcesses,
+  addNumber(app, "--processes", line.host.processes, 1, Client::Options::mostProcesses,
             "Messages at once (default: as processors)");
   addNumber(app, "--messages-per-process", line.host.messagesPerProcess, 1, most,
             fmt::format("How many one process may see (default {})", defaults.messagesPerProcess));
@@ -125,16 +134,11 @@ void addHostOptions(::CLI::App& app, Arguments& line) {
             true);
   app.add_flag("--require-layers", line.host.requireLayers,
                "Refuse to run without namespaces, Landlock");
+  addChoice(app, "--isolation", {"rewind", "fork"}, line.host.isolation, Client::Isolation::rewind,
+            "How a process is fresh: rewind (default), fork");
   app.add_flag("--quiet", line.quiet, "Say nothing but errors");
-  const auto readLevel = [&line](const std::string& name) {
-    constexpr std::array names = {"none", "error", "warning"};
-    const auto level = std::ranges::find(names, name);
-    if (level == names.end()) refuse("--log-level", name, "none, error or warning");
-    line.logLevel = static_cast<LogLevel>(level - names.begin() + 1);
-  };
-  app.add_option_function<std::string>("--log-level", readLevel,
-                                       "What is logged: none, error or warning (default)")
-      ->type_name("LEVEL");
+  addChoice(app, "--log-level", {"none", "error", "warning"}, line.logLevel, LogLevel::none,
+            "What is logged: none, error or warning (default)");
   addServiceOptions(app, line.host);
 }
 
@@ -269,9 +273,8 @@ void readFileNames(const String& from, Array<String>& files) try {
 
 /// Deliberate: the layout follows standard output alone, wherever the input comes from.
 JSON::Layout layoutOf(const Arguments& arguments) {
-  if (arguments.pretty) return JSON::Layout::pretty;
-  if (arguments.compact) return JSON::Layout::compact;
-  return isTerminal(STDOUT_FILENO) ? JSON::Layout::pretty : JSON::Layout::compact;
+  const Bool pretty = arguments.pretty || (!arguments.compact && isTerminal(STDOUT_FILENO));
+  return pretty ? JSON::Layout::pretty : JSON::Layout::compact;
 }
 
 /// What the parser cannot be told of `unpack` and `check`.

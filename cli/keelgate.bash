@@ -45,6 +45,7 @@ _keelgate() {
         command sed -n 's/^ *"command": \([0-9]*\).*/\1/p' | sort -u)"
       return
       ;;
+    --isolation) _keelgate_complete "rewind fork"; return ;;
     --log-level) _keelgate_complete "none error warning"; return ;;
     --service-path | --connect | --files0-from | --metrics)
       mapfile -t COMPREPLY < <(compgen -f -- "$current"); return ;;

@@ -47,6 +47,7 @@ complete -c keelgate -n 'contains -- describe (__keelgate_subcommand)' -a '(__ke
 complete -c keelgate -l record -x -a '(__keelgate_values record)'
 complete -c keelgate -l service -x -a '(__keelgate_values service)'
 complete -c keelgate -l command -x -a '(__keelgate_values command)'
+complete -c keelgate -l isolation -x -a 'rewind fork'
 complete -c keelgate -l log-level -x -a 'none error warning'
 complete -c keelgate -l service-path -l connect -l files0-from -l metrics -r -F
 complete -c keelgate -l processes -l messages-per-process -l time-limit -l max-message -x

@@ -7,6 +7,7 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <cstdlib>
 #include <filesystem>
 #include <fstream>
 #include <set>
@@ -14,6 +15,11 @@
 #include <string_view>
 
 namespace Keelgate::Testing {
+
+/// Tests run once with workers that are set back and once, by this, with forks alone.
+inline bool forksAlone() {
+  return std::getenv("KEELGATE_TEST_FORKS") != nullptr;
+}
 
 inline Bytes bytesOf(std::string_view text) {
   return std::as_bytes(std::span(text));

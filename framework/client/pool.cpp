@@ -51,6 +51,7 @@ ServiceSettings settingsFor(const Client::Options& options, std::size_t processe
           .socket = options.socket,
           .socketUser = options.socketUser,
           .requireLayers = options.requireLayers,
+          .forks = options.isolation == Client::Isolation::fork,
           .messagesPerWorker = std::max<std::uint64_t>(options.messagesPerProcess, 1),
           .cpuSecondsPerWorker = cpuSeconds(options),
           .maximumWorkers = slotsPerPlace * processes};

@@ -59,7 +59,8 @@ ServiceProcess::ServiceProcess(const ServiceSettings& settings, DescriptorRegist
   // Said once and for all workers: what bounds a worker is fixed before any message is known. A
   // service that has already refused takes no hello, and its reason is waiting to be read.
   const ControlFrame hello = makeControlFrame(
-      ControlKind::hello, 0, {settings.messagesPerWorker, settings.cpuSecondsPerWorker});
+      ControlKind::hello, 0,
+      {settings.messagesPerWorker, settings.cpuSecondsPerWorker, settings.forks ? 1U : 0U});
   static_cast<void>(
       Protocol::sendControl(handles_.control.get(), hello, noDescriptor, Waiting::no));
 }

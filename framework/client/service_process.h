@@ -25,6 +25,8 @@ struct ServiceSettings {
   /// Who else than root and the caller may serve on the socket.
   Optional<unsigned> socketUser;
   bool requireLayers;
+  /// Every worker is forked; none is set back.
+  bool forks;
   std::uint64_t messagesPerWorker;
   std::uint64_t cpuSecondsPerWorker;
   /// How many workers may be alive at a time, those included that have answered and not yet ended.

@@ -32,13 +32,14 @@ namespace Keelgate::Protocol {
 /// "KGAT". Nothing is looked at in a frame that begins otherwise.
 constexpr std::uint32_t magic = 0x4b47'4154;
 /// To be raised with any change of what travels: two builds that differ must refuse each other.
-constexpr std::uint16_t protocolVersion = 6;
+constexpr std::uint16_t protocolVersion = 7;
 
 /// From 1, here and below, so that a frame of zeros is not one.
 enum class ControlKind : std::uint16_t { hello = 1, ready, fork, kill, exit, refused };
 
 /// What stands in `numbers` for each kind, all others being 0:
-///   hello: [0] messages per worker, [1] CPU seconds per worker
+///   hello: [0] messages per worker, [1] CPU seconds per worker,
+///          [2] 1 where each worker is to be forked
 ///   ready: [0] layers (Layer), [1] version of the service: 16 bits each for major, minor, patch
 ///   fork:  [0] length in bytes of the longest message that the worker will be given
 ///   exit:  [0] wait status as wait4 gives it, [1] peak resident bytes, [2] CPU microseconds;

@@ -35,6 +35,7 @@ void closeAll(unsigned first, unsigned last) {
 
 void keepOnly(int kept) {
   constexpr unsigned channel = serviceDescriptor;
+  if (kept < 0) return closeAll(0, UINT_MAX);
   if (kept != serviceDescriptor && dup3(kept, serviceDescriptor, 0) < 0) {
     throw StartError(StartStep::closeDescriptors);
   }

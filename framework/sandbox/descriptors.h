@@ -6,7 +6,8 @@
 
 namespace Keelgate::Sandbox {
 
-/// Closes every descriptor of the process but `kept`, and makes it the service's descriptor.
+/// Closes every descriptor of the process but `kept`, and makes it the service's descriptor; all of
+/// them where that is -1.
 /// Throws StartError when it cannot.
 void keepOnly(int kept);
 

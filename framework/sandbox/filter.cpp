@@ -4,10 +4,15 @@
 #include "framework/contracts/process.h"
 #include "framework/contracts/start_step.h"
 #include "framework/sandbox/architecture.h"
+#include "framework/sandbox/page_scan.h"
 #include "framework/sandbox/processes.h"
+#include "framework/sandbox/rewinding.h"
 
+#include <linux/userfaultfd.h>
+#include <sys/ioctl.h>
 #include <sys/mman.h>
 #include <sys/prctl.h>
+#include <sys/ptrace.h>
 #include <sys/resource.h>
 #include <sys/syscall.h>
 #include <sys/wait.h>
@@ -49,7 +54,8 @@ constexpr Rule zygote[] = {
     {SYS_getppid, Verdict::allow},
     {SYS_prlimit64, Verdict::allowWith, 0},
     {SYS_setpriority, Verdict::allowWith, PRIO_PROCESS},
-    {SYS_mmap, Verdict::allowWith, PROT_READ | PROT_WRITE, 2, ENOMEM},
+    {SYS_mmap, Verdict::allowWith, PROT_READ | PROT_WRITE, 2},
+    {SYS_mmap, Verdict::refuse, ENOMEM},
     {SYS_seccomp, Verdict::allowWith, SECCOMP_SET_MODE_FILTER},
     // And what it is left with, which the zygote needs too.
     {SYS_read, Verdict::allow},
@@ -58,6 +64,37 @@ constexpr Rule zygote[] = {
     // Refused, as in a worker, so that all memory that comes is in mappings: the kernel places them
     // with more randomness.
     {SYS_brk, Verdict::refuse, 0},
+};
+
+constexpr Rule rewinding[] = {
+    // For each message.
+    {SYS_ptrace, Verdict::allowWith, PTRACE_CONT},
+    {SYS_ptrace, Verdict::allowWith, PTRACE_GETREGSET},
+    {SYS_ptrace, Verdict::allowWith, PTRACE_SETREGSET},
+    {SYS_ioctl, Verdict::allowWith, scanPages, 1},
+    {SYS_ioctl, Verdict::allowWith, SECCOMP_IOCTL_NOTIF_RECV, 1},
+    {SYS_ioctl, Verdict::allowWith, SECCOMP_IOCTL_NOTIF_ADDFD, 1},
+    {SYS_pwrite64, Verdict::allow},
+    {SYS_shutdown, Verdict::allow},
+    // For each worker.
+    {SYS_ptrace, Verdict::allowWith, PTRACE_SETOPTIONS},
+    {SYS_recvmsg, Verdict::allowWith, handoverReceiver},
+    {SYS_pread64, Verdict::allow},
+    {SYS_madvise, Verdict::allowWith, MADV_DONTFORK, 2},
+    {SYS_munmap, Verdict::allow},
+    // In a new worker, until its own filter stands.
+    {SYS_ptrace, Verdict::allowWith, PTRACE_TRACEME},
+    {SYS_prctl, Verdict::allowWith, PR_SET_DUMPABLE},
+    {SYS_openat, Verdict::allowWith, processesDescriptor},
+    {SYS_userfaultfd, Verdict::allowWith, trackingFlags},
+    {SYS_ioctl, Verdict::allowWith, UFFDIO_API, 1},
+    {SYS_ioctl, Verdict::allowWith, UFFDIO_REGISTER, 1},
+    {SYS_sendmsg, Verdict::allowWith, handoverSender},
+};
+
+constexpr Rule returning[] = {
+    {SYS_exit_group, Verdict::stopWith, 0},
+    {SYS_exit_group, Verdict::noticeWith, waitingStatus},
 };
 
 constexpr sock_filter load(std::size_t offset) {
@@ -70,24 +107,33 @@ constexpr sock_filter answer(unsigned action) {
   return BPF_STMT(BPF_RET | BPF_K, action);
 }
 
-void append(std::vector<sock_filter>& program, const Rule& rule, sock_filter denied) {
-  const auto call = static_cast<unsigned>(rule.call);
+constexpr unsigned actionOf(const Rule& rule) {
   switch (rule.verdict) {
     case Verdict::allow:
-      program.insert(program.end(), {unlessEqual(call, 1), answer(SECCOMP_RET_ALLOW)});
-      return;
-    case Verdict::refuse:
-      program.insert(program.end(),
-                     {unlessEqual(call, 1), answer(SECCOMP_RET_ERRNO | rule.number)});
-      return;
     case Verdict::allowWith:
-      program.insert(program.end(),
-                     {unlessEqual(call, 4),
-                      load(offsetof(seccomp_data, args) + rule.argument * sizeof(std::uint64_t)),
-                      unlessEqual(rule.number, 1), answer(SECCOMP_RET_ALLOW),
-                      rule.error == 0 ? denied : answer(SECCOMP_RET_ERRNO | rule.error)});
-      return;
+      break;
+    case Verdict::refuse:
+      return SECCOMP_RET_ERRNO | rule.number;
+    case Verdict::stopWith:
+      return SECCOMP_RET_TRACE;
+    case Verdict::noticeWith:
+      return SECCOMP_RET_USER_NOTIF;
   }
+  return SECCOMP_RET_ALLOW;
+}
+
+void append(std::vector<sock_filter>& program, const Rule& rule) {
+  const auto call = static_cast<unsigned>(rule.call);
+  if (rule.verdict == Verdict::allow || rule.verdict == Verdict::refuse) {
+    program.insert(program.end(), {unlessEqual(call, 1), answer(actionOf(rule))});
+    return;
+  }
+  program.insert(program.end(),
+                 {unlessEqual(call, 4),
+                  load(offsetof(seccomp_data, args) + rule.argument * sizeof(std::uint64_t)),
+                  unlessEqual(rule.number, 1), answer(actionOf(rule)),
+                  // For the rules that follow.
+                  load(offsetof(seccomp_data, nr))});
 }
 
 /// As the kernel has it in siginfo; the C library has no name for it.
@@ -124,6 +170,13 @@ std::span<const Rule> zygoteRules() noexcept {
   return zygote;
 }
 
+std::span<const Rule> rewindingRules() noexcept {
+  return rewinding;
+}
+std::span<const Rule> returningRules() noexcept {
+  return returning;
+}
+
 std::vector<sock_filter> compile(std::span<const Rule> rules, unsigned deniedAction) {
   const sock_filter denied = answer(deniedAction);
   // The calling convention comes first: the same numbers mean other calls under another one, and
@@ -132,22 +185,34 @@ std::vector<sock_filter> compile(std::span<const Rule> rules, unsigned deniedAct
   std::vector<sock_filter> program{load(offsetof(seccomp_data, arch)),
                                    BPF_JUMP(BPF_JMP | BPF_JEQ | BPF_K, nativeCalls, 1, 0), denied,
                                    load(offsetof(seccomp_data, nr))};
-  for (const Rule& rule : rules) append(program, rule, denied);
+  for (const Rule& rule : rules) append(program, rule);
   program.push_back(denied);
   return program;
 }
 
-void enforce(std::span<const sock_filter> program) {
+namespace {
+
+int enforceWith(unsigned flags, std::span<const sock_filter> program) {
 #ifndef KEELGATE_UNSEALED
   const sock_fprog handed{.len = static_cast<unsigned short>(program.size()),
                           // The kernel only reads it.
                           .filter = const_cast<sock_filter*>(program.data())};
-  if (syscall(SYS_seccomp, SECCOMP_SET_MODE_FILTER, 0, &handed) != 0) {
-    throw StartError(StartStep::loadFilter);
-  }
+  const long result = syscall(SYS_seccomp, SECCOMP_SET_MODE_FILTER, flags, &handed);
+  if (result < 0) throw StartError(StartStep::loadFilter);
+  return static_cast<int>(result);
 #else
-  static_cast<void>(program);
+  static_cast<void>(flags), static_cast<void>(program);
+  return 0;
 #endif
+}
+
+}  // namespace
+
+void enforce(std::span<const sock_filter> program) {
+  enforceWith(0, program);
+}
+int enforceNoticing(std::span<const sock_filter> program) {
+  return enforceWith(SECCOMP_FILTER_FLAG_NEW_LISTENER, program);
 }
 
 void proveEnforced(std::span<const Rule> rules) {

@@ -15,20 +15,23 @@ namespace Keelgate::Sandbox {
 enum class Verdict {
   /// The call is made.
   allow,
-  /// The call is made when its argument is `number`, which the kernel reads as 32 bits.
+  /// The call is made when its argument is `number`, which the kernel reads as 32 bits. With
+  /// another argument the rules that follow decide, here and below.
   allowWith,
   /// The call is not made and reports `number` as its errno; 0 stands for a result of 0.
   refuse,
+  /// With this argument the process stops before the call, and its tracer decides.
+  stopWith,
+  /// With this argument it waits in the call, and whoever listens to the filter decides.
+  noticeWith,
 };
 
 struct Rule {
   int call;
   Verdict verdict;
   unsigned number = 0;
-  /// For allowWith: which argument, from 0.
+  /// For those that look at an argument: which, from 0.
   unsigned argument = 0;
-  /// For allowWith: what other calls report as their errno, where they are not to kill.
-  unsigned error = 0;
 };
 
 /// All that a worker can do from before it reads the first byte of a message: C1.
@@ -37,6 +40,13 @@ std::span<const Rule> workerRules() noexcept;
 /// All that the zygote can do, and a worker until its own filter stands.
 std::span<const Rule> zygoteRules() noexcept;
 
+/// What a zygote that sets workers back can do besides, and such a worker until its own filter
+/// stands.
+std::span<const Rule> rewindingRules() noexcept;
+
+/// What becomes of such a worker's ends; its own filter decides about all other calls.
+std::span<const Rule> returningRules() noexcept;
+
 /// The kernel's program for a table. `denied` is what it answers to calls that are not listed.
 std::vector<sock_filter> compile(std::span<const Rule> rules,
                                  unsigned denied = SECCOMP_RET_KILL_PROCESS);
@@ -44,6 +54,9 @@ std::vector<sock_filter> compile(std::span<const Rule> rules,
 /// Puts the calling thread under a program, in addition to those that it is under, for good;
 /// no_new_privs must be set. Throws StartError.
 void enforce(std::span<const sock_filter> program);
+
+/// The same for a program with notices, which are read from the descriptor that it returns.
+int enforceNoticing(std::span<const sock_filter> program);
 
 /// Has a child of the calling process make a call that a table forbids, under a trial copy of its
 /// program. An emulation of the kernel, or a kernel told to ignore filters, accepts filters and

@@ -40,13 +40,20 @@ constexpr std::array abiRows{
 
 }  // namespace
 
-bool renounceByLandlock() {
+bool renounceByLandlock(int butFor) {
   const long abi =
       syscall(SYS_landlock_create_ruleset, nullptr, 0, LANDLOCK_CREATE_RULESET_VERSION);
   for (const AbiRow& row : abiRows) {
     if (abi < static_cast<long>(row.abi)) continue;
     const long ruleset = syscall(SYS_landlock_create_ruleset, &row.handled, row.size, 0);
     if (ruleset < 0) return false;
+    const landlock_path_beneath_attr exception{
+        .allowed_access = LANDLOCK_ACCESS_FS_READ_FILE | LANDLOCK_ACCESS_FS_WRITE_FILE,
+        .parent_fd = butFor};
+    // Where it cannot be had, what it is for fails.
+    if (butFor >= 0) {
+      syscall(SYS_landlock_add_rule, ruleset, LANDLOCK_RULE_PATH_BENEATH, &exception, 0);
+    }
     const bool restricted = syscall(SYS_landlock_restrict_self, ruleset, 0) == 0;
     close(static_cast<int>(ruleset));
     return restricted;

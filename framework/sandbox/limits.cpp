@@ -38,7 +38,7 @@ void lower(__rlimit_resource resource, rlim_t limit) {
 
 }  // namespace
 
-void limitZygote() {
+void limitZygote(rlim_t descriptors) {
   lower(RLIMIT_CORE, 0);
   lower(RLIMIT_FSIZE, 0);
   lower(RLIMIT_MEMLOCK, 0);
@@ -51,7 +51,7 @@ void limitZygote() {
     throw StartError(StartStep::checkStack, 0);
   }
 #endif
-  lower(RLIMIT_NOFILE, zygoteDescriptors);
+  lower(RLIMIT_NOFILE, descriptors);
   cpuCeiling = ceilingOf(RLIMIT_CPU);
 }
 
@@ -62,6 +62,10 @@ void limitWorker(std::uint64_t cpuSeconds) {
   // The kernel takes 0 for 1. The second more lets the readable signal come first.
   set(RLIMIT_CPU, std::min<rlim_t>(cpuSeconds, cpuCeiling),
       std::min<rlim_t>(cpuSeconds + 1, cpuCeiling));
+}
+
+bool mayHaveProcessorTime(std::uint64_t cpuSeconds) noexcept {
+  return cpuSeconds <= cpuCeiling;
 }
 
 void offerMemoryFirst() {

@@ -15,6 +15,7 @@
 #include "framework/sandbox/namespaces.h"
 #include "framework/sandbox/pages.h"
 #include "framework/sandbox/processes.h"
+#include "framework/sandbox/rewinding.h"
 
 #include <poll.h>
 #include <unistd.h>
@@ -57,6 +58,7 @@ ZygoteSeal sealZygote() {
                   .process = getpid(),
                   .launcher = start.launcher,
                   .childDeaths = watchChildren(),
+                  .canRewind = false,
                   .workerFilter = {}};
 #ifndef KEELGATE_UNSEALED
   layers |= start.layers;
@@ -65,9 +67,12 @@ ZygoteSeal sealZygote() {
 
   offerMemoryFirst();
   layers |= unshareNamespaces();
+  // Nobody else of its user may take hold of its workers, nor they of anybody.
+  constexpr std::uint32_t own = layerUserNamespace | layerPidNamespace | layerMountNamespace;
+  seal.canRewind = (layers & own) == own && prepareRewinding();
   if ((layers & layerMountNamespace) != 0 && enterEmptyRoot()) layers |= layerEmptyRoot;
 
-  if (renounceByLandlock()) layers |= layerLandlock;
+  if (renounceByLandlock(seal.canRewind ? processesDescriptor : -1)) layers |= layerLandlock;
 
   layers = becomeNobodyIn(layers);
   dropCapabilities();
@@ -79,13 +84,15 @@ ZygoteSeal sealZygote() {
   becomeUndumpable();
   layers |= layerNotDumpable;
 
-  limitZygote();
+  limitZygote(seal.canRewind ? rewindingDescriptors : zygoteDescriptors);
   layers |= layerLimits;
 
   prepareHeap();
   proveEnforced(workerRules());
   seal.workerFilter = compile(workerRules());
-  enforce(compile(zygoteRules()));
+  std::vector<Rule> rules(zygoteRules().begin(), zygoteRules().end());
+  if (seal.canRewind) rules.insert(rules.end(), rewindingRules().begin(), rewindingRules().end());
+  enforce(compile(rules));
   abandonFirstHeap();
   reserveHeap(heapFor(shortMessage));
   seal.layers = layers | layerStrictFilter | layerOneDescriptor;
@@ -96,6 +103,7 @@ ZygoteSeal sealZygote() {
 }
 
 void sealWorker(const WorkerSeal& seal) {
+  if (seal.rewindable) handOver();
   keepOnly(seal.channel);
   dieWithParent();
   // It may have died before the line above.
@@ -104,8 +112,9 @@ void sealWorker(const WorkerSeal& seal) {
   limitWorker(seal.cpuSeconds);
   lowerPriority();
   reserveHeap(heapFor(std::max(seal.longestMessage, shortMessage)));
-  if (!isAwaited()) touchPages();
+  if (seal.rewindable || !isAwaited()) touchPages();
   enforce(seal.filter);
+  if (seal.rewindable) awaitChannel();
 #endif
 }
 

@@ -27,6 +27,8 @@ struct ZygoteSeal {
   int launcher;
   /// Readable when a worker has ended.
   int childDeaths;
+  /// Whether it has what it takes to set workers back.
+  bool canRewind;
   std::vector<sock_filter> workerFilter;
 };
 
@@ -36,13 +38,15 @@ ZygoteSeal sealZygote();
 
 /// What a worker's seal is made of.
 struct WorkerSeal {
-  /// The channel to its client, whatever its number.
+  /// The channel to its client, whatever its number; none for one that waits for it.
   int channel = -1;
   /// The zygote as the worker sees it.
   pid_t parent = 0;
   std::uint64_t cpuSeconds = 0;
   /// Bytes: the length of the longest message that it will be given.
   std::uint64_t longestMessage = 0;
+  /// It hands over to its zygote, and waits for a channel when it is sealed.
+  bool rewindable = false;
   std::span<const sock_filter> filter;
 };
 

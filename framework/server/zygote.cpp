@@ -1,11 +1,15 @@
 // SPDX-License-Identifier: Apache-2.0
-/// One loop over three descriptors: the client's frames, the workers' deaths, the launcher's.
+/// One loop over four descriptors: the client's frames, the launcher's death, the workers' ends,
+/// and the next step of a worker that is being made ready to be set back.
 #include "framework/server/zygote.h"
 
+#include "framework/contracts/memory_budget.h"
 #include "framework/contracts/process.h"
 #include "framework/contracts/start_step.h"
 #include "framework/protocol/control_frames.h"
+#include "framework/sandbox/limits.h"
 #include "framework/sandbox/processes.h"
+#include "framework/sandbox/rewinding.h"
 #include "framework/server/worker.h"
 
 #include <poll.h>
@@ -52,9 +56,11 @@ void Zygote::serve() {
   greet();
   pollfd channels[]{{.fd = serviceDescriptor, .events = POLLIN, .revents = 0},
                     {.fd = seal_.launcher, .events = 0, .revents = 0},
+                    {.fd = -1, .events = POLLIN, .revents = 0},
                     {.fd = -1, .events = POLLIN, .revents = 0}};
   for (;;) {
     pollfd& deaths = channels[2];
+    channels[3].fd = rewinding_.startStep();
     const bool isBusy = deaths.fd < 0;
     // ppoll and not poll: the kernel takes it up again after a stop without a call of its own.
     const int ready =
@@ -67,6 +73,7 @@ void Zygote::serve() {
       signalfd_siginfo death;
       static_cast<void>(!read(deaths.fd, &death, sizeof death));
     }
+    if (channels[3].revents != 0) rewinding_.takeStep();
     reap();
     deaths.fd = ready == 0 ? seal_.childDeaths : -1;
   }
@@ -78,6 +85,10 @@ void Zygote::greet() {
   if (hello->frame.kind != ControlKind::hello) throw StartError(StartStep::readFrame, 0);
   messages_ = hello->frame.numbers[0];
   workerSeal_.cpuSeconds = hello->frame.numbers[1];
+  rewinding_ = Rewinding(workerSeal_.cpuSeconds);
+  const bool rewinds = hello->frame.numbers[2] == 0 && messages_ == 1 &&
+                       Sandbox::mayHaveProcessorTime(rewinding_.cpuLimit());
+  if (seal_.canRewind && !rewinds) renounceRewinding();
   send(Protocol::makeControlFrame(ControlKind::ready, 0, {seal_.layers, Protocol::ownVersion()}));
 }
 
@@ -115,9 +126,44 @@ bool Zygote::takeFrame() {
 
 void Zygote::fork(std::uint32_t slot, int channel) {
   const bool taken = std::any_of(children_.begin(), children_.end(),
-                                 [slot](const Child& child) { return child.slot == slot; });
+                                 [slot](const Child& child) { return child.slot == slot; }) ||
+                     rewinding_.processOf(slot) != 0;
   // Two workers on one slot: an exit could be told of the wrong one.
   if (taken) throw StartError(StartStep::readFrame, 0);
+  // Workers for long messages write to more memory than it pays to put back.
+  if (!seal_.canRewind || workerSeal_.longestMessage > shortMessage) {
+    forkOnce(slot, channel);
+    return;
+  }
+  if (rewinding_.give(slot, channel)) return;
+  // One may have ended just now.
+  reap();
+  if (rewinding_.give(slot, channel)) return;
+  forkOnce(slot, channel);
+  if (rewinding_.isHopeless()) {
+    renounceRewinding();
+  } else if (rewinding_.isAnotherWorthIt()) {
+    forkToRewind();
+  }
+}
+
+void Zygote::forkToRewind() {
+  Sandbox::WorkerSeal seal = workerSeal_;
+  seal.rewindable = true;
+  // One for all short messages.
+  seal.longestMessage = shortMessage;
+  seal.cpuSeconds = rewinding_.cpuLimit();
+  const pid_t process = Sandbox::forkSelf(0);
+  if (process == 0) work(server_, messages_, seal);
+  rewinding_.add(process);
+}
+
+void Zygote::renounceRewinding() {
+  seal_.canRewind = false;
+  Sandbox::renounceRewinding();
+}
+
+void Zygote::forkOnce(std::uint32_t slot, int channel) {
   workerSeal_.channel = channel;
   const pid_t process = Sandbox::forkSelf(0);
   // What was forked never comes back here.
@@ -134,6 +180,7 @@ void Zygote::fork(std::uint32_t slot, int channel) {
 }
 
 void Zygote::kill(std::uint32_t slot) const {
+  if (const pid_t process = rewinding_.processOf(slot); process != 0) ::kill(process, SIGKILL);
   for (const Child& child : children_) {
     if (child.slot != slot) continue;
     // Not reaped yet, so the number is still this child's.
@@ -149,10 +196,13 @@ void Zygote::reap() {
     if (process <= 0) return;
     const auto child = std::find_if(children_.begin(), children_.end(),
                                     [process](const Child& c) { return c.process == process; });
-    // The first process of a namespace inherits its orphans; nobody asked for those.
-    if (child == children_.end()) continue;
-    send(exitFrame(child->slot, status, used));
-    children_.erase(child);
+    if (child != children_.end()) {
+      send(exitFrame(child->slot, status, used));
+      children_.erase(child);
+    } else if (const auto end = rewinding_.note(process, status, used)) {
+      send(exitFrame(end->slot, end->status, end->used));
+    }
+    // Others are orphans that the first process of a namespace inherits; nobody asked for those.
   }
 }
 

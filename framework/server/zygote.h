@@ -1,11 +1,12 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The zygote: sealed once, it forks a worker for each request of its client and never reads a
-/// message itself, so that it stays worth forking.
+/// The zygote: sealed once, it has a fresh worker for each request of its client, forked or set
+/// back, and never reads a message itself, so that it stays worth forking.
 #pragma once
 
 #include "framework/protocol/frames.h"
 #include "framework/sandbox/seal.h"
 #include "framework/server/keelgate_server.h"
+#include "framework/server/rewinding.h"
 
 #include <sys/types.h>
 #include <cstdint>
@@ -45,7 +46,13 @@ class Zygote {
   static Optional<Received> receive();
   /// False when the client has gone.
   bool takeFrame();
+  /// Gives a fresh worker to a slot.
   void fork(std::uint32_t slot, int channel);
+  void forkOnce(std::uint32_t slot, int channel);
+  /// A worker that has no channel yet and is set back whenever it ends.
+  void forkToRewind();
+  /// From here on it forks and does nothing else.
+  void renounceRewinding();
   void kill(std::uint32_t slot) const;
   /// Tells the client of every worker that has ended.
   void reap();
@@ -57,6 +64,7 @@ class Zygote {
   /// Of the next worker.
   Sandbox::WorkerSeal workerSeal_;
   std::vector<Child> children_;
+  Rewinding rewinding_;
 };
 
 }  // namespace Keelgate

@@ -7,7 +7,7 @@
 ///         bytes, {.command = 232, .service = "com.tessen.private.braid.viso.video"});
 ///
 /// No byte of a message is parsed in the calling process. By default every message has a freshly
-/// forked, sealed process to itself.
+/// sealed process to itself.
 #pragma once
 
 #include <keelgate/errors.h>
@@ -126,6 +126,11 @@ class RecordSink final : public Sink {
 /// was, ready for the next message.
 class KEELGATE_API Client {
  public:
+  /// How a message gets a process that has seen no other. With `rewind` one that has answered is
+  /// set back, its memory and registers, to before it read its first byte; where the machine does
+  /// not give what that takes, and after anything unusual, it is a fork. With `fork` it always is.
+  enum class Isolation { rewind, fork };
+
   struct Options {
     /// More could not be in work on any machine, and each costs a process or two.
     static constexpr unsigned mostProcesses = 128;
@@ -168,6 +173,8 @@ class KEELGATE_API Client {
     /// default they go to standard error. Several threads may be in it at once, each within a call
     /// to the client. It must not throw, and must not call the client back.
     std::function<void(std::string_view line)> log;
+    /// Of messages that have a process to themselves, with `messagesPerProcess` 1.
+    Isolation isolation = Isolation::rewind;
   };
 
   /// A message as batches and asynchronous calls take it. The bytes are borrowed until its outcome

@@ -174,6 +174,11 @@ const std::vector<Environment> environments{
      namespaces | layerNotRoot},
     {"a kernel without Landlock", {{SYS_landlock_create_ruleset, ENOSYS}}, layerLandlock},
     {"Landlock switched off", {{SYS_landlock_create_ruleset, EOPNOTSUPP}}, layerLandlock},
+    {"tracing refused", {{SYS_ptrace, EPERM}}},
+    {"tracking of pages refused", {{SYS_userfaultfd, EPERM}}},
+    {"a kernel without lists of written pages", {{SYS_ioctl, ENOTTY, 0x4400, 1}}},
+    {"no notices of a filter", {{SYS_seccomp, EINVAL, SECCOMP_FILTER_FLAG_NEW_LISTENER, 1}}},
+    {"no list of the own processes", {{SYS_fsopen, ENOSYS}}},
     {"a kernel without close_range", {{SYS_close_range, ENOSYS}}},
     // A user namespace is refused in there; the process still becomes nobody.
     {"chroot", {}, layerUserNamespace | layerEmptyRoot, root, privilege, enterRoot},
@@ -200,10 +205,13 @@ std::string seenByClient(const std::string& service) {
     for (const SandboxLayer& layer : client.report().layers) {
       if (layer.present) text += layer.name + '\n';
     }
-    for (const std::string_view order : {"answer", "call 39"}) {
+    const auto send = [&client](std::string_view order) {
       client.unpack<VespCommandResponse>(std::as_bytes(std::span(order)));
-      text += order;
-    }
+    };
+    // As many as it takes to set workers back, or to find out that it cannot be done.
+    for (int i = 0; i < 100; ++i) send("answer");
+    text += "answer";
+    send("call 39");
     return text;
   } catch (const HostError& error) {
     if (error.reason == HostError::Reason::crashed) return text + "and a crash";
@@ -240,8 +248,12 @@ TEST(C11, OneDescriptorIsTrueWithoutCloseRange) {
   try {
     EXPECT_TRUE(Testing::comesTrue([&] { return descriptorsOf(worker).size() == 1; }));
     EXPECT_EQ(descriptorsOf(worker), std::set<std::string>{"3"});
-    // The channel, the tether, and the deaths of its workers; the worker's end goes after the fork.
-    EXPECT_TRUE(Testing::comesTrue([&] { return descriptorsOf(service.zygote()).size() == 3; }));
+    // The channel, the tether, and the deaths of its workers; where these can be set back, three
+    // more. The worker's end goes after the fork.
+    EXPECT_TRUE(Testing::comesTrue([&] {
+      const std::size_t count = descriptorsOf(service.zygote()).size();
+      return count == 3 || count == 6;
+    }));
   } catch (const std::filesystem::filesystem_error& error) {
     GTEST_SKIP() << error.what();
   }

@@ -103,7 +103,8 @@ class RawClient {
     close(program);
     close(ends[1]);
     control_ = ends[0];
-    sendFrame(ControlKind::hello, 0, {options.messages, options.cpuSeconds});
+    sendFrame(ControlKind::hello, 0,
+              {options.messages, options.cpuSeconds, Testing::forksAlone() ? 1U : 0U});
     first_ = receiveFrame();
   }
   ~RawClient() {

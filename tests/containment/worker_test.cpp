@@ -35,6 +35,15 @@ void waitFor(pid_t process, const std::string& file, const std::string& text) {
   }
 }
 
+/// A number in the status of a process.
+int numberIn(pid_t process, const std::string& name) {
+  std::string status = readAll("/proc/" + std::to_string(process) + "/status");
+  return std::stoi(status.erase(0, status.find(name + ":\t") + name.size() + 2));
+}
+std::string filtersLine(int count) {
+  return "Seccomp_filters:\t" + std::to_string(count) + '\n';
+}
+
 /// What is the same for the zygote and for a worker.
 void expectSealed(pid_t process) {
   const std::string here = "/proc/" + std::to_string(process) + "/";
@@ -70,9 +79,9 @@ TEST_F(Worker, C3SeenFromOutside) {
     GTEST_SKIP() << "this root may not look into an undumpable process";
   }
   // Containers and service managers have filters of their own.
-  std::string own = readAll("/proc/self/status");
-  own.erase(0, own.find("Seccomp_filters:\t") + 17);
-  const std::string filters = "Seccomp_filters:\t" + std::to_string(std::stoi(own) + 2) + '\n';
+  const int ofZygote = numberIn(service_.zygote(), "Seccomp_filters");
+  EXPECT_GT(ofZygote, numberIn(getpid(), "Seccomp_filters"));
+  const std::string filters = filtersLine(ofZygote + 1);
   const int waiting = service_.fork(1);
   const int spinning = service_.fork(2);
   sendMessage(spinning, "spin");
@@ -101,6 +110,29 @@ TEST_F(Worker, C3SeenFromOutside) {
   service_.kill(2);
   EXPECT_EQ(service_.end(2).signal(), SIGKILL);
   close(spinning);
+}
+
+TEST_F(Worker, C3OfThoseThatAreSetBack) {
+  if (geteuid() != 0) GTEST_SKIP() << "only root may look into an undumpable process";
+  for (int i = 0; i < 50; ++i) EXPECT_EQ(service_.obey("answer").first.result(), 0);
+  const int channel = service_.fork(1);
+  const std::string filters = filtersLine(numberIn(service_.zygote(), "Seccomp_filters") + 2);
+  std::size_t seen = 0;
+  for (const pid_t worker : service_.workers(1)) {
+    if (numberIn(worker, "TracerPid") == 0) continue;
+    ++seen;
+    expectSealed(worker);
+    expectIn(worker, "status", {filters});
+    expectIn(worker, "limits",
+             {"Max processes             0                    0 ",
+              "Max open files            4                    4 ",
+              "Max cpu time              12                   13 "});
+    std::set<std::string> others = descriptorsOf(worker);
+    others.erase("3");
+    EXPECT_TRUE(others.empty());
+  }
+  if (seen == 0) GTEST_SKIP() << "this machine does not give what it takes to set one back";
+  close(channel);
 }
 
 TEST_F(Worker, GivesWayToOthers) {

@@ -51,6 +51,7 @@ inline Client::Options optionsFor(const String& service, milliseconds limit, uns
   options.processes = processes;
   options.timeLimit = limit;
   options.servicePath = service;
+  if (Testing::forksAlone()) options.isolation = Client::Isolation::fork;
   // Tests make workers fail by the hundred.
   options.abnormalEndsPerSecond = 0;
   options.log = [](std::string_view) {

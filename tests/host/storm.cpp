@@ -6,6 +6,8 @@
 //
 //     storm SERVICE MESSAGES THREADS          processes are killed, stopped and faulted at random
 //     storm SERVICE MESSAGES THREADS ORDER    each message is an order to crash
+//
+// With "fork" in front of SERVICE no worker is set back.
 #include "tests/host/host_testing.h"
 
 #include <sys/prctl.h>
@@ -125,9 +127,11 @@ class Storm {
   milliseconds longest_{};
 };
 
-bool runStorm(const String& service, Int messages, unsigned threads, const String& order) {
+bool runStorm(Client::Isolation isolation, const String& service, Int messages, unsigned threads,
+              const String& order) {
   const auto limit = order.empty() ? Storm::limit : milliseconds(20'000);
-  const Client::Options options = optionsFor(service, limit, threads);
+  Client::Options options = optionsFor(service, limit, threads);
+  options.isolation = isolation;
   // As pid 1 of a container: what the service leaves behind would be found among our children.
   // Where launchers are killed, that is what they were there for.
   if (!order.empty()) prctl(PR_SET_CHILD_SUBREAPER, 1);
@@ -167,9 +171,14 @@ bool runStorm(const String& service, Int messages, unsigned threads, const Strin
 }  // namespace Keelgate::Host
 
 int main(int count, char** arguments) {
+  const bool forks = std::string_view(arguments[1]) == "fork";
+  if (forks) ++arguments, --count;
+  const auto isolation =
+      forks ? Keelgate::Client::Isolation::fork : Keelgate::Client::Isolation::rewind;
   const auto threads = static_cast<unsigned>(std::stoul(arguments[3]));
   const Keelgate::Int messages = std::stol(arguments[2]);
-  return Keelgate::Host::runStorm(arguments[1], messages, threads, count > 4 ? arguments[4] : "")
+  return Keelgate::Host::runStorm(isolation, arguments[1], messages, threads,
+                                  count > 4 ? arguments[4] : "")
              ? 0
              : 1;
 }

@@ -132,6 +132,7 @@ class Supervised : public testing::Test {
                           .socket = {},
                           .socketUser = {},
                           .requireLayers = false,
+                          .forks = false,
                           .messagesPerWorker = 1,
                           .cpuSecondsPerWorker = 5,
                           .maximumWorkers = 3},

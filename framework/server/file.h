@@ -6,7 +6,7 @@
 
 #include <utility>
 
-namespace Keelgate::Rewind {
+namespace Keelgate {
 
 class File {
  public:
@@ -27,4 +27,4 @@ class File {
   int descriptor_;
 };
 
-}  // namespace Keelgate::Rewind
+}  // namespace Keelgate

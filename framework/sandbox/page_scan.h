@@ -7,7 +7,7 @@
 
 #include <cstdint>
 
-namespace Keelgate::Rewind {
+namespace Keelgate::Sandbox {
 
 /// Features of a userfaultfd: a protected page that is written is noted and let go, and pages that
 /// are not there yet can be protected too.
@@ -45,4 +45,4 @@ constexpr std::uint64_t pageIsWritten = 1U << 1;
 constexpr std::uint64_t pageIsPresent = 1U << 3;
 constexpr std::uint64_t pageIsSwapped = 1U << 4;
 
-}  // namespace Keelgate::Rewind
+}  // namespace Keelgate::Sandbox

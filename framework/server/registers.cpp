@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "bench/rewind/registers.h"
+#include "framework/server/registers.h"
 
 #include <elf.h>
 #include <sys/ptrace.h>
@@ -7,8 +7,9 @@
 
 #include <cstring>
 
-namespace Keelgate::Rewind {
+namespace Keelgate {
 
+#if defined __x86_64__
 namespace {
 
 /// More than any processor has.
@@ -44,23 +45,36 @@ bool readRegisters(pid_t process, Registers& registers) {
 }
 
 bool writeRegisters(pid_t process, const Registers& registers) {
-  user_regs_struct now;
-  // Before anything is written: the sets of 32-bit code have other sizes.
-  if (!readGeneral(process, now)) return false;
-  if (!putSet(process, NT_PRSTATUS, &registers.general, sizeof registers.general)) return false;
-  if (!putSet(process, NT_X86_XSTATE, registers.extended.data(), registers.extended.size())) {
+  if (!putSet(process, NT_PRSTATUS, &registers.general, sizeof registers.general) ||
+      !putSet(process, NT_X86_XSTATE, registers.extended.data(), registers.extended.size())) {
     return false;
   }
+  // The sets of 32-bit code have other sizes, and take a part of these.
+  user_regs_struct now;
   return readGeneral(process, now) && std::memcmp(&now, &registers.general, sizeof now) == 0;
 }
 
-Registers beforeCall(Registers atEntry) {
+Registers beforeCall(Registers inCall) {
   constexpr unsigned long long lengthOfCall = 2;
-  atEntry.general.rip -= lengthOfCall;
-  atEntry.general.rax = atEntry.general.orig_rax;
+  inCall.general.rip -= lengthOfCall;
+  inCall.general.rax = inCall.general.orig_rax;
   // Not in a call: or the kernel would start it over by itself.
-  atEntry.general.orig_rax = ~0ULL;
-  return atEntry;
+  inCall.general.orig_rax = ~0ULL;
+  return inCall;
 }
+#else
+bool Registers::operator==(const Registers&) const noexcept {
+  return false;
+}
+bool readRegisters(pid_t, Registers&) {
+  return false;
+}
+bool writeRegisters(pid_t, const Registers&) {
+  return false;
+}
+Registers beforeCall(Registers inCall) {
+  return inCall;
+}
+#endif
 
-}  // namespace Keelgate::Rewind
+}  // namespace Keelgate

@@ -1,5 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "bench/rewind/marks.h"
+/// Stands for a parser that was taken over, and tries to leave something for the next message. For
+/// one test, which includes it.
+#pragma once
 
 #include "framework/contracts/process.h"
 #include "framework/sandbox/limits.h"
@@ -11,40 +13,44 @@
 #include <array>
 #include <cstdint>
 #include <cstdlib>
-#include <cstring>
-#include <ctime>
+#include <string_view>
 
-namespace Keelgate::Rewind {
+namespace Keelgate::Test {
 
-namespace {
+struct Mark {
+  std::string_view name;
+  void (*leave)();
+  /// Whether its worker cannot be set back: it has ended, or is to be thrown away.
+  bool ends;
+};
 
 constexpr std::size_t page = 4096;
 constexpr int pattern = 0x5a;
 
-std::array<char, 3 * page> zeroed;
-std::array<char, 64> initialised{"initialised"};
-thread_local std::array<char, 64> ofThread{"of the thread"};
+inline std::array<char, 3 * page> zeroed;
+inline std::array<char, 64> initialised{"initialised"};
+inline thread_local std::array<char, 64> ofThread{"of the thread"};
 
-[[noreturn]] void end() {
-  _exit(0);
-}
+/// An end at once: code that leaves marks does not want them to be written over.
+#define END "mov $231, %%eax\n\t mov $0, %%edi\n\t syscall\n\t ud2"
+static_assert(SYS_exit_group == 231);
 
-void nothing() {}
+inline void nothing() {}
 
-void fill(void* from, std::size_t size) {
+inline void fill(void* from, std::size_t size) {
   volatile char* const bytes = static_cast<char*>(from);
   for (std::size_t at = 0; at < size; ++at) bytes[at] = pattern;
 }
 
-void staticData() {
+inline void staticData() {
   fill(zeroed.data(), zeroed.size());
   fill(initialised.data(), initialised.size());
   fill(ofThread.data(), ofThread.size());
-  end();
+  _exit(0);
 }
 
 /// The allocator's own lists too, and pages that nobody has touched before.
-void heap() {
+inline void heap() {
   for (int size = 16; size < 4096; size += 16) {
     void* const block = std::malloc(static_cast<std::size_t>(size));
     fill(block, static_cast<std::size_t>(size));
@@ -53,72 +59,54 @@ void heap() {
   constexpr std::size_t far = std::size_t{64} << 20;
   char* const large = static_cast<char*>(std::malloc(far));
   for (std::size_t at = 0; at < far; at += far / 64) fill(large + at, 8);
-  end();
+  _exit(0);
 }
 
-[[gnu::noinline]] void stackFrom(std::size_t depth) {
+[[gnu::noinline]] inline void stackFrom(std::size_t depth) {
   volatile char* const here = static_cast<char*>(__builtin_frame_address(0));
   for (std::size_t at = page; at < depth; at += 64 * page)
     here[-static_cast<std::ptrdiff_t>(at)] = pattern;
-  end();
+  _exit(0);
 }
 
-void stack() {
+inline void stack() {
   stackFrom(Sandbox::stackLimit / 2);
 }
 /// To where the kernel lets it grow at the most.
-void grownStack() {
+inline void grownStack() {
   stackFrom(Sandbox::stackLimit - 64 * page);
 }
 
 /// Written by the kernel, on the process's behalf.
-void readIntoMemory() {
+inline void readIntoMemory() {
   char* const block = static_cast<char*>(std::malloc(16 * page));
   if (read(serviceDescriptor, block + 5 * page, page) <= 0) abort();
-  end();
+  _exit(0);
 }
 
 /// A critical section that is nowhere, for the kernel to jump out of at the next interruption.
-void restartableSequence() {
+inline void restartableSequence() {
   auto* const area = reinterpret_cast<struct rseq*>(static_cast<char*>(__builtin_thread_pointer()) +
                                                     __rseq_offset);
   // In one write, and over before it can be seen.
-  volatile auto* const section = &area->rseq_cs;
-  asm volatile(
-      "movq $0x1000, %0\n\t"
-      "mov $231, %%eax\n\t"
-      "xor %%edi, %%edi\n\t"
-      "syscall"
-      : "=m"(*section)
-      :
-      : "rax", "rdi", "rcx", "r11", "memory");
+  asm volatile("movq $0x1000, %0\n\t" END : "=m"(area->rseq_cs));
 }
 
-static_assert(SYS_exit_group == 231);
-
-void generalRegisters() {
+inline void generalRegisters() {
   asm volatile(
-      "mov $0x5a5a5a5a5a5a5a5a, %%rbx\n\t"
-      "mov %%rbx, %%rdx\n\t mov %%rbx, %%rsi\n\t mov %%rbx, %%r8\n\t mov %%rbx, %%r9\n\t"
-      "mov %%rbx, %%r10\n\t mov %%rbx, %%r12\n\t mov %%rbx, %%r13\n\t mov %%rbx, %%r14\n\t"
-      "mov %%rbx, %%r15\n\t mov %%rbx, %%rbp\n\t mov %%rbx, %%rsp\n\t"
-      "mov $231, %%eax\n\t xor %%edi, %%edi\n\t syscall\n\t ud2" ::
-          : "memory");
+      "mov $0x5a5a5a5a5a5a5a5a, %rbx\n\t .irp r,dx,si,8,9,10,12,13,14,15,bp,sp\n\t"
+      "mov %rbx, %r\\r\n\t .endr\n\t mov $231, %eax\n\t xor %edi, %edi\n\t syscall\n\t ud2");
 }
 
-[[gnu::target("avx512f,avx512bw")]] void widestRegisters() {
-  asm volatile(
-      ".irp "
-      "n,0,1,2,3,4,5,6,7,8,9,10,11,12,13,14,15,16,17,18,19,20,21,22,23,24,25,26,27,28,29,30,31\n\t"
-      "vpternlogd $0xff, %%zmm\\n, %%zmm\\n, %%zmm\\n\n\t"
-      ".endr\n\t"
-      ".irp n,0,1,2,3,4,5,6,7\n\t"
-      "kxnorq %%k\\n, %%k\\n, %%k\\n\n\t"
-      ".endr\n\t" ::
-          : "memory");
+[[gnu::target("avx512f,avx512bw")]] inline void widestRegisters() {
+  asm volatile(".irp n,0,1,2,3,4,5,6,7,8,9,10,11,12,13,14,15\n\t"
+               "vpternlogd $0xff, %zmm\\n, %zmm\\n, %zmm\\n\n\t .endr\n\t"
+               ".irp n,16,20,24,28,29,30,31\n\t"
+               "vpternlogd $0xff, %zmm\\n, %zmm\\n, %zmm\\n\n\t .endr\n\t"
+               ".irp n,0,1,2,3,4,5,6,7\n\t kxnorq %k\\n, %k\\n, %k\\n\n\t .endr");
 }
 
-void vectorRegisters() {
+inline void vectorRegisters() {
   static const std::uint32_t control = 0xffbf;
   static const std::uint16_t x87Control = 0x0e3f;
   if (__builtin_cpu_supports("avx512bw") != 0) {
@@ -126,60 +114,43 @@ void vectorRegisters() {
   } else {
     asm volatile("pcmpeqd %%xmm0, %%xmm0\n\t pcmpeqd %%xmm15, %%xmm15" ::: "memory");
   }
-  asm volatile(
-      "ldmxcsr %0\n\t fldcw %1\n\t fldpi\n\t fldpi\n\t fldpi\n\t"
-      "mov $231, %%eax\n\t xor %%edi, %%edi\n\t syscall\n\t ud2" ::"m"(control),
-      "m"(x87Control)
-      : "memory");
+  asm volatile("ldmxcsr %0\n\t fldcw %1\n\t fldpi\n\t fldpi\n\t" END ::"m"(control),
+               "m"(x87Control));
 }
 
 template <unsigned long Flags>
 void flags() {
-  asm volatile(
-      "pushfq\n\t orq %0, (%%rsp)\n\t popfq\n\t"
-      "mov $231, %%eax\n\t mov $0, %%edi\n\t syscall\n\t ud2" ::"i"(Flags)
-      : "memory");
+  asm volatile("pushfq\n\t orq %0, (%%rsp)\n\t popfq\n\t" END ::"i"(Flags));
 }
 
-void segments() {
+inline void segments() {
   asm volatile(
       "mov $3, %%eax\n\t mov %%eax, %%gs\n\t mov $0x2b, %%eax\n\t mov %%eax, %%ds\n\t"
-      "mov %%eax, %%es\n\t mov $0x5a5a5a5a5a5a, %%rax\n\t wrgsbase %%rax\n\t wrfsbase %%rax\n\t"
-      "mov $231, %%eax\n\t xor %%edi, %%edi\n\t syscall\n\t ud2" ::
-          : "memory");
+      "mov %%eax, %%es\n\t mov $0x5a5a5a5a5a5a, %%rax\n\t wrgsbase %%rax\n\t wrfsbase %%rax\n\t" END
+:);
 }
 
 /// Far return into 32-bit code: there is no memory that it could run in.
-void oldCode() {
+inline void oldCode() {
   asm volatile("pushq $0x23\n\t pushq $0x1000\n\t lretq" ::: "memory");
 }
 
-void fault() {
+inline void fault() {
   asm volatile("movb $1, 0" ::: "memory");
 }
 
 /// More than the client reads, and it may come late.
-void unsent() {
+inline void unsent() {
   static const std::array<char, 4 * page> bytes{"a second answer"};
   for (int i = 0; i < 8; ++i)
     static_cast<void>(!write(serviceDescriptor, bytes.data(), bytes.size()));
-  end();
+  _exit(0);
 }
 
-void processorTime() {
-  timespec from{};
-  timespec now{};
-  clock_gettime(CLOCK_MONOTONIC, &from);
-  do {
-    clock_gettime(CLOCK_MONOTONIC, &now);
-  } while ((now.tv_sec - from.tv_sec) * 1000 + (now.tv_nsec - from.tv_nsec) / 1'000'000 < 50);
-  end();
-}
-
-void muchMemory() {
+inline void muchMemory() {
   constexpr std::size_t size = std::size_t{16} << 20;
   fill(std::malloc(size), size);
-  end();
+  _exit(0);
 }
 
 constexpr unsigned long directionAndAlignment = 0x40400;
@@ -187,7 +158,8 @@ constexpr unsigned long nestedTask = 0x4000;
 constexpr unsigned long singleStep = 0x100;
 constexpr unsigned long identification = 0x20'0000;
 
-constexpr Mark all[] = {
+/// Each is left in a sealed worker, in the middle of its message.
+constexpr Mark marks[] = {
     {"nothing", nothing, false},
     {"static data", staticData, false},
     {"heap", heap, false},
@@ -204,15 +176,10 @@ constexpr Mark all[] = {
     {"32-bit code", oldCode, true},
     {"a fault", fault, true},
     {"unread and unsent bytes", unsent, false},
-    {"processor time", processorTime, false},
     {"grown stack", grownStack, true},
     {"much memory", muchMemory, true},
 };
 
-}  // namespace
+#undef END
 
-std::span<const Mark> marks() noexcept {
-  return all;
-}
-
-}  // namespace Keelgate::Rewind
+}  // namespace Keelgate::Test

@@ -8,7 +8,7 @@
 #include <cstddef>
 #include <vector>
 
-namespace Keelgate::Rewind {
+namespace Keelgate {
 
 struct Registers {
   /// With the segments and their bases.
@@ -28,7 +28,7 @@ bool readRegisters(pid_t process, Registers& registers);
 /// tracer change. False when it did not.
 bool writeRegisters(pid_t process, const Registers& registers);
 
-/// Those of a process that goes on with the call at whose entry it had `atEntry`.
-Registers beforeCall(Registers atEntry);
+/// Those of a process that makes the call again in which it was interrupted with these.
+Registers beforeCall(Registers inCall);
 
-}  // namespace Keelgate::Rewind
+}  // namespace Keelgate

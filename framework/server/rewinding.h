@@ -1,0 +1,74 @@
+// SPDX-License-Identifier: Apache-2.0
+/// The workers of a zygote that are set back instead of being forked: who they are, when another
+/// one is worth it, and when it is over with one of them.
+///
+/// For one thread, the zygote's.
+#pragma once
+
+#include "framework/server/rewindable_worker.h"
+
+#include <keelgate/values.h>
+
+#include <sys/resource.h>
+#include <sys/types.h>
+
+#include <memory>
+#include <vector>
+
+namespace Keelgate {
+
+class Rewinding {
+ public:
+  /// `cpuSeconds`: what a message may have of the processor.
+  explicit Rewinding(std::uint64_t cpuSeconds = 0) noexcept : cpuSeconds_(cpuSeconds) {}
+
+  /// The limit of a worker that each of its messages has as much of as it would have in a fork.
+  [[nodiscard]] std::uint64_t cpuLimit() const noexcept { return 2 * cpuSeconds_ + 2; }
+
+  /// Gives a channel to a worker that waits for one, which owns it then. False where none does.
+  bool give(std::uint32_t slot, int channel);
+
+  /// Called for each message that had to be forked for: whether to fork one to be set back as well.
+  bool isAnotherWorthIt();
+  /// Such a fork, or -1 where it failed.
+  void add(pid_t process);
+  /// Whether it has turned out that the machine does not let it.
+  [[nodiscard]] bool isHopeless() const noexcept { return failures_ >= mostFailures; }
+
+  /// What the one that is getting ready waits for, or -1; and what to do when it is readable.
+  [[nodiscard]] int startStep() const noexcept;
+  void takeStep();
+
+  /// The process that has a slot, or 0.
+  [[nodiscard]] pid_t processOf(std::uint32_t slot) const noexcept;
+
+  /// How a message ended, as wait4 would have told it of a fork.
+  struct End {
+    std::uint32_t slot;
+    int status;
+    rusage used;
+  };
+  /// Takes what wait4 has given. Nothing where nobody need be told.
+  Optional<End> note(pid_t process, int status, const rusage& used);
+
+ private:
+  static constexpr unsigned mostFailures = 3;
+
+  struct Member {
+    std::unique_ptr<RewindableWorker> worker;
+    /// Whoever has none is on its way back, or waits.
+    Optional<std::uint32_t> slot;
+    rusage usedBefore{};
+  };
+
+  Optional<End> noteStop(Member& member, int status, const rusage& used);
+  [[nodiscard]] bool isTired(const rusage& used) const noexcept;
+  static void throwAway(const Member& member) noexcept;
+
+  std::uint64_t cpuSeconds_;
+  std::vector<Member> members_;
+  unsigned missed_ = 0;
+  unsigned failures_ = 0;
+};
+
+}  // namespace Keelgate
