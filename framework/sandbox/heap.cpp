@@ -55,6 +55,7 @@ void prepareHeap() {
   }
   randomOffset = random % largestOffset;
 #endif
+  // The first one that is thrown makes a system call.
   try {
     throw StartError(StartStep::reserveHeap, 0);
   } catch (const StartError&) {
@@ -86,9 +87,10 @@ void reserveHeap(std::size_t bytes) {
     whole = allocate(randomOffset + bytes);
   }
   std::free(whole);
-  if (whole == nullptr || allocate(randomOffset) == nullptr) {
-    throw StartError(StartStep::reserveHeap);
-  }
+  // For good, also of a heap that a longer one follows.
+  static void* inFront;
+  inFront = whole == nullptr ? nullptr : allocate(randomOffset);
+  if (inFront == nullptr) throw StartError(StartStep::reserveHeap);
 }
 
 }  // namespace Keelgate::Sandbox
