@@ -38,6 +38,10 @@ void lower(__rlimit_resource resource, rlim_t limit) {
 
 }  // namespace
 
+bool mayHaveDescriptors(rlim_t count) {
+  return count <= ceilingOf(RLIMIT_NOFILE);
+}
+
 void limitZygote(rlim_t descriptors) {
   lower(RLIMIT_CORE, 0);
   lower(RLIMIT_FSIZE, 0);

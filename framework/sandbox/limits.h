@@ -18,6 +18,9 @@ constexpr rlim_t zygoteDescriptors = 16;
 /// With five for each worker that is set back.
 constexpr rlim_t rewindingDescriptors = zygoteDescriptors + 5 * 64;
 
+/// Whether the one who started the service lets it have so many descriptors.
+bool mayHaveDescriptors(rlim_t count);
+
 /// For the zygote and all that it forks: no core, no file, no locked memory, no message queue; a
 /// bounded stack, and so many descriptors. Throws StartError.
 void limitZygote(rlim_t descriptors);

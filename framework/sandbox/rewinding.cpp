@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "framework/sandbox/rewinding.h"
 
+#include "framework/contracts/process.h"
 #include "framework/contracts/start_step.h"
 #include "framework/sandbox/credentials.h"
 #include "framework/sandbox/filter.h"
@@ -148,10 +149,14 @@ bool prepareRewinding() {
   return settle(ends[0], handoverReceiver) && settle(ends[1], handoverSender);
 }
 
-void renounceRewinding() {
+void abandonRewinding() {
   for (const int descriptor : {processesDescriptor, handoverReceiver, handoverSender}) {
     close(descriptor);
   }
+}
+
+void renounceRewinding() {
+  abandonRewinding();
   enforce(compile(zygoteRules()));
 }
 
@@ -172,7 +177,7 @@ void handOver() {
 
 void awaitChannel() {
   // Deliberate: the call returns, with the number of the channel, when the zygote answers it.
-  if (syscall(SYS_exit_group, waitingStatus) < 0) fail();
+  if (syscall(SYS_exit_group, waitingStatus) != serviceDescriptor) fail();
 }
 
 }  // namespace Keelgate::Sandbox

@@ -50,6 +50,9 @@ constexpr std::size_t handedCount = 4;
 /// not give what it takes; nothing was lost then.
 bool prepareRewinding();
 
+/// Before the filter: takes back what was prepared.
+void abandonRewinding();
+
 /// In a zygote that has been prepared, for good: it is one that can fork alone.
 void renounceRewinding();
 

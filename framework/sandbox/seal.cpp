@@ -69,8 +69,12 @@ ZygoteSeal sealZygote() {
   layers |= unshareNamespaces();
   // Nobody else of its user may take hold of its workers, nor they of anybody.
   constexpr std::uint32_t own = layerUserNamespace | layerPidNamespace | layerMountNamespace;
-  seal.canRewind = (layers & own) == own && prepareRewinding();
+  const bool prepared =
+      (layers & own) == own && mayHaveDescriptors(rewindingDescriptors) && prepareRewinding();
   if ((layers & layerMountNamespace) != 0 && enterEmptyRoot()) layers |= layerEmptyRoot;
+  // Its workers open files of their own, and are to find no others.
+  seal.canRewind = prepared && (layers & layerEmptyRoot) != 0;
+  if (!seal.canRewind) abandonRewinding();
 
   if (renounceByLandlock(seal.canRewind ? processesDescriptor : -1)) layers |= layerLandlock;
 

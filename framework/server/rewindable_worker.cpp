@@ -83,7 +83,11 @@ bool RewindableWorker::give(int channel) {
                             .srcfd = static_cast<std::uint32_t>(channel),
                             .newfd = serviceDescriptor,
                             .newfd_flags = 0};
-  if (ioctl(notices, SECCOMP_IOCTL_NOTIF_ADDFD, &order) != serviceDescriptor) return false;
+  if (ioctl(notices, SECCOMP_IOCTL_NOTIF_ADDFD, &order) != serviceDescriptor) {
+    // Its call has been taken and would never be answered.
+    kill(process_, SIGKILL);
+    return false;
+  }
   channel_ = File(channel);
   return true;
 }

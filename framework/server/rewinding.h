@@ -34,6 +34,7 @@ class Rewinding {
   void add(pid_t process);
   /// Whether it has turned out that the machine does not let it.
   [[nodiscard]] bool isHopeless() const noexcept { return failures_ >= mostFailures; }
+  [[nodiscard]] bool isEmpty() const noexcept { return members_.empty(); }
 
   /// What the one that is getting ready waits for, or -1; and what to do when it is readable.
   [[nodiscard]] int startStep() const noexcept;

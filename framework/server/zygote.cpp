@@ -140,7 +140,7 @@ void Zygote::fork(std::uint32_t slot, int channel) {
   reap();
   if (rewinding_.give(slot, channel)) return;
   forkOnce(slot, channel);
-  if (rewinding_.isHopeless()) {
+  if (rewinding_.isHopeless() && rewinding_.isEmpty()) {
     renounceRewinding();
   } else if (rewinding_.isAnotherWorthIt()) {
     forkToRewind();
@@ -150,6 +150,7 @@ void Zygote::fork(std::uint32_t slot, int channel) {
 void Zygote::forkToRewind() {
   Sandbox::WorkerSeal seal = workerSeal_;
   seal.rewindable = true;
+  seal.channel = -1;
   // One for all short messages.
   seal.longestMessage = shortMessage;
   seal.cpuSeconds = rewinding_.cpuLimit();
@@ -179,7 +180,9 @@ void Zygote::forkOnce(std::uint32_t slot, int channel) {
   }
 }
 
-void Zygote::kill(std::uint32_t slot) const {
+void Zygote::kill(std::uint32_t slot) {
+  // One that has just answered may be set back yet.
+  reap();
   if (const pid_t process = rewinding_.processOf(slot); process != 0) ::kill(process, SIGKILL);
   for (const Child& child : children_) {
     if (child.slot != slot) continue;

@@ -53,7 +53,7 @@ class Zygote {
   void forkToRewind();
   /// From here on it forks and does nothing else.
   void renounceRewinding();
-  void kill(std::uint32_t slot) const;
+  void kill(std::uint32_t slot);
   /// Tells the client of every worker that has ended.
   void reap();
 

@@ -179,6 +179,7 @@ const std::vector<Environment> environments{
     {"a kernel without lists of written pages", {{SYS_ioctl, ENOTTY, 0x4400, 1}}},
     {"no notices of a filter", {{SYS_seccomp, EINVAL, SECCOMP_FILTER_FLAG_NEW_LISTENER, 1}}},
     {"no list of the own processes", {{SYS_fsopen, ENOSYS}}},
+    {"few descriptors", {}, 0, root, userNamespaces, allowOnly<RLIMIT_NOFILE, 24>},
     {"a kernel without close_range", {{SYS_close_range, ENOSYS}}},
     // A user namespace is refused in there; the process still becomes nobody.
     {"chroot", {}, layerUserNamespace | layerEmptyRoot, root, privilege, enterRoot},
