@@ -52,35 +52,20 @@ unsigned run(const std::vector<sock_filter>& program, const seccomp_data& data) 
 using Arguments = std::array<std::uint64_t, 6>;
 
 /// What a rule may name, and what is near.
-constexpr std::uint64_t arguments[] = {0,
-                                       1,
-                                       2,
-                                       3,
-                                       4,
-                                       7,
-                                       8,
-                                       10,
-                                       11,
-                                       12,
-                                       16,
-                                       17,
-                                       256,
-                                       trackingFlags,
-                                       PTRACE_SETOPTIONS,
-                                       PTRACE_GETREGSET,
-                                       PTRACE_SETREGSET,
-                                       PTRACE_SEIZE,
-                                       scanPages,
-                                       SECCOMP_IOCTL_NOTIF_RECV,
-                                       SECCOMP_IOCTL_NOTIF_ADDFD,
-                                       SECCOMP_IOCTL_NOTIF_SEND,
-                                       UFFDIO_API,
-                                       UFFDIO_REGISTER,
-                                       UFFDIO_COPY,
-                                       0xffff'ffff,
-                                       0x1'0000'0003,
-                                       0x3'0000'0000,
-                                       ~std::uint64_t{0}};
+std::vector<std::uint64_t> arguments() {
+  std::vector<std::uint64_t> all{PTRACE_SETOPTIONS, PTRACE_GETREGSET, PTRACE_SETREGSET,
+                                 PTRACE_SEIZE,      trackingFlags,    waitingStatus};
+  for (const std::uint64_t command :
+       {scanPages, SECCOMP_IOCTL_NOTIF_RECV, UFFDIO_COPY, SECCOMP_IOCTL_NOTIF_ADDFD,
+        SECCOMP_IOCTL_NOTIF_SEND, UFFDIO_API, UFFDIO_REGISTER}) {
+    all.push_back(command);
+  }
+  for (std::uint64_t small = 0; small < 20; ++small) all.push_back(small);
+  for (const std::uint64_t high : {0xffff'fffful, 0x1'0000'0003ul, 0x3'0000'0000ul, ~0ul}) {
+    all.push_back(high);
+  }
+  return all;
+}
 
 /// Every number that has ever been one, around every power of two, and the x32 convention's.
 std::vector<int> numbers() {
@@ -103,9 +88,10 @@ constexpr unsigned architectures[] = {
 /// One argument at a time has a value of the table, and the others are something else.
 template <class Check>
 void forAllCalls(Check&& check) {
+  const std::vector<std::uint64_t> values = arguments();
   for (const unsigned arch : architectures) {
     for (const int number : numbers()) {
-      for (const std::uint64_t argument : arguments) {
+      for (const std::uint64_t argument : values) {
         const bool known = arch == nativeCalls && number < 512;
         for (std::size_t position = 0; position < (known ? 3 : 1); ++position) {
           seccomp_data data{.nr = number, .arch = arch, .instruction_pointer = 0, .args = {}};

@@ -15,7 +15,8 @@
 #include <sys/socket.h>
 #include <sys/syscall.h>
 #include <unistd.h>
-#include <cstdio>
+#include <algorithm>
+#include <charconv>
 #include <cstring>
 #include <string>
 
@@ -87,17 +88,19 @@ WorkerAreas readAreas() {
     const std::size_t end = std::min(text.find('\n', at), text.size());
     const std::string line = text.substr(at, end - at);
     at = end + 1;
-    unsigned long first = 0;
-    unsigned long last = 0;
-    char rights[5] = "";
-    if (std::sscanf(line.c_str(), "%lx-%lx %4s", &first, &last, rights) != 3) fail();
-    if (rights[1] != 'w') continue;
+    // As in "7f00-7fff rw-p".
+    WritableArea area{};
+    const char* const behind = line.data() + line.size();
+    const auto first = std::from_chars(line.data(), behind, area.begin, 16);
+    const auto last = std::from_chars(std::min(first.ptr + 1, behind), behind, area.end, 16);
+    if (last.ec != std::errc() || behind - last.ptr < 3) fail();
+    if (last.ptr[2] != 'w') continue;
     if (line.ends_with("[stack]")) {
-      all.areas[0] = {.begin = first, .end = last};
-    } else if (all.count > 1 && all.areas[all.count - 1].end == first) {
-      all.areas[all.count - 1].end = last;
+      all.areas[0] = area;
+    } else if (all.count > 1 && all.areas[all.count - 1].end == area.begin) {
+      all.areas[all.count - 1].end = area.end;
     } else if (all.count < all.areas.size()) {
-      all.areas[all.count++] = {.begin = first, .end = last};
+      all.areas[all.count++] = area;
     } else {
       fail();
     }

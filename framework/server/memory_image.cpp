@@ -24,7 +24,7 @@ constexpr std::uint64_t mostPages = 384;
 /// As many runs as one message may leave; more than that is unusual enough.
 constexpr std::size_t mostRuns = 512;
 
-constexpr std::array<std::byte, 16 * pageSize> zeros{};
+constexpr std::array<std::byte, pageSize> zeros{};
 
 /// From where the stack may grow to, so that it shows.
 WritableArea wholeStack(const WritableArea& stack) {
