@@ -64,12 +64,7 @@ TEST_F(ServiceLocation, FollowsLinksDotsAndRelativePaths) {
 
 TEST_F(ServiceLocation, RefusesWhatOthersCanReplaceAndSaysWhere) {
   const uid_t self = geteuid();
-  const struct {
-    const char* place;
-    mode_t mode;
-    uid_t owner;
-    const char* sentence;
-  } rows[] = {
+  const std::tuple<const char*, mode_t, uid_t, const char*> rows[] = {
       {"outer/inner/service", 0775, self, "/inner/service may be written"},
       {"outer/inner/service", 0757, self, "/inner/service may be written"},
       {"outer/inner", 0777, self, "/inner may be written by others"},
@@ -80,17 +75,16 @@ TEST_F(ServiceLocation, RefusesWhatOthersCanReplaceAndSaysWhere) {
       {"outer", 0755, stranger, "outer belongs to user 12345"},
       {"outer", 01777, stranger, "outer belongs to user 12345"},
   };
-  for (const auto& row : rows) {
-    if (row.owner != self && self != 0) continue;
-    const fs::path place = root_ / row.place;
-    ASSERT_EQ(chown(place.c_str(), row.owner, static_cast<gid_t>(-1)), 0);
-    ASSERT_EQ(chmod(place.c_str(), row.mode), 0);
-    for (const char* path : {"outer/inner/service", "link/inner/service"}) {
-      EXPECT_NE(outcome(path).find(row.sentence), String::npos)
-          << row.place << row.mode << outcome(path);
+  for (const auto& [place, mode, owner, sentence] : rows) {
+    if (owner != self && self != 0) continue;
+    const fs::path path = root_ / place;
+    ASSERT_EQ(chown(path.c_str(), owner, static_cast<gid_t>(-1)), 0);
+    ASSERT_EQ(chmod(path.c_str(), mode), 0);
+    for (const char* way : {"outer/inner/service", "link/inner/service"}) {
+      EXPECT_NE(outcome(way).find(sentence), String::npos) << place << mode << outcome(way);
     }
-    ASSERT_EQ(chown(place.c_str(), self, static_cast<gid_t>(-1)), 0);
-    ASSERT_EQ(chmod(place.c_str(), 0755), 0);
+    ASSERT_EQ(chown(path.c_str(), self, static_cast<gid_t>(-1)), 0);
+    ASSERT_EQ(chmod(path.c_str(), 0755), 0);
   }
 }
 

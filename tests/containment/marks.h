@@ -62,19 +62,12 @@ inline void heap() {
   _exit(0);
 }
 
-[[gnu::noinline]] inline void stackFrom(std::size_t depth) {
+template <std::size_t Depth>
+[[gnu::noinline]] void stack() {
   volatile char* const here = static_cast<char*>(__builtin_frame_address(0));
-  for (std::size_t at = page; at < depth; at += 64 * page)
+  for (std::size_t at = page; at < Depth; at += 64 * page)
     here[-static_cast<std::ptrdiff_t>(at)] = pattern;
   _exit(0);
-}
-
-inline void stack() {
-  stackFrom(Sandbox::stackLimit / 2);
-}
-/// To where the kernel lets it grow at the most.
-inline void grownStack() {
-  stackFrom(Sandbox::stackLimit - 64 * page);
 }
 
 /// Written by the kernel, on the process's behalf.
@@ -135,10 +128,6 @@ inline void oldCode() {
   asm volatile("pushq $0x23\n\t pushq $0x1000\n\t lretq" ::: "memory");
 }
 
-inline void fault() {
-  asm volatile("movb $1, 0" ::: "memory");
-}
-
 /// More than the client reads, and it may come late.
 inline void unsent() {
   static const std::array<char, 4 * page> bytes{"a second answer"};
@@ -153,31 +142,26 @@ inline void muchMemory() {
   _exit(0);
 }
 
-constexpr unsigned long directionAndAlignment = 0x40400;
-constexpr unsigned long nestedTask = 0x4000;
-constexpr unsigned long singleStep = 0x100;
-constexpr unsigned long identification = 0x20'0000;
-
 /// Each is left in a sealed worker, in the middle of its message.
 constexpr Mark marks[] = {
     {"nothing", nothing, false},
-    {"static data", staticData, false},
+    {"static_data", staticData, false},
     {"heap", heap, false},
-    {"stack", stack, false},
-    {"memory by read", readIntoMemory, false},
-    {"restartable sequence", restartableSequence, false},
-    {"general registers", generalRegisters, false},
-    {"vector registers", vectorRegisters, false},
-    {"segments and bases", segments, false},
-    {"flags DF and AC", flags<directionAndAlignment>, false},
-    {"flag NT", flags<nestedTask>, false},
-    {"flag ID", flags<identification>, true},
-    {"flag TF", flags<singleStep>, true},
-    {"32-bit code", oldCode, true},
-    {"a fault", fault, true},
-    {"unread and unsent bytes", unsent, false},
-    {"grown stack", grownStack, true},
-    {"much memory", muchMemory, true},
+    {"stack", stack<Sandbox::stackLimit / 2>, false},
+    {"memory_by_read", readIntoMemory, false},
+    {"restartable_sequence", restartableSequence, false},
+    {"general_registers", generalRegisters, false},
+    {"vector_registers", vectorRegisters, false},
+    {"segments_and_bases", segments, false},
+    {"flags_DF_and_AC", flags<0x40400>, false},
+    {"flag_NT", flags<0x4000>, false},
+    {"flag_ID", flags<0x20'0000>, true},
+    {"flag_TF", flags<0x100>, true},
+    {"32_bit_code", oldCode, true},
+    {"unread_and_unsent_bytes", unsent, false},
+    // To where the kernel lets it grow at the most.
+    {"grown_stack", stack<Sandbox::stackLimit - 64 * page>, true},
+    {"much_memory", muchMemory, true},
 };
 
 #undef END

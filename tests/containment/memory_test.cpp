@@ -22,8 +22,6 @@ constexpr std::size_t piece = 65536;
 /// One worker after the other that may have many messages.
 class Reused : public Worker {
  protected:
-  static RawOptions many() { return {.messages = 1000, .cpuSeconds = 100, .before = {}}; }
-
   RawReply obeyNext(std::string_view order) {
     if (channel_ < 0) channel_ = reusing_.fork(9, 64 << 20);
     sendMessage(channel_, order, sequence_);
@@ -36,7 +34,7 @@ class Reused : public Worker {
   }
 
  private:
-  RawClient reusing_{OBEDIENT_SERVICE, many()};
+  RawClient reusing_{OBEDIENT_SERVICE, {.messages = 1000, .cpuSeconds = 100, .before = {}}};
   int channel_ = -1;
   std::uint32_t sequence_ = 0;
 };

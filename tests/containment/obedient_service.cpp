@@ -8,8 +8,7 @@
 ///                      messageId
 ///     int80 N A        the same by x86-64's old 32-bit gate
 ///     vsyscall N       slot N of the vsyscall page
-///     eat BYTES PIECE  takes and touches that much memory in pieces of so many bytes, 64 KiB
-///                      without PIECE, and keeps it until it has answered
+///     eat BYTES PIECE  takes and touches that much memory in pieces of so many bytes
 ///     address WHAT     where the program (0), its stack (1), a small block (2), a large one (3)
 ///                      lie
 ///     count            how many of these this process has been given
@@ -22,12 +21,11 @@
 #include "tests/containment/machine.h"
 
 #include <unistd.h>
-#include <algorithm>
 #include <cstdlib>
 #include <cstring>
+#include <forward_list>
 #include <memory>
 #include <sstream>
-#include <vector>
 
 namespace {
 
@@ -37,27 +35,12 @@ using namespace Keelgate::Test;
 /// What the link check looks for, whatever is inlined or stripped.
 [[gnu::used]] constexpr char marker[] = "an unpacker that obeys";
 
-long call(const std::vector<long>& numbers) {
-  RawCall whole{};
-  std::copy(numbers.begin(), numbers.end(), whole.begin());
-  return callKernel(whole);
-}
-
 void eat(std::size_t bytes, std::size_t piece) {
-  struct Piece {
-    std::unique_ptr<std::byte[]> memory;
-    std::unique_ptr<Piece> next;
-  };
-  std::unique_ptr<Piece> first;
+  std::forward_list<std::unique_ptr<std::byte[]>> pieces;
   for (std::size_t eaten = 0; eaten < bytes; eaten += piece) {
-    auto another = std::make_unique<Piece>();
-    another->memory = std::make_unique_for_overwrite<std::byte[]>(piece);
-    std::memset(another->memory.get(), 1, piece);
-    another->next = std::move(first);
-    first = std::move(another);
+    pieces.push_front(std::make_unique_for_overwrite<std::byte[]>(piece));
+    std::memset(pieces.front().get(), 1, piece);
   }
-  // One by one: a list that frees itself would need a stack as deep as it is long.
-  while (first) first = std::move(first->next);
 }
 
 long addressOf(long what) {
@@ -104,21 +87,20 @@ long obey(const std::string& order) {
   std::istringstream words(order);
   std::string verb;
   words >> verb;
-  std::vector<long> numbers;
-  for (long number; numbers.size() < 7 && words >> number;) numbers.push_back(number);
+  RawCall numbers{};
+  for (long& number : numbers) words >> number;
   if (verb == "log") {
-    const std::string line(static_cast<std::size_t>(numbers.at(1)), 'x');
-    for (long rest = numbers.at(0); rest > 0; --rest) Log::keelgate.error("%@", line);
+    const std::string line(static_cast<std::size_t>(numbers[1]), 'x');
+    for (long rest = numbers[0]; rest > 0; --rest) Log::keelgate.error("%@", line);
   }
   if (verb == "count") return ++messagesSeen;
-  if (verb == "call") return call(numbers);
-  if (verb == "int80") return callByGate(numbers.at(0), numbers.at(1));
-  if (verb == "vsyscall") return callVsyscall(numbers.at(0));
+  if (verb == "call") return callKernel(numbers);
+  if (verb == "int80") return callByGate(numbers[0], numbers[1]);
+  if (verb == "vsyscall") return callVsyscall(numbers[0]);
   if (verb == "eat") {
-    numbers.resize(2, 65'536);
     eat(static_cast<std::size_t>(numbers[0]), static_cast<std::size_t>(numbers[1]));
   }
-  if (verb == "address") return addressOf(numbers.at(0));
+  if (verb == "address") return addressOf(numbers[0]);
   misbehave(verb);
   return 0;
 }

@@ -20,18 +20,13 @@ std::string readAll(const std::string& path) {
   return text.str();
 }
 
-/// A file of a process has each of these texts.
-void expectIn(pid_t process, const char* file, const std::vector<std::string>& texts) {
-  const std::string text = readAll("/proc/" + std::to_string(process) + "/" + file);
-  for (const std::string& line : texts) {
-    EXPECT_NE(text.find(line), std::string::npos) << line << " is not in\n" << text;
-  }
-}
-
-/// Waits until a file of a process has a text; without end, which the test's time limit notices.
-void waitFor(pid_t process, const std::string& file, const std::string& text) {
-  while (readAll("/proc/" + std::to_string(process) + "/" + file).find(text) == std::string::npos) {
-    usleep(1000);
+/// A file of a process comes to have each of these texts.
+void expectIn(pid_t process, const std::string& file, const std::vector<std::string>& texts) {
+  const std::string path = "/proc/" + std::to_string(process) + "/" + file;
+  for (const std::string& text : texts) {
+    EXPECT_TRUE(Testing::comesTrue([&] { return readAll(path).find(text) != std::string::npos; }))
+        << text << " is not in\n"
+        << readAll(path);
   }
 }
 
@@ -39,9 +34,6 @@ void waitFor(pid_t process, const std::string& file, const std::string& text) {
 int numberIn(pid_t process, const std::string& name) {
   std::string status = readAll("/proc/" + std::to_string(process) + "/status");
   return std::stoi(status.erase(0, status.find(name + ":\t") + name.size() + 2));
-}
-std::string filtersLine(int count) {
-  return "Seccomp_filters:\t" + std::to_string(count) + '\n';
 }
 
 /// What is the same for the zygote and for a worker.
@@ -69,41 +61,49 @@ void expectSealed(pid_t process) {
   EXPECT_EQ(status.st_uid, 0U);
 }
 
+/// The filters come last; before them it gives way to others.
+void expectSealedWorker(pid_t worker, int filters, const std::string& cpuLimits) {
+  expectIn(worker, "status", {"Seccomp_filters:\t" + std::to_string(filters) + '\n'});
+  expectSealed(worker);
+  std::set<std::string> others = descriptorsOf(worker);
+  others.erase("3");
+  EXPECT_TRUE(others.empty());
+  expectIn(worker, "oom_score_adj", {"1000\n"});
+  EXPECT_EQ(getpriority(PRIO_PROCESS, static_cast<id_t>(worker)), 19);
+  expectIn(worker, "limits",
+           {"Max core file size        0                    0 ",
+            "Max file size             0                    0 ",
+            "Max processes             0                    0 ",
+            "Max open files            4                    4 ",
+            "Max locked memory         0                    0 ",
+            "Max msgqueue size         0                    0 ",
+            "Max stack size            8388608              8388608 ",
+            "Max cpu time              " + cpuLimits});
+}
+
 TEST_F(Worker, C3SeenFromOutside) {
   if (geteuid() != 0) GTEST_SKIP() << "only root may look into an undumpable process";
   for (const NamedLayer& row : namedLayers) {
     // A chroot never gives the user namespace, nor with it the right to the others.
     if ((service_.layers() & row.layer) == 0) GTEST_SKIP() << "this machine gives no " << row.name;
   }
-  if (readAll("/proc/" + std::to_string(service_.zygote()) + "/syscall").empty()) {
+  const pid_t zygote = service_.zygote();
+  if (readAll("/proc/" + std::to_string(zygote) + "/syscall").empty()) {
     GTEST_SKIP() << "this root may not look into an undumpable process";
   }
+  expectSealed(zygote);
+  EXPECT_EQ(getpriority(PRIO_PROCESS, static_cast<id_t>(zygote)), getpriority(PRIO_PROCESS, 0));
   // Containers and service managers have filters of their own.
-  const int ofZygote = numberIn(service_.zygote(), "Seccomp_filters");
+  const int ofZygote = numberIn(zygote, "Seccomp_filters");
   EXPECT_GT(ofZygote, numberIn(getpid(), "Seccomp_filters"));
-  const std::string filters = filtersLine(ofZygote + 1);
   const int waiting = service_.fork(1);
   const int spinning = service_.fork(2);
   sendMessage(spinning, "spin");
   const std::vector<pid_t> workers = service_.workers(2);
   ASSERT_EQ(workers.size(), 2u);
-  // The one waits for a header, in read, for descriptor 3: it is sealed by then.
-  waitFor(workers[0], "syscall", std::to_string(SYS_read) + " 0x3 ");
-  waitFor(workers[1], "status", filters);
-  expectSealed(service_.zygote());
   for (const pid_t worker : workers) {
-    expectSealed(worker);
-    expectIn(worker, "status", {filters});
-    EXPECT_EQ(descriptorsOf(worker), std::set<std::string>{"3"});
-    expectIn(worker, "limits",
-             {"Max core file size        0                    0 ",
-              "Max file size             0                    0 ",
-              "Max processes             0                    0 ",
-              "Max open files            4                    4 ",
-              "Max locked memory         0                    0 ",
-              "Max msgqueue size         0                    0 ",
-              "Max stack size            8388608              8388608 ",
-              "Max cpu time              5                    6 "});
+    expectSealedWorker(worker, ofZygote + 1, "5                    6 ");
+    EXPECT_EQ(descriptorsOf(worker).size(), 1u);
   }
   close(waiting);
   EXPECT_EQ(service_.end(1).exitStatus(), 0);
@@ -116,38 +116,14 @@ TEST_F(Worker, C3OfThoseThatAreSetBack) {
   if (geteuid() != 0) GTEST_SKIP() << "only root may look into an undumpable process";
   for (int i = 0; i < 50; ++i) EXPECT_EQ(service_.obey("answer").first.result(), 0);
   const int channel = service_.fork(1);
-  const std::string filters = filtersLine(numberIn(service_.zygote(), "Seccomp_filters") + 2);
+  const int ofZygote = numberIn(service_.zygote(), "Seccomp_filters");
   std::size_t seen = 0;
   for (const pid_t worker : service_.workers(1)) {
     if (numberIn(worker, "TracerPid") == 0) continue;
     ++seen;
-    expectSealed(worker);
-    expectIn(worker, "status", {filters});
-    expectIn(worker, "limits",
-             {"Max processes             0                    0 ",
-              "Max open files            4                    4 ",
-              "Max cpu time              12                   13 "});
-    std::set<std::string> others = descriptorsOf(worker);
-    others.erase("3");
-    EXPECT_TRUE(others.empty());
+    expectSealedWorker(worker, ofZygote + 2, "12                   13 ");
   }
   if (seen == 0) GTEST_SKIP() << "this machine does not give what it takes to set one back";
-  close(channel);
-}
-
-TEST_F(Worker, GivesWayToOthers) {
-  const int channel = service_.fork(1);
-  sendMessage(channel, "spin");
-  const auto niceOf = [](pid_t process) {
-    return getpriority(PRIO_PROCESS, static_cast<id_t>(process));
-  };
-  const pid_t worker = service_.workers(1).at(0);
-  // It does so before it is sealed, which is soon.
-  EXPECT_TRUE(Testing::comesTrue([&] { return niceOf(worker) == 19; }));
-  EXPECT_EQ(niceOf(service_.zygote()), niceOf(getpid()));
-  EXPECT_EQ(readAll("/proc/" + std::to_string(worker) + "/oom_score_adj"), "1000\n");
-  service_.kill(1);
-  service_.end(1);
   close(channel);
 }
 
@@ -234,13 +210,11 @@ TEST(Stack, TheDeepestMessageFits) {
 }
 
 TEST_F(Worker, C5ProcessorTimeIsLimitedWithoutTheClient) {
-  RawOptions options;
-  options.cpuSeconds = 1;
   // Whatever whoever starts it has done with the signal.
-  options.before = [] {
+  const auto ignore = [] {
     signal(SIGXCPU, SIG_IGN);
   };
-  RawClient service(OBEDIENT_SERVICE, options);
+  RawClient service(OBEDIENT_SERVICE, {.messages = 1, .cpuSeconds = 1, .before = ignore});
   EXPECT_EQ(service.obey("spin").second.signal(), SIGXCPU);
 }
 
@@ -296,25 +270,22 @@ TEST_F(Worker, WrongHeadersEndIt) {
 
 TEST(Zygote, RefusesEveryFrameThatIsNotExactlyRight) {
   using Protocol::ControlKind;
-  const std::vector<std::function<void(RawClient&)>> wrongs{
-      [](RawClient& service) { service.sendFrame(ControlKind::hello, 0, {}); },
-      [](RawClient& service) { service.sendFrame(ControlKind::exit, 0, {}); },
-      [](RawClient& service) { service.sendFrame(ControlKind{99}, 0, {}); },
-      [](RawClient& service) { service.sendFrame(ControlKind::fork, 0, {}); },
-      [](RawClient& service) {
-        close(service.fork(3)), close(service.fork(3));
-      }};
-  for (std::size_t i = 0; i < wrongs.size(); ++i) {
+  for (const auto& [kind, slot] : {std::pair(ControlKind::hello, 0U),
+                                   {ControlKind::exit, 0U},
+                                   {ControlKind{99}, 0U},
+                                   {ControlKind::fork, 0U},
+                                   {ControlKind::fork, 3U}}) {
     RawClient service(OBEDIENT_SERVICE);
-    // The worker of another slot holds the last case's slot taken.
+    // It holds the slot of the last case, whose frame is right otherwise.
     const int held = service.fork(3);
     service.kill(12345);
-    wrongs[i](service);
+    service.sendFrame(kind, slot, {shortMessage}, slot == 3 ? held : -1);
     Protocol::ControlFrame frame = service.receiveFrame();
     while (frame.kind == ControlKind::exit) frame = service.receiveFrame();
-    EXPECT_EQ(frame.kind, ControlKind::refused) << i;
-    EXPECT_EQ(frame.numbers[0], static_cast<std::uint64_t>(StartStep::readFrame)) << i;
-    EXPECT_EQ(service.stop(), Protocol::refusedExitStatus) << i;
+    EXPECT_EQ(frame.kind, ControlKind::refused) << static_cast<int>(kind) << slot;
+    EXPECT_EQ(frame.numbers[0], static_cast<std::uint64_t>(StartStep::readFrame))
+        << static_cast<int>(kind) << slot;
+    EXPECT_EQ(service.stop(), Protocol::refusedExitStatus) << static_cast<int>(kind) << slot;
     close(held);
   }
 }

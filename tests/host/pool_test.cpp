@@ -29,21 +29,22 @@ String startOf(const Client::Options& options) {
 }
 
 TEST(Start, AFailureSaysWhatIsWrong) {
-  Client::Options missing = fakeOptions();
-  missing.servicePath = "/nowhere/service";
-  Client::Options noProgram = fakeOptions();
-  noProgram.servicePath = "/etc/passwd";
-  Client::Options noSocket = fakeOptions();
-  noSocket.socket = "/nowhere/socket";
-  Client::Options longSocket = fakeOptions();
-  longSocket.socket = String(sizeof sockaddr_un::sun_path, 's');
+  const auto with = [](String Client::Options::*member, const String& path) {
+    Client::Options options = fakeOptions();
+    options.*member = path;
+    return options;
+  };
+  constexpr auto program = &Client::Options::servicePath;
+  constexpr auto socket = &Client::Options::socket;
+  const String longPath(sizeof sockaddr_un::sun_path, 's');
   Client::Options layers = fakeOptions("bare");
   layers.requireLayers = true;
   const std::pair<Client::Options, const char*> rows[] = {
-      {missing, "/nowhere/service could not be started: No such file"},
-      {noProgram, "/etc/passwd could not be started: Permission denied"},
-      {noSocket, "No service answers on the socket /nowhere/socket: No such file"},
-      {longSocket, "The socket's path is longer than the system allows: sss"},
+      {with(program, "/nowhere/service"), "/nowhere/service could not be started: No such file"},
+      {with(program, "/etc/passwd"), "/etc/passwd could not be started: Permission denied"},
+      {with(socket, "/nowhere/socket"),
+       "No service answers on the socket /nowhere/socket: No such file"},
+      {with(socket, longPath), "The socket's path is longer than the system allows: sss"},
       {layers, "Running without: user namespace, mount namespace"},
 #ifndef KEELGATE_UNSEALED
       {fakeOptions("unsealed"), "built without its seal"},
@@ -315,14 +316,11 @@ TEST(Application, TrustsTheListenersThatItNames) {
             0);
 }
 
-TEST(Application, IsToldWhereTheServiceManagerSaysWhy) {
+TEST(Application, MayUseAnActivatedServiceAndIsToldWhereItSaysWhyNot) {
   const String outcome = startOf(Activator(geteuid(), "fake_service.dies").options);
   for (const char* hint : {"journalctl -u", "MaxConnections"}) {
     EXPECT_NE(outcome.find(hint), String::npos) << outcome;
   }
-}
-
-TEST(Application, MayUseAnActivatedService) {
   const Activator activator;
   Client client(activator.options);
   for (int i = 0; i < 2; ++i) {

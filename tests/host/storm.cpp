@@ -12,6 +12,7 @@
 
 #include <sys/prctl.h>
 
+#include <array>
 #include <iostream>
 #include <map>
 #include <mutex>
@@ -20,27 +21,21 @@
 namespace Keelgate::Host {
 namespace {
 
-struct Holdings {
-  std::ptrdiff_t descriptors = openDescriptors();
-  std::ptrdiff_t children = std::ssize(Host::children());
-  std::ptrdiff_t threads = [] {
-    // One that was joined may be listed for a moment more.
-    comesTrue([] { return entriesOf("/proc/self/task") == 1; });
-    return entriesOf("/proc/self/task");
-  }();
-  // statm counts roughly where there are many processors.
-  std::size_t residentKiB = [] {
-    std::ifstream rollup("/proc/self/smaps_rollup");
-    std::size_t resident = 0;
-    for (String word; rollup >> word && word != "Rss:";) continue;
-    rollup >> resident;
-    return resident;
-  }();
-};
+/// Descriptors, children, threads and KiB of memory.
+using Holdings = std::array<std::ptrdiff_t, 4>;
 
-std::ostream& operator<<(std::ostream& out, const Holdings& held) {
-  return out << held.descriptors << " descriptors, " << held.children << " children, "
-             << held.threads << " threads, " << held.residentKiB << " KiB\n";
+Holdings holdings() {
+  // One that was joined may be listed for a moment more.
+  comesTrue([] { return entriesOf("/proc/self/task") == 1; });
+  Holdings held{openDescriptors(), std::ssize(children()), entriesOf("/proc/self/task")};
+  // statm counts roughly where there are many processors.
+  std::ifstream rollup("/proc/self/smaps_rollup");
+  for (String word; rollup >> word && word != "Rss:";) continue;
+  rollup >> held[3];
+  std::cout << "held:";
+  for (const std::ptrdiff_t count : held) std::cout << ' ' << count;
+  std::cout << '\n';
+  return held;
 }
 
 class Storm {
@@ -142,29 +137,27 @@ bool runStorm(Client::Isolation isolation, const String& service, Int messages, 
     Client client(options);
     warmUp(client);
   }
-  const Holdings before;
+  const Holdings before = holdings();
   bool sound = false;
   {
     Client client(options);
     warmUp(client);
-    const Holdings early;
+    const Holdings early = holdings();
     sound = Storm(client, threads, order).send(messages);
-    const Holdings late;
-    std::cout << "after the first: " << early << "after the last: " << late;
+    const Holdings late = holdings();
     // Workers come and go: two that are kept ready for each thread, and a service that ends.
-    const auto more = late.descriptors - early.descriptors + late.children - early.children;
+    const auto more = late[0] - early[0] + late[1] - early[1];
     sound = sound && more <= 2 * std::ptrdiff_t{threads} + 3;
   }
-  const Holdings after;
-  std::cout << "before: " << before << "after: " << after;
+  const Holdings after = holdings();
 #ifdef KEELGATE_UNSEALED
   // A sanitizer remembers what was freed.
-  constexpr std::size_t slack = 65'536;
+  constexpr std::ptrdiff_t slack = 65'536;
 #else
-  constexpr std::size_t slack = 1024;
+  constexpr std::ptrdiff_t slack = 1024;
 #endif
-  return sound && after.descriptors == before.descriptors && after.children == before.children &&
-         after.threads == before.threads && after.residentKiB <= before.residentKiB + slack;
+  return sound && std::equal(after.begin(), after.begin() + 3, before.begin()) &&
+         after[3] <= before[3] + slack;
 }
 
 }  // namespace
