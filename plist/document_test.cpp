@@ -11,8 +11,12 @@
 namespace PropertyList {
 namespace {
 
-std::string textOf(const std::string& element, const std::string& content) {
-  const Tree tree = read(xml("<" + element + ">" + content + "</" + element + ">"));
+std::string element(const std::string& name, const std::string& content) {
+  return xml("<" + name + ">" + content + "</" + name + ">");
+}
+
+std::string textOf(const std::string& name, const std::string& content) {
+  const Tree tree = read(element(name, content));
   if (const auto* data = std::get_if<Data>(&tree.value)) {
     return {reinterpret_cast<const char*>(data->data()), data->size()};
   }
@@ -42,7 +46,7 @@ TEST(Document, XmlTextMeansWhatXmlSaysAtEveryPlace) {
       }
       EXPECT_EQ(textOf("string", content), meaning);
       for (const std::string bad : {"\x1F", "\x80", "]]>", "&"}) {
-        EXPECT_NE(problemIn(xml("<string>" + left + bad + right + "</string>")), std::nullopt);
+        EXPECT_NE(problemIn(element("string", left + bad + right)), std::nullopt);
       }
     }
   }
@@ -53,8 +57,7 @@ TEST(Document, Base64) {
     EXPECT_EQ(textOf("data", content), "ABC") << content;
   }
   for (const char* content : {"Q", "<![CDATA[QQ]]>"}) {
-    EXPECT_EQ(problemIn(xml("<data>" + std::string(content) + "</data>")), Problem::badBase64)
-        << content;
+    EXPECT_EQ(problemIn(element("data", content)), Problem::badBase64) << content;
   }
 }
 
@@ -103,20 +106,6 @@ TEST(Document, AskingForAnotherTypeIsRefused) {
   EXPECT_THROW(top.elements(), std::logic_error);
 }
 
-TEST(Writers, WidthsOfReferencesAndOffsets) {
-  for (const std::size_t count : {254u, 255u, 256u, 257u, 65'534u, 65'535u, 65'536u, 65'537u}) {
-    Array elements;
-    for (std::size_t i = 0; i < count; ++i) elements.emplace_back(i);
-    const auto message = writeBinary(elements);
-    const Document document(message);
-    std::uint64_t expected = 0;
-    for (const Value value : document.top().elements()) {
-      ASSERT_EQ(value.integer(), (Integer{expected++, false}));
-    }
-    EXPECT_EQ(expected, count);
-  }
-}
-
 TEST(Writers, RefuseWhatTheFormatHasNot) {
   for (const Tree& tree :
        {Tree(nullptr), Tree(Uid{1}), Tree(Set{}), Tree(Date{0.5}), Tree(Date{-63'113'904'001}),
@@ -130,31 +119,16 @@ TEST(Writers, RefuseWhatTheFormatHasNot) {
 constexpr std::int64_t lowest = std::numeric_limits<std::int64_t>::min();
 constexpr std::uint64_t highest = std::numeric_limits<std::uint64_t>::max();
 
-std::string integer(std::string_view text) {
-  return xml("<integer>" + std::string(text) + "</integer>");
-}
-std::string real(std::string_view text) {
-  return xml("<real>" + std::string(text) + "</real>");
-}
-std::string date(std::string_view text) {
-  return xml("<date>" + std::string(text) + "</date>");
-}
-
-Tree readBack(const Tree& tree) {
-  const std::string text = writeXml(tree);
-  Tree back = treeOf(writeBinary(tree));
-  EXPECT_EQ(back, read(text));
-  return back;
-}
-
 TEST(Numbers, EveryPowerOfTwoPlusMinusOne) {
   for (unsigned shift = 0; shift < 64; ++shift) {
     for (const std::uint64_t offset : {highest, std::uint64_t{0}, std::uint64_t{1}}) {
       const std::uint64_t number = (std::uint64_t{1} << shift) + offset;
       const auto asSigned = static_cast<std::int64_t>(number);
-      EXPECT_EQ(readBack(asSigned), Tree(asSigned));
-      EXPECT_EQ(readBack(number), number >> 63 != 0 ? Tree(number) : Tree(asSigned));
-      EXPECT_EQ(readBack(-static_cast<double>(number)), Tree(-static_cast<double>(number)));
+      for (const Tree& tree : {Tree(asSigned), asSigned < 0 ? Tree(number) : Tree(-1 - asSigned),
+                               Tree(-static_cast<double>(number))}) {
+        EXPECT_EQ(treeOf(writeBinary(tree)), tree);
+        EXPECT_EQ(read(writeXml(tree)), tree);
+      }
     }
   }
 }
@@ -180,9 +154,9 @@ TEST(Numbers, BinaryIntegers) {
 TEST(Numbers, XmlIntegers) {
   for (const char* text : {"12", "+12", "\n 0012\t", "0xc", "0xC", "0x000000000000000C",
                            "00000000000000000000000000000000000012", "1<!-- -->2", "&#49;2"}) {
-    EXPECT_EQ(read(integer(text)), Tree(12)) << text;
+    EXPECT_EQ(read(element("integer", text)), Tree(12)) << text;
   }
-  const std::string zero = integer("-0");
+  const std::string zero = element("integer", "-0");
   EXPECT_EQ(Document(bytesOf(zero)).top().integer(), (Integer{0, false}));
   const std::pair<const char*, Tree> sound[] = {{"-0", 0},
                                                 {"-007", -7},
@@ -191,26 +165,26 @@ TEST(Numbers, XmlIntegers) {
                                                 {"0xFFFFFFFFFFFFFFFF", highest},
                                                 {"18446744073709551615", highest},
                                                 {"-9223372036854775808", lowest}};
-  for (const auto& [text, number] : sound) EXPECT_EQ(read(integer(text)), number) << text;
+  for (const auto& [text, number] : sound) EXPECT_EQ(read(element("integer", text)), number);
   for (const char* text :
        {"", " ", "+", "-", "1 2", "1.0", "1e3", "0x", "0x1G", "0X1F", "-0x1", "+0x1", "0x-1", "x1",
         "+-1", "18446744073709551616", "-9223372036854775809", "0x00000000000000001", "\xD9\xA1"}) {
-    EXPECT_EQ(problemIn(integer(text)), Problem::badInteger) << text;
+    EXPECT_EQ(problemIn(element("integer", text)), Problem::badInteger) << text;
   }
 }
 
 TEST(Numbers, Reals) {
   for (const char* text : {"1", "-1.5", "+.5", "5.", " 1e3\n", "1E-2", "2.5e+1", "inf", "-Infinity",
                            "+INF", "5e-324", "1.7976931348623157e308", "0e999999999999", "0.1"}) {
-    EXPECT_EQ(read(real(text)), Tree(std::strtod(text, nullptr))) << text;
+    EXPECT_EQ(read(element("real", text)), Tree(std::strtod(text, nullptr))) << text;
   }
   for (const char* text : {"nan", "NaN", "-NAN"}) {
-    EXPECT_TRUE(std::isnan(std::get<double>(read(real(text)).value))) << text;
+    EXPECT_TRUE(std::isnan(std::get<double>(read(element("real", text)).value))) << text;
   }
-  EXPECT_TRUE(std::signbit(std::get<double>(read(real("-0.0")).value)));
+  EXPECT_TRUE(std::signbit(std::get<double>(read(element("real", "-0.0")).value)));
   for (const char* text : {"", ".", "+", "e5", "1e", "1e+", "0x1p3", "1,5", "1.2.3", "nan(1)",
                            "infi", "1 e5", "--1", "1e309", "-1e99999", "1e-400", "1f"}) {
-    EXPECT_EQ(problemIn(real(text)), Problem::badReal) << text;
+    EXPECT_EQ(problemIn(element("real", text)), Problem::badReal) << text;
   }
   EXPECT_EQ(read(binary({bytes("\x22\xBF\x00\x00\x00")})), Tree(-0.5));
   EXPECT_EQ(read(binary({"\x23\x7F\xF0" + std::string(6, '\0')})),
@@ -220,8 +194,8 @@ TEST(Numbers, Reals) {
 }
 
 TEST(Numbers, Dates) {
-  EXPECT_EQ(read(date(" 2000-12-31T23:59:59Z\n")), Tree(Date{-1}));
-  EXPECT_EQ(problemIn(date("2001-02-29T00:00:00Z")), Problem::badDate);
+  EXPECT_EQ(read(element("date", " 2000-12-31T23:59:59Z\n")), Tree(Date{-1}));
+  EXPECT_EQ(problemIn(element("date", "2001-02-29T00:00:00Z")), Problem::badDate);
 }
 
 }  // namespace

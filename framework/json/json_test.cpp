@@ -13,9 +13,11 @@
 namespace Keelgate::JSON {
 namespace {
 
-String joined(const Pieces& pieces) {
+String textIn(Writer&& out) {
   String all;
-  for (const String& piece : pieces) all += piece;
+  for (const String& piece : std::move(out).take()) all += piece;
+  EXPECT_EQ(all.back(), '\n');
+  all.pop_back();
   return all;
 }
 
@@ -23,9 +25,7 @@ template <class T>
 String compact(const T& value) {
   Writer out(Layout::compact);
   write(out, value);
-  const String line = joined(std::move(out).take());
-  EXPECT_EQ(line.back(), '\n');
-  return line.substr(0, line.size() - 1);
+  return textIn(std::move(out));
 }
 
 Data dataOf(std::string_view text) {
@@ -95,8 +95,7 @@ TEST(JSON, PropertyListsAreTreesAndTypedOnesLoseNothing) {
   const auto typed = [](const Value& value) {
     Writer out(Layout::compact);
     writeTyped(out, value);
-    const String line = joined(std::move(out).take());
-    return line.substr(0, line.size() - 1);
+    return textIn(std::move(out));
   };
   const UInt64 largest = std::numeric_limits<UInt64>::max();
   const std::tuple<Value, const char*, const char*> table[] = {

@@ -3,7 +3,6 @@
    usage: keelgate_test SERVICE */
 #include <keelgate.h>
 
-#include <pthread.h>
 #include <stdio.h>
 #include <stdlib.h>
 #include <string.h>
@@ -75,15 +74,6 @@ static void calls(keelgate_client *client) {
         "nowhere to put the reply");
 }
 
-static void *thread(void *client) {
-  for (int i = 0; i < 100; ++i) {
-    char *reply = NULL;
-    if (keelgate_unpack(client, "PropertyList", text, strlen(text), &reply) != 0) return client;
-    keelgate_free(reply);
-  }
-  return NULL;
-}
-
 static void openings(const char *service) {
   keelgate_options options;
   /* An older header ends earlier: what lies beyond is not touched, and has its default. */
@@ -131,13 +121,6 @@ int main(int count, char **words) {
   check(client != NULL && sentence == NULL, "a client");
   if (client == NULL) return 1;
   calls(client);
-  pthread_t threads[4];
-  for (int i = 0; i < 4; ++i) pthread_create(&threads[i], NULL, thread, client);
-  for (int i = 0; i < 4; ++i) {
-    void *result = client;
-    pthread_join(threads[i], &result);
-    check(result == NULL, "four threads, one client");
-  }
   keelgate_close(client);
   openings(words[1]);
   check(strcmp(keelgate_version(), "") != 0, "a version");

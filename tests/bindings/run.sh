@@ -12,7 +12,7 @@ cmake --install "$build" --prefix "$prefix" >"$work/install.log"
 libraries=$(dirname "$(find "$prefix" -name libkeelgate.so)")
 service=$prefix/libexec/keelgate/VespKeelgateService
 
-cc -std=c11 -Wall -Wextra -Wpedantic -Wconversion -Werror -pthread \
+cc -std=c11 -Wall -Wextra -Wpedantic -Wconversion -Werror \
   -I"$prefix/include" "$root/tests/bindings/keelgate_test.c" -L"$libraries" -lkeelgate \
   -o "$work/keelgate_test"
 LD_LIBRARY_PATH=$libraries "$work/keelgate_test" "$service"

