@@ -50,26 +50,33 @@ namespace {
 using Unpacking = VespKeelgateService::VespClientMessageUnpackingError;
 using Limit = ReadLimitReached::Limit;
 
-/// Reads the error and writes it again, with the fields that were thrown.
-Data errorAgain(Bytes body) {
+template <class Visit>
+auto visitError(Bytes body, Visit visit) {
   try {
     throwError(body);
   } catch (const DecodingError& error) {
-    return encodeError(error);
+    return visit(error);
   } catch (const Breach& error) {
-    return encodeError(error);
+    return visit(error);
   } catch (const Unpacking& error) {
-    return encodeError(error);
+    return visit(error);
   }
 }
 
-/// It is made of all fields, and shows one that a coding loses both ways.
-String sentenceOf(Bytes body) {
-  try {
-    throwError(body);
-  } catch (const std::exception& error) {
-    return error.what();
+/// Reads the error and writes it again, with the fields that were thrown.
+Data errorAgain(Bytes body) {
+  return visitError(body, [](const auto& error) { return encodeError(error); });
+}
+
+/// With all fields: one that a coding loses both ways does not show in its bytes.
+template <class E>
+String textOf(const E& error) {
+  String text = error.what();
+  if constexpr (std::same_as<E, Breach>) text += error.keyPath.value_or(" everywhere");
+  if constexpr (std::same_as<E, DecodingError>) {
+    text += String(nameOf(error.kind)) + error.key.value_or("");
   }
+  return text;
 }
 
 template <Record R>
@@ -97,7 +104,7 @@ std::vector<Sample> samples() {
     }
   });
   const auto add = [&](const auto& error) {
-    all.push_back({error.what(), encodeError(error), errorAgain});
+    all.push_back({textOf(error), encodeError(error), errorAgain});
   };
   add(DecodingError(Kind::keyNotFound, "k", {String("a"), std::size_t{7}}, "missing"));
   add(DecodingError(Kind::typeMismatch, {}, Array<CodingKey>(512), ""));
@@ -112,7 +119,10 @@ std::vector<Sample> samples() {
 TEST(Reply, EveryBodyIsReadBackAndNoOtherLengthIs) {
   for (const Sample& sample : samples()) {
     EXPECT_EQ(sample.readAgain(sample.body), sample.body) << sample.name;
-    EXPECT_TRUE(sample.readAgain != errorAgain || sentenceOf(sample.body) == sample.name);
+    if (sample.readAgain == errorAgain) {
+      EXPECT_EQ(visitError(sample.body, [](const auto& error) { return textOf(error); }),
+                sample.name);
+    }
     for (std::size_t length = 0; length < sample.body.size(); ++length) {
       EXPECT_THROW(sample.readAgain(Bytes(sample.body).first(length)), MalformedReply)
           << sample.name << ' ' << length;
