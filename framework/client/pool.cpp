@@ -20,7 +20,7 @@ namespace {
 constexpr std::size_t slotsPerPlace = 6;
 
 /// Where no worker is to be had just now, and nobody may tell when one is.
-constexpr milliseconds secondLook{10};
+constexpr milliseconds secondLook{4};
 
 /// A quarter of the places, one at least, is kept free for small messages; a single one is for all.
 constexpr std::size_t largePlaces(std::size_t places) {

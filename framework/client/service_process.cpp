@@ -31,7 +31,7 @@ namespace {
 constexpr milliseconds startPatience{10'000};
 
 /// An honest worker is gone so long after its last answer; the slots are looked at as often.
-constexpr milliseconds leavePatience{10};
+constexpr milliseconds leavePatience{4};
 
 /// Ending of its own will, or by our hand, shows nothing of the address layout. Anything else may
 /// be somebody's miss, and the next try must not meet the same layout.
@@ -187,12 +187,9 @@ Optional<ServiceProcess::Forked> ServiceProcess::fork(std::uint64_t longestMessa
   const auto free = std::find_if(slots_.begin(), slots_.end(),
                                  [](const Slot& slot) { return slot.state == SlotState::free; });
   if (state_ == State::lost) return std::nullopt;
-  if (free == slots_.end()) {
-    // Workers that have answered and stay: an honest one ends at once.
-    killOverdue(SlotState::leaving);
-    killOverdue(SlotState::overdue);
-    return std::nullopt;
-  }
+  // Those that have answered are on their way, and the processor is theirs while the caller waits:
+  // one that is killed now cannot be set back.
+  if (free == slots_.end()) return std::nullopt;
   const auto slot = static_cast<std::uint32_t>(free - slots_.begin());
   const ControlFrame frame = makeControlFrame(ControlKind::fork, slot, {longestMessage});
   switch (Protocol::sendControl(handles_.control.get(), frame, theirs.get(), Waiting::no)) {
