@@ -52,8 +52,8 @@ WaymarkMessage convertMessage(WaymarkSchema&& schema, Array<WaymarkGroupFields>&
 }  // namespace
 
 VespClientMessageResult WaymarkMessageUnpacker::unpack(Bytes from, const Context& with) const {
-  return checkingCommand(with, [&] {
-    auto schema = PropertyListDecoder().decode<WaymarkSchema>(from);
+  return dispatch(Commands(), with, [&]<class Row>(Row) {
+    auto schema = PropertyListDecoder().decode<typename Row::Schema>(from);
     auto groups = foldGroups(schema);
     return VespClientMessageResult{.result = convertMessage(std::move(schema), std::move(groups))};
   });
