@@ -67,7 +67,8 @@ State::State(pid_t process) {
     std::sscanf(line.c_str(), "%lx-%lx %4s", &begin, &end, rights);
     for (; rights[1] == 'w' && begin < end; begin += page) {
       std::uint64_t entry = 0;
-      pread(table.get(), &entry, sizeof entry, static_cast<off_t>(begin / page * sizeof entry));
+      const auto place = static_cast<off_t>(begin / page * sizeof entry);
+      EXPECT_EQ(pread(table.get(), &entry, sizeof entry, place), sizeof entry);
       // There, or swapped out.
       if (entry >> 62 == 0) continue;
       pages[begin].resize(page);
