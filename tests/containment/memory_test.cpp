@@ -34,7 +34,7 @@ class Reused : public Worker {
   }
 
  private:
-  RawClient reusing_{OBEDIENT_SERVICE, {.messages = 1000, .cpuSeconds = 100, .before = {}}};
+  RawClient reusing_{OBEDIENT_SERVICE, {.messages = 1000}};
   int channel_ = -1;
   std::uint32_t sequence_ = 0;
 };

@@ -75,7 +75,8 @@ inline RawReply receiveReply(int channel, std::uint32_t sequence = 0) {
 
 struct RawOptions {
   std::uint64_t messages = 1;
-  std::uint64_t cpuSeconds = 5;
+  /// Enough for a machine that is emulated.
+  std::uint64_t cpuSeconds = 100;
   /// Runs in the service's process before it is executed, to take something from it.
   std::function<void()> before = {};
 };
