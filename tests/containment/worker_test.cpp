@@ -102,7 +102,7 @@ TEST_F(Worker, C3SeenFromOutside) {
   const std::vector<pid_t> workers = service_.workers(2);
   ASSERT_EQ(workers.size(), 2u);
   for (const pid_t worker : workers) {
-    expectSealedWorker(worker, ofZygote + 1, "5                    6 ");
+    expectSealedWorker(worker, ofZygote + 1, "100                  101 ");
     EXPECT_EQ(descriptorsOf(worker).size(), 1u);
   }
   close(waiting);
@@ -121,7 +121,7 @@ TEST_F(Worker, C3OfThoseThatAreSetBack) {
   for (const pid_t worker : service_.workers(1)) {
     if (numberIn(worker, "TracerPid") == 0) continue;
     ++seen;
-    expectSealedWorker(worker, ofZygote + 2, "12                   13 ");
+    expectSealedWorker(worker, ofZygote + 2, "202                  203 ");
   }
   if (seen == 0) GTEST_SKIP() << "this machine does not give what it takes to set one back";
   close(channel);
