@@ -121,11 +121,11 @@ void addHostOptions(::CLI::App& app, Arguments& line) {
   const Client::Options defaults;
   constexpr UInt64 most = std::numeric_limits<std::uint32_t>::max();
   addNumber(app, "--processes", line.host.processes, 1, Client::Options::mostProcesses,
-            "Messages at once (default: as processors)");
+            "How many messages at a time (default: one per processor)");
   addNumber(app, "--messages-per-process", line.host.messagesPerProcess, 1, most,
-            fmt::format("How many one process may see (default {})", defaults.messagesPerProcess));
+            fmt::format("How many each process may see (default {})", defaults.messagesPerProcess));
   addSeconds(app, "--time-limit", line.host.timeLimit,
-             fmt::format("What a message may take, e.g. 0.5 (default {})",
+             fmt::format("How long a message may take, e.g. 0.5 (default {})",
                          std::chrono::duration<double>(defaults.timeLimit).count()));
   // 4G itself is a byte too many, and what somebody types who wants the most: the client cuts it.
   addNumber(app, "--max-message", line.host.largestMessage, 1, UInt64{4} << 30,
@@ -133,10 +133,10 @@ void addHostOptions(::CLI::App& app, Arguments& line) {
                         defaults.largestMessage >> 20),
             true);
   app.add_flag("--require-layers", line.host.requireLayers,
-               "Refuse to run without namespaces, Landlock");
+               "Refuse to run without namespaces or Landlock");
   addChoice(app, "--isolation", {"rewind", "fork"}, line.host.isolation, Client::Isolation::rewind,
-            "How a process is fresh: rewind (default), fork");
-  app.add_flag("--quiet", line.quiet, "Say nothing but errors");
+            "How messages get fresh processes: rewind (default) or fork");
+  app.add_flag("--quiet", line.quiet, "Print only errors and rejections");
   addChoice(app, "--log-level", {"none", "error", "warning"}, line.logLevel, LogLevel::none,
             "What is logged: none, error or warning (default)");
   addServiceOptions(app, line.host);
@@ -161,10 +161,10 @@ void addSubjectOptions(::CLI::App& app, Arguments& arguments) {
   service->needs(command)->check([](const std::string& id) {
     return Text::isUtf8(id) ? std::string() : "the identifier is not UTF-8";
   });
-  app.add_option("FILE", arguments.unpack.files, "A message each; -, or none: standard input")
+  app.add_option("FILE", arguments.unpack.files, "One message each; -, or none, is standard input")
       ->type_name("");
   app.add_option("--files0-from", arguments.filesFrom,
-                 "Read the FILE names from FILE, a null character behind each")
+                 "Read the FILE names from FILE, a null character after each")
       ->type_name("FILE")
       ->excludes("FILE");
 }
@@ -172,11 +172,11 @@ void addSubjectOptions(::CLI::App& app, Arguments& arguments) {
 void addUnpack(::CLI::App& app, Arguments& arguments) {
   auto& unpack = *app.add_subcommand("unpack", "Unpack messages, one from each file");
   addSubjectOptions(unpack, arguments);
-  auto* pretty = unpack.add_flag("--pretty", arguments.pretty, "Indent, as on a terminal");
-  unpack.add_flag("--compact", arguments.compact, "One line for each, as in a pipe")
+  auto* pretty = unpack.add_flag("--pretty", arguments.pretty, "Indent, the default on a terminal");
+  unpack.add_flag("--compact", arguments.compact, "One line for each, the default elsewhere")
       ->excludes(pretty);
   unpack.add_flag("--typed", arguments.unpack.typed,
-                  "With each value of a PropertyList its type, so that nothing is lost");
+                  "Print the type of each value of a PropertyList, too");
   addHostOptions(unpack, arguments);
   unpack.footer(fmt::format(
       "TYPE is one of\n  {}\n"
@@ -186,7 +186,7 @@ void addUnpack(::CLI::App& app, Arguments& arguments) {
       "  keelgate unpack --service com.tessen.private.braid.viso.video --command 232 <message\n"
       "\n"
       "Exit status: 0 all gave a record, 1 some were rejected, 2 wrong usage or an\n"
-      "unreadable file, 3 no service. The largest that applies counts.",
+      "unreadable file, 3 no service. The highest that applies is used.",
       fmt::join(JSON::recordNames(), "\n  ")));
 }
 
@@ -200,13 +200,13 @@ void addCheck(::CLI::App& app, Arguments& arguments) {
       "Example:\n"
       "  find . -name '*.plist' -print0 | keelgate check --files0-from -\n"
       "\n"
-      "Exit status: as of unpack.");
+      "Exit status: as for unpack.");
 }
 
 void addStream(::CLI::App& app, Arguments& arguments) {
   auto& stream = *app.add_subcommand("stream", "Answer requests, one JSON object on each line");
   addHostOptions(stream, arguments);
-  stream.add_option("--metrics", arguments.metrics, "Keep counters there, for Prometheus")
+  stream.add_option("--metrics", arguments.metrics, "Keep counters in FILE, for Prometheus")
       ->type_name("FILE");
   stream.footer(
       "A request:\n"
@@ -239,7 +239,7 @@ void build(::CLI::App& app, Arguments& arguments) {
   // None is right with --version alone, which is for checkUsage to see.
   app.require_subcommand(0, 1);
   app.add_flag("--version", arguments.version, "Show the version");
-  app.add_flag("--verbose", arguments.verbose, "The service's version and sandbox layers too")
+  app.add_flag("--verbose", arguments.verbose, "Also the service's version and sandbox layers")
       ->needs("--version");
   addServiceOptions(app, arguments.host);
   addUnpack(app, arguments);

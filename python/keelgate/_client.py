@@ -35,15 +35,15 @@ class Client:
     """A running service. All methods may be called from many threads at once; each call holds one
     of the service's processes, and waits for one while all are taken.
 
-    processes: messages that can be in work at once; 0 stands for one for each processor.
-    messages_per_process: with 1, every message has a fresh, sealed process to itself.
+    processes: how many messages are processed at a time; 0 stands for the number of processors.
+    messages_per_process: with 1, every message gets a sealed process that has seen no other.
     max_message: bytes; a larger message is refused before anything is sent.
     time_limit: seconds from the call until the record.
     require_layers: refuse to run where namespaces or Landlock are missing.
     service_path: the VespKeelgateService to start; None for the installed one.
-    socket: the path of an activated service's socket, used in place of a started one.
+    socket: the path of an activated service's socket, used instead of starting one.
 
-    Raises HostError (startFailed) where no service can be started.
+    Raises HostError (startFailed) if no service can be started.
     """
 
     def __init__(self, *, processes: Optional[int] = None,
