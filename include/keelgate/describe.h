@@ -14,10 +14,10 @@
 ///
 ///     FieldsOf<Point>::each([&](auto field) { print(field.name, point.*field.member); });
 ///
-/// It stays an aggregate with the members x and height. Beside them it gets a nested struct
-/// KeelgateFields, in which the same list is the types of the members, their positions, and a
-/// switch from a position to its Field. That is all that is generated; FieldList, below, is what is
-/// used.
+/// It stays an aggregate with the members x and height. It also gets a nested struct
+/// KeelgateFields, with the types of the members, their positions, a switch from a position to its
+/// Field, and a function that visits every value. Nothing else is generated; FieldList, below, is
+/// the interface to it.
 ///
 /// A visitor is instantiated for each type of value and not for each field, because fields are
 /// passed as values; with structs of 156 fields that is the difference between seconds and minutes
@@ -38,12 +38,12 @@
 #include <string_view>
 #include <utility>
 
-/// The list of a schema: (Type, name), or (Type, name, "key") where the wire key is another.
+/// The list of a schema: (Type, name), or (Type, name, "key") where the wire key differs.
 #define KEELGATE_SCHEMA(Self_, ...)       \
   KEELGATE_DESCRIBED_(Self_, __VA_ARGS__) \
   using CodingKeys = ::Keelgate::FieldList<Self_>
 
-/// The list of a record: (Type, name).
+/// The list of a record: (Type, name). A record has no keys.
 #define KEELGATE_RECORD(Self_, ...)       \
   KEELGATE_DESCRIBED_(Self_, __VA_ARGS__) \
   using Labels = ::Keelgate::FieldList<Self_>
@@ -111,8 +111,8 @@ std::false_type takesMore(...);
 
 }  // namespace Detail
 
-/// The list of S. S holds no more than an alias of it: asked while S is incomplete, it would have
-/// no answer.
+/// The list of S, which walkers use. S itself has only an alias of it, because the list cannot be
+/// used before S is complete.
 template <class S>
 class FieldList {
   using Fields = typename S::KeelgateFields;
@@ -132,16 +132,16 @@ class FieldList {
     for (std::size_t position = 0; position < size; ++position) Fields::at(position, visitor);
   }
 
-  /// Calls `visitor(value)` for the value of every field in declaration order. Code for each of
-  /// them in a row, with no loop: for what takes an instruction or two.
+  /// Calls `visitor(value)` for the value of every field in declaration order. Expands to code for
+  /// each of them, without a loop: for visitors of an instruction or two.
   template <class Visitor>
   [[gnu::always_inline]] static constexpr void eachValue(const S& of, Visitor&& visitor) {
     Fields::values(of, visitor);
   }
 
-  /// False when S has a member beside its list. The compiler is asked whether S can be made from as
-  /// many values as there are fields, and cannot be made from one more. A walker that missed a
-  /// member would drop it without a word.
+  /// False if S has a member that is not in its list, which every walker would silently drop. The
+  /// compiler is asked whether S can be made from as many values as there are fields, and whether
+  /// it cannot be made from one more.
   static constexpr bool isComplete() {
     using All = typename Fields::Types*;
     return decltype(Detail::takes<S>(All(), 0))::value &&
@@ -160,8 +160,8 @@ class FieldList {
     return key;
   }
 
-  /// The names, and the keys, in declaration order. As arrays, for tables and comparisons that are
-  /// made at compile time.
+  /// The names and the keys in declaration order: arrays, for tables and comparisons at compile
+  /// time.
   static constexpr std::array<std::string_view, size> names = [] {
     std::array<std::string_view, size> all{};
     std::size_t n = 0;
@@ -188,7 +188,7 @@ concept Record = requires {
   typename T::Labels;
 };
 
-/// Either kind of struct. None is both.
+/// Either kind of struct. No struct is both.
 template <class T>
 concept Described = Schema<T> || Record<T>;
 
