@@ -13,7 +13,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   Reply reply{.kind = Protocol::ReplyKind::record, .body = {}, .log = {}};
   if (record >= OutputRecords::size) reply.kind = Protocol::ReplyKind::error;
   const Bytes body = std::as_bytes(std::span(data, size)).subspan(1);
-  reply.body.assign(body.begin(), body.end());
+  reply.body.bytes.assign(body.begin(), body.end());
   try {
     Fuzz::read({.record = record, .service = {}, .command = 0, .message = nullptr}, reply);
   } catch (const Transport::MalformedReply&) {

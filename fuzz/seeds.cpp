@@ -76,14 +76,15 @@ void addRequest(Folder& folder, const Target& target, Bytes message) {
 
 void addReply(Folder& folder, const Target& target, const Reply& reply) {
   const bool isRecord = reply.kind == Protocol::ReplyKind::record;
-  folder.add("reply_fuzz", behind(isRecord ? target.record : OutputRecords::size, reply.body));
+  folder.add("reply_fuzz",
+             behind(isRecord ? target.record : OutputRecords::size, reply.body.bytes));
   if (reply.body.size() > 4096) return;
   // Of the frames' harness: a reply, in pieces of 41 bytes.
   Data frames{std::byte{0}, std::byte{40}};
   for (const String& line : reply.log) {
     Protocol::appendReplyFrame(frames, 7, Protocol::ReplyKind::log, std::as_bytes(std::span(line)));
   }
-  Protocol::appendReplyFrame(frames, 7, reply.kind, reply.body);
+  Protocol::appendReplyFrame(frames, 7, reply.kind, reply.body.bytes);
   folder.add("frames_fuzz", frames);
 }
 

@@ -3,12 +3,14 @@
 
 #include "framework/contracts/memory_budget.h"
 
+#include <sys/mman.h>
 #include <sys/socket.h>
 #include <sys/uio.h>
 
 #include <algorithm>
 #include <array>
 #include <cerrno>
+#include <cstdlib>
 #include <cstring>
 #include <new>
 
@@ -30,6 +32,10 @@ constexpr std::uint64_t replyFactor = 128;
 
 /// Most replies fit; room grows twofold from here with the bytes that have arrived.
 constexpr std::size_t firstBuffer = std::size_t{64} << 10;
+
+/// The size of one, on most machines. A large block is in such pages where the kernel has them:
+/// most of the time that a long reply takes would go into page faults.
+constexpr std::size_t hugePage = std::size_t{2} << 20;
 
 /// How often one step may go to the kernel: other messages and the deadline have their turn.
 constexpr int callsPerStep = 16;
@@ -67,13 +73,30 @@ class Pieces {
   std::size_t count_ = 0;
 };
 
+/// A mapping of so many bytes in place of a block, of which `used` are kept; null without one. It
+/// is moved and not copied from the second time on.
+void* remap(const std::unique_ptr<std::byte[], FreeBlock>& block, std::size_t used,
+            std::size_t size) noexcept {
+  const std::size_t mapped = block.get_deleter().mapped;
+  void* const moved =
+      mapped != 0 ? mremap(block.get(), mapped, size, MREMAP_MAYMOVE)
+                  : mmap(nullptr, size, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
+  if (moved == MAP_FAILED) return nullptr;
+  madvise(moved, size, MADV_HUGEPAGE);
+  if (mapped == 0) {
+    std::copy_n(block.get(), used, static_cast<std::byte*>(moved));
+    std::free(block.get());
+  }
+  return moved;
+}
+
 std::size_t sizeOf(const Protocol::RequestHeader& header) noexcept {
   return sizeof header + header.serviceLength + header.bodyLength;
 }
 
 std::uint64_t largestReply(const ClientRequest& request) {
-  // 64 bits hold it for the largest message that there is. A worker has the body twice at the end,
-  // by itself and framed.
+  // 64 bits hold it for the largest message that there is. A worker has what it answers with twice
+  // at the end, as a record and as bytes, but for what is long.
   return std::min<std::uint64_t>(
       replyBase + request.service.size() + replyFactor * request.message.size(),
       memoryBudget(request.message.size()) / 2);
@@ -95,13 +118,25 @@ std::span<std::byte> ReceiveBuffer::room(std::size_t wanted) {
   end_ = used;
   if (used == size_) {
     const std::size_t size = std::max(firstBuffer, std::min(2 * size_, std::max(wanted, used) + 1));
-    auto* const grown = static_cast<std::byte*>(std::realloc(block_.get(), size));
-    if (grown == nullptr) throw std::bad_alloc();
-    static_cast<void>(block_.release());
-    block_.reset(grown);
-    size_ = size;
+    grow(size);
   }
   return {block_.get() + end_, size_ - end_};
+}
+
+void FreeBlock::operator()(std::byte* block) const noexcept {
+  if (mapped == 0) return std::free(block);
+  munmap(block, mapped);
+}
+
+void ReceiveBuffer::grow(std::size_t size) {
+  const bool isLarge = size >= hugePage;
+  if (isLarge) size = (size + hugePage - 1) / hugePage * hugePage;
+  auto* const grown = static_cast<std::byte*>(isLarge ? remap(block_, end_, size)
+                                                      : std::realloc(block_.get(), size));
+  if (grown == nullptr) throw std::bad_alloc();
+  static_cast<void>(block_.release());
+  block_ = {grown, FreeBlock{isLarge ? size : 0}};
+  size_ = size;
 }
 
 void ReceiveBuffer::drop(std::size_t count) noexcept {

@@ -11,7 +11,6 @@
 #include <keelgate/values.h>
 
 #include <cstddef>
-#include <cstdlib>
 #include <deque>
 #include <memory>
 #include <string_view>
@@ -32,21 +31,27 @@ struct ClientRequest {
 enum class WorkerSign { quiet, gone, talking };
 WorkerSign signOf(int channel) noexcept;
 
+/// Gives a block back: to the kernel where so many bytes were mapped, else to the C library.
+struct FreeBlock {
+  std::size_t mapped = 0;
+  void operator()(std::byte* block) const noexcept;
+};
+
 /// What has arrived and was not dropped. It grows without being filled or, if it is large, copied.
 class ReceiveBuffer {
  public:
   [[nodiscard]] Bytes bytes() const noexcept { return {block_.get() + begin_, end_ - begin_}; }
   /// Room behind them, of at least a byte more than they need to be `wanted` bytes: so that more
-  /// than is wanted shows. At most doubled, whatever is wanted. Throws std::bad_alloc.
+  /// than is wanted shows. At most doubled, but for whole pages, whatever is wanted. Throws
+  /// std::bad_alloc.
   std::span<std::byte> room(std::size_t wanted);
   void add(std::size_t count) noexcept { end_ += count; }
   void drop(std::size_t count) noexcept;
 
  private:
-  struct Free {
-    void operator()(std::byte* block) const noexcept { std::free(block); }
-  };
-  std::unique_ptr<std::byte[], Free> block_;
+  void grow(std::size_t size);
+
+  std::unique_ptr<std::byte[], FreeBlock> block_;
   std::size_t size_ = 0;
   std::size_t begin_ = 0;
   std::size_t end_ = 0;

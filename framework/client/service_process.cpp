@@ -4,6 +4,7 @@
 #include "framework/client/service_process.h"
 
 #include "framework/contracts/layers.h"
+#include "framework/contracts/memory_budget.h"
 #include "framework/contracts/start_step.h"
 #include "framework/protocol/control_frames.h"
 
@@ -14,6 +15,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <csignal>
+#include <initializer_list>
 
 namespace Keelgate {
 
@@ -38,6 +40,13 @@ constexpr milliseconds leavePatience{4};
 bool isAbnormal(int status, bool killed) noexcept {
   if (WIFEXITED(status)) return WEXITSTATUS(status) != 0;
   return !(killed && WTERMSIG(status) == SIGKILL);
+}
+
+/// A channel for long messages holds as much as the system lets it, so that both sides are woken
+/// less often for each.
+void widen(std::initializer_list<int> ends) noexcept {
+  constexpr int most = 1 << 20;
+  for (const int end : ends) setsockopt(end, SOL_SOCKET, SO_SNDBUF, &most, sizeof most);
 }
 
 const char* silentSentence(bool activated) {
@@ -183,6 +192,7 @@ Optional<ServiceProcess::Forked> ServiceProcess::fork(std::uint64_t longestMessa
   // Registered as well: a copy in a forked child would keep the worker's channel open.
   const Descriptor theirs(registry_, ends[1]);
   if (!ours || !theirs) throw shortage("No channel for a worker could be made", errno);
+  if (longestMessage > shortMessage) widen({ours.get(), theirs.get()});
   const std::lock_guard lock(mutex_);
   const auto free = std::find_if(slots_.begin(), slots_.end(),
                                  [](const Slot& slot) { return slot.state == SlotState::free; });

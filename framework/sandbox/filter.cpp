@@ -56,6 +56,8 @@ constexpr Rule zygote[] = {
     {SYS_setpriority, Verdict::allowWith, PRIO_PROCESS},
     {SYS_mmap, Verdict::allowWith, PROT_READ | PROT_WRITE, 2},
     {SYS_mmap, Verdict::refuse, ENOMEM},
+    {SYS_prctl, Verdict::allowWith, PR_SET_THP_DISABLE},
+    {SYS_madvise, Verdict::allowWith, MADV_HUGEPAGE, 2},
     {SYS_seccomp, Verdict::allowWith, SECCOMP_SET_MODE_FILTER},
     // And what it is left with, which the zygote needs too.
     {SYS_read, Verdict::allow},

@@ -54,7 +54,8 @@ using Arguments = std::array<std::uint64_t, 6>;
 /// What a rule may name, and what is near.
 std::vector<std::uint64_t> arguments() {
   std::vector<std::uint64_t> all{PTRACE_SETOPTIONS, PTRACE_GETREGSET, PTRACE_SETREGSET,
-                                 PTRACE_SEIZE,      trackingFlags,    waitingStatus};
+                                 PTRACE_SEIZE,      trackingFlags,    waitingStatus,
+                                 PR_SET_THP_DISABLE};
   for (const std::uint64_t command :
        {scanPages, SECCOMP_IOCTL_NOTIF_RECV, UFFDIO_COPY, SECCOMP_IOCTL_NOTIF_ADDFD,
         SECCOMP_IOCTL_NOTIF_SEND, UFFDIO_API, UFFDIO_REGISTER}) {
@@ -147,7 +148,9 @@ bool isZygotes(int number, const Low& low) {
     case SYS_clone:
       return low[0] == SIGCHLD;
     case SYS_prctl:
-      return low[0] == PR_SET_PDEATHSIG;
+      return isOneOf(low[0], {PR_SET_PDEATHSIG, PR_SET_THP_DISABLE});
+    case SYS_madvise:
+      return low[2] == MADV_HUGEPAGE;
     case SYS_prlimit64:
     case SYS_setpriority:
       return low[0] == 0;

@@ -5,11 +5,14 @@
 #include "framework/contracts/start_step.h"
 
 #include <malloc.h>
+#include <sys/mman.h>
+#include <sys/prctl.h>
 #include <sys/random.h>
 #include <unistd.h>
 #include <algorithm>
 #include <cstdint>
 #include <cstdlib>
+#include <utility>
 
 namespace Keelgate::Sandbox {
 
@@ -32,6 +35,14 @@ void* allocate(std::size_t bytes) noexcept {
   return block;
 }
 
+/// Most of the time that a long message takes would go into page faults. A machine without such
+/// pages gives small ones.
+void preferHugePages(const Area& heap) noexcept {
+  constexpr std::uintptr_t page = 4096;
+  const std::uintptr_t begin = (heap.begin + page - 1) / page * page;
+  madvise(reinterpret_cast<void*>(begin), heap.end - begin, MADV_HUGEPAGE);
+}
+
 bool liesInFirstHeap(const void* block) noexcept {
   const auto address = reinterpret_cast<std::uintptr_t>(block);
   return address >= firstHeap.begin && address < firstHeap.end;
@@ -45,6 +56,8 @@ void prepareHeap() {
   mallopt(M_ARENA_MAX, 1);
   // -1 is "never": a freed area stays ours, so that a freed message leaves room for the next one.
   mallopt(M_TRIM_THRESHOLD, -1);
+  // A short message writes to little of one, and it would be put back whole.
+  prctl(PR_SET_THP_DISABLE, 1, 0, 0, 0);
   const auto end = reinterpret_cast<std::uintptr_t>(sbrk(0));
   firstHeap = {.begin = end - mallinfo2().arena, .end = end};
 
@@ -53,7 +66,8 @@ void prepareHeap() {
   if (getrandom(&random, sizeof random, 0) != sizeof random) {
     throw StartError(StartStep::reserveHeap);
   }
-  randomOffset = random % largestOffset;
+  // Not 0, which would be no block.
+  randomOffset = random % largestOffset + 1;
 #endif
   // The first one that is thrown makes a system call.
   try {
@@ -80,17 +94,23 @@ void reserveHeap(std::size_t bytes) {
   static std::size_t reserved = 0;
   if (bytes <= reserved) return;
   reserved = bytes;
-  // Two blocks in one piece of memory: the first is kept, and what the second was is the heap.
   void* whole = allocate(randomOffset + bytes);
   while (whole == nullptr && bytes > heapFor(0)) {
     bytes = std::max(bytes / 2, heapFor(0));
     whole = allocate(randomOffset + bytes);
   }
-  std::free(whole);
-  // For good, also of a heap that a longer one follows.
+  const auto begin = reinterpret_cast<std::uintptr_t>(whole);
+  // What is cut off is the heap. The rest is kept for good, also when a longer one follows.
   static void* inFront;
-  inFront = whole == nullptr ? nullptr : allocate(randomOffset);
+  inFront = whole == nullptr ? nullptr : std::realloc(whole, randomOffset);
   if (inFront == nullptr) throw StartError(StartStep::reserveHeap);
+  static Area heap{};
+  const Area before = std::exchange(heap, {.begin = begin, .end = begin + randomOffset + bytes});
+  if (before.end == 0) return;
+  // The one for a long message, who has that of a short one as well.
+  prctl(PR_SET_THP_DISABLE, 0, 0, 0, 0);
+  preferHugePages(before);
+  preferHugePages(heap);
 }
 
 }  // namespace Keelgate::Sandbox

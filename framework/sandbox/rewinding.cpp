@@ -147,8 +147,6 @@ bool prepareRewinding() {
   int ends[2];
   if (!isPossible || !settle(openProcesses(), processesDescriptor)) return false;
   if (socketpair(AF_UNIX, SOCK_SEQPACKET, 0, ends) != 0) return false;
-  // Huge pages would be put back whole.
-  prctl(PR_SET_THP_DISABLE, 1, 0, 0, 0);
   return settle(ends[0], handoverReceiver) && settle(ends[1], handoverSender);
 }
 

@@ -33,11 +33,11 @@ Reply KeelgateServer::answer(const Request& request) const {
     reply.body = handlers_[request.record](request);
     reply.kind = ReplyKind::record;
   } catch (const DecodingError& error) {
-    reply.body = Transport::encodeError(error);
+    reply.body.bytes = Transport::encodeError(error);
   } catch (const Breach& error) {
-    reply.body = Transport::encodeError(error);
+    reply.body.bytes = Transport::encodeError(error);
   } catch (const VespClientMessageUnpackingError& error) {
-    reply.body = Transport::encodeError(error);
+    reply.body.bytes = Transport::encodeError(error);
   }
   // Anything else that is thrown is a defect of the program, or an end of memory: no reply hides
   // it.

@@ -31,7 +31,7 @@ struct Request {
 /// logged on the way.
 struct Reply {
   Protocol::ReplyKind kind;
-  Data body;
+  Transport::Body body;
   Array<String> log;
 };
 
@@ -46,14 +46,14 @@ class KeelgateServer {
   requires std::same_as<typename U::SchemaType, R>
   void registerUnpacker(U unpacker) {
     add(recordNumber<R>, [unpacker = std::move(unpacker)](const Request& request) {
-      return Transport::encodeRecord(unpacker.unpack(request.message));
+      return Transport::lendRecord(unpacker.unpack(request.message));
     });
   }
   template <OutputRecord R, ContextualUnpacker U>
   requires std::same_as<typename U::SchemaType, R>
   void registerUnpacker(U unpacker) {
     add(recordNumber<R>, [unpacker = std::move(unpacker)](const Request& request) {
-      return Transport::encodeRecord(unpacker.unpack(
+      return Transport::lendRecord(unpacker.unpack(
           request.message,
           typename U::Context{.command = request.command, .service = String(request.service)}));
     });
@@ -68,7 +68,7 @@ class KeelgateServer {
   [[nodiscard]] Reply answer(const Request& request) const;
 
  private:
-  using Handler = std::function<Data(const Request&)>;
+  using Handler = std::function<Transport::Body(const Request&)>;
 
   void add(std::size_t record, Handler handler);
 

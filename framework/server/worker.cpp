@@ -97,10 +97,9 @@ RequestHeader receiveHeader(std::uint32_t sequence, std::uint64_t longestMessage
   return header;
 }
 
-void sendFrame(std::uint32_t sequence, ReplyKind kind, Bytes body, bool last) {
-  const auto header = Protocol::makeReplyHeader(sequence, kind, body.size(), last);
+void giveHeader(std::uint32_t sequence, ReplyKind kind, std::size_t size, bool last) {
+  const auto header = Protocol::makeReplyHeader(sequence, kind, size, last);
   channel.give(std::as_bytes(std::span(&header, 1)));
-  channel.give(body);
 }
 
 void send(const Reply& reply, std::uint32_t sequence, bool last) {
@@ -109,10 +108,12 @@ void send(const Reply& reply, std::uint32_t sequence, bool last) {
   for (const String& line : reply.log) {
     if (++lines > Protocol::maximumLogFrames) break;
     const Bytes bytes = std::as_bytes(std::span(line));
-    sendFrame(sequence, ReplyKind::log,
-              bytes.first(std::min(bytes.size(), Protocol::maximumLogLength)), false);
+    const Bytes shown = bytes.first(std::min(bytes.size(), Protocol::maximumLogLength));
+    giveHeader(sequence, ReplyKind::log, shown.size(), false);
+    channel.give(shown);
   }
-  sendFrame(sequence, reply.kind, reply.body, last);
+  giveHeader(sequence, reply.kind, reply.body.size(), last);
+  reply.body.eachPart([](Bytes part) { channel.give(part); });
 }
 
 /// From the first byte of the body on, this is the part that a stranger may take over. False when

@@ -93,7 +93,7 @@ Data encodeError(const DecodingError& error) {
     if (const auto* key = std::get_if<String>(&step)) to.text(*key);
   }
   to.text(error.debugDescription);
-  return std::move(to).take();
+  return std::move(to).take().joined();
 }
 
 Data encodeError(const Breach& error) {
@@ -101,7 +101,7 @@ Data encodeError(const Breach& error) {
   to.text(error.domain);
   to.text(error.errorType);
   writeOptional(to, error.keyPath);
-  return std::move(to).take();
+  return std::move(to).take().joined();
 }
 
 Data encodeError(const VespClientMessageUnpackingError& error) {
@@ -109,7 +109,7 @@ Data encodeError(const VespClientMessageUnpackingError& error) {
   to.byte(static_cast<std::uint8_t>(error.code()));
   if (error.command) to.word(error.command->rawValue());
   if (error.service) to.text(*error.service);
-  return std::move(to).take();
+  return std::move(to).take().joined();
 }
 
 void throwError(Bytes body, const ReadLimits& limits) {

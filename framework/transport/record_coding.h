@@ -243,10 +243,20 @@ void read(Reader& from, T& value, int depth) {
 
 /// The body of a record frame. For the service. Throws std::bad_alloc.
 template <Record T>
+Body lendRecord(T record) {
+  Writer to;
+  write(to, record);
+  Body body = std::move(to).take();
+  // What is long has a block of its own, and stays there when the record is moved.
+  if (!body.loans.empty()) body.lender = std::make_shared<const T>(std::move(record));
+  return body;
+}
+/// The same in one piece.
+template <Record T>
 Data encodeRecord(const T& record) {
   Writer to;
   write(to, record);
-  return std::move(to).take();
+  return std::move(to).take().joined();
 }
 
 /// The record that a body holds. Throws MalformedReply, ReadLimitReached, std::bad_alloc, or what

@@ -133,6 +133,15 @@ TEST(Reply, EveryBodyIsReadBackAndNoOtherLengthIs) {
   }
 }
 
+TEST(Reply, WhatIsLongIsLentAndOutlivesItsRecord) {
+  VespCommandWebTunnelResponse record{};
+  record.contentType = String(100'000, 'a');
+  record.messageUUID = Data(100'000, std::byte{7});
+  Body lent = lendRecord(record);
+  EXPECT_LT(lent.bytes.size(), 1000u);
+  EXPECT_EQ(std::move(lent).joined(), encodeRecord(record));
+}
+
 /// With any one byte changed it is known to be a lie, or is the one spelling of another record or
 /// error that an honest service might send.
 TEST(Reply, NoChangedByteDoesMore) {

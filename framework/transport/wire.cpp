@@ -4,6 +4,7 @@
 #include "text/utf8.h"
 
 #include <algorithm>
+#include <numeric>
 
 namespace Keelgate::Transport {
 
@@ -16,24 +17,32 @@ constexpr std::size_t smallestBlock = 32;
 
 constexpr unsigned readsPerClock = 1024;
 
+/// What is longer costs more to copy than to be written by a call of its own.
 constexpr std::size_t copiedOctets = std::size_t{16} << 10;
 
 }  // namespace
 
+std::size_t Body::size() const noexcept {
+  return std::accumulate(
+      loans.begin(), loans.end(), bytes.size(),
+      [](std::size_t sum, const Loan& loan) { return sum + loan.octets.size(); });
+}
+
+Data Body::joined() && {
+  if (loans.empty()) return std::move(bytes);
+  Data all;
+  all.reserve(size());
+  eachPart([&](Bytes part) { all.insert(all.end(), part.begin(), part.end()); });
+  return all;
+}
+
 void Writer::octets(Bytes value) {
   word(value.size());
-  if (value.size() <= copiedOctets) {
-    if (!value.empty()) std::memcpy(room(value.size()), value.data(), value.size());
-    return;
+  if (value.size() > copiedOctets) {
+    loans_.push_back({.position = size_, .octets = value});
+  } else if (!value.empty()) {
+    std::memcpy(room(value.size()), value.data(), value.size());
   }
-  // Appended as it is: room for it would be zeroed first. With room for what follows, so that a few
-  // words behind a large body do not have it moved once more.
-  out_.resize(size_);
-  const std::size_t needed = size_ + value.size() + firstRoom;
-  if (needed > out_.capacity()) out_.reserve(std::max(needed, 2 * out_.capacity()));
-  out_.insert(out_.end(), value.begin(), value.end());
-  size_ = out_.size();
-  out_.resize(size_ + firstRoom);
 }
 
 void Writer::grow(std::size_t size) {

@@ -16,6 +16,7 @@
 #include <cstddef>
 #include <cstring>
 #include <exception>
+#include <memory>
 #include <string_view>
 
 namespace Keelgate::Transport {
@@ -44,6 +45,34 @@ struct ReadLimits {
   std::chrono::steady_clock::time_point deadline = std::chrono::steady_clock::time_point::max();
 };
 
+/// The body of a reply, in parts: what is long is borrowed from where it lies, and never copied.
+struct Body {
+  struct Loan {
+    /// Behind so many of `bytes`.
+    std::size_t position;
+    Bytes octets;
+  };
+  Data bytes;
+  Array<Loan> loans;
+  /// Of what is on loan; null where that is its user's business.
+  std::shared_ptr<const void> lender;
+
+  [[nodiscard]] std::size_t size() const noexcept;
+  /// Calls `visitor(Bytes)` for each part.
+  template <class Visitor>
+  void eachPart(Visitor visitor) const {
+    std::size_t begin = 0;
+    for (const auto& [position, octets] : loans) {
+      visitor(Bytes(bytes).subspan(begin, position - begin));
+      visitor(octets);
+      begin = position;
+    }
+    visitor(Bytes(bytes).subspan(begin));
+  }
+  /// In one piece, with nothing on loan.
+  [[nodiscard]] Data joined() &&;
+};
+
 /// Throws std::bad_alloc. Trusts its caller: it runs in the service, and the reader checks in the
 /// client what it wrote.
 class Writer {
@@ -51,14 +80,14 @@ class Writer {
   void byte(std::uint8_t value) { *room(1) = std::byte{value}; }
   /// As it lies in memory.
   void word(std::uint64_t value) { std::memcpy(room(sizeof value), &value, sizeof value); }
-  /// Behind their length, so that no octet needs escaping.
+  /// Behind their length, so that no octet needs escaping. Long ones are borrowed.
   void octets(Bytes value);
   void text(std::string_view value) {
     octets(std::as_bytes(std::span(value.data(), value.size())));
   }
-  [[nodiscard]] Data take() && {
+  [[nodiscard]] Body take() && {
     out_.resize(size_);
-    return std::move(out_);
+    return {.bytes = std::move(out_), .loans = std::move(loans_), .lender = nullptr};
   }
 
  private:
@@ -76,6 +105,7 @@ class Writer {
   /// What lies behind `size_` is not written yet.
   Data out_ = Data(firstRoom);
   std::size_t size_ = 0;
+  Array<Body::Loan> loans_;
 };
 
 /// Every function that takes something throws MalformedReply where there is not that much, and

@@ -80,17 +80,19 @@ std::string readError(Bytes body) try {
 }  // namespace
 
 Reply replyTo(const Target& target, Bytes message) {
-  return server().answer({.record = target.record,
-                          .message = message,
-                          .command = target.command,
-                          .service = target.service});
+  Reply reply = server().answer({.record = target.record,
+                                 .message = message,
+                                 .command = target.command,
+                                 .service = target.service});
+  reply.body = {.bytes = std::move(reply.body).joined(), .loans = {}, .lender = nullptr};
+  return reply;
 }
 
 std::string read(const Target& target, const Reply& reply) {
-  if (reply.kind == Protocol::ReplyKind::error) return readError(reply.body);
+  if (reply.kind == Protocol::ReplyKind::error) return readError(reply.body.bytes);
   std::string text;
   OutputRecords::each([&]<class R>(std::type_identity<R>) {
-    if (target.record == recordNumber<R>) text = readRecord<R>(reply.body);
+    if (target.record == recordNumber<R>) text = readRecord<R>(reply.body.bytes);
   });
   return text;
 }
