@@ -46,6 +46,13 @@ std::string_view trimmed(std::string_view text) {
   return text.substr(0, text.find_last_not_of(" \t\r") + 1);
 }
 
+/// By looking for each, which skips what lies between many characters at a time.
+std::size_t newlinesIn(std::string_view text) {
+  std::size_t count = 0;
+  for (std::size_t at = 0; (at = text.find('\n', at)) != std::string_view::npos; ++at) ++count;
+  return count;
+}
+
 }  // namespace
 
 Optional<std::span<char>> Lines::next() {
@@ -125,13 +132,13 @@ Bool RequestInput::isWaiting() const {
 Optional<Lines> RequestInput::cut() {
   if (whole_) return std::exchange(whole_, std::nullopt);
   const std::string_view rest = std::string_view(text_).substr(begin_);
-  const auto waiting = static_cast<std::size_t>(std::ranges::count(rest, '\n'));
-  const std::size_t most = std::min(mostLines, (waiting + threads_ - 1) / threads_);
+  const std::size_t most = std::min(mostLines, (waiting_ + threads_ - 1) / threads_);
   std::size_t end = 0;
-  for (std::size_t lines = 0; lines < most && end < chunkSize; ++lines) {
+  for (std::size_t taken = 0; taken < most && end < chunkSize; ++taken) {
     end = rest.find('\n', end) + 1;
+    --waiting_;
   }
-  hasLines_ = waiting > most;
+  hasLines_ = waiting_ > 0;
   if (end == 0) return std::nullopt;
   Lines lines;
   if (end == text_.size()) {
@@ -152,6 +159,7 @@ void RequestInput::add(std::string_view chunk) {
   if (!abridged_) {
     try {
       text_ += chunk;
+      waiting_ += newlinesIn(chunk);
       return;
     } catch (const std::bad_alloc&) {
       abridge(HostError::Reason::resourcesExhausted);
@@ -161,6 +169,7 @@ void RequestInput::add(std::string_view chunk) {
   if (end == chunk.size()) return;
   whole_ = std::exchange(abridged_, std::nullopt)->take();
   text_ = chunk.substr(end + 1);
+  waiting_ = newlinesIn(text_);
 }
 
 void RequestInput::abridge(HostError::Reason why) {

@@ -77,6 +77,8 @@ class RequestInput {
   /// What has not been taken, from `begin_` on.
   String text_;
   std::size_t begin_ = 0;
+  /// How many newlines there are in it: so that no byte of a long line is looked at twice.
+  std::size_t waiting_ = 0;
   std::atomic<bool> hasLines_ = false;
   Bool isFirst_ = true;
   /// The line that is read now, if it is too long, and the one before `text_`.
