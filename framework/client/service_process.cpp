@@ -35,6 +35,9 @@ constexpr milliseconds startPatience{10'000};
 /// An honest worker is gone so long after its last answer; the slots are looked at as often.
 constexpr milliseconds leavePatience{4};
 
+/// After one that was not gone by then nobody is waited for who holds the last slot.
+constexpr milliseconds impatience{100};
+
 /// Ending of its own will, or by our hand, shows nothing of the address layout. Anything else may
 /// be somebody's miss, and the next try must not meet the same layout.
 bool isAbnormal(int status, bool killed) noexcept {
@@ -139,6 +142,10 @@ void ServiceProcess::noteFrame(const ControlFrame& frame) noexcept {
 
 void ServiceProcess::noteExit(Slot& slot, const Exit& exit) noexcept {
   if (!exit.neverStarted && isAbnormal(exit.status, slot.state == SlotState::killed)) retire();
+  // It had to be killed: others of its sender may hold more slots.
+  if (slot.state == SlotState::killed && WIFSIGNALED(exit.status)) {
+    impatientUntil_ = Clock::now() + impatience;
+  }
   slot = {.state = slot.state == SlotState::held ? SlotState::ended : SlotState::free,
           .exit = exit};
 }
@@ -197,9 +204,12 @@ Optional<ServiceProcess::Forked> ServiceProcess::fork(std::uint64_t longestMessa
   const auto free = std::find_if(slots_.begin(), slots_.end(),
                                  [](const Slot& slot) { return slot.state == SlotState::free; });
   if (state_ == State::lost) return std::nullopt;
-  // Those that have answered are on their way, and the processor is theirs while the caller waits:
-  // one that is killed now cannot be set back.
-  if (free == slots_.end()) return std::nullopt;
+  if (free == slots_.end()) {
+    // Those that have answered are on their way, and the processor is theirs while the caller
+    // waits: one that is killed now cannot be set back.
+    if (Clock::now() < impatientUntil_) killOverdue(SlotState::leaving);
+    return std::nullopt;
+  }
   const auto slot = static_cast<std::uint32_t>(free - slots_.begin());
   const ControlFrame frame = makeControlFrame(ControlKind::fork, slot, {longestMessage});
   switch (Protocol::sendControl(handles_.control.get(), frame, theirs.get(), Waiting::no)) {

@@ -153,6 +153,7 @@ class ServiceProcess {
   /// Its size never changes.
   std::vector<Slot> slots_;
   Deadline lastLook_{};
+  Deadline impatientUntil_{};
 
   EndStep endStep_ = EndStep::none;
   Deadline nextStepAt_{};
