@@ -63,18 +63,19 @@ class Cursor {
   static std::uint64_t wordAt(Bytes message, std::size_t offset) noexcept {
     return __builtin_bswap64(bigEndianAt(message, offset, 8));
   }
-  /// Whether none of the bytes at `offset` is above 0x7f. Requires 8 bytes of message behind them.
-  static bool isAsciiAt(Bytes message, std::size_t offset, std::size_t length) noexcept {
-    if (length < 8) {
-      // Shifted in two steps: of no bytes, by all 64 bits.
-      const std::uint64_t word = bigEndianAt(message, offset, 8);
-      return (word >> 1 >> (63 - 8 * length) & 0x8080'8080'8080'8080) == 0;
+  /// Zero where none of the bytes at `offset` is above 0x7f. Requires 32 bytes of message behind
+  /// them.
+  static std::uint64_t highBitsAt(Bytes message, std::size_t offset, std::size_t length) noexcept {
+    Block seen{};
+    for (; length > 2 * sizeof(Block); length -= sizeof(Block), offset += sizeof(Block)) {
+      seen |= blockAt(message.data() + offset);
     }
-    // The last word overlaps the one before it.
-    const std::size_t last = offset + length - 8;
-    std::uint64_t seen = bigEndianAt(message, last, 8);
-    for (; offset < last; offset += 8) seen |= bigEndianAt(message, offset, 8);
-    return (seen & 0x8080'8080'8080'8080) == 0;
+    // Most texts are shorter: they are looked at without a branch, which could not be foreseen.
+    const signed char* const marks = leadingMarks.data() + (2 * sizeof(Block) - length);
+    seen |= blockAt(message.data() + offset) & blockAt(marks);
+    seen |= blockAt(message.data() + offset + sizeof(Block)) & blockAt(marks + sizeof(Block));
+    const auto words = std::bit_cast<std::array<std::uint64_t, 2>>(seen);
+    return (words[0] | words[1]) & 0x8080'8080'8080'8080;
   }
   /// The view of `length` bytes at `offset`; both checked by the caller when the node was made.
   static std::string_view textAt(Bytes message, std::size_t offset, std::size_t length) noexcept {
@@ -134,10 +135,21 @@ class Cursor {
   /// Signed, because that is what machines compare: the bytes above 0x7f are below zero.
   using Block [[gnu::vector_size(16)]] = signed char;
 
+  static Block blockAt(const void* bytes) noexcept {
+    Block block;
+    std::memcpy(&block, bytes, sizeof block);
+    return block;
+  }
+  /// From the place 32 - n on, n bytes of ones and then zeros.
+  static constexpr auto leadingMarks = [] {
+    std::array<signed char, 64> marks{};
+    for (std::size_t i = 0; i < 32; ++i) marks[i] = -1;
+    return marks;
+  }();
+
   /// How many bytes come before the first that is not plain. Requires a block inside the window.
   std::size_t plainPrefix() const noexcept {
-    Block block;
-    std::memcpy(&block, here_, sizeof block);
+    const Block block = blockAt(here_);
     // Bytes above 0x7f are below a space too.
     const Block marks = ((block < ' ') & (block != '\n') & (block != '\t')) | (block == '<') |
                         (block == '&') | (block == ']');

@@ -58,10 +58,41 @@ EntryRange Value::entries() const {
   return {*store_, key, key + apart, count, isShared()};
 }
 
+void Value::find(const KnownKeys& keys, std::uint64_t* present, std::uint32_t* values) const {
+  const Store& store = *store_;
+  const bool areNumbers = store.known == &keys;
+  const auto note = [&, nodes = store.nodes.data()](std::uint32_t key, std::uint32_t value) {
+    const std::uint32_t number = nodes[key].key();
+    std::size_t position = number - 1;
+    if (!areNumbers) {
+      position = keys.find(store.digest(number), [&] { return store.text(nodes[key]); });
+    }
+    if (position >= keys.count) return;
+    present[position / 64] |= std::uint64_t{1} << position % 64;
+    values[position] = value;
+  };
+  const std::uint32_t count = expect(Type::dictionary).count;
+  std::size_t place = store.firstChild(number_);
+  const std::size_t size = store.referenceSize;
+  if (size == 0) {
+    for (std::uint32_t left = count; left > 0; --left, place = store.nextKey(place)) {
+      const auto key = static_cast<std::uint32_t>(place);
+      note(key, key + 1);
+    }
+    return;
+  }
+  const auto reference = [message = store.message, size](std::size_t position) {
+    return static_cast<std::uint32_t>(Cursor::bigEndianAt(message, position, size));
+  };
+  const std::size_t end = place + size * count;
+  for (; place < end; place += size) note(reference(place), reference(place + size * count));
+}
+
 /// The first bytes decide; a binary one of another version is refused there, never tried as XML.
-Document::Document(Bytes message) {
+Document::Document(Bytes message, const KnownKeys& known) {
   if (message.size() > Limits::length) throw MalformedDocument(Problem::messageTooLarge, 0);
   store_.message = message;
+  store_.known = &known;
   const std::string_view beginning = Cursor(message).rest();
   refuseOtherFormats(beginning);
   if (beginning.starts_with("bplist")) {

@@ -2,7 +2,7 @@
 /// A checked property list, binary or XML, and cheap handles to what is in it.
 ///
 ///   PropertyList::Document document(message);       // throws MalformedDocument
-///   for (auto [key, digest, value] : document.top().entries()) { ... }
+///   for (auto [key, value] : document.top().entries()) { ... }
 ///
 /// The constructor checks everything that the top object reaches, so that no accessor can meet
 /// anything malformed later. It takes time and memory in proportion to the message's length,
@@ -14,6 +14,7 @@
 #pragma once
 
 #include "plist/bytes.h"
+#include "plist/known_keys.h"
 #include "plist/malformed_document.h"
 #include "plist/store.h"
 
@@ -73,11 +74,10 @@ class Value {
   std::uint32_t number() const noexcept { return number_; }
   Value child(std::uint32_t number) const noexcept { return {*store_, number, isShared()}; }
 
-  /// Calls `visitor(key, digest, value)` for each entry of a dictionary, in order: the number of
-  /// the key, keyDigest of its text, and the number of the value. The fastest way through one that
-  /// a schema has.
-  template <class Visitor>
-  void eachEntry(Visitor&& visitor) const;
+  /// The entries of a dictionary whose keys are among these: for each, by the position of its key,
+  /// a bit in `present`, which is zero before, and the number of its value in `values`. Fastest for
+  /// the keys that the Document was told of.
+  void find(const KnownKeys& keys, std::uint64_t* present, std::uint32_t* values) const;
 
   /// Whether this object, or any container on the way to it, is referenced more than once, so that
   /// it may be reached more often than its bytes can justify. Never in XML.
@@ -111,7 +111,6 @@ class Value {
 /// What a dictionary holds under one key. Every key occurs once: that was checked.
 struct Entry {
   std::string_view key;  // valid UTF-8
-  std::uint64_t digest;  // keyDigest(key), already known
   Value value;
 };
 
@@ -129,8 +128,7 @@ class Range {
     Item operator*() const noexcept {
       const Value value(*store_, store_->child(value_), shared_);
       if constexpr (isEntry) {
-        const Node& key = store_->nodes[store_->child(key_)];
-        return {store_->text(key), store_->keys[key.key() - 1].digest, value};
+        return {store_->text(store_->nodes[store_->child(key_)]), value};
       } else {
         return value;
       }
@@ -178,39 +176,14 @@ class Range {
   Iterator first_;
 };
 
-template <class Visitor>
-void Value::eachEntry(Visitor&& visitor) const {
-  // In variables of its own: what the visitor writes cannot change them.
-  const Store& store = *store_;
-  const Node* const nodes = store.nodes.data();
-  const Key* const keys = store.keys.data();
-  const std::uint32_t count = expect(Type::dictionary).count;
-  std::size_t place = store.firstChild(number_);
-  const auto visit = [&](std::uint32_t key, std::uint32_t value) {
-    visitor(key, keys[nodes[key].key() - 1].digest, value);
-  };
-  if (store.referenceSize == 0) {
-    for (std::uint32_t left = count; left > 0; --left, place = store.nextKey(place)) {
-      const auto key = static_cast<std::uint32_t>(place);
-      visit(key, key + 1);
-    }
-    return;
-  }
-  const Bytes message = store.message;
-  const std::size_t size = store.referenceSize;
-  const auto reference = [&](std::size_t position) {
-    return static_cast<std::uint32_t>(Cursor::bigEndianAt(message, position, size));
-  };
-  const std::size_t end = place + size * count;
-  for (; place < end; place += size) visit(reference(place), reference(place + size * count));
-}
-
 class Document {
  public:
   /// Throws MalformedDocument for anything that is not a property list, and std::bad_alloc. A small
   /// message costs no allocation, a larger one a few: never one per object. The message must not
   /// change while the Document lives: what was checked is not checked again.
-  explicit Document(Bytes message);
+  ///
+  /// The keys that are known make no difference but in time, and have to outlive the Document.
+  explicit Document(Bytes message, const KnownKeys& known = noKnownKeys);
 
   /// Values point at the document, so it stays where it is.
   Document(const Document&) = delete;

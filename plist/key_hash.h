@@ -70,6 +70,20 @@ constexpr bool isWholeKey(std::uint64_t digest) noexcept {
   return digest >> 63 == 0;
 }
 
+/// Whether two keys of at least 8 bytes are the same. By words: a call takes longer than they do.
+constexpr bool isSameLongKey(std::string_view left, std::string_view right) noexcept {
+  if (left.size() != right.size()) return false;
+  // The last word overlaps the one before it.
+  const std::size_t last = left.size() - 8;
+  const auto isSameAt = [&](std::size_t at) {
+    return loadWord<8>({left.data() + at, 8}) == loadWord<8>({right.data() + at, 8});
+  };
+  for (std::size_t at = 0; at < last; at += 8) {
+    if (!isSameAt(at)) return false;
+  }
+  return isSameAt(last);
+}
+
 /// A number of so many bits, 1 to 63, in which all of the digest has a say.
 constexpr std::size_t keyHash(std::uint64_t digest, int bits) noexcept {
   return static_cast<std::size_t>(digest * keyFactor >> (64 - bits));

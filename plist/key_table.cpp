@@ -18,73 +18,73 @@ bool isBefore(std::string_view left, std::string_view right) noexcept {
 }  // namespace
 
 bool KeyTable::Less::operator()(std::uint32_t left, std::uint32_t right) const noexcept {
-  return isBefore(store->keyText(left), store->keyText(right));
+  return isBefore(table->text(left), table->text(right));
 }
 
 bool KeyTable::Less::operator()(std::uint32_t left, std::string_view right) const noexcept {
-  return isBefore(store->keyText(left), right);
+  return isBefore(table->text(left), right);
 }
 
 bool KeyTable::Less::operator()(std::string_view left, std::uint32_t right) const noexcept {
-  return isBefore(left, store->keyText(right));
+  return isBefore(left, table->text(right));
 }
 
-KeyTable::KeyTable(Store& store) : store_(store), colliding_(Less{&store}) {
-  slots_.zero(std::size_t{1} << bits_);
+KeyTable::KeyTable(Store& store) : store_(store), known_(*store.known), colliding_(Less{this}) {
+  last_.zero(known_.count);
 }
 
-std::size_t KeyTable::add(std::uint32_t dictionary, std::span<const Named> keys) {
-  // In variables of its own: what the loop writes cannot change them.
-  Node* const nodes = store_.nodes.data();
-  Slot* const slots = slots_.data();
-  const int bits = bits_;
+std::size_t KeyTable::add(std::uint32_t dictionary, std::span<const Named> keys, std::size_t left) {
   const std::uint32_t mark = dictionary + 1;
-  const std::size_t before = store_.keys.size();
-  store_.keys.resize(before + keys.size());
-  Key* const known = store_.keys.data();
-  std::uint32_t count = static_cast<std::uint32_t>(before);
   std::size_t added = 0;
   for (const Named& key : keys) {
-    Node& node = nodes[key.node];
-    std::uint32_t number = node.key();
-    if (number == 0) {
-      Slot& first = slots[keyHash(key.digest, bits)];
-      // As a rule a key is new, and nothing is where it would be.
-      if (first.number == 0) first = {count + 1, tagOf(key.digest)};
-      number = first.number == count + 1 ? first.number : find(key, count);
-      if (number > count)
-        known[count++] = {.digest = key.digest, .node = key.node, .dictionary = 0};
-      node.setKey(number);
-    }
-    if (known[number - 1].dictionary == mark) break;
-    known[number - 1].dictionary = mark;
+    const std::uint32_t its = key.number != 0 ? key.number : number(key, left);
+    std::uint32_t& last = last_[its - 1];
+    if (last == mark) break;
+    last = mark;
     ++added;
   }
-  store_.keys.resize(count);
   return added;
 }
 
-/// The number of the key with this text: of those that are there, or the next.
-std::uint32_t KeyTable::find(const Named& key, std::uint32_t count) {
+/// Of a key that had none when it was named.
+std::uint32_t KeyTable::number(const Named& key, std::size_t left) {
+  Node& node = store_.nodes[key.node];
+  // A dictionary may name one string twice.
+  if (node.key() != 0) return node.key();
+  if (2 * (store_.keys.size() + left) > slots_.size()) grow(store_.keys.size() + left);
+  const std::uint32_t next = known_.count + static_cast<std::uint32_t>(store_.keys.size()) + 1;
+  // As a rule a key is new, and nothing is where it would be.
+  store_.keys.push({.digest = key.digest, .node = key.node});
+  Slot& first = slots_[keyHash(key.digest, bits_)];
+  if (first.number == 0) first = {next, tagOf(key.digest)};
+  const std::uint32_t its = first.number == next ? next : find(key, next);
+  if (its == next) {
+    last_.push(0);
+  } else {
+    store_.keys.resize(store_.keys.size() - 1);
+  }
+  node.setKey(its);
+  return its;
+}
+
+/// The number of the key with this text: of those that are there, or the next, which is the key's
+/// own.
+std::uint32_t KeyTable::find(const Named& key, std::uint32_t next) {
+  const std::string_view itsText = store_.text(store_.nodes[key.node]);
   for (std::uint32_t step = 0; step < triedSlots; ++step) {
     Slot& tried = slot(key.digest, step);
     if (tried.number == 0) {
-      tried = {count + 1, tagOf(key.digest)};
-      return tried.number;
+      tried = {next, tagOf(key.digest)};
+      return next;
     }
-    if (tried.tag == tagOf(key.digest) && store_.keys[tried.number - 1].digest == key.digest &&
-        (isWholeKey(key.digest) ||
-         store_.keyText(tried.number) == store_.text(store_.nodes[key.node]))) {
+    if (tried.tag == tagOf(key.digest) && store_.otherKey(tried.number).digest == key.digest &&
+        (isWholeKey(key.digest) || text(tried.number) == itsText)) {
       return tried.number;
     }
   }
   // No slot was vacant, now or when it came.
-  const auto found = colliding_.find(store_.text(store_.nodes[key.node]));
-  if (found != colliding_.end()) return *found;
-  // The set asks for its text.
-  store_.keys[count].node = key.node;
-  colliding_.insert(count + 1);
-  return count + 1;
+  const auto found = colliding_.find(itsText);
+  return found != colliding_.end() ? *found : *colliding_.insert(next).first;
 }
 
 /// Makes room for so many keys. Those that are there find new slots.
@@ -93,11 +93,11 @@ void KeyTable::grow(std::size_t keys) {
   slots_.zero(size);
   bits_ = std::countr_zero(size);
   colliding_.clear();
-  for (std::uint32_t number = 1; number <= store_.keys.size(); ++number) place(number);
+  for (std::uint32_t i = 1; i <= store_.keys.size(); ++i) place(known_.count + i);
 }
 
 void KeyTable::place(std::uint32_t number) {
-  const std::uint64_t digest = store_.keys[number - 1].digest;
+  const std::uint64_t digest = store_.digest(number);
   for (std::uint32_t step = 0; step < triedSlots; ++step) {
     Slot& tried = slot(digest, step);
     if (tried.number != 0) continue;

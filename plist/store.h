@@ -11,6 +11,7 @@
 
 #include "plist/bytes.h"
 #include "plist/cursor.h"
+#include "plist/known_keys.h"
 #include "plist/small_buffer.h"
 
 #include <cstddef>
@@ -66,11 +67,10 @@ struct Node {
 };
 static_assert(sizeof(Node) == 16);
 
-/// A distinct key of the document. Numbers of keys are counted from 1.
+/// A distinct key of the document that is not known beforehand.
 struct Key {
-  std::uint64_t digest;      // keyDigest of the text
-  std::uint32_t node;        // the first with this text
-  std::uint32_t dictionary;  // while reading: the last that has it, counted from 1
+  std::uint64_t digest;  // keyDigest of the text
+  std::uint32_t node;    // the first with this text
 };
 
 /// Inline room for a small message, on the stack of whoever decodes. Two formats, one shape:
@@ -80,6 +80,9 @@ struct Store {
   SmallBuffer<Node, 512> nodes;
   std::uint32_t top = 0;        // the node of the top object
   SmallBuffer<char, 512> side;  // unescaped and converted text, decoded base64
+  /// Numbers of keys are counted from 1: first those that are known, whether the document has them
+  /// or not, then the others.
+  const KnownKeys* known = &noKnownKeys;
   SmallBuffer<Key, 256> keys;
   std::size_t referenceSize = 0;  // bytes; 0 for XML
 
@@ -90,8 +93,13 @@ struct Store {
     return Cursor::textAt(message, node.position(), node.count);
   }
 
-  std::string_view keyText(std::uint32_t number) const noexcept {
-    return text(nodes[keys[number - 1].node]);
+  /// Of a key by its number.
+  std::uint64_t digest(std::uint32_t number) const noexcept {
+    return number > known->count ? otherKey(number).digest : known->digests[number - 1];
+  }
+  /// Of one that is not known.
+  const Key& otherKey(std::uint32_t number) const noexcept {
+    return keys[number - known->count - 1];
   }
 
   /// A position among children is an offset into the message in binary, a node number in XML.

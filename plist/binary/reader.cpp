@@ -23,6 +23,28 @@ namespace {
 constexpr std::size_t trailerLength = 32;
 constexpr std::size_t trailerUnused = 6;
 
+/// What a first byte says of an object that has no length: its type, how many bytes follow, and the
+/// bits of its value that stand in none of them. Null where it says something else.
+struct Fixed {
+  Type type = Type::null;
+  std::uint8_t width = 0;
+  std::uint8_t bits = 0;
+  bool isSigned = false;
+};
+
+constexpr auto fixedObjects = [] {
+  std::array<Fixed, 256> all{};
+  all[0x08] = {.type = Type::boolean};
+  all[0x09] = {.type = Type::boolean, .bits = 1};
+  all[0x10] = {.type = Type::integer, .width = 1};
+  all[0x11] = {.type = Type::integer, .width = 2};
+  all[0x12] = {.type = Type::integer, .width = 4};
+  all[0x13] = {.type = Type::integer, .width = 8, .isSigned = true};
+  all[0x23] = {.type = Type::real, .width = 8};
+  all[0x33] = {.type = Type::date, .width = 8};
+  return all;
+}();
+
 class BinaryReader {
  public:
   explicit BinaryReader(Store& store) : store_(store), keys_(store) {}
@@ -44,7 +66,8 @@ class BinaryReader {
   void leave(const Frame& frame);
   [[gnu::always_inline]] inline KeyTable::Named readKey(const Objects& objects,
                                                         std::size_t position);
-  [[gnu::always_inline]] inline void load(const Objects& objects, std::uint32_t number);
+  KeyTable::Named readOtherKey(std::uint32_t number, std::size_t position);
+  [[gnu::always_inline]] inline bool load(const Objects& objects, std::uint32_t number);
   [[gnu::always_inline]] inline bool readShort(const Objects& objects, std::size_t offset,
                                                Node& node) noexcept;
   void open(std::uint32_t number);
@@ -70,8 +93,7 @@ class BinaryReader {
 
 void BinaryReader::read() {
   store_.top = readTrailer();
-  load(objects_, store_.top);
-  if (store_.nodes[store_.top].has(Node::open)) open(store_.top);
+  if (load(objects_, store_.top)) open(store_.top);
   while (depth_ > 0) walk(frames_[depth_ - 1]);
 }
 
@@ -123,8 +145,7 @@ void BinaryReader::walk(Frame& frame) {
       revisit(node, next);
       continue;
     }
-    load(objects, number);
-    if (!node.has(Node::open)) continue;
+    if (!load(objects, number)) continue;
     frame.next = next + objects.referenceSize;
     return open(number);
   }
@@ -136,8 +157,8 @@ void BinaryReader::walk(Frame& frame) {
 /// times.
 void BinaryReader::readKeys(Frame& frame) {
   const Objects objects = objects_;
-  keys_.reserve(objects.nodes[frame.node].count);
   std::array<KeyTable::Named, 16> named;
+  std::size_t left = objects.nodes[frame.node].count;
   const std::size_t end = frame.end;
   for (std::size_t next = frame.next; next < end;) {
     const std::size_t first = next;
@@ -145,7 +166,8 @@ void BinaryReader::readKeys(Frame& frame) {
     for (; count < named.size() && next < end; next += objects.referenceSize) {
       named[count++] = readKey(objects, next);
     }
-    const std::size_t distinct = keys_.add(frame.node, {named.data(), count});
+    const std::size_t distinct = keys_.add(frame.node, {named.data(), count}, left);
+    left -= count;
     if (distinct < count) {
       throw MalformedDocument(Problem::duplicateKey, first + distinct * objects.referenceSize);
     }
@@ -153,27 +175,34 @@ void BinaryReader::readKeys(Frame& frame) {
   frame.next = end;
 }
 
-/// The key that is named at this position.
+/// The key that is named at this position: one of up to 7 bytes that is met for the first time, as
+/// most are.
 KeyTable::Named BinaryReader::readKey(const Objects& objects, std::size_t position) {
   const std::uint32_t number = objects.reference(position);
   Node& node = objects.nodes[number];
+  if (node.has(Node::read)) return readOtherKey(number, position);
+  const std::size_t offset = objects.offset(number);
+  // With a text of up to 7 bytes, all of the object.
+  const std::uint64_t object = Cursor::wordAt(objects.message, offset);
+  const std::uint32_t length = object & 7;
+  const std::uint64_t digest = shortKeyDigest(object >> 8, length);
+  if ((object & 0xf8) != 0x50 || (digest & 0x80'8080'8080'8080) != 0 ||
+      offset + length >= objects.tableStart || length > claimable_) {
+    return readOtherKey(number, position);
+  }
+  claimable_ -= length;
+  node = {.bits = offset + 1, .count = length, .type = Type::string, .flags = Node::read};
+  return keys_.named(number, digest);
+}
+
+/// Any other. Apart, so that the first kind has the registers.
+[[gnu::noinline]] KeyTable::Named BinaryReader::readOtherKey(std::uint32_t number,
+                                                             std::size_t position) {
+  Node& node = objects_.nodes[number];
   if (node.has(Node::read)) {
     revisit(node, position);
   } else {
-    const std::size_t offset = objects.offset(number);
-    // With a text of up to 7 bytes, all of the object.
-    const std::uint64_t object = Cursor::wordAt(objects.message, offset);
-    const std::uint32_t length = object & 7;
-    if ((object & 0xf8) == 0x50 && offset + 1 + length <= objects.tableStart &&
-        length <= claimable_) {
-      const std::uint64_t digest = shortKeyDigest(object >> 8, length);
-      if ((digest & 0x80'8080'8080'8080) == 0) {
-        claimable_ -= length;
-        node = {.bits = offset + 1, .count = length, .type = Type::string, .flags = Node::read};
-        return keys_.named(number, digest);
-      }
-    }
-    load(objects, number);
+    load(objects_, number);
   }
   if (node.type != Type::string) throw MalformedDocument(Problem::keyNotString, position);
   return keys_.named(number);
@@ -201,51 +230,52 @@ void BinaryReader::leave(const Frame& frame) {
   if (depth_ > 0) frames_[depth_ - 1].highest = std::max(frames_[depth_ - 1].highest, node.height);
 }
 
-/// Reads the object of this number, for the first time.
-void BinaryReader::load(const Objects& objects, std::uint32_t number) {
+/// Reads the object of this number, for the first time. Says whether it is to be opened.
+bool BinaryReader::load(const Objects& objects, std::uint32_t number) {
   const std::size_t offset = objects.offset(number);
   Node& node = objects.nodes[number];
-  if (readShort(objects, offset, node)) return;
+  if (readShort(objects, offset, node)) return false;
   node = readObject(offset);
   node.set(Node::read);
+  return node.has(Node::open);
 }
 
-/// The commonest objects in few instructions: texts and data of a length below 256, integers, and
-/// booleans. False for any other, and for what is wrong with one of these: that is for readObject
-/// to tell.
+/// The commonest objects in few instructions, and few branches that could not be foreseen: texts
+/// and data of a length below 256, integers, reals, dates and booleans. False for any other, and
+/// for what is wrong with one of these: that is for readObject to tell.
 bool BinaryReader::readShort(const Objects& objects, std::size_t offset, Node& node) noexcept {
   const std::uint64_t head = Cursor::bigEndianAt(objects.message, offset, 8);
-  const unsigned kind = static_cast<unsigned>(head >> 60);
-  const unsigned low = static_cast<unsigned>(head >> 56) & 0xf;
-  if (kind == 0x5 || kind == 0x4) {
-    std::size_t start = offset + 1;
-    std::uint32_t length = low;
-    if (low == 0xf) {
-      // The length follows, here as an integer of one byte.
-      if ((head >> 48 & 0xff) != 0x10) return false;
-      start = offset + 3;
-      length = static_cast<std::uint32_t>(head >> 40 & 0xff);
-    }
+  const auto low = static_cast<std::uint32_t>(head >> 56) & 0xf;
+  if (head >> 61 == 2) {
+    // Where the length follows, it is an integer of one byte here.
+    const bool isLong = low == 0xf;
+    const bool isString = (head >> 60 & 1) != 0;
+    const std::size_t start = offset + 1 + 2 * std::size_t{isLong};
+    const std::uint32_t length = isLong ? static_cast<std::uint32_t>(head >> 40 & 0xff) : low;
     if (start + length > objects.tableStart || length > claimable_) return false;
-    if (kind == 0x5 && !Cursor::isAsciiAt(objects.message, start, length)) return false;
+    // Of what does not apply, nothing is kept.
+    const std::uint64_t otherCount = ((head >> 48 & 0xff) ^ 0x10) & -std::uint64_t{isLong};
+    const std::uint64_t highBits =
+        Cursor::highBitsAt(objects.message, start, length) & -std::uint64_t{isString};
+    if ((otherCount | highBits) != 0) return false;
     claimable_ -= length;
     node = {.bits = start,
             .count = length,
-            .type = kind == 0x5 ? Type::string : Type::data,
+            .type = isString ? Type::string : Type::data,
             .flags = Node::read};
     return true;
   }
-  if (kind == 0x1 && low <= 3) {
-    const std::size_t width = std::size_t{1} << low;
-    if (offset + 1 + width > objects.tableStart) return false;
-    node = {.bits = Cursor::bigEndianAt(objects.message, offset + 1, width),
-            .type = Type::integer,
-            .flags = Node::read};
-    if (low == 3 && node.bits >> 63 != 0) node.set(Node::negative);
-    return true;
-  }
-  if (kind != 0x0 || low - 8 > 1) return false;
-  node = {.bits = low - 8, .type = Type::boolean, .flags = Node::read};
+  const Fixed fixed = fixedObjects.data()[head >> 56];
+  if (fixed.type == Type::null || offset + 1 + fixed.width > objects.tableStart) return false;
+  const std::uint64_t word = Cursor::bigEndianAt(objects.message, offset + 1, 8);
+  // Shifted in two steps: of no bytes, by all 64 bits.
+  const unsigned half = 32U - 4U * fixed.width;
+  const std::uint64_t bits = word >> half >> half | fixed.bits;
+  if (fixed.type == Type::date && !std::isfinite(std::bit_cast<double>(bits))) return false;
+  const bool isNegative = fixed.isSigned & (bits >> 63 != 0);
+  node = {.bits = bits,
+          .type = fixed.type,
+          .flags = static_cast<std::uint8_t>(Node::read | (isNegative ? Node::negative : 0))};
   return true;
 }
 

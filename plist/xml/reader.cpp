@@ -170,7 +170,6 @@ void XmlReader::closeContainer() {
 
 /// Once all of the dictionary is read: dictionaries inside have keys of their own.
 void XmlReader::checkKeys(std::uint32_t dictionary, std::size_t end) {
-  keys_.reserve(store_.nodes[dictionary].count);
   std::array<KeyTable::Named, 16> named;
   std::size_t key = store_.firstChild(dictionary);
   for (std::size_t left = store_.nodes[dictionary].count; left > 0;) {
@@ -178,7 +177,7 @@ void XmlReader::checkKeys(std::uint32_t dictionary, std::size_t end) {
     for (std::size_t i = 0; i < count; ++i, key = store_.nextKey(key)) {
       named[i] = keys_.named(static_cast<std::uint32_t>(key));
     }
-    const std::size_t distinct = keys_.add(dictionary, {named.data(), count});
+    const std::size_t distinct = keys_.add(dictionary, {named.data(), count}, left);
     if (distinct < count) {
       const Node& node = store_.nodes[named[distinct].node];
       // Assembled text stands nowhere in the message.

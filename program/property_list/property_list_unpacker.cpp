@@ -114,9 +114,10 @@ class TreeBuilder {
 
 Keelgate::PropertyList PropertyListUnpacker::unpack(Bytes from) const {
   Keelgate::PropertyList record{};
-  PropertyListDecoder().read(from, [&](Decoding& decoding, const Value& top) {
-    TreeBuilder(decoding.budget).build(top, record.value);
-  });
+  PropertyListDecoder().read(from, ::PropertyList::noKnownKeys,
+                             [&](Decoding& decoding, const Value& top) {
+                               TreeBuilder(decoding.budget).build(top, record.value);
+                             });
   return Keelgate::construct(std::move(record));
 }
 

@@ -18,13 +18,10 @@
 
 namespace VespKeelgateService {
 
-/// The position of the first field that has another name in the other list, or the length: in an
-/// error the compiler prints it. Also for their order: swapped fields would be filled crosswise.
+/// Also their order: swapped fields of one type would otherwise be filled crosswise.
 template <class S, class R>
-consteval std::size_t firstOtherName() {
-  constexpr auto& names = Keelgate::FieldsOf<S>::names;
-  const auto other = std::ranges::mismatch(names, Keelgate::FieldsOf<R>::names).in1;
-  return static_cast<std::size_t>(other - names.begin());
+consteval bool namesAgree() {
+  return std::ranges::equal(Keelgate::FieldsOf<S>::names, Keelgate::FieldsOf<R>::names);
 }
 
 /// Whether a value that a schema describes as From can be decoded into a To: into the same, or into
@@ -32,8 +29,7 @@ consteval std::size_t firstOtherName() {
 template <class From, class To>
 constexpr bool fills = std::same_as<From, To>;
 template <Keelgate::Schema From, Keelgate::Record To>
-constexpr bool fills<From, To> = std::ranges::equal(Keelgate::FieldsOf<From>::names,
-                                                    Keelgate::FieldsOf<To>::names);
+constexpr bool fills<From, To> = namesAgree<From, To>();
 /// Absent stays absent: a missing dictionary becomes no record, an empty one becomes a record.
 template <class From, class To>
 constexpr bool fills<Keelgate::Optional<From>, Keelgate::Optional<To>> = fills<From, To>;
@@ -57,35 +53,44 @@ constexpr auto membersOf = [] {
   return members;
 }();
 
+/// Where the fields of an R's list are: in its own members. Specialised for who keeps some of them
+/// elsewhere.
+template <class R>
+struct Places {
+  using Listed = R;
+  template <class V>
+  static V& at(R& record, std::size_t position) {
+    return record.*membersOf<R, V>[position];
+  }
+};
+
 /// For each field of a schema the function that decodes it.
 template <class Function, std::size_t size>
 struct Decoders {
   std::array<Function, size> functions{};
-  /// The position of a member that cannot hold what its field does, or `size`. A function cannot be
-  /// compared with null at compile time where sanitizers are on.
-  std::size_t misfit = size;
+  /// Whether each member can hold what its field does. A function cannot be compared with null at
+  /// compile time where sanitizers are on.
+  bool fit = true;
 };
 
-/// Into the member of R at the position of the field of S. `Decode` gives, as `Decode::template
+/// Into the place in R at the position of the field of S. `Decode` gives, as `Decode::template
 /// into<W, V>`, the function for a field of type W and a member of type V.
 template <Keelgate::Schema S, class R, class Decode>
 constexpr auto decodersOf = [] {
   using From = Keelgate::FieldsOf<S>;
-  using To = Keelgate::FieldsOf<R>;
+  using Listed = typename Places<R>::Listed;
+  using To = Keelgate::FieldsOf<Listed>;
   static_assert(From::size == To::size,
                 "the schema and the record have different numbers of fields");
   Decoders<typename Decode::Function, From::size> decoders;
   if constexpr (From::size == To::size) {
-    static_assert(firstOtherName<S, R>() == From::size,
+    static_assert(namesAgree<S, Listed>(),
                   "a field of the record has another name than the schema's field at its position");
     std::size_t position = 0;
     From::each([&]<class W>(Keelgate::Field<S, W>) {
-      To::at(position, [&]<class V>(Keelgate::Field<R, V>) {
-        if constexpr (fills<W, V>) {
-          decoders.functions[position] = Decode::template into<W, V>;
-        } else {
-          decoders.misfit = position;
-        }
+      To::at(position, [&]<class V>(Keelgate::Field<Listed, V>) {
+        decoders.fit = decoders.fit && fills<W, V>;
+        if constexpr (fills<W, V>) decoders.functions[position] = Decode::template into<W, V>;
       });
       ++position;
     });

@@ -106,15 +106,11 @@ class FieldValues {
  public:
   using Fields = Keelgate::FieldSet<S::CodingKeys::size>;
 
+  /// Keys that no field has are passed over: a newer sender may know more of them.
   explicit FieldValues(const PropertyList::Value& dictionary) : dictionary_(dictionary) {
-    dictionary.eachEntry([&](std::uint32_t key, std::uint64_t digest, std::uint32_t value) {
-      const std::size_t field =
-          KeyTable<S>::find(digest, [&] { return dictionary_.child(key).string(); });
-      // Keys that no field has are passed over: a newer sender may know more of them.
-      if (field == KeyTable<S>::none) return;
-      present_.insert(field);
-      numbers_[field] = value;
-    });
+    typename Fields::Words words{};
+    dictionary.find(knownKeys<S>, words.data(), numbers_.data());
+    present_ = Fields(words);
   }
 
   [[nodiscard]] const Fields& present() const { return present_; }
@@ -152,7 +148,7 @@ struct FieldDecoder {
   template <class W, class V>
   static void into(Decoding& decoding, PropertyList::Value value, const CodingPath& outer,
                    std::size_t position, R& record) {
-    V& member = record.*membersOf<R, V>[position];
+    V& member = Places<R>::template at<V>(record, position);
     const std::string_view key = S::CodingKeys::keys[position];
     using Present = PresentOf<W>;
     if (Keelgate::isOptional<W> && value.type() == PropertyList::Type::null) return;
@@ -181,14 +177,13 @@ template <Keelgate::Schema S, class R>
 void decodeFields(Decoding& decoding, const PropertyList::Value& value, const CodingPath& path,
                   R& into) {
   constexpr auto& decoders = decodersOf<S, R, FieldDecoder<S, R>>;
-  static_assert(decoders.misfit == S::CodingKeys::size,
-                "a field of the record cannot hold what the schema's field does");
+  static_assert(decoders.fit, "a field of the record cannot hold what the schema's field does");
   const FieldValues<S> values(value);
   // What stands before the first field that is missing may be wrong, too.
   const std::size_t end = values.present().firstMissing(requiredFields<S>);
   values.present().eachBelow(end, [&](std::size_t position) {
     // NOLINTNEXTLINE(clang-analyzer-core.CallAndMessage): none is null, which was asserted.
-    decoders.functions[position](decoding, values.at(position), path, position, into);
+    decoders.functions.data()[position](decoding, values.at(position), path, position, into);
   });
   if (end < S::CodingKeys::size) throw Errors::keyNotFound(path, S::CodingKeys::keys[end]);
 }
@@ -271,18 +266,19 @@ class PropertyListDecoder {
   template <Keelgate::Schema S, class R = S>
   [[nodiscard]] R decode(Keelgate::Bytes from) {
     R decoded{};
-    read(from, [&](Decoding& decoding, const PropertyList::Value& top) {
+    read(from, knownKeys<S>, [&](Decoding& decoding, const PropertyList::Value& top) {
       decodeSchema<S>(decoding, top, CodingPath(), decoded);
     });
     return decoded;
   }
 
   /// Calls `body(decoding, top)` with the checked document's top value, which lives as long as the
-  /// call. What it throws comes through, and a message without a sound document as DecodingError.
+  /// call. The known keys are those of the schema that most of it has, if any. What it throws comes
+  /// through, and a message without a sound document as DecodingError.
   template <class Body>
-  void read(Keelgate::Bytes from, Body&& body) {
+  void read(Keelgate::Bytes from, const PropertyList::KnownKeys& known, Body&& body) {
     try {
-      const PropertyList::Document document(from);
+      const PropertyList::Document document(from, known);
       PropertyList::ExpansionBudget budget(from.size());
       Decoding decoding{budget};
       body(decoding, document.top());

@@ -7,13 +7,14 @@
 namespace VespKeelgateService {
 
 using Keelgate::construct;
+using Keelgate::VespSampleMessage;
 
 VespClientMessageResult VespSampleMessageUnpacker::unpack(Bytes from, const Context& with) const {
-  return dispatch(Commands(), with, [&]<class Row>(Row) {
-    auto schema = PropertyListDecoder().decode<typename Row::Schema>(from);
+  return checkingCommand(with, [&] {
+    auto schema = PropertyListDecoder().decode<VespSampleMessageSchema>(from);
 
     // Deliberate: the message's own command number, never compared with the context's.
-    return VespClientMessageResult{.result = construct<typename Row::Record>({
+    return VespClientMessageResult{.result = construct<VespSampleMessage>({
                                        .command = schema.command,
                                        .clientName = std::move(schema.clientName),
                                        .date = schema.date,

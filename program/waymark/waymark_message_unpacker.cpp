@@ -52,10 +52,11 @@ WaymarkMessage convertMessage(WaymarkSchema&& schema, Array<WaymarkGroupFields>&
 }  // namespace
 
 VespClientMessageResult WaymarkMessageUnpacker::unpack(Bytes from, const Context& with) const {
-  return dispatch(Commands(), with, [&]<class Row>(Row) {
-    auto schema = PropertyListDecoder().decode<typename Row::Schema>(from);
-    auto groups = foldGroups(schema);
-    return VespClientMessageResult{.result = convertMessage(std::move(schema), std::move(groups))};
+  return checkingCommand(with, [&] {
+    auto checkIn = PropertyListDecoder().decode<WaymarkSchema, FoldedCheckIn>(from);
+    constructInPlace(checkIn.groups);
+    return VespClientMessageResult{
+        .result = convertMessage(std::move(checkIn.fields), std::move(checkIn.groups))};
   });
 }
 

@@ -31,7 +31,7 @@ struct Record {
       (Optional<InnerRecord>, three));
 };
 
-static_assert(KeyTable<Schema>::find(PropertyList::keyDigest("1"), [] { return "1"; }) == 0);
+static_assert(knownKeys<Schema>.find(PropertyList::keyDigest("1"), [] { return "1"; }) == 0);
 
 Record decode(Bytes from) {
   return PropertyListDecoder().decode<Schema, Record>(from);
