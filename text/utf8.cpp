@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "text/utf8.h"
 
+#include <algorithm>
 #include <array>
 #include <cstdint>
 #include <cstring>
@@ -73,9 +74,15 @@ bool isAscii(std::string_view text) noexcept {
     std::memcpy(&word, text.data() + at, sizeof word);
     seen |= word;
   };
-  // In both, the last word overlaps the one before it.
+  // In both cases words overlap.
   if (text.size() >= 8) {
-    for (std::size_t at = 0; at + 8 < text.size(); at += 8) look(at, std::uint64_t());
+    std::size_t at = 0;
+    for (; text.size() - at > 32; at += 8) look(at, std::uint64_t());
+    // Four words that overlap as they must: a loop's end could not be foreseen.
+    const std::size_t rest = text.size() - at;
+    look(at, std::uint64_t());
+    look(at + std::min<std::size_t>(8, rest - 8), std::uint64_t());
+    look(at + (rest > 16 ? rest - 16 : 0), std::uint64_t());
     look(text.size() - 8, std::uint64_t());
   } else if (text.size() >= 4) {
     look(0, std::uint32_t());

@@ -30,12 +30,12 @@ void writeOptional(Writer& to, const Optional<String>& text) {
 
 Optional<String> readOptional(Reader& from) {
   if (!from.flag()) return std::nullopt;
-  return from.text();
+  return String(from.text());
 }
 
 CodingKey readCodingKey(Reader& from) {
   if (from.flag()) return static_cast<std::size_t>(from.word());
-  return from.text();
+  return String(from.text());
 }
 
 DecodingError readDecodingError(Reader& from) {
@@ -53,18 +53,18 @@ DecodingError readDecodingError(Reader& from) {
   if (steps > 0) from.charge(steps * sizeof(CodingKey));
   path.reserve(steps);
   for (std::size_t i = 0; i < steps; ++i) path.push_back(readCodingKey(from));
-  return {*kind, std::move(key), std::move(path), from.text()};
+  return {*kind, std::move(key), std::move(path), String(from.text())};
 }
 
 Breach readBreach(Reader& from) {
-  String domain = from.text();
-  String errorType = from.text();
+  String domain(from.text());
+  String errorType(from.text());
   return {std::move(domain), std::move(errorType), readOptional(from)};
 }
 
 VespClientMessageUnpackingError readUnpackingError(Reader& from) {
   if (from.flag()) {
-    return VespClientMessageUnpackingError::noUnpackerForService(from.text());
+    return VespClientMessageUnpackingError::noUnpackerForService(String(from.text()));
   }
   // An unknown number has no place in the error, whatever the other side says.
   const Optional<CommandType> command = CommandType::fromRawValue(from.word());

@@ -55,13 +55,13 @@ Data Reader::octets() {
   return {bytes.begin(), bytes.end()};
 }
 
-String Reader::text() {
+std::string_view Reader::text() {
   const Bytes bytes = take(word());
   const std::string_view text(reinterpret_cast<const char*>(bytes.data()), bytes.size());
   if (!Text::isUtf8(text)) throw MalformedReply();
   // A short one lies within its String.
   if (text.size() > String().capacity()) charge(text.size() + 1);
-  return String(text);
+  return text;
 }
 
 std::size_t Reader::count(std::size_t smallestElement) {

@@ -129,8 +129,8 @@ class Reader {
   }
   /// A copy of what follows its length, charged.
   Data octets();
-  /// The same, checked to be UTF-8.
-  String text();
+  /// A view of the same, checked to be UTF-8 and charged as the String that will be made of it.
+  std::string_view text();
   /// How many elements follow, each of at least so many bytes. So a count never makes more be set
   /// aside than has arrived.
   std::size_t count(std::size_t smallestElement);

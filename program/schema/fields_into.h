@@ -9,6 +9,8 @@
 /// Constants and pure functions; callable from any thread.
 #pragma once
 
+#include "framework/contracts/fields_by_type.h"
+
 #include <keelgate/describe.h>
 
 #include <algorithm>
@@ -40,18 +42,7 @@ template <class From, class To>
 constexpr bool fills<Keelgate::Optional<Keelgate::Array<From>>, Keelgate::Array<To>> =
     fills<From, To>;
 
-/// The members of R that are of type V, by the position of their field; null for the others. A
-/// table for each type, so that a function for a type serves all its fields.
-template <class R, class V>
-constexpr auto membersOf = [] {
-  std::array<V R::*, Keelgate::FieldsOf<R>::size> members{};
-  std::size_t position = 0;
-  Keelgate::FieldsOf<R>::each([&]<class Value>(Keelgate::Field<R, Value> field) {
-    if constexpr (std::same_as<Value, V>) members[position] = field.member;
-    ++position;
-  });
-  return members;
-}();
+using Keelgate::membersOf;
 
 /// Where the fields of an R's list are: in its own members. Specialised for who keeps some of them
 /// elsewhere.
