@@ -5,6 +5,9 @@
 #include "plist/cursor.h"
 #include "plist/store.h"
 
+#include <array>
+#include <bit>
+#include <cmath>
 #include <cstddef>
 #include <cstdint>
 #include <string_view>
@@ -13,6 +16,28 @@ namespace PropertyList {
 
 /// What a binary message begins with.
 inline constexpr std::string_view magic = "bplist00";
+
+/// What a first byte says of an object that has no length: its type, how many bytes follow, and the
+/// bits of its value that stand in none of them. Null where it says something else.
+struct Fixed {
+  Type type = Type::null;
+  std::uint8_t width = 0;
+  std::uint8_t bits = 0;
+  bool isSigned = false;
+};
+
+inline constexpr auto fixedObjects = [] {
+  std::array<Fixed, 256> all{};
+  all[0x08] = {.type = Type::boolean};
+  all[0x09] = {.type = Type::boolean, .bits = 1};
+  all[0x10] = {.type = Type::integer, .width = 1};
+  all[0x11] = {.type = Type::integer, .width = 2};
+  all[0x12] = {.type = Type::integer, .width = 4};
+  all[0x13] = {.type = Type::integer, .width = 8, .isSigned = true};
+  all[0x23] = {.type = Type::real, .width = 8};
+  all[0x33] = {.type = Type::date, .width = 8};
+  return all;
+}();
 
 /// Where the objects stand, and their nodes. Borrowed. A loop takes a copy: what it writes to nodes
 /// cannot change the copy, so that all of it stays in registers.
@@ -39,6 +64,23 @@ struct Objects {
       throw MalformedDocument(Problem::objectOutside, entry);
     }
     return static_cast<std::size_t>(offset);
+  }
+  /// Reads an object that has no length and begins with these bytes. False for any other, and for
+  /// what is wrong with one.
+  [[gnu::always_inline]] bool readFixed(std::uint64_t head, std::size_t offset,
+                                        Node& node) const noexcept {
+    const Fixed fixed = fixedObjects.data()[head >> 56];
+    if (fixed.type == Type::null || offset + 1 + fixed.width > tableStart) return false;
+    const std::uint64_t word = Cursor::bigEndianAt(message, offset + 1, 8);
+    // Shifted in two steps: of no bytes, by all 64 bits.
+    const unsigned half = 32U - 4U * fixed.width;
+    const std::uint64_t bits = word >> half >> half | fixed.bits;
+    if (fixed.type == Type::date && !std::isfinite(std::bit_cast<double>(bits))) return false;
+    const bool isNegative = fixed.isSigned & (bits >> 63 != 0);
+    node = {.bits = bits,
+            .type = fixed.type,
+            .flags = static_cast<std::uint8_t>(Node::read | (isNegative ? Node::negative : 0))};
+    return true;
   }
 };
 

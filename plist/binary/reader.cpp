@@ -23,28 +23,6 @@ namespace {
 constexpr std::size_t trailerLength = 32;
 constexpr std::size_t trailerUnused = 6;
 
-/// What a first byte says of an object that has no length: its type, how many bytes follow, and the
-/// bits of its value that stand in none of them. Null where it says something else.
-struct Fixed {
-  Type type = Type::null;
-  std::uint8_t width = 0;
-  std::uint8_t bits = 0;
-  bool isSigned = false;
-};
-
-constexpr auto fixedObjects = [] {
-  std::array<Fixed, 256> all{};
-  all[0x08] = {.type = Type::boolean};
-  all[0x09] = {.type = Type::boolean, .bits = 1};
-  all[0x10] = {.type = Type::integer, .width = 1};
-  all[0x11] = {.type = Type::integer, .width = 2};
-  all[0x12] = {.type = Type::integer, .width = 4};
-  all[0x13] = {.type = Type::integer, .width = 8, .isSigned = true};
-  all[0x23] = {.type = Type::real, .width = 8};
-  all[0x33] = {.type = Type::date, .width = 8};
-  return all;
-}();
-
 class BinaryReader {
  public:
   explicit BinaryReader(Store& store) : store_(store), keys_(store) {}
@@ -265,18 +243,7 @@ bool BinaryReader::readShort(const Objects& objects, std::size_t offset, Node& n
             .flags = Node::read};
     return true;
   }
-  const Fixed fixed = fixedObjects.data()[head >> 56];
-  if (fixed.type == Type::null || offset + 1 + fixed.width > objects.tableStart) return false;
-  const std::uint64_t word = Cursor::bigEndianAt(objects.message, offset + 1, 8);
-  // Shifted in two steps: of no bytes, by all 64 bits.
-  const unsigned half = 32U - 4U * fixed.width;
-  const std::uint64_t bits = word >> half >> half | fixed.bits;
-  if (fixed.type == Type::date && !std::isfinite(std::bit_cast<double>(bits))) return false;
-  const bool isNegative = fixed.isSigned & (bits >> 63 != 0);
-  node = {.bits = bits,
-          .type = fixed.type,
-          .flags = static_cast<std::uint8_t>(Node::read | (isNegative ? Node::negative : 0))};
-  return true;
+  return objects.readFixed(head, offset, node);
 }
 
 /// Makes a container that was read the innermost frame.
