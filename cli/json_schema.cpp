@@ -9,6 +9,7 @@
 
 #include <algorithm>
 #include <iterator>
+#include <span>
 
 namespace Keelgate::CLI {
 
@@ -80,10 +81,9 @@ Array<ErrorShape> errorShapes() {
   };
 }
 
-template <class E>
-Array<std::string_view> namesOf() {
+Array<std::string_view> namesOf(std::span<const EnumerationCase> cases) {
   Array<std::string_view> names;
-  for (const EnumerationCase& entry : casesOf<E>) names.push_back(entry.name);
+  for (const EnumerationCase& entry : cases) names.push_back(entry.name);
   return names;
 }
 
@@ -193,15 +193,13 @@ class Schema {
     if (record != all_.records.end()) {
       define(*record);
     } else if (enumeration != all_.enumerations.end()) {
-      Array<std::string_view> cases;
-      for (const EnumerationCase& entry : enumeration->cases) cases.push_back(entry.name);
-      writeField(out_, "enum", cases);
+      writeField(out_, "enum", namesOf(enumeration->cases));
     } else if (name == "error") {
       defineError();
     } else if (name == "reason") {
-      writeField(out_, "enum", namesOf<HostError::Reason>());
-    } else if (name == "case") {
-      writeField(out_, "enum", namesOf<VespClientMessageUnpackingError::Case>());
+      writeField(out_, "enum", namesOf(casesOf<HostError::Reason>));
+    } else {
+      writeField(out_, "enum", namesOf(casesOf<VespClientMessageUnpackingError::Case>));
     }
     out_.endObject();
   }

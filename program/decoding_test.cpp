@@ -58,11 +58,6 @@ TEST(Decoding, TellsNullFromAbsentAndFromValues) {
   }
 }
 
-TEST(Decoding, DamageIsFoundBeforeAnyFieldIsRead) {
-  const std::string_view damaged = "<plist><dict><key>x</key><integer>1e3</integer></dict></plist>";
-  EXPECT_EQ(outcome(sample, std::as_bytes(std::span(damaged))), "dataCorrupted @");
-}
-
 TEST(Decoding, EveryTruncationIsDamageAndEveryChangedByteHasOneAnswer) {
   const Array others{2.5, "x<", data("any"), Dictionary{{"\u00e9", -3}}};
   const std::pair<Target, Tree> messages[] = {

@@ -38,29 +38,21 @@ Expect moved(std::vector<std::pair<std::string, std::string>> moves) {
 /// Numbered fields move into their group; codes that no enumeration knows become its default.
 Fields groupsFolded(const Fields& fields) {
   Fields expected;
-  std::map<int, std::map<std::string, std::string>> groups;
+  std::map<std::string, std::string> values;
   for (const std::string& field : fields) {
-    const std::size_t equals = field.find('=');
-    const std::string name = field.substr(1, equals - 1);
-    const std::size_t digits = name.find_last_not_of("0123456789") + 1;
-    const std::string code = field.substr(equals + 1);
-    if (digits < name.size()) {
-      groups[std::stoi(name.substr(digits))][name.substr(0, digits)] = code;
-      continue;
-    }
+    const std::string name = field.substr(1, field.find('=') - 1);
+    values[name] = field.substr(name.size() + 2);
     const bool isCode =
         name.ends_with("Type") || name == "lowPowerModeWarningState" || name == "referenceFrame";
-    expected.push_back(isCode ? "." + name + "=0" : field);
+    if (std::isdigit(name.back()) == 0) expected.push_back(isCode ? "." + name + "=0" : field);
   }
   for (int number = 2; number <= 32; ++number) {
     const std::string group = ".groupFields[" + std::to_string(number - 2) + "].";
     expected.push_back(group + "groupNumber=" + std::to_string(number));
     for (const char* name :
          {"receiverHandle", "sharingInvitationData", "shareURL", "participantID"}) {
-      const auto value = groups[number].find(name);
-      if (value != groups[number].end()) {
-        expected.push_back(group + name + "=" + value->second);
-      }
+      const auto value = values.find(name + std::to_string(number));
+      if (value != values.end()) expected.push_back(group + name + "=" + value->second);
     }
   }
   return expected;

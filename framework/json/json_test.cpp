@@ -126,6 +126,9 @@ TEST(JSON, PropertyListsAreTreesAndTypedOnesLoseNothing) {
     EXPECT_EQ(compact(PropertyList{value}), plainText);
     EXPECT_EQ(typed(value), typedText);
   }
+  Writer pretty(Layout::pretty);
+  write(pretty, std::get<0>(std::end(table)[-1]));
+  EXPECT_EQ(textIn(std::move(pretty)), "{\n  \"z\": null,\n  \"a\": [\n    3\n  ]\n}");
 }
 
 TEST(JSON, TheBudgetIsKeptToTheByte) {

@@ -187,7 +187,8 @@ void Writer::quotedCharacter(std::string_view& text) {
   // One escape for each byte that begins no character.
   if (length == 0) character = 0xdc00 + static_cast<unsigned char>(text.front());
   const std::size_t consumed = std::max<std::size_t>(length, 1);
-  const Bool control = character < 0x20 || (character >= 0x7f && character < 0xa0);
+  // Of ASCII only controls come here, beside those that have a letter.
+  const Bool control = character < 0xa0;
   const Bool lineEnd = character == 0x2028 || character == 0x2029;
   if (const char letter = shortEscape(character); letter != '\0') {
     const char escape[] = {'\\', letter};

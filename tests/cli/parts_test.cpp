@@ -1,12 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
-// The parts of the command that need no service: request lines, ordered work, sums.
+// The parts of the command that need no service: request lines and ordered work.
 #include "cli/ordered_work.h"
 #include "cli/request_line.h"
-#include "cli/tally.h"
 
 #include <gtest/gtest.h>
-
-#include <poll.h>
 
 #include <algorithm>
 #include <atomic>
@@ -194,39 +191,6 @@ TEST(OrderedWork, AJobWithoutMemoryEndsTheWorkAndNotTheProgram) {
     return jobOf(1, 1, [](int) -> JSON::Reply { throw std::bad_alloc(); });
   };
   EXPECT_THROW(work.run(2, jobs(1000, job)), std::bad_alloc);
-}
-
-TEST(OrderedWork, EndsWithItsReader) {
-  int seen = 0, taken = 0;
-  OrderedWork work([&](const Due&, Bool) { return ++seen < 10; });
-  work.run(3, jobs(1'000'000, [&](int) { return ++taken, jobOf(1, 1, numbered); }));
-  EXPECT_EQ(seen, 10);
-  EXPECT_LT(taken, 1000);
-  pollfd entry{.fd = work.endedDescriptor(), .events = POLLIN, .revents = 0};
-  EXPECT_EQ(poll(&entry, 1, 0), 1);
-}
-
-TEST(Tally, SumsUpWhatIsNotZero) {
-  using JSON::Outcome;
-  using Reason = HostError::Reason;
-  Tally tally;
-  const std::tuple<Outcome, Optional<Reason>, int, const char*> rows[] = {
-      {Outcome::unusable, {}, 5, "0 messages, "},
-      {Outcome::record, {}, 1, "1 message, "},
-      {Outcome::record, {}, 99, "100 messages, "},
-      {Outcome::record, {}, 1143, "1,243 messages, "},
-      {Outcome::rejected, {}, 2, "1,245 messages, 2 rejected, "},
-      {Outcome::rejected, Reason::crashed, 1, "1,246 messages, 2 rejected, 1 crashed, "},
-      {Outcome::rejected, Reason::timedOut, 2, "2 rejected, 1 crashed, 2 timed out, "},
-      {Outcome::rejected, Reason::messageTooLarge, 1, "1 failed, "},
-      {Outcome::rejected, Reason::resourcesExhausted, 1, "2 failed, "},
-      {Outcome::rejected, Reason::protocolViolation, 1, "3 failed, "},
-      {Outcome::serviceLost, Reason::startFailed, 1,
-       "1,252 messages, 2 rejected, 1 crashed, 2 timed out, 4 failed, "}};
-  for (const auto& [outcome, reason, times, sentence] : rows) {
-    for (int i = 0; i < times; ++i) tally.count({.outcome = outcome, .reason = reason});
-    EXPECT_NE(tally.sentence().find(sentence), String::npos) << tally.sentence();
-  }
 }
 
 }  // namespace

@@ -5,6 +5,7 @@
 usage: run.py ROOT KEELGATE FAKE_SERVICE
 """
 import base64
+import fcntl
 import json
 import os
 import pathlib
@@ -15,6 +16,7 @@ import struct
 import subprocess
 import sys
 import tempfile
+import termios
 import time
 
 root, keelgate, fake = pathlib.Path(sys.argv[1]), sys.argv[2], sys.argv[3]
@@ -137,7 +139,7 @@ def said_of_a_run():
     record = ["--record", "VespCommandResponse"]
     for words, status, expected in (
             ([good] * 1001 + [bad, bad], 1, r"1,003 messages, 2 rejected, \d+\.\d\d s"),
-            ([good, "/nonexistent", good], 2, r"2 messages, \d+\.\d\d s"),
+            ([good, "/nonexistent"], 2, r"1 message, \d+\.\d\d s"),
             ([good, messages / "push-payload.xml", "--max-message", "1k"], 1,
              r"2 messages, 1 failed, \d+\.\d\d s")):
         for command in ("unpack", "check"):
@@ -269,20 +271,23 @@ def without_service():
             check((status, out) == (3, b"") and err.startswith("keelgate: "), f"{where}: {status}")
     pause, raise_signal = 3, 4
     script = lambda operation, amount: struct.pack("<BxxxI", operation, amount)
-    for step, limit, reason in ((script(raise_signal, 11), 20, "crashed"),
-                                (script(pause, 60_000), 0.2, "timedOut")):
-        status, out, err = run(*record, "--service-path", fake, "--time-limit", limit, stdin=step)
-        check((status, host_error(objects(out)[0])) == (1, reason), f"{reason}: {out}")
-        check(("--time-limit" in err) == (reason == "timedOut"), f"what helps: {err}")
-
-    # A service that cannot be had again: its file is gone when its process has crashed.
     with tempfile.TemporaryDirectory() as folder:
+        crash, wait = (pathlib.Path(folder, name) for name in ("crash", "wait"))
+        crash.write_bytes(script(raise_signal, 11))
+        wait.write_bytes(script(pause, 60_000))
+        status, out, err = run(*record, "--service-path", fake, "--time-limit", 2, crash, wait, crash)
+        reasons = [host_error(reply) for reply in objects(out)]
+        check((status, reasons) == (1, ["crashed", "timedOut", "crashed"]), f"{reasons}")
+        check("3 messages, 2 crashed, 1 timed out, " in err, f"the sum of it: {err}")
+        check(err.count("--time-limit") == 1, f"what helps: {err}")
+
+        # A service that cannot be had again: its file is gone when its process has crashed.
         service = shutil.copy(fake, folder)
         process = started("stream", "--service-path", service)
         process.stdin.write(b"started?\n")
         process.stdout.readline()
         os.unlink(service)
-        crash = base64.b64encode(script(raise_signal, 11)).decode()
+        crash = base64.b64encode(crash.read_bytes()).decode()
         out, err = process.communicate((request(1, crash) + "\n").encode() * 50, timeout=60)
         reasons = {host_error(reply) for reply in objects(out)}
         check(process.returncode == 3, f"not kept: {process.returncode}")
@@ -406,9 +411,10 @@ def json_schema():
     check(run("describe", "--json-schema", "VespSessionInvitationSchema")[0] == 2, "not printed")
 
 
-def on_terminal(*words, **environment):
-    """Everything that the command says when both streams are one terminal."""
+def on_terminal(*words, window=0, **environment):
+    """Everything that the command says when both streams are one terminal of this width."""
     main, side = pty.openpty()
+    fcntl.ioctl(side, termios.TIOCSWINSZ, struct.pack("HHHH", 0, window, 0, 0))
     process = subprocess.Popen([keelgate, *map(str, words)], stdin=subprocess.DEVNULL, stdout=side,
                                stderr=side, env={**os.environ, "TERM": "xterm", **environment})
     os.close(side)
@@ -432,6 +438,11 @@ def terminal():
     compact = on_terminal("unpack", "--compact", "--record", "VespCommandResponse", files[0])
     check(compact.startswith(b'{"record":'), f"compact at a terminal: {compact}")
     check(b"\033[1m" in on_terminal("describe", NO_COLOR=""), "colour")
+    for columns, window, expected in (("", 0, 80), ("0", 0, 80), ("70", 0, 70), ("", 60, 60),
+                                      ("70", 60, 60), ("50", 60, 50)):
+        said = on_terminal("describe", window=window, COLUMNS=columns, NO_COLOR="1")
+        check(said == on_terminal("describe", COLUMNS=str(expected), NO_COLOR="1"),
+              f"{columns} in a window of {window}")
     check(all(len(line) <= 60 for line in on_terminal("unpack", "--help", COLUMNS="60").splitlines()), "help")
     check(b"\033" not in on_terminal("describe", NO_COLOR="1"), "NO_COLOR")
 

@@ -44,8 +44,9 @@ void die(int signal) {
   raise(signal);
 }
 
-/// A service is given its channel and nothing else.
+/// A service is given its channel and nothing else, nor signals that its starter ignores.
 bool hasOnlyChannel() {
+  if (signal(SIGCHLD, SIG_DFL) != SIG_DFL) return false;
   for (int other = 0; other < 64; ++other) {
     if (other != channel && fcntl(other, F_GETFD) >= 0) return false;
   }
