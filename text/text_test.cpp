@@ -89,7 +89,9 @@ TEST(Utf8, WhatIsMalformedIsFoundAnywhere) {
   for (std::string bad; std::getline(bads, bad, '|');) {
     for (std::size_t before = 0; before < 70; ++before) {
       for (const std::size_t after : {0u, 1u, 64u, 100u}) {
-        std::string text = std::string(before, 'a').append(bad).append(after, 'b');
+        // Beside zeros a byte says the least.
+        const char beside = before % 2 == 0 ? 'a' : '\0';
+        std::string text = std::string(before, beside).append(bad).append(after, beside);
         EXPECT_FALSE(isUtf8(text)) << bad << before << ' ' << after;
         EXPECT_FALSE(isAscii(text)) << bad << before << ' ' << after;
         text.replace(before, bad.size(), "\xf0\x9f\x98\x80");
