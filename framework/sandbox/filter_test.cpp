@@ -206,6 +206,7 @@ TEST(Filter, IsProvedToBeInForce) {
       proveEnforced(rules);
       return StartStep{};
     } catch (const StartError& error) {
+      EXPECT_EQ(error.error, 0);
       return error.step;
     }
   };
@@ -215,7 +216,9 @@ TEST(Filter, IsProvedToBeInForce) {
   EXPECT_EQ(stepOf({call, end}), StartStep::proveFilter);
   // It cannot even say that the call was made, or is trapped for another one.
   EXPECT_EQ(stepOf({call}), StartStep::proveFilter);
-  EXPECT_EQ(stepOf({call, {SYS_exit_group, Verdict::allowWith, 0}}), StartStep::proveFilter);
+  for (const unsigned status : {0U, 2U}) {
+    EXPECT_EQ(stepOf({call, {SYS_exit_group, Verdict::allowWith, status}}), StartStep::proveFilter);
+  }
   // A kernel that takes no filter: too long for it.
   EXPECT_EQ(stepOf(std::vector<Rule>(3000, end)), StartStep::loadFilter);
 }
