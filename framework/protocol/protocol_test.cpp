@@ -12,7 +12,6 @@
 #include <array>
 #include <cstring>
 #include <filesystem>
-#include <functional>
 #include <utility>
 #include <vector>
 

@@ -5,7 +5,6 @@
 #include <array>
 #include <csignal>
 #include <cstddef>
-#include <cstdint>
 
 namespace Keelgate::Test {
 

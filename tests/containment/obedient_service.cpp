@@ -20,7 +20,6 @@
 #include "framework/server/keelgate_server.h"
 #include "tests/containment/machine.h"
 
-#include <unistd.h>
 #include <cstdlib>
 #include <cstring>
 #include <forward_list>

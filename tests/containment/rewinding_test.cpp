@@ -16,7 +16,6 @@
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <poll.h>
-#include <sys/ioctl.h>
 #include <sys/ptrace.h>
 #include <sys/rseq.h>
 #include <sys/socket.h>
