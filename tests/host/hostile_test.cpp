@@ -152,6 +152,21 @@ TEST(C6, AWorkerSeesOneMessageUnlessMoreAreAllowed) {
   }
 }
 
+/// What it was given besides goes to the next.
+TEST(C6, AWorkerThatHasTakenMuchIsNotUsedAgain) {
+  Client::Options options = optionsFor(KEELGATE_OBEDIENT_SERVICE, milliseconds(20'000), 1);
+  options.messagesPerProcess = 100;
+  Client client(options);
+  const String eats = "eat 117440512 65536" + String(200'000, ' ');
+  std::vector<Client::Request> requests(9, {.message = bytesOf("count")});
+  requests[4].message = bytesOf(eats);
+  std::vector<Int64> counts;
+  for (auto& outcome : client.unpackBatch<VespCommandResponse>(requests)) {
+    counts.push_back(outcome.record().messageId.value_or(-1));
+  }
+  EXPECT_EQ(counts, (std::vector<Int64>{1, 2, 3, 4, 0, 1, 2, 3, 4}));
+}
+
 TEST(C8, WorkersThatSpeakBeforeTheyAreAskedAreNotBelieved) {
   Client client(fakeOptions("early"));
   // What comes after the message can't be told from its answer: a worker must be early.
