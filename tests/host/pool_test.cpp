@@ -93,7 +93,7 @@ TEST(Start, ThereMayBeTooFewDescriptors) {
     const rlimit few{.rlim_cur = static_cast<rlim_t>(firstFree + spare),
                      .rlim_max = before.rlim_max};
     setrlimit(RLIMIT_NOFILE, &few);
-    const String outcome = call();
+    String outcome = call();
     setrlimit(RLIMIT_NOFILE, &before);
     return outcome;
   };
