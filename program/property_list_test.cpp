@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // A property list comes out as the tree that it is, for no more than its length is worth.
+#include "framework/transport/wire.h"
 #include "plist/limits.h"
 #include "plist/test_messages.h"
 #include "program/property_list/property_list_unpacker.h"
@@ -8,6 +9,9 @@
 #include <gtest/gtest.h>
 
 namespace VespKeelgateService::Testing {
+
+// What the service can read the client can read back.
+static_assert(Keelgate::Transport::maximumNesting == PropertyList::Limits::nestedContainers);
 
 namespace {
 

@@ -12,8 +12,6 @@ namespace {
 /// say, least of all for one that was taken over.
 enum class ErrorKind : std::uint8_t { decoding, breach, unpacking };
 
-/// A path leads through at most 512 nested containers, one step for each.
-constexpr std::size_t maximumPathLength = 512;
 /// Its kind, and a number or the length of a key.
 constexpr std::size_t smallestStep = 1 + sizeof(std::uint64_t);
 
@@ -47,8 +45,8 @@ DecodingError readDecodingError(Reader& from) {
     throw MalformedReply();
   }
   const std::size_t steps = from.count(smallestStep);
-  // An honest path is never longer. A longer one would only have the client build it.
-  if (steps > maximumPathLength) throw MalformedReply();
+  // An honest path is never longer: it has a step for each container that it leads through.
+  if (steps > maximumNesting) throw MalformedReply();
   Array<CodingKey> path;
   if (steps > 0) from.charge(steps * sizeof(CodingKey));
   path.reserve(steps);

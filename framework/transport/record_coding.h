@@ -147,10 +147,6 @@ void write(Writer& to, const T& value) {
 
 // ---------------------------------------------------------------------------------- reading
 
-/// Property lists nest 512 containers, and what is read here has nested in one. A lying service
-/// must not get any deeper into the client's stack than an honest one.
-constexpr int maximumNesting = 512;
-
 /// How many containers an array of such values takes at each level: itself, and around the fields
 /// of a record their dictionary.
 template <class T>

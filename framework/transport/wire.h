@@ -45,6 +45,10 @@ struct ReadLimits {
   std::chrono::steady_clock::time_point deadline = std::chrono::steady_clock::time_point::max();
 };
 
+/// So many containers of a property list stand in one another, and so many at most what a reply
+/// brings. A lying service must not get any deeper into the client's stack than an honest one.
+constexpr int maximumNesting = 512;
+
 /// The body of a reply, in parts: what is long is borrowed from where it lies, and never copied.
 struct Body {
   struct Loan {
