@@ -121,8 +121,8 @@ class Walk {
   Description& to_;
 };
 
-/// The name of the case that carries R in a client message's result. Every row's record is a case:
-/// one that is none would have no name here, and no way out of the service either.
+/// The name of the case that carries R in a client message's result. Every row's record is a case,
+/// since a row takes no other.
 template <class R, class... Cases>
 std::string_view caseNameOf(const std::variant<Cases...>*) {
   constexpr bool is[] = {std::same_as<R, Cases>...};

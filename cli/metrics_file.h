@@ -14,8 +14,8 @@ namespace Keelgate::CLI {
 /// For one thread. What it refers to must outlive it.
 class MetricsFile {
  public:
-  /// An empty path stands for no file. Writes the first version at once; throws std::system_error
-  /// where that cannot be done.
+  /// An empty path stands for no file. Writes the first version at once, before a service is
+  /// started; throws std::system_error where that cannot be done.
   MetricsFile(String path, const Tally& tally, Console& console);
   /// Writes the last version.
   ~MetricsFile();

@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The workers of a client: one message each by default, and a fresh one forked ahead.
+/// The workers of a client: one message each by default, and a fresh one forked ahead. A call waits
+/// for one of `places()` first, and then for a worker that it can `take()`.
 #pragma once
 
 #include "framework/client/fair_semaphore.h"

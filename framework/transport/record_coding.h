@@ -221,6 +221,7 @@ struct Reading {
 template <class T>
 void readRecord(Reader& from, T& value, int depth) {
   static_assert(T::Labels::isComplete(), "a member of the record is not in its list of fields");
+  static_assert(T::Labels::keys == T::Labels::names, "a field of the record has a wire key");
   constexpr std::size_t size = FieldsOf<T>::size;
   auto words = allFields<T>.words();
   for (std::size_t i = 0; i < presenceWords<T>; ++i) words[i] = from.word();

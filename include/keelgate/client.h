@@ -6,8 +6,8 @@
 ///     auto result  = client.unpackClientMessage(
 ///         bytes, {.command = 232, .service = "com.tessen.private.braid.viso.video"});
 ///
-/// No byte of a message is parsed in the calling process. By default every message has a freshly
-/// sealed process to itself.
+/// No byte of a message is parsed in the calling process. By default every message gets a sealed
+/// process that has seen no other message.
 #pragma once
 
 #include <keelgate/errors.h>
@@ -33,24 +33,24 @@ namespace Keelgate {
 struct SandboxLayer {
   /// For people to read, e.g. "empty root directory".
   String name;
-  /// False where the kernel, a container's profile or the caller's own rights took it away.
+  /// False where the kernel, a container's profile or the caller's rights do not allow it.
   Bool present;
 };
 
-/// What the running service said of itself.
+/// What the running service reports about itself.
 struct ServiceReport {
-  /// Of this build, which client and service always share.
+  /// The version of this build: client and service are always of the same one.
   String version;
   /// Strongest first. Those that a service never starts without are listed too.
   Array<SandboxLayer> layers;
 };
 
-/// What became of the messages of a client so far, by whatever call they came. `messages` is the
+/// The outcomes of all messages of a client so far, by whatever call they came. `messages` is the
 /// sum of the others.
 struct Statistics {
   UInt64 messages;
   UInt64 records;
-  /// Messages that an unpacker refused, with whatever error.
+  /// Messages that an unpacker rejected, with any error.
   UInt64 rejections;
   /// One for each HostError::Reason.
   UInt64 crashed;
@@ -61,7 +61,7 @@ struct Statistics {
   UInt64 startFailed;
 };
 
-/// What became of one message: the record, or the error that a call for it alone would have thrown.
+/// The outcome of one message: the record, or the error that a call for it alone would have thrown.
 template <OutputRecord R>
 class Outcome {
  public:
@@ -69,7 +69,7 @@ class Outcome {
   explicit Outcome(std::exception_ptr error) : value_(std::move(error)) {}
 
   [[nodiscard]] bool hasRecord() const noexcept { return value_.index() == 0; }
-  /// The record; throws the error where there is none.
+  /// The record, owned by this; throws the error if there is none. For one thread at a time.
   R& record() {
     if (!hasRecord()) std::rethrow_exception(std::get<1>(value_));
     return std::get<0>(value_);
@@ -81,13 +81,13 @@ class Outcome {
 
 namespace Detail {
 
-/// Where the record of one message goes. It keeps the library free of what each record is made of.
+/// Receives the outcome of one message, so that the library needs no templates.
 class Sink {
  public:
   virtual ~Sink() = default;
   /// Room for the record that recordNumber stands for.
   virtual void* makeRecord() = 0;
-  /// Once, at the end: null where there is a record.
+  /// Called once, at the end, with null if there is a record.
   virtual void complete(std::exception_ptr error) = 0;
 };
 
@@ -110,78 +110,78 @@ class RecordSink final : public Sink {
 
 /// A running service. All members may be called from many threads at once; each call holds one of
 /// the service's processes, and waits for one while all are taken. The client makes no threads,
-/// installs no signal handlers and leaves the application's children alone. In a process that was
-/// forked from the application it starts a service of its own at its first use; until then it
-/// shares the parent's channel, so that a service whose parent was killed ends with it.
+/// installs no signal handlers and leaves the application's children alone. In a fork of the
+/// application it starts a service of its own at its first use; until then it keeps the parent's
+/// channel open, so that the service of a killed parent ends only with the fork.
 ///
 /// A calling thread needs 256 KiB of free stack; with less a call throws HostError
 /// (resourcesExhausted).
 ///
 /// A message that ends its process abnormally (it crashes, times out, exhausts its memory or
-/// violates the protocol) also costs the service its address layout: another one, started in
-/// advance, takes its place, and the old one finishes what it has. After 10,000 messages or ten
+/// violates the protocol) also retires the service, whose address layout may now be known: a
+/// standby takes its place, and the old one finishes its messages. After 10,000 messages or ten
 /// minutes a service is replaced anyway.
 ///
 /// A call returns nothing partial: it gives the whole record, or throws and leaves the client as it
 /// was, ready for the next message.
 class KEELGATE_API Client {
  public:
-  /// How a message gets a process that has seen no other. With `rewind` one that has answered is
-  /// set back, its memory and registers, to before it read its first byte; where the machine does
-  /// not give what that takes, and after anything unusual, it is a fork. With `fork` it always is.
+  /// How a message gets a process that has seen no other. `rewind` restores the memory and
+  /// registers of a process that has answered to what they were before its first message; where the
+  /// system cannot, and after anything unusual, it forks. `fork` always forks.
   enum class Isolation { rewind, fork };
 
   struct Options {
-    /// More could not be in work on any machine, and each costs a process or two.
+    /// Bounds the processes and descriptors that a client takes.
     static constexpr unsigned mostProcesses = 128;
-    /// Positions in a message are kept in 32 bits by whoever reads it.
+    /// Positions in a message are stored in 32 bits.
     static constexpr std::size_t greatestLargestMessage = 0xffff'ffff;
 
-    /// Messages that can be in work at once, at most `mostProcesses`; 0 stands for one for each
-    /// processor. A higher number is cut to the most, not refused. Messages of 4 MiB and more get
-    /// three quarters of them at most, so that small ones need not wait for large ones.
+    /// How many messages are processed at a time; 0 stands for the number of processors, and a
+    /// number above `mostProcesses` for that. Messages of 4 MiB and more get at most three quarters
+    /// of the processes, but at least one.
     unsigned processes = 0;
-    /// From the call until the record; a message that takes longer is given up. Waiting for a free
-    /// process counts. It bounds what a hostile message can cost the caller, so there is no value
-    /// for "none"; more than a year counts as a year.
+    /// From the call until the record, including the wait for a free process; a message that takes
+    /// longer is given up. It bounds the cost of a hostile message, so it cannot be switched off;
+    /// more than a year counts as a year.
     std::chrono::milliseconds timeLimit{5000};
-    /// In bytes, at most `greatestLargestMessage`. Looked at before anything is sent, so a message
-    /// above it costs nothing.
+    /// In bytes, at most `greatestLargestMessage`. Checked before anything is sent, so a longer
+    /// message costs nothing.
     std::size_t largestMessage = std::size_t{64} << 20;
-    /// How many messages a process may see before a fresh one takes its place. With 1 a process
+    /// How many messages a process may see before a fresh one takes its place. With 1, a process
     /// that was taken over by a message never sees another sender's message. A process that is used
-    /// again is forked for the largest message, whatever it gets, and so may fill a heap in
-    /// proportion to `largestMessage`. 0 counts as 1.
+    /// again may fill a heap in proportion to `largestMessage`, however short its messages are. 0
+    /// counts as 1.
     std::size_t messagesPerProcess = 1;
-    /// With more abnormal ends a second than this the error is given later, though not after the
-    /// time limit: whoever searches for an address, or wants to keep services restarting, is slowed
-    /// down, and nobody else is. Four at once are not; 0: none is.
+    /// With more abnormal ends a second than this, their errors are delayed, though not beyond the
+    /// time limit. That slows down an attacker who searches for an address or keeps services
+    /// restarting, and nobody else. A burst of four is not delayed; 0 disables the delay.
     unsigned abnormalEndsPerSecond = 10;
-    /// Refuse to run where namespaces or Landlock are missing. Without it a missing layer is one
-    /// line of the log, once for each client.
+    /// Refuse to run where namespaces or Landlock are missing. Without it, missing layers are
+    /// logged in one line, once for each client.
     bool requireLayers = false;
-    /// The VespKeelgateService to start; empty: the one of the tree that this library is in. Its
+    /// The path of the VespKeelgateService to start; by default the one beside this library. Its
     /// file and all folders above must belong to root or the caller and be writable by nobody else.
     String servicePath;
-    /// The socket of an activated service, which is used in place of a started one. A path; it goes
-    /// before `servicePath`.
+    /// The path of an activated service's socket. If it is set, no service is started, and
+    /// `servicePath` is not used.
     String socket;
-    /// The user id of whoever may listen on the socket, beside root, as which a service manager
-    /// listens, and the caller's own user.
+    /// A user id that may listen on the socket, besides root (as a service manager does) and the
+    /// caller's own user.
     Optional<unsigned> socketUser;
-    /// Takes each line that the service logs, control characters escaped, from any thread; by
-    /// default they go to standard error. Several threads may be in it at once, each within a call
-    /// to the client. It must not throw, and must not call the client back.
+    /// Called with each log line, control characters escaped; by default lines go to standard
+    /// error. It is called by threads that are in a call to the client, by several at once too. It
+    /// must not throw or call the client.
     std::function<void(std::string_view line)> log;
-    /// Of messages that have a process to themselves, with `messagesPerProcess` 1.
+    /// Has an effect only with `messagesPerProcess` 1.
     Isolation isolation = Isolation::rewind;
   };
 
-  /// A message as batches and asynchronous calls take it. The bytes are borrowed until its outcome
-  /// is there.
+  /// A message for a batch or an asynchronous call. The bytes are borrowed until its outcome is
+  /// delivered.
   struct Request {
     Bytes message;
-    /// For a VespClientMessageResult; the other records have none.
+    /// Used for VespClientMessageResult only.
     VespClientMessageContext context{.command = 0, .service = {}};
   };
 
@@ -189,17 +189,17 @@ class KEELGATE_API Client {
   /// sentence that says what to do about it.
   Client();
   explicit Client(Options options);
-  /// Ends it, within 200 ms: after 100 ms whatever still runs is killed. No call may be under way.
-  /// In a fork of the application it closes the fork's descriptors and lets the parent's service
-  /// be.
+  /// Ends the service within 200 ms; what still runs after 100 ms is killed. No call may be under
+  /// way. In a fork of the application it closes the fork's descriptors and leaves the parent's
+  /// service alone.
   ~Client();
-  /// A client that was moved from can be destroyed and assigned to, and nothing else.
+  /// A moved-from client can only be destroyed or assigned to.
   Client(Client&&) noexcept;
   Client& operator=(Client&&) noexcept;
 
   /// The record that a message holds. Throws what the unpacker threw (DecodingError, Breach), or
-  /// HostError. The bytes are borrowed for the time of the call. What comes back owns all that it
-  /// holds, and is still untrusted: its form has been checked, its meaning has not.
+  /// HostError. The bytes are borrowed during the call. The record owns all that it holds, and is
+  /// still untrusted: its form has been checked, its meaning has not.
   template <OutputRecord R>
   requires(!std::same_as<R, VespClientMessageResult>) R unpack(Bytes message) {
     R record{};
@@ -208,8 +208,8 @@ class KEELGATE_API Client {
   }
 
   /// The same for a client message, which comes with the command and the service that it arrived
-  /// under. Throws VespClientMessageUnpackingError too. The identifier may have 64 KiB; above that
-  /// HostError (messageTooLarge).
+  /// under. Also throws VespClientMessageUnpackingError; and HostError (messageTooLarge) for a
+  /// service identifier of more than 64 KiB.
   VespClientMessageResult unpackClientMessage(Bytes message,
                                               const VespClientMessageContext& context) {
     VespClientMessageResult record{};
@@ -218,10 +218,10 @@ class KEELGATE_API Client {
     return record;
   }
 
-  /// Many messages in one call, as many of them at a time as there are processes; the calling
-  /// thread drives them all. The time limit of each counts from when it has its turn. `visitor` is
-  /// given each position and its outcome, as they come. What it throws ends the batch and comes
-  /// through: messages that are in work are given up.
+  /// Unpacks many messages in one call, as many at a time as there are processes; the calling
+  /// thread drives them all. The time limit of each message starts when its processing does.
+  /// `visitor` is called with each position and its outcome, in order of completion. An exception
+  /// from it ends the batch and propagates; messages in progress are given up.
   template <OutputRecord R>
   void unpackBatch(std::span<const Request> requests,
                    const std::function<void(std::size_t position, Outcome<R> outcome)>& visitor) {
@@ -230,7 +230,7 @@ class KEELGATE_API Client {
           [&visitor, position](Outcome<R> outcome) { visitor(position, std::move(outcome)); });
     });
   }
-  /// The same with the outcomes in the order of the requests.
+  /// The same; returns the outcomes in the order of the requests.
   template <OutputRecord R>
   std::vector<Outcome<R>> unpackBatch(std::span<const Request> requests) {
     std::vector<Outcome<R>> outcomes(requests.size(), Outcome<R>(std::exception_ptr()));
@@ -240,8 +240,8 @@ class KEELGATE_API Client {
     return outcomes;
   }
 
-  /// Begins with a message, and calls `completion` once, from dispatch(), with what became of it:
-  /// within `timeLimit` from now, if the application dispatches; by default that of the options.
+  /// Starts to unpack a message. dispatch() calls `completion` once, with the outcome, within
+  /// `timeLimit` from now (by default that of the options) if the application dispatches in time.
   /// The completion may call the client. Throws HostError (startFailed) when there are no
   /// descriptors left.
   template <OutputRecord R>
@@ -251,19 +251,19 @@ class KEELGATE_API Client {
     startTask(recordNumber<R>, std::move(request),
               std::make_unique<Detail::RecordSink<R>>(std::move(completion)), timeLimit);
   }
-  /// For an event loop: readable, as poll and epoll say it, when dispatch() has something to do.
-  /// It stays the client's. In a fork of the application there is another one, and the parent's
-  /// messages are not completed there.
+  /// For an event loop: readable (poll, epoll) when dispatch() has something to do. The client owns
+  /// it. A fork of the application has another one, and the parent's messages are not completed
+  /// there. Throws as start() does.
   int descriptor();
-  /// Goes on with all messages that were started, without waiting, and calls completions. What one
-  /// throws comes through, and the next dispatch() calls the others. While a thread is in it others
-  /// return at once. Messages that are in work when the client ends are given up, and their
-  /// completions are not called.
+  /// Advances all started messages without waiting, and calls completions. An exception from a
+  /// completion propagates; the next dispatch() calls the remaining ones. While one thread is in
+  /// dispatch(), it returns at once in the others. Messages in progress when the client is
+  /// destroyed are given up, and their completions are never called.
   void dispatch();
 
   [[nodiscard]] Statistics statistics() const noexcept;
 
-  /// Which layers the running service has. Throws HostError when none is running and none starts.
+  /// The version and layers of the service. Throws HostError when none runs or can be started.
   ServiceReport report();
 
  private:

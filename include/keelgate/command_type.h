@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The command numbers that the framework knows. To be known says nothing of being served: which
-/// service answers which command is in the program's tables.
+/// The command numbers that the framework knows. Not all are served: the program's tables say which
+/// service answers which command.
 ///
 /// Values and pure functions; callable from any thread. Nothing throws.
 #pragma once
@@ -12,8 +12,8 @@
 
 namespace Keelgate {
 
-/// A known command. There is no way to hold an unknown one. A client message is held against this
-/// list before a byte of it is looked at. The numbers travel, so a case is never renumbered.
+/// A known command; an unknown one cannot be represented. A client message's number is checked
+/// against this list before its bytes are read. Numbers travel: never renumber a case.
 class CommandType {
  public:
   KEELGATE_NESTED_ENUMERATION(Case, UInt64,
@@ -43,8 +43,8 @@ class CommandType {
   /// Implicit, so that a case can stand wherever a command is wanted.
   constexpr CommandType(Case which) : which_(which) {}
 
-  /// The number that travels, and the case as it is spelt here. The text lives as long as the
-  /// program.
+  /// The number that travels, and the name of the case as it is spelt above. The text lives as long
+  /// as the program.
   [[nodiscard]] constexpr UInt64 rawValue() const { return rawValueOf(which_); }
   [[nodiscard]] constexpr std::string_view name() const { return nameOf(which_); }
 

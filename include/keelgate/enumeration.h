@@ -25,7 +25,7 @@
 
 #define KEELGATE_ENUMERATION(Name_, Raw_, ...) KEELGATE_ENUMERATION_(, Name_, Raw_, __VA_ARGS__)
 
-/// The form inside a class, where only a friend is found by its argument alone.
+/// The form inside a class, where only a friend function is found by argument-dependent lookup.
 #define KEELGATE_NESTED_ENUMERATION(Name_, Raw_, ...) \
   KEELGATE_ENUMERATION_(friend, Name_, Raw_, __VA_ARGS__)
 
@@ -37,7 +37,7 @@
   }                                                                 \
   static_assert(true)
 
-/// A struct that derives from a std::variant of the records, in order, and knows the cases' names.
+/// A struct that derives from a std::variant of the records, in order, and has their cases' names.
 #define KEELGATE_CASES(Name_, ...)                                                              \
   struct Name_                                                                                  \
       : ::Keelgate::Detail::Cases<void KEELGATE_FOR_EACH(KEELGATE_CASE_RECORD_, __VA_ARGS__)> { \
@@ -60,8 +60,8 @@
 
 namespace Keelgate {
 
-/// A case as `describe` and JSON show it. Never negative, so that a negative number on the wire is
-/// an unknown one.
+/// A case as `describe` and JSON show it. Its number is never negative: a negative number on the
+/// wire is always an unknown one.
 struct EnumerationCase {
   std::string_view name;
   UInt64 rawValue;
@@ -73,14 +73,14 @@ template <class, class... Record>
 using Cases = std::variant<Record...>;
 }  // namespace Detail
 
-/// An enumeration that was declared by one of the macros; found by its argument, so that it may
-/// stand in any namespace or class.
+/// An enumeration that was declared by one of the macros. It may be in any namespace or class:
+/// argument-dependent lookup finds its cases.
 template <class E>
 concept Enumeration = std::is_enum_v<E> && requires(E value) {
   keelgateCases(value);
 };
 
-/// An enumeration that gives a stated case for a number that it does not know.
+/// An enumeration with a default case for numbers that it does not know.
 template <class E>
 concept Defaulting = Enumeration<E> && requires(E value) {
   keelgateDefault(value);
@@ -92,7 +92,7 @@ concept CaseKeyed = requires {
   T::caseNames;
 };
 
-/// All cases in declaration order. A constant of the program: views of it never end.
+/// All cases in declaration order. A constant: views of it are always valid.
 template <Enumeration E>
 inline constexpr auto casesOf = keelgateCases(E{});
 
@@ -112,7 +112,7 @@ constexpr Optional<E> fromRawValue(UInt64 rawValue) {
   return std::nullopt;
 }
 
-/// The name of a value's case. A value without a case, which only a cast can make, has none.
+/// The name of a value's case; empty for a value without a case, which only a cast can make.
 template <Enumeration E>
 constexpr std::string_view nameOf(E value) {
   for (const EnumerationCase& entry : casesOf<E>) {
@@ -121,15 +121,15 @@ constexpr std::string_view nameOf(E value) {
   return {};
 }
 
-/// The case with this raw value, or the enumeration's default. For the few codes for which an
-/// unknown number is not an error.
+/// The case with this raw value, or the enumeration's default. For the few codes where an unknown
+/// number is not an error.
 template <Defaulting E>
 constexpr E defaulting(UInt64 rawValue) {
   return fromRawValue<E>(rawValue).value_or(keelgateDefault(E{}));
 }
 
-/// The same for an optional number: absent stays absent. The default is what an unknown code means,
-/// and never what a missing one does.
+/// The same for an optional number: absent stays absent. The default stands for an unknown code,
+/// never for a missing one.
 template <Defaulting E>
 constexpr Optional<E> defaulting(Optional<UInt> rawValue) {
   if (!rawValue) return std::nullopt;

@@ -1,12 +1,12 @@
 // SPDX-License-Identifier: Apache-2.0
-/// Everything that is thrown when a message gives no record.
+/// The errors that are thrown when a message gives no record.
 ///
 /// A rejected message throws the very error that its unpacker threw inside the sandbox, with all of
 /// its fields; a failure of the host itself throws HostError. Errors are values: copy them freely,
-/// use separate ones from separate threads.
+/// and use separate ones from separate threads.
 ///
 /// Sentences, descriptions and reasons can quote what the message or its sender chose. They are
-/// UTF-8, and nothing else is promised: escape them before they reach a terminal or a log.
+/// valid UTF-8 and may contain anything else: escape them before they reach a terminal or a log.
 #pragma once
 
 #include <keelgate/command_type.h>
@@ -25,7 +25,7 @@ namespace Keelgate {
 /// What the errors share: what() gives one readable English sentence, valid as long as the error.
 class KEELGATE_API Error : public std::exception {
  public:
-  /// Owned by the error. For people: programs go by the fields of the single errors.
+  /// Owned by the error. For people: programs use the fields of the derived classes.
   [[nodiscard]] const char* what() const noexcept override { return sentence_.c_str(); }
 
  protected:
@@ -48,21 +48,21 @@ class KEELGATE_API DecodingError : public Error {
       (typeMismatch, 1),
       /// A null stands where a value is required; `codingPath` leads to it.
       (valueNotFound, 2),
-      /// The bytes are not a well-formed property list (`codingPath` is empty), or a value of the right
-      /// type is none that its field accepts (`codingPath` leads to it).
+      /// The bytes are not a well-formed property list (`codingPath` is empty), or a value of the
+      /// right type is not one that its field accepts (`codingPath` leads to it).
       (dataCorrupted, 3));
 
-  /// For whoever decodes, or reads a decoded reply; applications only receive it.
+  /// For code that decodes messages or replies; applications only receive these errors.
   DecodingError(Kind itsKind, Optional<String> itsKey, Array<CodingKey> itsPath,
                 String itsDescription);
 
   Kind kind;
-  /// The wire key that is missing; present with keyNotFound alone.
+  /// The wire key that is missing; present only with keyNotFound.
   Optional<String> key;
   /// Outermost first. At most 512 steps, which is as deep as property lists nest. An honest service
   /// takes the keys from its schemas; one that was taken over writes what it likes.
   Array<CodingKey> codingPath;
-  /// What is wrong, without the path: in English, for people.
+  /// What is wrong, without the path; in English, for people.
   String debugDescription;
 };
 
@@ -78,13 +78,13 @@ class KEELGATE_API Breach : public Error {
   Optional<String> keyPath;
 };
 
-/// The host gave the message up; nothing is known of its content. The message may be without fault,
-/// as when the machine is overloaded. It is not tried again for that: a message that was alone with
-/// its process has had its only try.
+/// The host gave the message up; nothing is known about its content. The message may be faultless,
+/// for example when the machine is overloaded. A message that had a process to itself is never
+/// retried.
 class KEELGATE_API HostError : public Error {
  public:
-  /// For programs, which may treat them differently: timedOut and crashed say nothing of the next
-  /// message, startFailed does.
+  /// For programs, which may treat them differently: timedOut and crashed say nothing about the
+  /// next message, startFailed does.
   KEELGATE_NESTED_ENUMERATION(Reason, std::uint8_t,
       /// The process that held the message died.
       (crashed, 0),
@@ -103,7 +103,7 @@ class KEELGATE_API HostError : public Error {
   HostError(Reason itsReason, String itsDescription);
 
   Reason reason;
-  /// What is known beyond the reason, for people; the reason's own sentence where that is nothing.
+  /// Details for people, or the reason's own sentence if there are none.
   String description;
 };
 
@@ -120,20 +120,20 @@ class KEELGATE_API VespClientMessageUnpackingError : public Keelgate::Error {
       /// No unpacker serves `service`, which is the identifier as it was received.
       (noUnpackerForService, 1));
 
-  /// The only ways to make one, so that each case comes with its own field.
+  /// The only ways to make one, so that each case has its field set.
   static VespClientMessageUnpackingError unimplementedCommand(Keelgate::CommandType command);
   static VespClientMessageUnpackingError noUnpackerForService(Keelgate::String service);
 
-  /// The same for both cases; with `code` it names the case to other languages.
+  /// The same for both cases; together with `code` it identifies the case in other languages.
   static constexpr const char* domain = "VespKeelgateService.VespClientMessageUnpackingError";
 
   /// The position of the case.
   [[nodiscard]] int code() const noexcept { return static_cast<int>(which); }
 
   Case which;
-  /// Present with unimplementedCommand alone.
+  /// Present only with unimplementedCommand.
   Keelgate::Optional<Keelgate::CommandType> command;
-  /// Present with noUnpackerForService alone.
+  /// Present only with noUnpackerForService.
   Keelgate::Optional<Keelgate::String> service;
 
  private:

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-/// KEELGATE_FOR_EACH(macro, (a, b), (c), …) becomes macro(a, b) macro(c) …: the one trick that all
-/// descriptions in these headers are made with. A list is written once, and expanded as members, as
+/// KEELGATE_FOR_EACH(macro, (a, b), (c), …) becomes macro(a, b) macro(c) …: all descriptions in
+/// these headers are built on it. A list is written once and expanded several times: as members, as
 /// names, as the cases of a switch.
 ///
 /// The preprocessor does not expand a macro within itself. A step therefore leaves the name of the

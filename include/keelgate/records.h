@@ -18,7 +18,7 @@
 
 namespace Keelgate {
 
-/// Types as a table that is walked at compile time. A value of it is an empty tag.
+/// A list of types that is walked at compile time. A value of it is an empty tag.
 template <class... T>
 struct TypeList {
   static constexpr std::size_t size = sizeof...(T);
@@ -50,18 +50,18 @@ template <class T>
 concept OutputRecord = Detail::positionOf<T>(OutputRecords())
 < OutputRecords::size;
 
-/// What stands for the record in a request, and is the place of its unpacker in the server.
+/// The number of the record in a request, and the position of its unpacker in the server.
 template <OutputRecord T>
 constexpr std::size_t recordNumber = Detail::positionOf<T>(OutputRecords());
 
-/// The context that comes with every client message. Set by the caller from what delivered the
-/// message. An attacker may choose both, since a message can be sent to any service with any
-/// number.
+/// The context that comes with every client message. The caller sets it from what delivered the
+/// message. An attacker may choose both values: a message can be sent to any service with any
+/// command number.
 struct VespClientMessageContext {
-  /// Any number; one that CommandType does not know is refused with a Breach.
+  /// Any number; one that CommandType does not know gives a Breach.
   UInt64 command;
-  /// The delivery-service topic that the message arrived under. Compared exactly, with regard to
-  /// case.
+  /// The delivery-service topic that the message arrived under. Compared exactly: upper and lower
+  /// case differ.
   String service;
 };
 

@@ -2,7 +2,7 @@
 /// The name of a type as its source spells it, without its namespace or enclosing class, so that
 /// no table has to repeat it as a string.
 ///
-/// Compile time alone; callable from any thread. The texts live as long as the program.
+/// Evaluated at compile time; callable from any thread. The texts live as long as the program.
 #pragma once
 
 #include <cstddef>
@@ -12,8 +12,8 @@ namespace Keelgate {
 
 namespace Detail {
 
-// The compilers have no other spelling of a type at compile time: typeid's name is mangled, and no
-// constant.
+// The compilers have no other spelling of a type at compile time: typeid's name is mangled, and not
+// a constant.
 template <class T>
 constexpr std::string_view prettyFunction() {
   return __PRETTY_FUNCTION__;

@@ -21,8 +21,8 @@
 
 namespace Keelgate {
 
-/// A borrowed octet string: the bytes of a message. Valid only as long as its owner. Nobody changes
-/// the bytes while a call looks at them.
+/// A borrowed octet string: the bytes of a message. Valid only as long as its owner. The bytes must
+/// not change during a call.
 using Bytes = std::span<const std::byte>;
 
 /// The word-sized and the explicitly sized integers are both 64 bits wide, and are distinct types
@@ -37,14 +37,14 @@ static_assert(sizeof(Int) == 8 && sizeof(UInt) == 8, "the word-sized integers ha
 using Double = double;
 using Bool = bool;
 
-/// UTF-8, always valid. Zero characters may stand in it, and characters that drive a terminal too.
+/// UTF-8, always valid. It may contain null characters and terminal control sequences.
 using String = std::string;
 
-/// An owned octet string. Not looked into: what is in it is as the sender made it.
+/// An owned octet string. Its content is whatever the sender put there.
 using Data = std::vector<std::byte>;
 
-/// Absent means that the message had no such value, or null in its place, and never that a value
-/// was refused.
+/// Absent means that the message had no such value, or null in its place; never that a value was
+/// rejected.
 template <class T>
 using Optional = std::optional<T>;
 
@@ -53,7 +53,7 @@ template <class T>
 using Array = std::vector<T>;
 
 /// A point in time, in seconds since 2001-01-01T00:00:00Z, never NaN or infinite. Any finite
-/// number, also far outside the calendar: who converts it checks the range first.
+/// number, even far outside the calendar: check the range before converting it.
 struct Date {
   double secondsSinceReferenceDate;
 

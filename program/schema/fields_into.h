@@ -20,10 +20,13 @@
 
 namespace VespKeelgateService {
 
-/// Also their order: swapped fields of one type would otherwise be filled crosswise.
+/// The position of the first field that has another name in the other list, or the length: in an
+/// error the compiler prints it. Also for their order: swapped fields would be filled crosswise.
 template <class S, class R>
-consteval bool namesAgree() {
-  return std::ranges::equal(Keelgate::FieldsOf<S>::names, Keelgate::FieldsOf<R>::names);
+consteval std::size_t firstOtherName() {
+  constexpr auto& names = Keelgate::FieldsOf<S>::names;
+  const auto other = std::ranges::mismatch(names, Keelgate::FieldsOf<R>::names).in1;
+  return static_cast<std::size_t>(other - names.begin());
 }
 
 /// Whether a value that a schema describes as From can be decoded into a To: into the same, or into
@@ -31,7 +34,8 @@ consteval bool namesAgree() {
 template <class From, class To>
 constexpr bool fills = std::same_as<From, To>;
 template <Keelgate::Schema From, Keelgate::Record To>
-constexpr bool fills<From, To> = namesAgree<From, To>();
+constexpr bool fills<From, To> = std::ranges::equal(Keelgate::FieldsOf<From>::names,
+                                                    Keelgate::FieldsOf<To>::names);
 /// Absent stays absent: a missing dictionary becomes no record, an empty one becomes a record.
 template <class From, class To>
 constexpr bool fills<Keelgate::Optional<From>, Keelgate::Optional<To>> = fills<From, To>;
@@ -59,9 +63,9 @@ struct Places {
 template <class Function, std::size_t size>
 struct Decoders {
   std::array<Function, size> functions{};
-  /// Whether each member can hold what its field does. A function cannot be compared with null at
-  /// compile time where sanitizers are on.
-  bool fit = true;
+  /// The position of a member that cannot hold what its field does, or `size`. A function cannot be
+  /// compared with null at compile time where sanitizers are on.
+  std::size_t misfit = size;
 };
 
 /// Into the place in R at the position of the field of S. `Decode` gives, as `Decode::template
@@ -75,13 +79,16 @@ constexpr auto decodersOf = [] {
                 "the schema and the record have different numbers of fields");
   Decoders<typename Decode::Function, From::size> decoders;
   if constexpr (From::size == To::size) {
-    static_assert(namesAgree<S, Listed>(),
+    static_assert(firstOtherName<S, Listed>() == From::size,
                   "a field of the record has another name than the schema's field at its position");
     std::size_t position = 0;
     From::each([&]<class W>(Keelgate::Field<S, W>) {
       To::at(position, [&]<class V>(Keelgate::Field<Listed, V>) {
-        decoders.fit = decoders.fit && fills<W, V>;
-        if constexpr (fills<W, V>) decoders.functions[position] = Decode::template into<W, V>;
+        if constexpr (fills<W, V>) {
+          decoders.functions[position] = Decode::template into<W, V>;
+        } else {
+          decoders.misfit = position;
+        }
       });
       ++position;
     });

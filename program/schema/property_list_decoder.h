@@ -177,7 +177,8 @@ template <Keelgate::Schema S, class R>
 void decodeFields(Decoding& decoding, const PropertyList::Value& value, const CodingPath& path,
                   R& into) {
   constexpr auto& decoders = decodersOf<S, R, FieldDecoder<S, R>>;
-  static_assert(decoders.fit, "a field of the record cannot hold what the schema's field does");
+  static_assert(decoders.misfit == S::CodingKeys::size,
+                "a field of the record cannot hold what the schema's field does");
   const FieldValues<S> values(value);
   // What stands before the first field that is missing may be wrong, too.
   const std::size_t end = values.present().firstMissing(requiredFields<S>);

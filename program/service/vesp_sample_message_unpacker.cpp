@@ -7,14 +7,13 @@
 namespace VespKeelgateService {
 
 using Keelgate::construct;
-using Keelgate::VespSampleMessage;
 
 VespClientMessageResult VespSampleMessageUnpacker::unpack(Bytes from, const Context& with) const {
-  return checkingCommand(with, [&] {
-    auto schema = PropertyListDecoder().decode<VespSampleMessageSchema>(from);
+  return dispatch(Commands(), with, [&]<class Row>(Row) {
+    auto schema = PropertyListDecoder().decode<typename Row::Schema>(from);
 
     // Deliberate: the message's own command number, never compared with the context's.
-    return VespClientMessageResult{.result = construct<VespSampleMessage>({
+    return VespClientMessageResult{.result = construct<typename Row::Record>({
                                        .command = schema.command,
                                        .clientName = std::move(schema.clientName),
                                        .date = schema.date,

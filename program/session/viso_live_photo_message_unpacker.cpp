@@ -7,23 +7,12 @@ namespace VespKeelgateService {
 
 using Keelgate::ClientMessageType;
 using Keelgate::construct;
-using Keelgate::VespRestrictedMessage;
-
-namespace {
-
-template <class Row>
-VespClientMessageResult answer(Keelgate::TypeList<Row>, CommandType command) {
-  if (command.rawValue() != Row::command) {
-    throw VespClientMessageUnpackingError::unimplementedCommand(command);
-  }
-  return {.result =
-              construct<VespRestrictedMessage>({.messageType = ClientMessageType::restricted})};
-}
-
-}  // namespace
 
 VespClientMessageResult VisoLivePhotoMessageUnpacker::unpack(Bytes, const Context& with) const {
-  return checkingCommand(with, [](CommandType command) { return answer(Commands(), command); });
+  return dispatch(Commands(), with, []<class Row>(Row) {
+    return VespClientMessageResult{
+        .result = construct<typename Row::Record>({.messageType = ClientMessageType::restricted})};
+  });
 }
 
 }  // namespace VespKeelgateService

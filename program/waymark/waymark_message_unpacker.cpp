@@ -52,8 +52,8 @@ WaymarkMessage convertMessage(WaymarkSchema&& schema, Array<WaymarkGroupFields>&
 }  // namespace
 
 VespClientMessageResult WaymarkMessageUnpacker::unpack(Bytes from, const Context& with) const {
-  return checkingCommand(with, [&] {
-    auto checkIn = PropertyListDecoder().decode<WaymarkSchema, FoldedCheckIn>(from);
+  return dispatch(Commands(), with, [&]<class Row>(Row) {
+    auto checkIn = PropertyListDecoder().decode<typename Row::Schema, FoldedCheckIn>(from);
     constructInPlace(checkIn.groups);
     return VespClientMessageResult{
         .result = convertMessage(std::move(checkIn.fields), std::move(checkIn.groups))};

@@ -2,8 +2,8 @@
 /// The record of any property list: the tree that the message is. Values that own all that they
 /// hold; separate ones may be used from separate threads.
 ///
-/// Containers nest at most 512 deep. Whoever walks a tree by recursion needs a stack for that; to
-/// copy, compare or destroy one is such a walk.
+/// Containers nest at most 512 deep. A recursive walk needs enough stack for that; copying,
+/// comparing and destroying a tree are such walks.
 #pragma once
 
 #include <keelgate/describe.h>
@@ -24,7 +24,7 @@ struct PropertyListSet {
   bool operator==(const PropertyListSet& other) const = default;
 };
 
-/// A number of 128 bits that names something within the document.
+/// A 128-bit number that refers to something within the document.
 struct PropertyListUID {
   KEELGATE_RECORD(PropertyListUID,
       (UInt64, high),
@@ -33,8 +33,8 @@ struct PropertyListUID {
   bool operator==(const PropertyListUID&) const = default;
 };
 
-/// One value, with everything below it. The entries of a dictionary stand in the order of the
-/// message, and no key stands twice. An integer is the second kind only above the largest Int64.
+/// One value, with everything below it. The entries of a dictionary are in the order of the
+/// message, and no key occurs twice. An integer is a UInt64 only above the largest Int64.
 KEELGATE_CASES(PropertyListValue,
     (std::nullptr_t, null),
     (Bool, boolean),
@@ -49,7 +49,7 @@ KEELGATE_CASES(PropertyListValue,
     (PropertyListSet, set),
     (Array<PropertyListEntry>, dictionary));
 
-/// What a dictionary holds under one key.
+/// A key of a dictionary and its value.
 struct PropertyListEntry {
   KEELGATE_RECORD(PropertyListEntry,
       (String, key),

@@ -8,8 +8,8 @@
 
 namespace Keelgate {
 
-/// Every value is as it was received. Whoever sends them on checks them first: nothing here keeps a
-/// line end out of a value, and with it a header that somebody else wrote.
+/// Every value is as it was received. Check them before you send them on: a value may contain a
+/// line break, and with it a header that the attacker wrote.
 struct PulseUserPayloadHttpHeaders {
   KEELGATE_RECORD(PulseUserPayloadHttpHeaders,
       (Optional<String>, adhocServiceOverride),

@@ -2,7 +2,7 @@
 /// The record of a push payload, and the records inside it. Values that own all that they hold;
 /// separate ones may be used from separate threads.
 ///
-/// Numbers are the sender's codes and counts, checked for their type and their 64 bits alone.
+/// Numbers are the sender's codes and counts, checked only for their type and 64-bit range.
 #pragma once
 
 #include <keelgate/describe.h>
@@ -11,7 +11,7 @@
 
 namespace Keelgate {
 
-/// How often the delivery was tried.
+/// How often the delivery has been attempted.
 struct PulseUserPayloadDeliveryContext {
   KEELGATE_RECORD(PulseUserPayloadDeliveryContext,
       (Optional<Int>, count));
@@ -26,8 +26,8 @@ struct PulseHoplinePluginRequest {
       (Optional<Bool>, pluginDevMode));
 };
 
-/// What a media relay answered for one participant. The participant is a number of 64 bits without
-/// sign: read as a signed one, half of them would turn negative.
+/// What a media relay answered for one participant. Participants are unsigned 64-bit numbers: as
+/// signed ones, half of them would be negative.
 struct PulseHoplineAllocationStatus {
   KEELGATE_RECORD(PulseHoplineAllocationStatus,
       (Optional<UInt64>, participantId),
@@ -60,14 +60,14 @@ struct PulseHoplinePluginAllocation {
 };
 
 /// One push payload. The two payload lists and the four relay lists are empty where the message had
-/// none; everything else that the message lacked is absent. Payloads nest at most as deep as
-/// property lists may, which is 256.
+/// none; everything else that the message lacked is absent. Payloads nest at most 256 deep, half as
+/// deep as property lists do.
 ///
-/// Whoever walks it depth first by recursion needs a stack for that, or a limit of its own: a
-/// message of some KB nests to the full depth.
+/// A recursive walk needs enough stack for that, or a limit of its own: a message of a few KB can
+/// nest to the full depth.
 struct PulseUserPayload {
   KEELGATE_RECORD(PulseUserPayload,
-      /// What the payload is: the one field that is always there.
+      /// What the payload is: the only field that is always present.
       (Int, command),
       (Optional<Int>, commandContext),
       (Optional<Int>, version),
@@ -96,8 +96,8 @@ struct PulseUserPayload {
       (Optional<String>, userAgent),
       /// An attachment in the chunk store: owner, signature, length in octets, and where to fetch
       /// or put it. Its expiry is in nanoseconds, as the sender counts. URLs here and below are any
-      /// text that the sender chose: whoever fetches one shows its owner that the message was read,
-      /// and from where.
+      /// text that the sender chose: fetching one tells its owner that the message was read, and
+      /// from where.
       (Optional<String>, BCSOwnerId),
       (Optional<Data>, BCSFileSignature),
       (Optional<Int64>, BCSFileLength),
@@ -144,14 +144,14 @@ struct PulseUserPayload {
       (Optional<Int>, storageCheckVersion),
       (Optional<Int64>, dateExpirationSeconds),
       (Optional<Int>, ostrelProtocol),
-      /// The next three may ask for more to be logged or traced. It is a stranger who asks.
+      /// The next three may ask for more to be logged or traced. The request comes from a stranger.
       (Optional<Bool>, internalBuild),
       (Optional<Bool>, loggingProfile),
       (Optional<Bool>, traceProfile),
       (Optional<Bool>, groupMessage),
       (Optional<String>, contentType),
-      /// Header values that stand by themselves; those of a tunnelled exchange are in httpHeaders.
-      /// A message may bring both, and neither fills in for the other.
+      /// Header values outside of httpHeaders, which has those of a tunnelled exchange. A message
+      /// may have both, and neither replaces the other.
       (Optional<String>, adhocServiceOverride),
       (Optional<Data>, responseIdentifier),
       (Optional<String>, responseIdentifierString),
@@ -205,13 +205,13 @@ struct PulseUserPayload {
       (Optional<Data>, activeRelayIp),
       (Optional<Int>, selfAllocTokenCountOld),
       (Optional<Int>, selfAllocTokenCount),
-      /// Plugins: those asked for together, and independently of them one by itself.
+      /// Plugins: several that are requested together, and independently of them a single one.
       (Array<PulseHoplinePluginRequest>, pluginRequests),
       (Optional<String>, pluginName),
       (Optional<String>, pluginConfig),
       (Optional<Int>, pluginStream),
       (Optional<Bool>, pluginDevMode),
-      /// The relay session that is asked for.
+      /// The relay session that is requested.
       (Optional<Bool>, hlNewSession),
       (Optional<Int>, requestType),
       (Optional<Data>, vespSessionId),
@@ -237,14 +237,14 @@ struct PulseUserPayload {
       (Optional<Int>, relayHighPriorityPort),
       (Optional<Int>, ipFamilyPreference),
       (Optional<Int64>, allocationEpochTimeMillis),
-      /// What became of the allocation, for one participant and for each.
+      /// The result of the allocation, for one participant and for each.
       (Optional<Int>, allocationStatus),
       (Array<PulseHoplineAllocationStatus>, allocationStatuses),
       (Array<PulseHoplineSelfAllocToken>, selfAllocTokenList),
       (Optional<Data>, relayReportingBlob),
       (Optional<Int>, relayServerType),
       (Array<PulseHoplinePluginAllocation>, pluginAllocations),
-      /// What an answer says of the command that it answers.
+      /// What an answer says about its command.
       (Optional<Int>, hlErrorCode),
       (Optional<Int>, originalCommand),
       (Optional<Bool>, isBulkedPayload),
@@ -253,8 +253,8 @@ struct PulseUserPayload {
       (Optional<Bool>, expectsPeerResponse),
       (Optional<Int>, allowGDR),
       (Optional<Int>, sendMode),
-      /// Whom the device knows the sender as, or so the message says: these are claims like all
-      /// else in it, and prove nothing.
+      /// Who the sender claims to be on this device: like all else in the message, it proves
+      /// nothing.
       (Optional<Bool>, isTrustedSender),
       (Optional<Bool>, isUPlusOneKey));
 };

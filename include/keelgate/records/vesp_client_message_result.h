@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-/// What every client message gives: one record, under the name of its kind. Values that own all
+/// The result of every client message: one record, under the name of its kind. Values that own all
 /// that they hold; separate ones may be used from separate threads.
 #pragma once
 
@@ -11,9 +11,9 @@
 
 namespace Keelgate {
 
-/// One case for each kind. A new kind of client message is one more alternative here. In a
-/// std::visit the compiler then shows every place that has to know it. The position of an
-/// alternative travels between service and client, which are always of one build.
+/// One case for each kind of client message. The compiler rejects a std::visit that lacks a new
+/// one. The position of an alternative travels between service and client, which are always of the
+/// same build.
 KEELGATE_CASES(VespClientMessageType,
     (VespSampleMessage, vespSampleMessage),
     (VespSessionInvitation, sessionInvitation),
@@ -24,7 +24,7 @@ KEELGATE_CASES(VespClientMessageType,
     (VespRestrictedMessage, messageTypeRestricted),
     (WaymarkMessage, waymarkMessage));
 
-/// The one record whose JSON is not an object of its own, but its case.
+/// Its JSON is that of its only field: an object with the case as its key.
 struct VespClientMessageResult {
   KEELGATE_RECORD(VespClientMessageResult,
       (VespClientMessageType, result));

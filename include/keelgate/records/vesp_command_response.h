@@ -8,13 +8,13 @@
 
 namespace Keelgate {
 
-/// Only the command number is always there. Nothing ties the answer to a command that was asked:
-/// whoever sent that compares the numbers.
+/// Only the command number is always present. Nothing ties the answer to a command that was sent:
+/// the sender of the command has to compare the numbers.
 struct VespCommandResponse {
   KEELGATE_RECORD(VespCommandResponse,
       (Int, command),
       /// The message that is answered, by number or by identifier. Deliberate: a number here, a
-      /// text in payloads.
+      /// string in payloads.
       (Optional<Int64>, messageId),
       (Optional<Data>, messageUUID),
       /// How it went, in the delivery service's codes.

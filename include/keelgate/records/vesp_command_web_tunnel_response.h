@@ -9,29 +9,29 @@
 
 namespace Keelgate {
 
-/// `httpBody` is the stored or inline body, of any length. Only the command number is always there.
-/// Body and headers come from the server that was asked, so they are a third party's and not the
-/// delivery service's.
+/// `httpBody` is the stored or inline body, of any length. Only the command number is always
+/// present. Body and headers come from the HTTP server, which is a third party and not the delivery
+/// service.
 struct VespCommandWebTunnelResponse {
   KEELGATE_RECORD(VespCommandWebTunnelResponse,
       (Int, command),
       /// The message that is answered, by number or by identifier. Deliberate: a number here, a
-      /// text in payloads.
+      /// string in payloads.
       (Optional<Int>, messageId),
       (Optional<Data>, messageUUID),
       (Optional<Int>, responseStatus),
       (Optional<String>, contentType),
       /// In nanoseconds, as the sender counts.
       (Optional<Int64>, epochTimeNanos),
-      /// Any text: that it is a URL, or the one that was asked for, is not checked.
+      /// Any text: it need not be a URL, nor the one that was requested.
       (Optional<String>, httpUrl),
       /// Absent when the message had none.
       (Optional<PulseUserPayloadHttpHeaders>, httpHeaders),
       (Optional<Data>, httpBody),
-      /// Where a body is that was too large to carry, and the key that opens it.
+      /// Where a body that was too large to carry is stored, and the key to decrypt it.
       (Optional<String>, httpBodyUrl),
       (Optional<Data>, httpBodyKey),
-      /// Of the HTTP exchange, where responseStatus is the delivery's.
+      /// The status of the HTTP exchange; responseStatus is that of the delivery.
       (Optional<Int>, httpResponseStatus),
       (Optional<String>, httpErrorMsg));
 };

@@ -2,7 +2,7 @@
 /// The record of an invitation: an envelope around one of five kinds. Values that own all that they
 /// hold; separate ones may be used from separate threads.
 ///
-/// Anybody can send an invitation. That one was decoded says nothing of who sent it.
+/// Anyone can send an invitation: that it was decoded says nothing about who sent it.
 #pragma once
 
 #include <keelgate/describe.h>
@@ -10,14 +10,14 @@
 
 namespace Keelgate {
 
-/// A cloud sharing token: opaque octets, never empty. Not parsed here: that it opens anything is
-/// for the cloud to say.
+/// A cloud sharing token: opaque octets, never empty. Not parsed here: only the cloud can tell
+/// whether it opens anything.
 struct SkyvaultSharingToken {
   KEELGATE_RECORD(SkyvaultSharingToken,
       (Data, tokenData));
 };
 
-/// The smallest kind; all of it may be absent.
+/// The smallest kind; every field may be absent.
 struct VespSampleInvitation {
   KEELGATE_RECORD(VespSampleInvitation,
       (Optional<String>, title),
@@ -25,16 +25,16 @@ struct VespSampleInvitation {
       (Optional<String>, reason));
 };
 
-/// The least version of the home's hub, and the features that it must have. Both are always there
-/// once the message has the dictionary; the features are codes.
+/// The minimum version of the home's hub, and the features that it must have, as codes. Both are
+/// present whenever the message has the dictionary.
 struct VespHearthInvitationRequestedCapabilities {
   KEELGATE_RECORD(VespHearthInvitationRequestedCapabilities,
       (Double, hearthdVersion),
       (Array<Int>, homeSupportedFeatures));
 };
 
-/// The times are as the sender counts them; neither they nor the day mask are checked. A rule with
-/// nothing in it is kept as one.
+/// The times are as the sender counts them; neither they nor the day mask are checked. An empty
+/// rule is kept as a rule.
 struct VespHearthInviteeScheduleWeekDayRule {
   KEELGATE_RECORD(VespHearthInviteeScheduleWeekDayRule,
       (Optional<Int>, startTime),
@@ -57,8 +57,8 @@ struct VespHearthInviteeSchedule {
       (Optional<Array<VespHearthInviteeScheduleYearDayRule>>, yearDayRules));
 };
 
-/// An invitation to join a home. Every field may be absent. Deliberate: it has no share URL: the
-/// message's has its type checked and goes no further.
+/// An invitation to join a home. Every field may be absent. Deliberate: there is no share URL here;
+/// that of the message is only checked for its type.
 struct VespHearthInvitation {
   /// Keeps the octets of a sharing token; throws Breach when there are none.
   static SkyvaultSharingToken decodeSkyvaultToken(Data tokenData);
@@ -83,7 +83,7 @@ struct VespHearthInvitation {
       (Optional<String>, userId),
       (Optional<Int>, invitationState),
       (Optional<Int>, presenceAuthorizationStatus),
-      /// Of whoever issued the invitation. Nothing vouches for it yet.
+      /// The key of whoever issued the invitation. Nothing vouches for it yet.
       (Optional<Data>, issuerPublicKeyExternalRepresentation));
 };
 
@@ -104,7 +104,7 @@ struct VespCofferSharingInvitation {
 /// An invitation to share measurements.
 struct VespVitalsInvitation {
   KEELGATE_RECORD(VespVitalsInvitation,
-      /// A serialised message that nobody has looked into.
+      /// A serialised message, not parsed here.
       (Data, untrustedData));
 };
 
@@ -112,7 +112,7 @@ struct VespVitalsInvitation {
 struct VespStrideSharingInvitation {
   KEELGATE_RECORD(VespStrideSharingInvitation,
       (Int, item),
-      /// A serialised message that nobody has looked into.
+      /// A serialised message, not parsed here.
       (Data, untrustedData));
 };
 
@@ -125,7 +125,7 @@ KEELGATE_CASES(VespDictionaryContext,
     (VespVitalsInvitation, vespVitalsInvitation),
     (VespStrideSharingInvitation, vespStrideSharingInvitation));
 
-/// How the context is written down; there is one way.
+/// How the context is encoded; there is one way.
 KEELGATE_CASES(VespInvitationContextType,
     (VespDictionaryContext, dictionary));
 
@@ -134,7 +134,7 @@ struct VespInvitationContext {
   KEELGATE_RECORD(VespInvitationContext,
       /// The schema string that named the kind.
       (String, schema),
-      /// Always 1, the number of the one way: any other is refused.
+      /// Always 1, the only encoding: any other number is rejected.
       (Int, contextType),
       (VespInvitationContextType, context));
 };

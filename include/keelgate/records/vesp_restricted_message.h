@@ -12,8 +12,8 @@ KEELGATE_ENUMERATION(ClientMessageType, UInt,
     (unrestricted, 0),
     (restricted, 1));
 
-/// It is the same for every message of its service. So it cannot leak any, and bytes that would
-/// harm a decoder never meet one.
+/// It is the same for every message of its service, so it leaks no content, and no decoder ever
+/// reads the bytes. A value; separate ones may be used from separate threads.
 struct VespRestrictedMessage {
   KEELGATE_RECORD(VespRestrictedMessage,
       (ClientMessageType, messageType));

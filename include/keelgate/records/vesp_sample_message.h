@@ -8,12 +8,12 @@
 
 namespace Keelgate {
 
-/// The fields are optional because the framework's record is so; the service always gives the first
-/// two.
+/// All fields are optional because the framework's record is defined so; the service always sets
+/// the first two.
 struct VespSampleMessage {
   KEELGATE_RECORD(VespSampleMessage,
-      /// The command number that the message itself states. Deliberate: it may be another than the
-      /// one that the message arrived with.
+      /// The command number that the message itself states. Deliberate: it may differ from the
+      /// command that the message arrived with.
       (Optional<Int>, command),
       (Optional<String>, clientName),
       (Optional<Date>, date),

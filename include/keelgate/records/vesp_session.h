@@ -2,9 +2,9 @@
 /// The records of the call services: an invitation to a session, its answers and follow-ups. Values
 /// that own all that they hold; separate ones may be used from separate threads.
 ///
-/// Each names a session and a participant, as texts that the sender chose. Nothing here knows which
-/// sessions exist: an answer may come for a call that never was. Unlike a check-in's codes, an
-/// unknown number of any enumeration here fails the message.
+/// Each names a session and a participant, as strings that the sender chose. Nothing here knows
+/// which sessions exist: an answer may arrive for a call that never was. Unlike in a check-in, a
+/// number that an enumeration here does not know fails the message.
 #pragma once
 
 #include <keelgate/describe.h>
@@ -12,8 +12,8 @@
 
 namespace Keelgate {
 
-/// A call is offered. The switches are wishes of a stranger. The host decides, above all on those
-/// that would take protection away.
+/// A call is offered. The switches are a stranger's wishes. The host decides on them, above all on
+/// those that reduce protection.
 struct VespSessionInvitation {
   /// How the media of the call travel.
   KEELGATE_NESTED_ENUMERATION(TransportType, UInt,
@@ -36,7 +36,7 @@ struct VespSessionInvitation {
       /// The caller's key. Nothing vouches for it yet.
       (Optional<Data>, unauthenticatedPublicKey),
       (Optional<Bool>, assumeRemoteDeviceEncryption),
-      /// Opaque to everybody but the two ends.
+      /// Opaque to everyone but the two ends.
       (Optional<Data>, sessionMessageContext),
       (Optional<Bool>, usePhoneTetherLocalMessage),
       /// Who calls, and in which session, as they say.
@@ -47,8 +47,8 @@ struct VespSessionInvitation {
       (Optional<Bool>, useCloudPairedControlChannel));
 };
 
-/// The call is taken. What an invitation calls the sender's own is `remote` here: it is seen from
-/// the caller.
+/// The call is accepted. What describes the sender is called `remote` here, from the caller's point
+/// of view.
 struct VespSessionAccept {
   KEELGATE_RECORD(VespSessionAccept,
       (UInt, version),
@@ -64,13 +64,13 @@ struct VespSessionAccept {
       (Optional<Bool>, remoteUsePhoneTetherLocalMessage),
       /// What the other side's media are secured with, and where its streams begin.
       (Optional<Data>, remoteKeyMaterialData),
-      /// Deliberate: signed, as they travel.
+      /// Deliberate: signed, as on the wire.
       (Optional<Int>, remoteSSRC),
       (Optional<Int>, remoteSecStart));
 };
 
-/// The call is refused. Deliberate: declined elsewhere gives this record too, and which of the two
-/// commands it came with is not kept.
+/// The call is declined. Deliberate: "declined elsewhere" gives this record too, and which of the
+/// two commands it was is not kept.
 struct VespSessionDecline {
   KEELGATE_RECORD(VespSessionDecline,
       (UInt, version),
@@ -79,7 +79,7 @@ struct VespSessionDecline {
       (Optional<Data>, sessionMessageContext));
 };
 
-/// The caller takes the offer back, or a participant leaves.
+/// The caller withdraws the offer, or a participant leaves.
 struct VespSessionCancel {
   /// Why the other side says that it ended.
   KEELGATE_NESTED_ENUMERATION(VespSessionEndedReason, UInt,
@@ -97,14 +97,14 @@ struct VespSessionCancel {
       (UInt, version),
       (String, sessionID),
       (String, participantID),
-      /// Absent when the sender gave none.
+      /// Absent if the sender gave none.
       (Optional<VespSessionEndedReason>, remoteEndReason),
       (Optional<Data>, sessionMessageContext));
 };
 
-/// A running session is set up anew.
+/// A running session is to be set up again.
 struct VespSessionReinitiate {
-  /// There is no default: to do the wrong thing anew would be worse than to do nothing.
+  /// There is no default: repeating the wrong step would be worse than doing nothing.
   KEELGATE_NESTED_ENUMERATION(VespSessionReinitiateSubcommand, UInt,
       (restartConnection, 0),
       (renegotiateMedia, 1),
@@ -115,7 +115,7 @@ struct VespSessionReinitiate {
       (UInt, version),
       (String, sessionID),
       (String, participantID),
-      /// What is to be done anew.
+      /// What is to be repeated.
       (VespSessionReinitiateSubcommand, sessionReinitiateSubcommand));
 };
 

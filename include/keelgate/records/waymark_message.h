@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The record of a safety check-in. A code that the framework does not know is its default case: a
-/// newer sender's check-in must still arrive, since somebody may depend on it.
+/// The record of a safety check-in. A code that the framework does not know becomes its default
+/// case: a newer sender's check-in must still arrive, since someone may depend on it.
 ///
 /// Values that own all that they hold; separate ones may be used from separate threads.
 #pragma once
@@ -10,7 +10,7 @@
 
 namespace Keelgate {
 
-/// What the check-in tells. The one code that is required.
+/// The kind of check-in; the only code that is required.
 KEELGATE_DEFAULTING_ENUMERATION(WMMessageType, UInt, unknown,
     (unknown, 0),
     (sessionStart, 1),
@@ -20,7 +20,7 @@ KEELGATE_DEFAULTING_ENUMERATION(WMMessageType, UInt, unknown,
     (cacheUpdate, 5),
     (locationUpdate, 6));
 
-/// What is waited for.
+/// What ends the session.
 KEELGATE_DEFAULTING_ENUMERATION(WMsessionType, UInt, unknown,
     (unknown, 0),
     (timer, 1),
@@ -46,7 +46,7 @@ KEELGATE_DEFAULTING_ENUMERATION(GLClientLocationReferenceFrame, UInt, unknown,
     (wgs84, 1),
     (shifted, 2));
 
-/// Why the sender's device raised it.
+/// What triggered it on the sender's device.
 KEELGATE_DEFAULTING_ENUMERATION(WMTriggerCategory, UInt, unknown,
     (unknown, 0),
     (timerExpired, 1),
@@ -55,8 +55,8 @@ KEELGATE_DEFAULTING_ENUMERATION(WMTriggerCategory, UInt, unknown,
     (unresponsive, 4),
     (emergency, 5));
 
-/// One group of recipients. Receivers know a group by its number, not by its place in the list. An
-/// empty group is a group: all that the number says is that it may have recipients.
+/// One group of recipients. Receivers know a group by its number, not by its position in the list.
+/// An empty group is kept: its number only says that it may have recipients.
 struct WaymarkGroupFields {
   KEELGATE_RECORD(WaymarkGroupFields,
       /// 2 to 32.
@@ -68,8 +68,8 @@ struct WaymarkGroupFields {
 };
 
 /// Times, angles, lengths and speeds are as the sender counts them. The first group of recipients
-/// stands in the record itself; `groupFields` has the groups 2 to 32, empty ones too. No value is
-/// tied to another: a latitude may come without a longitude.
+/// is in the record itself; `groupFields` has the groups 2 to 32, empty ones too. No field depends
+/// on another: a latitude may come without a longitude.
 struct WaymarkMessage {
   KEELGATE_RECORD(WaymarkMessage,
       (WMMessageType, messageType),
@@ -85,7 +85,7 @@ struct WaymarkMessage {
       (Optional<String>, sharingInvitationData),
       (Optional<String>, shareURL),
       (Optional<String>, participantID),
-      /// What is checked in on, and when it should end.
+      /// What the check-in is about, and when it should end.
       (Optional<WMsessionType>, sessionType),
       (Optional<Double>, estimatedEndTime),
       (Optional<Double>, coarseEstimatedEndTime),
@@ -93,8 +93,8 @@ struct WaymarkMessage {
       (Optional<String>, sessionDestinationMapItem),
       /// What the sender's device last warned about.
       (Optional<WMDeviceConfigurationLowPowerModeWarningState>, lowPowerModeWarningState),
-      /// What set it off, when and where. Degrees, metres and metres per second as the sender has
-      /// them; hunc and vunc are the horizontal and vertical uncertainty.
+      /// What triggered it, when and where. Degrees, metres and metres per second, as the sender
+      /// measured them; hunc and vunc are the horizontal and vertical uncertainty.
       (Optional<Double>, triggerTime),
       (Optional<Double>, latitude),
       (Optional<Double>, longitude),
@@ -105,7 +105,7 @@ struct WaymarkMessage {
       (Optional<GLClientLocationReferenceFrame>, referenceFrame),
       (Optional<Double>, speed),
       (Optional<WMTriggerCategory>, triggerType),
-      /// Where the sender left its last known state for the recipients.
+      /// Where the sender stored its last known state for the recipients.
       (Optional<String>, safetyCacheKey),
       (Optional<String>, safetyCacheToken),
       (Optional<Bool>, isSOSTrigger),
