@@ -38,6 +38,7 @@ std::size_t KeyTable::add(std::uint32_t dictionary, std::span<const Named> keys,
   std::size_t added = 0;
   for (const Named& key : keys) {
     const std::uint32_t its = key.number != 0 ? key.number : number(key, left);
+    --left;
     std::uint32_t& last = last_[its - 1];
     if (last == mark) break;
     last = mark;

@@ -114,7 +114,7 @@ void ServiceProcess::readNews() noexcept {
   if (now < lastLook_ + leavePatience) return;
   lastLook_ = now;
   // One that was taken over may have answered and stay, to use the processor and its memory.
-  killOverdue(SlotState::overdue);
+  killAll(SlotState::overdue, SlotState::stayed);
   for (Slot& slot : slots_) {
     if (slot.state == SlotState::leaving) slot.state = SlotState::overdue;
   }
@@ -141,11 +141,12 @@ void ServiceProcess::noteFrame(const ControlFrame& frame) noexcept {
 }
 
 void ServiceProcess::noteExit(Slot& slot, const Exit& exit) noexcept {
-  if (!exit.neverStarted && isAbnormal(exit.status, slot.state == SlotState::killed)) retire();
-  // It had to be killed: others of its sender may hold more slots.
-  if (slot.state == SlotState::killed && WIFSIGNALED(exit.status)) {
-    impatientUntil_ = Clock::now() + impatience;
+  const bool stayed = slot.state == SlotState::stayed;
+  if (!exit.neverStarted && isAbnormal(exit.status, stayed || slot.state == SlotState::killed)) {
+    retire();
   }
+  // Others of its sender may hold more slots.
+  if (stayed && WIFSIGNALED(exit.status)) impatientUntil_ = Clock::now() + impatience;
   slot = {.state = slot.state == SlotState::held ? SlotState::ended : SlotState::free,
           .exit = exit};
 }
@@ -207,7 +208,7 @@ Optional<ServiceProcess::Forked> ServiceProcess::fork(std::uint64_t longestMessa
   if (free == slots_.end()) {
     // Those that have answered are on their way, and the processor is theirs while the caller
     // waits: one that is killed now cannot be set back.
-    if (Clock::now() < impatientUntil_) killOverdue(SlotState::leaving);
+    if (Clock::now() < impatientUntil_) killAll(SlotState::leaving, SlotState::killed);
     return std::nullopt;
   }
   const auto slot = static_cast<std::uint32_t>(free - slots_.begin());
@@ -245,9 +246,9 @@ void ServiceProcess::release(std::uint32_t slot, Leaving how) noexcept {
   }
 }
 
-void ServiceProcess::killOverdue(SlotState from) noexcept {
+void ServiceProcess::killAll(SlotState from, SlotState to) noexcept {
   for (std::uint32_t i = 0; i < slots_.size(); ++i) {
-    if (slots_[i].state == from && sendKill(i)) slots_[i].state = SlotState::killed;
+    if (slots_[i].state == from && sendKill(i)) slots_[i].state = to;
   }
 }
 

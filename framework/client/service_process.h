@@ -122,6 +122,8 @@ class ServiceProcess {
     overdue,
     /// Released and killed.
     killed,
+    /// The same since it stayed after its answer.
+    stayed,
   };
   struct Slot {
     SlotState state = SlotState::free;
@@ -132,7 +134,7 @@ class ServiceProcess {
   void noteFrame(const Protocol::ControlFrame& frame) noexcept;
   void noteAnswerToHello(const Protocol::ControlFrame& frame);
   void noteExit(Slot& slot, const Exit& exit) noexcept;
-  void killOverdue(SlotState from) noexcept;
+  void killAll(SlotState from, SlotState to) noexcept;
   bool sendKill(std::uint32_t slot) noexcept;
   void failToStart(StartFailure failure);
   void lose() noexcept;

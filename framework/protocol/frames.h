@@ -32,7 +32,7 @@ namespace Keelgate::Protocol {
 /// "KGAT". Nothing is looked at in a frame that begins otherwise.
 constexpr std::uint32_t magic = 0x4b47'4154;
 /// To be raised with any change of what travels: two builds that differ must refuse each other.
-constexpr std::uint16_t protocolVersion = 7;
+constexpr std::uint16_t protocolVersion = 8;
 
 /// From 1, here and below, so that a frame of zeros is not one.
 enum class ControlKind : std::uint16_t { hello = 1, ready, fork, kill, exit, refused };
