@@ -30,8 +30,17 @@ constexpr auto membersOf = [] {
 /// code, and each costs as much as a short field.
 template <class T>
 class ByType {
+  /// The position of the first field of type V.
   template <class V>
-  static constexpr char tag = 0;
+  static constexpr std::size_t firstOf = [] {
+    std::size_t first = 0;
+    bool isFound = false;
+    FieldsOf<T>::each([&]<class Value>(Field<T, Value>) {
+      isFound = isFound || std::same_as<Value, V>;
+      if (!isFound) ++first;
+    });
+    return first;
+  }();
 
  public:
   static constexpr std::size_t size = FieldsOf<T>::size;
@@ -40,16 +49,13 @@ class ByType {
   std::array<std::uint16_t, size> places{};
 
   constexpr ByType() {
-    std::array<const char*, size> tags{};
+    std::array<std::size_t, size> firsts{};
     std::size_t position = 0;
-    FieldsOf<T>::each([&]<class V>(Field<T, V>) { tags[position++] = &tag<V>; });
+    FieldsOf<T>::each([&]<class V>(Field<T, V>) { firsts[position++] = firstOf<V>; });
     std::size_t place = 0;
     for (std::size_t first = 0; first < size; ++first) {
-      if (tags[first] == nullptr) continue;
-      const char* const type = tags[first];
       for (std::size_t i = first; i < size; ++i) {
-        if (tags[i] != type) continue;
-        tags[i] = nullptr;
+        if (firsts[i] != first) continue;
         places[i] = static_cast<std::uint16_t>(place);
         positions[place++] = static_cast<std::uint16_t>(i);
       }
