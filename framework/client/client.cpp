@@ -92,12 +92,14 @@ struct Engine {
   explicit Engine(const Client::Options& options) : pool(options) {}
 
   EventSource& eventSource() {
-    std::call_once(once, [this] { events.emplace(pool); });
+    // Not std::call_once: where it throws, some implementations hang in the next call.
+    const std::lock_guard lock(mutex);
+    if (!events) events.emplace(pool);
     return *events;
   }
 
   Pool pool;
-  std::once_flag once;
+  std::mutex mutex;
   Optional<EventSource> events;
 };
 
