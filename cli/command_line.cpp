@@ -89,7 +89,7 @@ void addSeconds(::CLI::App& app, const std::string& name, std::chrono::milliseco
     const Bool plain = text.find_first_not_of("0123456789.") == std::string::npos;
     char* end = nullptr;
     const double seconds = std::strtod(text.c_str(), &end);
-    if (!plain || text.empty() || *end != '\0' || !(seconds > 0) || seconds > longest) {
+    if (!plain || *end != '\0' || !(seconds > 0) || seconds > longest) {
       refuse(name, text, "a number of seconds above 0");
     }
     to = std::chrono::milliseconds(static_cast<Int>(std::ceil(seconds * 1000)));

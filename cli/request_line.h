@@ -23,7 +23,7 @@ struct Request {
   JSON::Subject subject;
   /// In the memory of the line.
   Bytes message;
-  Bool typed = false;
+  Bool typed;
 };
 
 struct RequestLine {

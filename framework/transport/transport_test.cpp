@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 /// The bodies of replies: what was written is read back, everything else is refused, and what is
 /// refused has cost no more than it was allowed to.
+#include "framework/protocol/frames.h"
 #include "framework/transport/error_coding.h"
 #include "framework/transport/record_coding.h"
 #include "tests/filler.h"
@@ -138,6 +139,19 @@ TEST(Reply, EveryBodyIsReadBackAndNoOtherLengthIs) {
     longer.push_back(std::byte{});
     EXPECT_THROW(static_cast<void>(sample.readAgain(longer)), MalformedReply) << sample.name;
   }
+}
+
+/// A client would take one field for another where a service writes something else.
+TEST(Reply, HasTheFormThatTheProtocolsVersionStandsFor) {
+  std::uint64_t digest = 0xcbf2'9ce4'8422'2325;
+  for (const Sample& sample : samples()) {
+    for (const std::byte octet : sample.body) {
+      digest = (digest ^ static_cast<std::uint8_t>(octet)) * 0x100'0000'01b3;
+    }
+  }
+  EXPECT_EQ(std::pair(Protocol::protocolVersion, digest),
+            std::pair(std::uint16_t{8}, std::uint64_t{0x9c2f0789e33cdfb9}))
+      << "Replies have changed: raise protocolVersion, and put both numbers here.";
 }
 
 TEST(Reply, WhatIsLongIsLentAndOutlivesItsRecord) {

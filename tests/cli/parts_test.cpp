@@ -1,13 +1,18 @@
 // SPDX-License-Identifier: Apache-2.0
-// The parts of the command that need no service: request lines and ordered work.
+// The parts of the command that need no service: request lines, suggestions and ordered work.
+#include "cli/nearest.h"
 #include "cli/ordered_work.h"
 #include "cli/request_line.h"
 
 #include <gtest/gtest.h>
 
+#include <sys/resource.h>
+
 #include <atomic>
+#include <cstring>
 #include <latch>
 #include <semaphore>
+#include <system_error>
 #include <thread>
 
 namespace Keelgate::CLI {
@@ -66,8 +71,6 @@ TEST(RequestLine, IsReadStrictly) {
        "ok", R"(["\udc00","\u0041\"",[],{},1E400])"},
       {"{\"id\":\"\x7f\u009b\u2028\\n\u00e9\",\"record\":\"VespInvitation\",\"message\":\"\"}",
        "ok", "\"\\u007f\\u009b\\u2028\\n\u00e9\""},
-      {R"({"record":"\udc00","message":"","id":1})", "surrogate", "1"},
-      {R"({"service":"\ud800\u0041","command":1,"message":"","id":1})", "surrogate", "1"},
       {"{\"id\":\"0123456789012345678901234567890\x1f\"}", "control character", absent},
   };
   for (const char* line : {"", "\r", R"({"id":1)", R"({"id":1} {})", "{\"id\":\"\xff\"}",
@@ -84,6 +87,53 @@ TEST(RequestLine, IsReadStrictly) {
     const RequestLine line = readRequestLine(text);
     EXPECT_NE(problemOf(line).find(entry.problem), String::npos) << entry.line << problemOf(line);
     EXPECT_EQ(line.id, entry.id) << entry.line;
+  }
+}
+
+TEST(RequestLine, AStringStandsForItsCharacters) {
+  const std::pair<const char*, const char*> table[] = {
+      {R"(a\"\\\/\b\f\n\r\tz)", "a\"\\/\b\f\n\r\tz"},
+      {R"(\u0041\u00e9\u20AC\ud7ff\ue000)", "A\u00e9\u20ac\ud7ff\ue000"},
+      {R"(\ud800\udc00\uDBFF\uDFFF!)", "\U00010000\U0010ffff!"}};
+  const auto lineOf = [](const char* spelt) {
+    return String(R"({"service":")") + spelt + R"(","command":7,"message":"Zm9v"})";
+  };
+  for (const auto& [spelt, text] : table) {
+    String line = lineOf(spelt);
+    const RequestLine read = readRequestLine(line);
+    ASSERT_EQ(problemOf(read), "ok") << spelt;
+    const auto& request = std::get<Request>(read.content);
+    const auto& context = std::get<VespClientMessageContext>(request.subject);
+    EXPECT_EQ(context.service, text);
+    EXPECT_EQ(context.command, 7u);
+    EXPECT_EQ(std::memcmp(request.message.data(), "foo", 3), 0);
+    EXPECT_EQ(request.message.size(), 3u);
+  }
+  for (const char* half : {R"(\ud800)", R"(\ud800x)", R"(\ud800\n)", R"(\ud800\udbff)", R"(\udfff)",
+                           R"(\ud800\ue000)", R"(\udc00\udc00)", R"(\ud7ff\udc00)"}) {
+    String line = lineOf(half);
+    EXPECT_EQ(problemOf(readRequestLine(line)), "a string holds half of a surrogate pair") << half;
+  }
+  for (const char* wrong : {R"(\x)", R"(\u12g4)", R"(\u123)", R"(\U0041)", R"(\u-123)"}) {
+    String line = lineOf(wrong);
+    EXPECT_NE(problemOf(readRequestLine(line)).find("not an escape"), String::npos) << wrong;
+  }
+}
+
+TEST(Suggestion, IsWhatAThirdOfTheNameMayBeMistypedFor) {
+  const std::tuple<Array<std::string_view>, const char*, const char*> table[] = {
+      {{"check", "unpack"}, "unpak", "did you mean unpack?"},
+      {{"saturday", "sunday"}, "sunday", "did you mean sunday?"},
+      {{"sunday", "sitting"}, "saturday", "did you mean sunday?"},
+      {{"sitting"}, "kitten", "nothing"},
+      {{"sitting"}, "kittens", "did you mean sitting?"},
+      {{"abc"}, "xbz", "nothing"},
+      {{"aabb", "aaab", "aaac", "aaaa"}, "aaaa", "did you mean aaaa or aaab or aaac?"},
+      {{"describe"}, "des", "did you mean describe?"},
+      {{"describe"}, "de", "nothing"},
+      {{}, "x", "nothing"}};
+  for (const auto& [names, name, said] : table) {
+    EXPECT_EQ(suggestion(names, name, "nothing"), said);
   }
 }
 
@@ -181,6 +231,15 @@ TEST(OrderedWork, WhatWaitsIsBoundedInBytesAndGivenBack) {
     EXPECT_EQ(taken, count);
     EXPECT_EQ(bytes, row.reply * count);
   }
+}
+
+TEST(OrderedWork, NeedsADescriptor) {
+  rlimit before{};
+  getrlimit(RLIMIT_NOFILE, &before);
+  const rlimit none{.rlim_cur = 0, .rlim_max = before.rlim_max};
+  setrlimit(RLIMIT_NOFILE, &none);
+  EXPECT_THROW(OrderedWork([](const Due&, Bool) { return true; }), std::system_error);
+  setrlimit(RLIMIT_NOFILE, &before);
 }
 
 TEST(OrderedWork, AJobWithoutMemoryEndsTheWorkAndNotTheProgram) {

@@ -66,19 +66,21 @@ def wrong_usage():
                   ["unpack", "--record", "VespClientMessageResult"],
                   ["unpack", "--service", "x"], ["unpack", "--command", "1"],
                   ["unpack", *record, "--command", "1", "--service", "x"],
-                  ["unpack", "--service", "x", "--command", "-1"],
-                  ["unpack", "--service", "x", "--command", "0x10"],
-                  ["unpack", "--service", "x", "--command", "18446744073709551616"],
                   ["unpack", "--service", b"\xff", "--command", "1"],
                   ["unpack", *record, "--pretty", "--compact"], ["unpack", *record, "-", "-"],
-                  ["unpack", *record, "--time-limit", "0"], ["stream", "--time-limit", "nan"],
-                  ["stream", "--processes", "0"], ["stream", "--max-message", "4294967297"],
-                  ["stream", "extra"], ["describe", "Nothing"], ["--verbose"],
-                  ["stream", "--max-message", "5G"], ["stream", "--max-message", "1KK"],
-                  ["stream", "--log-level", "all"], ["unpack", *record, "--typed"],
+                  ["stream", "extra"], ["stream", "check"], ["describe", "Nothing"], ["--verbose"],
+                  ["unpack", *record, "--typed"],
                   ["unpack", *record, "--files0-from", "/nonexistent"],
                   ["unpack", *record, "--files0-from", "/dev/null", "x"],
                   ["stream", "--metrics", "/nonexistent/file"],
+                  *([*words, option, value]
+                    for *words, option, values in (
+                        ("unpack", "--service", "x", "--command", "-1 0x10 18446744073709551616"),
+                        ("check", "--time-limit", "0 nan 1.2.3 1e3 1000000001"),
+                        ("check", "--processes", "0 129"), ("check", "--log-level", "all"),
+                        ("check", "--messages-per-process", "0 4294967296"),
+                        ("check", "--max-message", "0 4294967297 5G 1KK"))
+                    for value in values.split()),
                   ["describe", "--json", "--json-schema"]):
         done = subprocess.run([keelgate, *words], capture_output=True, stdin=subprocess.DEVNULL)
         check((done.returncode, done.stdout) == (2, b""), f"{words}: {done}")
@@ -92,9 +94,12 @@ def wrong_usage():
     check("did you mean" not in run("install")[2], "a hint that nobody needs")
     for words in (["--help"], ["--version"], ["unpack", "--help"], ["stream", "--help"],
                   ["describe", "--help"], ["--version", "--verbose"],
-                  ["check", "--max-message", "4g", messages / "check-in.xml"]):
+                  ["stream", "--metrics=", "--service-path="],
+                  ["check", "--max-message", "4g", "--messages-per-process", "4294967295",
+                   "--time-limit", "1000000000", messages / "check-in.xml"]):
         status, out, err = run(*words)
-        check(status == 0 and (out or "4g" in words) and not err, f"{words}: {status} {err}")
+        silent = words[0] == "check" or "--metrics=" in words
+        check((status, out == b"", err) == (0, silent, ""), f"{words}: {status} {err}")
 
 
 def many_files():
@@ -282,18 +287,21 @@ def without_service():
         check(err.count("--time-limit") == 1, f"what helps: {err}")
 
         # A service that cannot be had again: its file is gone when its process has crashed.
-        service = shutil.copy(fake, folder)
-        process = started("stream", "--service-path", service)
-        process.stdin.write(b"started?\n")
-        process.stdout.readline()
-        os.unlink(service)
-        crash = base64.b64encode(crash.read_bytes()).decode()
-        out, err = process.communicate((request(1, crash) + "\n").encode() * 50, timeout=60)
-        reasons = {host_error(reply) for reply in objects(out)}
-        check(process.returncode == 3, f"not kept: {process.returncode}")
-        check(reasons <= {"crashed", "startFailed"} and "startFailed" in reasons,
-              f"not kept: {reasons}")
-        check(b"could not be started" in err, f"not kept: {err}")
+        line = request(1, base64.b64encode(crash.read_bytes()).decode()).encode() + b"\n"
+        for words, lines in ((["stream"], 50), ([*record, *[crash] * 50], 0)):
+            service = shutil.copy(fake, folder)
+            process = started(*words, "--service-path", service)
+            process.stdin.write(b"started?\n" if lines else b"")
+            process.stdout.readline()
+            os.unlink(service)
+            out, err = process.communicate(line * lines, timeout=60)
+            reasons = {host_error(reply) for reply in objects(out)}
+            check(process.returncode == 3, f"not kept: {process.returncode}")
+            check(reasons <= {"crashed", "startFailed"} and "startFailed" in reasons,
+                  f"not kept: {reasons}")
+            rest = 49 - len(objects(out))
+            check((f"{rest} of 50 messages were not unpacked" in err.decode()) == (lines == 0)
+                  and b"could not be started" in err, f"not kept: {err}")
 
 
 good_message = base64.b64encode((messages / "command-response.bplist").read_bytes()).decode()
@@ -350,6 +358,26 @@ def stream():
     process.stdout.close()
     check(process.wait(60) == 2 and heard(process.stderr.read()) == b"", "the reader goes away")
     process.stdin.close()
+
+
+def unblocked():
+    """Standard streams that do not block are waited for."""
+    given, taken = os.pipe(), os.pipe()
+    for end in (given[0], taken[1]):
+        os.set_blocking(end, False)
+    process = subprocess.Popen([keelgate, "unpack", "--record", "PropertyList"], stdin=given[0],
+                               stdout=taken[1])
+    for end in (given[0], taken[1]):
+        os.close(end)
+    text = "x" * 200_000
+    for end, mode in ((given[1], "wb"), (taken[0], "rb")):
+        time.sleep(0.2)
+        with open(end, mode) as file:
+            if mode == "wb":
+                file.write(f"<plist><string>{text}</string></plist>".encode())
+            else:
+                check(json.load(file)["value"] == text, "streams that do not block")
+    check(process.wait(60) == 0, "streams that do not block")
 
 
 def long_stream():
@@ -480,7 +508,8 @@ def completion():
 
 
 for group in (wrong_usage, many_files, said_of_a_run, property_lists, long_replies, metrics, memory,
-              without_service, stream, long_stream, described, json_schema, terminal, completion):
+              without_service, stream, unblocked, long_stream, described, json_schema, terminal,
+              completion):
     group()
 print(f"{count - len(failures)} passed, {len(failures)} failed")
 sys.exit(bool(failures))
