@@ -22,7 +22,7 @@ integers that it holds exactly, `data` is an octet string, `uuid` a string in th
 an array. An enumeration travels as the number of its case.
 
 Of a case-keyed enumeration (`VespClientMessageType`, `VespDictionaryContext` and so on) the cases
-are listed as fields, of which exactly one is there. Deliberate: on the wire the data of an
+are listed as fields, of which exactly one is present. Deliberate: on the wire the data of an
 invitation's context (`cD`) are the dictionary of the kind itself, which the context's schema string
 (`cS`) names; the case names stand only in records.
 """

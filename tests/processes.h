@@ -16,7 +16,7 @@
 
 namespace Keelgate::Testing {
 
-/// Tests run once with workers that are set back and once, by this, with forks alone.
+/// Tests run once with workers that are rewound and once, by this, with forks alone.
 inline bool forksAlone() {
   return std::getenv("KEELGATE_TEST_FORKS") != nullptr;
 }

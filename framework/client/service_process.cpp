@@ -207,7 +207,7 @@ Optional<ServiceProcess::Forked> ServiceProcess::fork(std::uint64_t longestMessa
   if (state_ == State::lost) return std::nullopt;
   if (free == slots_.end()) {
     // Those that have answered are on their way, and the processor is theirs while the caller
-    // waits: one that is killed now cannot be set back.
+    // waits: one that is killed now cannot be rewound.
     if (Clock::now() < impatientUntil_) killAll(SlotState::leaving, SlotState::killed);
     return std::nullopt;
   }

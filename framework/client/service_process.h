@@ -25,7 +25,7 @@ struct ServiceSettings {
   /// Who else than root and the caller may serve on the socket.
   Optional<unsigned> socketUser;
   bool requireLayers;
-  /// Every worker is forked; none is set back.
+  /// Every worker is forked; none is rewound.
   bool forks;
   std::uint64_t messagesPerWorker;
   std::uint64_t cpuSecondsPerWorker;

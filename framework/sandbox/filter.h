@@ -40,7 +40,7 @@ std::span<const Rule> workerRules() noexcept;
 /// All that the zygote can do, and a worker until its own filter stands.
 std::span<const Rule> zygoteRules() noexcept;
 
-/// What a zygote that sets workers back can do besides, and such a worker until its own filter
+/// What a zygote that rewinds workers can do besides, and such a worker until its own filter
 /// stands.
 std::span<const Rule> rewindingRules() noexcept;
 

@@ -56,7 +56,7 @@ void prepareHeap() {
   mallopt(M_ARENA_MAX, 1);
   // -1 is "never": a freed area stays ours, so that a freed message leaves room for the next one.
   mallopt(M_TRIM_THRESHOLD, -1);
-  // A short message writes to little of one, and it would be put back whole.
+  // A short message writes to little of one, and it would be restored whole.
   prctl(PR_SET_THP_DISABLE, 1, 0, 0, 0);
   const auto end = reinterpret_cast<std::uintptr_t>(sbrk(0));
   firstHeap = {.begin = end - mallinfo2().arena, .end = end};

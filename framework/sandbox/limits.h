@@ -15,7 +15,7 @@ constexpr rlim_t stackLimit = rlim_t{8} << 20;
 /// Descriptors of the zygote: the channel, its signals, the launcher's tether, and the one that a
 /// fork frame brings.
 constexpr rlim_t zygoteDescriptors = 16;
-/// With five for each worker that is set back.
+/// With five for each worker that is rewound.
 constexpr rlim_t rewindingDescriptors = zygoteDescriptors + 5 * 64;
 
 /// Whether the one who started the service lets it have so many descriptors.

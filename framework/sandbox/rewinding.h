@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The sandbox's part in setting workers back: what a zygote has to prepare for it before it is
+/// The sandbox's part in rewinding workers: what a zygote has to prepare for it before it is
 /// sealed, and how a worker gives itself into the hands of its zygote before it has read anything.
 ///
 /// A worker does that by itself. It asks to be traced, opens its own memory and the list of its
@@ -60,7 +60,7 @@ void renounceRewinding();
 void handOver();
 
 /// In a worker that is sealed and has handed over: waits until it is given a channel. Each time
-/// that the worker ends it is set back to this call.
+/// that the worker ends it is rewound to this call.
 void awaitChannel();
 
 }  // namespace Keelgate::Sandbox

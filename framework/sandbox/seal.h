@@ -27,7 +27,7 @@ struct ZygoteSeal {
   int launcher;
   /// Readable when a worker has ended.
   int childDeaths;
-  /// Whether it has what it takes to set workers back.
+  /// Whether it has what it takes to rewind workers.
   bool canRewind;
   std::vector<sock_filter> workerFilter;
 };

@@ -2,8 +2,8 @@
 /// The memory of a worker as it was before its first message, and the way back to it.
 ///
 /// The kernel notes which pages are written, from the moment at which the image is taken. Pages
-/// that have been put back count as written from then on: the next message is likely to write them
-/// again, and a copy is cheaper than a fault that tells of it. So what is put back is always a
+/// that have been restored count as written from then on: the next message is likely to write them
+/// again, and a copy is cheaper than a fault that tells of it. So what is restored is always a
 /// superset of what was written.
 #pragma once
 
@@ -61,7 +61,7 @@ class MemoryImage {
   /// memory than is worth it.
   bool take(const WorkerFiles& files);
 
-  /// Puts back every page that has been written. False when they are too many, or where the stack
+  /// Restores every page that has been written. False when they are too many, or where the stack
   /// has grown: then the worker is to be thrown away.
   bool restore(const WorkerFiles& files);
 

@@ -97,7 +97,7 @@ void RewindableWorker::hangUp() {
   channel_ = File();
 }
 
-bool RewindableWorker::setBack() {
+bool RewindableWorker::rewind() {
   return memory_.restore(*files_) && writeRegisters(process_, registers_);
 }
 

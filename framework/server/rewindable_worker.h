@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-/// A worker that is set back, from outside and each time that it ends, to the instant before it
+/// A worker that is rewound, from outside and each time that it ends, to the instant before it
 /// got its channel: sealed, and with nothing read.
 ///
 /// It ends as every worker does, by exit_group with a status of 0: a filter in front of its own
@@ -37,8 +37,8 @@ class RewindableWorker {
 
   /// When it has stopped at its end: its client is to see the end.
   void hangUp();
-  /// Then puts back its memory and its registers. False when it is to be thrown away.
-  bool setBack();
+  /// Then restores its memory and its registers. False when it is to be thrown away.
+  bool rewind();
   /// Out of a stop, with a signal or without. False when it is not stopped.
   bool goOn(int signal = 0);
 

@@ -12,7 +12,7 @@ namespace Keelgate {
 
 namespace {
 
-/// A worker that can be set back costs as much as a few forks. So it is made for those who send one
+/// A worker that can be rewound costs as much as a few forks. So it is made for those who send one
 /// message after the other, and a single one pays nothing for it.
 constexpr unsigned missesPerWorker = 16;
 
@@ -115,7 +115,7 @@ Optional<Rewinding::End> Rewinding::noteStop(Member& member, int status, const r
   member.slot.reset();
   member.usedBefore = used;
   worker.hangUp();
-  if (isTired(used) || !worker.setBack() || !worker.goOn()) throwAway(member);
+  if (isTired(used) || !worker.rewind() || !worker.goOn()) throwAway(member);
   return end;
 }
 

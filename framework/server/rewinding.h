@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The workers of a zygote that are set back instead of being forked: who they are, when another
+/// The workers of a zygote that are rewound instead of being forked: who they are, when another
 /// one is worth it, and when it is over with one of them.
 ///
 /// For one thread, the zygote's.
@@ -28,7 +28,7 @@ class Rewinding {
   /// Gives a channel to a worker that waits for one, which owns it then. False where none does.
   bool give(std::uint32_t slot, int channel);
 
-  /// Called for each message that had to be forked for: whether to fork one to be set back as well.
+  /// Called for each message that had to be forked for: whether to fork one to be rewound as well.
   bool isAnotherWorthIt();
   /// Such a fork, or -1 where it failed.
   void add(pid_t process);

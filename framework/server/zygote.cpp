@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 /// One loop over four descriptors: the client's frames, the launcher's death, the workers' ends,
-/// and the next step of a worker that is being made ready to be set back.
+/// and the next step of a worker that is being made ready to be rewound.
 #include "framework/server/zygote.h"
 
 #include "framework/contracts/memory_budget.h"
@@ -130,7 +130,7 @@ void Zygote::fork(std::uint32_t slot, int channel) {
                      rewinding_.processOf(slot) != 0;
   // Two workers on one slot: an exit could be told of the wrong one.
   if (taken) throw StartError(StartStep::readFrame, 0);
-  // Workers for long messages write to more memory than it pays to put back.
+  // Workers for long messages write to more memory than it pays to restore.
   if (!seal_.canRewind || workerSeal_.longestMessage > shortMessage) {
     forkOnce(slot, channel);
     return;
@@ -181,7 +181,7 @@ void Zygote::forkOnce(std::uint32_t slot, int channel) {
 }
 
 void Zygote::kill(std::uint32_t slot) {
-  // One that has just answered may be set back yet.
+  // One that has just answered may be rewound yet.
   reap();
   if (const pid_t process = rewinding_.processOf(slot); process != 0) ::kill(process, SIGKILL);
   for (const Child& child : children_) {

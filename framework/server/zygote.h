@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The zygote: sealed once, it has a fresh worker for each request of its client, forked or set
-/// back, and never reads a message itself, so that it stays worth forking.
+/// The zygote: sealed once, it has a fresh worker for each request of its client, forked or
+/// rewound, and never reads a message itself, so that it stays worth forking.
 #pragma once
 
 #include "framework/protocol/frames.h"
@@ -49,7 +49,7 @@ class Zygote {
   /// Gives a fresh worker to a slot.
   void fork(std::uint32_t slot, int channel);
   void forkOnce(std::uint32_t slot, int channel);
-  /// A worker that has no channel yet and is set back whenever it ends.
+  /// A worker that has no channel yet and is rewound whenever it ends.
   void forkToRewind();
   /// From here on it forks and does nothing else.
   void renounceRewinding();

@@ -207,7 +207,7 @@ std::string seenByClient(const std::string& service) {
     const auto send = [&client](std::string_view order) {
       client.unpack<VespCommandResponse>(std::as_bytes(std::span(order)));
     };
-    // As many as it takes to set workers back, or to find out that it cannot be done.
+    // As many as it takes to rewind workers, or to find out that it cannot be done.
     for (int i = 0; i < 100; ++i) send("answer");
     text += "answer";
     send("call 39");
@@ -247,7 +247,7 @@ TEST(C11, OneDescriptorIsTrueWithoutCloseRange) {
   try {
     const std::set<std::string> one{"3"};
     EXPECT_TRUE(Testing::comesTrue([&] { return descriptorsOf(worker) == one; }));
-    // The channel, the tether, and the deaths of its workers; where these can be set back, three
+    // The channel, the tether, and the deaths of its workers; where these can be rewound, three
     // more. The worker's end goes after the fork.
     EXPECT_TRUE(Testing::comesTrue([&] {
       const std::size_t count = descriptorsOf(service.zygote()).size();

@@ -20,7 +20,7 @@ namespace Keelgate::Test {
 struct Mark {
   std::string_view name;
   void (*leave)();
-  /// Whether its worker cannot be set back: it has ended, or is to be thrown away.
+  /// Whether its worker cannot be rewound: it has ended, or is to be thrown away.
   bool ends;
 };
 

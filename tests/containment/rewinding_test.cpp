@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-/// Whether setting a worker back is exact: one that was taken over leaves a mark, is set back, and
+/// Whether rewinding a worker is exact: one that was taken over leaves a mark, is rewound, and
 /// is compared with what it was, byte for byte. This process is its zygote.
 #include "framework/contracts/memory_budget.h"
 #include "framework/contracts/process.h"
@@ -137,15 +137,15 @@ class Laboratory {
 
   [[nodiscard]] bool isReady() const { return worker_->isReady(); }
   bool goOn() { return worker_->goOn(); }
-  bool setBack() {
+  bool rewind() {
     worker_->hangUp();
-    return worker_->setBack();
+    return worker_->rewind();
   }
   [[nodiscard]] std::string difference() const {
     return compare(*fresh_, State(worker_->process()));
   }
 
-  /// Whether it comes to an end that it can be set back from. What nobody reads lies behind it, and
+  /// Whether it comes to an end that it can be rewound from. What nobody reads lies behind it, and
   /// is more than an honest worker takes at once.
   bool send(std::string_view text) {
     int ends[2];
@@ -186,7 +186,7 @@ void tryMark(const Mark& mark) {
     return;
   }
   EXPECT_NE(worker.difference(), "");
-  ASSERT_EQ(worker.setBack(), !mark.ends);
+  ASSERT_EQ(worker.rewind(), !mark.ends);
   if (mark.ends) return;
   EXPECT_EQ(worker.difference(), "");
   ASSERT_TRUE(worker.goOn() && worker.send("nothing"));

@@ -112,7 +112,7 @@ TEST_F(Worker, C3SeenFromOutside) {
   close(spinning);
 }
 
-TEST_F(Worker, C3OfThoseThatAreSetBack) {
+TEST_F(Worker, C3OfThoseThatAreRewound) {
   if (geteuid() != 0) GTEST_SKIP() << "only root may look into an undumpable process";
   for (int i = 0; i < 50; ++i) EXPECT_EQ(service_.obey("answer").first.result(), 0);
   const int channel = service_.fork(1);

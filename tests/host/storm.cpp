@@ -6,7 +6,7 @@
 //     storm SERVICE MESSAGES THREADS          processes are killed, stopped and faulted at random
 //     storm SERVICE MESSAGES THREADS ORDER    each message is an order to crash
 //
-// With "fork" in front of SERVICE no worker is set back.
+// With "fork" in front of SERVICE no worker is rewound.
 #include "tests/host/host_testing.h"
 
 #include <sys/prctl.h>
