@@ -158,7 +158,7 @@ void freshWorkerWithoutSpare(benchmark::State& state) {
   const auto service = std::make_shared<ServiceProcess>(settings, registry);
   for (; service->state() == ServiceProcess::State::starting; service->readNews()) usleep(1000);
   const Data bytes = message();
-  const ClientRequest request{
+  const OutgoingMessage request{
       .record = recordNumber<VespCommandResponse>, .command = 0, .service = {}, .message = bytes};
   measure(state, std::chrono::milliseconds(2), [&] {
     service->readNews();

@@ -120,7 +120,7 @@ void addHostOptions(::CLI::App& app, Arguments& line) {
   // The client would cut them to these; here somebody typed them, and is told.
   const Client::Options defaults;
   constexpr UInt64 most = std::numeric_limits<std::uint32_t>::max();
-  addNumber(app, "--processes", line.host.processes, 1, Client::Options::mostProcesses,
+  addNumber(app, "--processes", line.host.processes, 1, Client::Options::maximumProcesses,
             "How many messages at a time (default: one per processor)");
   addNumber(app, "--messages-per-process", line.host.messagesPerProcess, 1, most,
             fmt::format("How many each process may see (default {})", defaults.messagesPerProcess));

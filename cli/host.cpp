@@ -14,7 +14,7 @@ namespace Keelgate::CLI {
 
 namespace {
 
-Client::Options completed(Client::Options options, Console& console, std::size_t mostMessages) {
+Client::Options completed(Client::Options options, Console& console, std::size_t maximumMessages) {
   options.log = [&console](std::string_view line) {
     console.log(line.starts_with("keelgate: ") ? LogLevel::warning : LogLevel::error, line);
   };
@@ -25,7 +25,8 @@ Client::Options completed(Client::Options options, Console& console, std::size_t
   // whose answers come behind it do.
   options.abnormalEndsPerSecond = 0;
   // No more processes than messages: the others would be started for nothing.
-  options.processes = static_cast<unsigned>(std::min<std::size_t>(options.processes, mostMessages));
+  options.processes =
+      static_cast<unsigned>(std::min<std::size_t>(options.processes, maximumMessages));
   return options;
 }
 
@@ -40,8 +41,8 @@ static_assert(statusOf(JSON::Outcome::serviceLost) == Status::serviceLost);
 
 }  // namespace
 
-Host::Host(Client::Options options, Console& console, std::size_t mostMessages)
-    : options_(completed(std::move(options), console, mostMessages)), client_(options_) {}
+Host::Host(Client::Options options, Console& console, std::size_t maximumMessages)
+    : options_(completed(std::move(options), console, maximumMessages)), client_(options_) {}
 
 JSON::Reply Host::answer(const JSON::Subject& subject, Bytes message,
                          const JSON::Form& form) const {

@@ -18,7 +18,7 @@ class Host {
  public:
   /// For at most so many messages at a time. The console must outlive it. Throws HostError
   /// (startFailed).
-  Host(Client::Options options, Console& console, std::size_t mostMessages = SIZE_MAX);
+  Host(Client::Options options, Console& console, std::size_t maximumMessages = SIZE_MAX);
 
   [[nodiscard]] JSON::Reply answer(const JSON::Subject& subject, Bytes message,
                                    const JSON::Form& form) const;

@@ -21,7 +21,7 @@ namespace {
 constexpr std::size_t chunkSize = std::size_t{64} << 10;
 
 /// What one thread takes, so that the others find some too.
-constexpr std::size_t mostLines = 16;
+constexpr std::size_t maximumLines = 16;
 
 /// What a line may have beside its message: the service's identifier, an id.
 constexpr std::size_t besideMessage = std::size_t{1} << 20;
@@ -132,7 +132,7 @@ Bool RequestInput::isWaiting() const {
 Optional<Lines> RequestInput::cut() {
   if (whole_) return std::exchange(whole_, std::nullopt);
   const std::string_view rest = std::string_view(text_).substr(begin_);
-  const std::size_t most = std::min(mostLines, (waiting_ + threads_ - 1) / threads_);
+  const std::size_t most = std::min(maximumLines, (waiting_ + threads_ - 1) / threads_);
   std::size_t end = 0;
   for (std::size_t taken = 0; taken < most && end < chunkSize; ++taken) {
     end = rest.find('\n', end) + 1;

@@ -356,7 +356,7 @@ JSON::Subject subjectOf(const Members& members) {
                                   .service = String(unescaped(*members[service]))};
 }
 
-Request requestOf(const Members& members) {
+StreamRequest requestOf(const Members& members) {
   JSON::Subject subject = subjectOf(members);
   demand(members[message].has_value(), "\"message\" is missing");
   char* const begin = members[message]->data();

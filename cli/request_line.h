@@ -19,7 +19,7 @@
 
 namespace Keelgate::CLI {
 
-struct Request {
+struct StreamRequest {
   JSON::Subject subject;
   /// In the memory of the line.
   Bytes message;
@@ -31,7 +31,7 @@ struct RequestLine {
   /// invalid request too, as long as the line is JSON and has one id.
   Optional<String> id;
   /// The request, or why the line is not one.
-  std::variant<Request, String> content;
+  std::variant<StreamRequest, String> content;
 };
 
 /// Reads one line, without its newline, in its own memory, which holds the message then. Callable

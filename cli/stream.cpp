@@ -48,7 +48,7 @@ class Replies {
     if (lines_.fault) {
       return JSON::givenUp(faultOf(*lines_.fault, host_.largestMessage()), form);
     }
-    const auto& [subject, message, typed] = std::get<Request>(request.content);
+    const auto& [subject, message, typed] = std::get<StreamRequest>(request.content);
     form.typed = typed;
     return host_.answer(subject, message, form);
   }

@@ -13,11 +13,11 @@
 namespace {
 
 using namespace Keelgate;
-using CLI::Request;
 using CLI::RequestLine;
+using CLI::StreamRequest;
 
 std::string said(const RequestLine& read) {
-  const auto& request = std::get<Request>(read.content);
+  const auto& request = std::get<StreamRequest>(read.content);
   JSON::Writer out(JSON::Layout::compact);
   out.beginObject();
   if (const auto* context = std::get_if<VespClientMessageContext>(&request.subject)) {
@@ -48,11 +48,12 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   std::string line(reinterpret_cast<const char*>(data), size);
   if (line.find('\n') != line.npos) return 0;
   const RequestLine read = CLI::readRequestLine(line);
-  if (!std::holds_alternative<Request>(read.content)) return 0;
+  if (!std::holds_alternative<StreamRequest>(read.content)) return 0;
   const std::string once = said(read);
   std::string copy = once;
   const RequestLine again = CLI::readRequestLine(copy);
-  Fuzz::require(std::holds_alternative<Request>(again.content), "a request can be said again");
+  Fuzz::require(std::holds_alternative<StreamRequest>(again.content),
+                "a request can be said again");
   Fuzz::require(said(again) == once, "a request that is said again is the same");
   return 0;
 }

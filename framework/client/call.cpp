@@ -20,8 +20,6 @@ namespace {
 
 /// The zygote tells of a death at once; on a machine that swaps, somewhat later.
 constexpr milliseconds exitPatience{500};
-/// Two calls may wait for the same news, and the one who reads it does not tell the other.
-constexpr milliseconds secondLook{10};
 
 /// An exit status is the worker's own word, and one that was taken over may choose it: what it can
 /// claim so is one of the host's errors, for the message that it was sent.
@@ -53,13 +51,13 @@ HostError outOfMemory() {
 
 }  // namespace
 
-Call::Call(Pool& pool, const ClientRequest& request, Deadline deadline, bool alone,
+Call::Call(Pool& pool, const OutgoingMessage& request, Deadline deadline, bool alone,
            Accept accept) try
     : pool_(pool),
       request_(request),
       deadline_(deadline),
       accept_(std::move(accept)),
-      place_(pool.places(), pool.isLarge(request.message.size())),
+      permit_(pool.permits(), pool.isLarge(request.message.size())),
       retried_(alone) {
 } catch (const StartFailure& failure) {
   throw HostError(Reason::startFailed, failure.sentence);
@@ -99,12 +97,12 @@ Optional<Wait> Call::step() {
 }
 
 Optional<Wait> Call::stepQueued() {
-  if (place_.isAdmitted()) {
+  if (permit_.isAdmitted()) {
     state_ = State::taking;
     return std::nullopt;
   }
   if (Clock::now() >= deadline_) throw HostError(Reason::timedOut, "no process came free in time");
-  return Wait{.descriptor = place_.descriptor(), .events = POLLIN, .until = deadline_};
+  return Wait{.descriptor = permit_.descriptor(), .events = POLLIN, .until = deadline_};
 }
 
 Optional<Wait> Call::stepTaking() {
@@ -151,17 +149,14 @@ Optional<Wait> Call::stepExchanging() {
 Optional<Wait> Call::stepExplaining() {
   ServiceProcess& service = worker_->service();
   service.readNews();
-  const Deadline now = Clock::now();
   if (const auto exit = worker_->exit()) {
     fail(explain(*exit));
   } else if (service.state() == ServiceProcess::State::lost) {
     fail({Reason::crashed, "the service ended with it"});
-  } else if (now >= until_) {
+  } else if (Clock::now() >= until_) {
     fail({Reason::crashed, "the service did not say how"});
   } else {
-    return Wait{.descriptor = service.descriptor(),
-                .events = POLLIN,
-                .until = std::min(until_, now + secondLook)};
+    return service.waitForNews(until_);
   }
   return std::nullopt;
 }
@@ -217,7 +212,7 @@ void Call::fail(const HostError& why) {
   finish(std::make_exception_ptr(why));
   pool_.tidy();
   if (!abnormal) return;
-  // The place is free by now: nobody waits with this one.
+  // The permit is given back by now: nobody waits with this one.
   until_ = std::min(deadline_, pool_.noteAbnormalEnd());
   state_ = State::slowed;
 }
@@ -227,7 +222,7 @@ void Call::finish(std::exception_ptr error) noexcept {
   worker_.reset();
   error_ = std::move(error);
   state_ = State::done;
-  place_.leave();
+  permit_.leave();
 }
 
 }  // namespace Keelgate

@@ -30,7 +30,7 @@ class Call {
 
   /// The pool and what the request borrows outlive the call. `alone`: in a worker that has served
   /// nobody, and this is its last try. Throws HostError, std::bad_alloc.
-  Call(Pool& pool, const ClientRequest& request, Deadline deadline, bool alone, Accept accept);
+  Call(Pool& pool, const OutgoingMessage& request, Deadline deadline, bool alone, Accept accept);
 
   /// Goes on as far as it can. Gives what to wait for, or nothing when it is done.
   Optional<Wait> advance() noexcept;
@@ -52,10 +52,10 @@ class Call {
   void finish(std::exception_ptr error) noexcept;
 
   Pool& pool_;
-  const ClientRequest request_;
+  const OutgoingMessage request_;
   const Deadline deadline_;
   const Accept accept_;
-  FairSemaphore::Place place_;
+  FairSemaphore::Permit permit_;
   State state_ = State::queued;
   /// Once an attempt has failed: the next worker is to have no past.
   bool retried_;

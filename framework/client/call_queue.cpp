@@ -62,7 +62,7 @@ void CallQueue::begin() {
   });
 }
 
-/// As many as there are places: whoever has begun is not to wait for one, because its time counts.
+/// As many as there are permits: whoever has begun is not to wait for one, because its time counts.
 bool CallQueue::mayBegin() const noexcept {
   const auto busy = std::count_if(pipelines_.begin(), pipelines_.end(),
                                   [](const Pipeline& one) { return one.wait().has_value(); });

@@ -104,8 +104,7 @@ struct Engine {
 };
 
 Client::Options bounded(Client::Options options) {
-  options.largestMessage =
-      std::min(options.largestMessage, Client::Options::greatestLargestMessage);
+  options.largestMessage = std::min(options.largestMessage, Client::Options::maximumMessageSize);
   return options;
 }
 
@@ -180,7 +179,7 @@ class Client::Message final : public Task {
     if (deadline_ == Deadline::max()) deadline_ = deadlineAfter(client_.options.timeLimit);
   }
 
-  const ClientRequest* request() noexcept override {
+  const OutgoingMessage* request() noexcept override {
     if (!sent_ && !error_) begin();
     if (!sent_) alone_ = true;
     return sent_ ? &*sent_ : nullptr;
@@ -203,7 +202,7 @@ class Client::Message final : public Task {
   Optional<Wait> advance() noexcept override {
     // First of all, so that nothing that follows goes uncounted.
     beginTime();
-    const ClientRequest* const request = call_ || error_ ? nullptr : this->request();
+    const OutgoingMessage* const request = call_ || error_ ? nullptr : this->request();
     if (request != nullptr) call(*request);
     return call_ ? call_->advance() : std::nullopt;
   }
@@ -230,15 +229,15 @@ class Client::Message final : public Task {
     if (!Text::isUtf8(service)) {
       throw VespClientMessageUnpackingError::noUnpackerForService(service);
     }
-    sent_ = ClientRequest{.record = static_cast<std::uint16_t>(recordNumber_),
-                          .command = command,
-                          .service = service,
-                          .message = request_.message};
+    sent_ = OutgoingMessage{.record = static_cast<std::uint16_t>(recordNumber_),
+                            .command = command,
+                            .service = service,
+                            .message = request_.message};
   } catch (...) {
     error_ = std::current_exception();
   }
 
-  void call(const ClientRequest& request) noexcept try {
+  void call(const OutgoingMessage& request) noexcept try {
     call_.emplace(client_.engine().pool, request, deadline_, alone_,
                   [this](const ReceivedReply& reply) { read(reply); });
   } catch (const std::bad_alloc&) {
@@ -268,7 +267,7 @@ class Client::Message final : public Task {
   const std::unique_ptr<Detail::Sink> sink_;
   Deadline deadline_;
   /// From when it has begun.
-  Optional<ClientRequest> sent_;
+  Optional<OutgoingMessage> sent_;
   /// It has shared a worker, and is not to again.
   bool alone_ = false;
   Optional<Call> call_;

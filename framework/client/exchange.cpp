@@ -94,7 +94,7 @@ std::size_t sizeOf(const Protocol::RequestHeader& header) noexcept {
   return sizeof header + header.serviceLength + header.bodyLength;
 }
 
-std::uint64_t largestReply(const ClientRequest& request) {
+std::uint64_t largestReply(const OutgoingMessage& request) {
   // 64 bits hold it for the largest message that there is. A worker has what it answers with twice
   // at the end, as a record and as bytes, but for what is long.
   return std::min<std::uint64_t>(
@@ -144,7 +144,7 @@ void ReceiveBuffer::drop(std::size_t count) noexcept {
   if (begin_ == end_) begin_ = end_ = 0;
 }
 
-void Exchange::add(const ClientRequest& request) {
+void Exchange::add(const OutgoingMessage& request) {
   pending_.push_back({.header = Protocol::makeRequestHeader(request.record, request.command,
                                                             request.service.size(),
                                                             request.message.size(), nextSequence_),

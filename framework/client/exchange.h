@@ -19,7 +19,7 @@ namespace Keelgate {
 
 /// A message on its way. Everything is borrowed until its call has ended. The lengths have been
 /// checked against the client's limits.
-struct ClientRequest {
+struct OutgoingMessage {
   /// recordNumber<Record> of the record that is asked for.
   std::uint16_t record;
   UInt64 command;
@@ -68,7 +68,7 @@ class Exchange {
   Exchange& operator=(const Exchange&) = delete;
 
   /// Adds a request behind those that have no reply yet. Throws std::bad_alloc.
-  void add(const ClientRequest& request);
+  void add(const OutgoingMessage& request);
 
   enum class State {
     /// To be advanced when the channel is writable, or readable.
@@ -101,7 +101,7 @@ class Exchange {
  private:
   struct Pending {
     Protocol::RequestHeader header;
-    ClientRequest request;
+    OutgoingMessage request;
   };
 
   [[nodiscard]] bool hasUnsent() const noexcept { return sent_ < pending_.size(); }

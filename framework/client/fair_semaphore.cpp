@@ -9,17 +9,17 @@
 
 namespace Keelgate {
 
-FairSemaphore::FairSemaphore(std::size_t places, std::size_t largePlaces,
+FairSemaphore::FairSemaphore(std::size_t permits, std::size_t largePermits,
                              DescriptorRegistry& registry)
-    : registry_(registry), free_(places), freeLarge_(largePlaces), places_(places) {
+    : registry_(registry), free_(permits), freeLarge_(largePermits), permits_(permits) {
   // So that giving one back allocates nothing.
-  spareWakeUps_.reserve(places);
+  spareWakeUps_.reserve(permits);
 }
 
-FairSemaphore::Place::Place(FairSemaphore& semaphore, bool isLarge)
+FairSemaphore::Permit::Permit(FairSemaphore& semaphore, bool isLarge)
     : semaphore_(semaphore), large_(isLarge) {
   const std::lock_guard lock(semaphore.mutex_);
-  std::deque<Place*>& line = large_ ? semaphore.waitingLarge_ : semaphore.waitingSmall_;
+  std::deque<Permit*>& line = large_ ? semaphore.waitingLarge_ : semaphore.waitingSmall_;
   turn_ = semaphore.turns_++;
   line.push_back(this);
   semaphore.admitNext();
@@ -32,12 +32,12 @@ FairSemaphore::Place::Place(FairSemaphore& semaphore, bool isLarge)
   }
 }
 
-bool FairSemaphore::Place::isAdmitted() const {
+bool FairSemaphore::Permit::isAdmitted() const {
   const std::lock_guard lock(semaphore_.mutex_);
   return state_ == State::admitted;
 }
 
-void FairSemaphore::Place::leave() noexcept {
+void FairSemaphore::Permit::leave() noexcept {
   const std::lock_guard lock(semaphore_.mutex_);
   if (state_ == State::left) return;
   if (state_ == State::admitted) {
@@ -48,7 +48,7 @@ void FairSemaphore::Place::leave() noexcept {
     std::erase(large_ ? semaphore_.waitingLarge_ : semaphore_.waitingSmall_, this);
   }
   state_ = State::left;
-  if (wakeUp_ && semaphore_.spareWakeUps_.size() < semaphore_.places_) {
+  if (wakeUp_ && semaphore_.spareWakeUps_.size() < semaphore_.permits_) {
     eventfd_t ignored;
     eventfd_read(wakeUp_.get(), &ignored);
     semaphore_.spareWakeUps_.push_back(std::move(wakeUp_));
@@ -58,7 +58,7 @@ void FairSemaphore::Place::leave() noexcept {
 
 std::size_t FairSemaphore::held() const {
   const std::lock_guard lock(mutex_);
-  return places_ - free_;
+  return permits_ - free_;
 }
 
 void FairSemaphore::admitNext() noexcept {
@@ -68,12 +68,12 @@ void FairSemaphore::admitNext() noexcept {
     if (!anySmall && !anyLarge) return;
     const bool large =
         anyLarge && (!anySmall || waitingLarge_.front()->turn_ < waitingSmall_.front()->turn_);
-    std::deque<Place*>& line = large ? waitingLarge_ : waitingSmall_;
-    Place& next = *line.front();
+    std::deque<Permit*>& line = large ? waitingLarge_ : waitingSmall_;
+    Permit& next = *line.front();
     line.pop_front();
     --free_;
     if (large) --freeLarge_;
-    next.state_ = Place::State::admitted;
+    next.state_ = Permit::State::admitted;
     if (next.wakeUp_) eventfd_write(next.wakeUp_.get(), 1);
   }
 }

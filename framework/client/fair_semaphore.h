@@ -16,23 +16,23 @@ namespace Keelgate {
 /// All members may be called from any thread.
 class FairSemaphore {
  public:
-  /// `largePlaces` of the places at most are held by large calls; the others are kept free for
+  /// `largePermits` of the permits at most are held by large calls; the others are kept free for
   /// small ones, which overtake a large call that waits for that reason alone.
-  FairSemaphore(std::size_t places, std::size_t largePlaces, DescriptorRegistry& registry);
+  FairSemaphore(std::size_t permits, std::size_t largePermits, DescriptorRegistry& registry);
 
-  /// One call's place: it stands in line from the beginning, and leaves with its end. One thread at
-  /// a time, but for the moment when it is admitted.
-  class Place {
+  /// One call's permit: it stands in line from the beginning, and leaves with its end. One thread
+  /// at a time, but for the moment when it is admitted.
+  class Permit {
    public:
     /// Throws std::bad_alloc, or StartFailure when it would have to wait and there is no descriptor
     /// left to wait on.
-    Place(FairSemaphore& semaphore, bool isLarge);
-    ~Place() { leave(); }
-    Place(const Place&) = delete;
-    Place& operator=(const Place&) = delete;
+    Permit(FairSemaphore& semaphore, bool isLarge);
+    ~Permit() { leave(); }
+    Permit(const Permit&) = delete;
+    Permit& operator=(const Permit&) = delete;
 
     [[nodiscard]] bool isAdmitted() const;
-    /// Gives the place up, or its turn.
+    /// Gives the permit back, or its turn up.
     void leave() noexcept;
     /// Readable as soon as it is admitted.
     [[nodiscard]] int descriptor() const noexcept { return wakeUp_.get(); }
@@ -61,11 +61,11 @@ class FairSemaphore {
   mutable std::mutex mutex_;
   std::size_t free_;
   std::size_t freeLarge_;
-  const std::size_t places_;
+  const std::size_t permits_;
   std::uint64_t turns_ = 0;
   /// First come, first served.
-  std::deque<Place*> waitingSmall_;
-  std::deque<Place*> waitingLarge_;
+  std::deque<Permit*> waitingSmall_;
+  std::deque<Permit*> waitingLarge_;
   /// For the next that wait.
   std::vector<Descriptor> spareWakeUps_;
 };

@@ -9,7 +9,7 @@ namespace Keelgate {
 
 namespace {
 
-/// So many messages, and the worker and its place are given back: others wait for them, and
+/// So many messages, and the worker and its permit are given back: others wait for them, and
 /// services are replaced from time to time.
 constexpr std::size_t messagesPerTurn = 512;
 
@@ -52,15 +52,15 @@ Optional<Wait> Pipeline::step(TaskList& done, TaskList& alone) {
   return Wait{};
 }
 
-/// A place and a worker, or what to wait for.
+/// A permit and a worker, or what to wait for.
 Optional<Wait> Pipeline::acquire() {
   const Deadline deadline = oldest().deadline();
-  if (!place_) place_.emplace(pool_.places(), false);
+  if (!permit_) permit_.emplace(pool_.permits(), false);
   if (Clock::now() >= deadline) {
     throw HostError(HostError::Reason::timedOut, "no process came free in time");
   }
-  if (!place_->isAdmitted()) {
-    return Wait{.descriptor = place_->descriptor(), .events = POLLIN, .until = deadline};
+  if (!permit_->isAdmitted()) {
+    return Wait{.descriptor = permit_->descriptor(), .events = POLLIN, .until = deadline};
   }
   auto taken = pool_.take(longest, false, deadline);
   if (const Wait* wait = std::get_if<Wait>(&taken)) return *wait;
@@ -143,14 +143,14 @@ void Pipeline::fail(TaskList& alone) noexcept {
   leave();
 }
 
-/// Gives back the worker and the place. What it was given and has not answered is new again.
+/// Gives back the worker and the permit. What it was given and has not answered is new again.
 void Pipeline::leave() noexcept {
   exchange_.reset();
   new_.splice(new_.begin(), given_);
   if (worker_) pool_.giveBack(std::move(*worker_));
   worker_.reset();
-  if (!place_) return;
-  place_.reset();
+  if (!permit_) return;
+  permit_.reset();
   pool_.tidy();
 }
 

@@ -22,7 +22,7 @@ class Task {
   /// Whether it may go together with others. Otherwise it is to be advanced.
   [[nodiscard]] virtual bool isShared() const noexcept = 0;
   /// Its request, with which it begins; null where there is none to be sent, and it goes alone.
-  virtual const ClientRequest* request() noexcept = 0;
+  virtual const OutgoingMessage* request() noexcept = 0;
   /// It is at the head of those that share a worker: from now on its time counts.
   virtual void beginTime() noexcept = 0;
   /// Takes the reply to that. False: it is to go alone, because what came is not a good reply.
@@ -73,14 +73,14 @@ class Pipeline {
   void leave() noexcept;
 
   Pool& pool_;
-  Optional<FairSemaphore::Place> place_;
+  Optional<FairSemaphore::Permit> permit_;
   Optional<Worker> worker_;
   Optional<Exchange> exchange_;
   /// What the worker has been given and not answered, the oldest first; and what follows them.
   TaskList given_;
   TaskList new_;
   std::size_t bytes_ = 0;
-  /// How many more the worker is given before its place is somebody else's.
+  /// How many more the worker is given before its permit is somebody else's.
   std::size_t turn_ = 0;
   /// How many may be on their way just now.
   std::size_t depth_ = 1;

@@ -17,14 +17,12 @@ namespace {
 
 /// Workers that have answered may take a moment to end, and their ends are told together; beside
 /// them fit as many as are kept.
-constexpr std::size_t slotsPerPlace = 6;
+constexpr std::size_t slotsPerProcess = 6;
 
-/// Where no worker is to be had just now, and nobody may tell when one is.
-constexpr milliseconds secondLook{4};
-
-/// A quarter of the places, one at least, is kept free for small messages; a single one is for all.
-constexpr std::size_t largePlaces(std::size_t places) {
-  return places == 1 ? 1 : places - (places + 3) / 4;
+/// A quarter of the processes, one at least, is kept free for small messages; a single one is for
+/// all.
+constexpr std::size_t largePermits(std::size_t processes) {
+  return processes == 1 ? 1 : processes - (processes + 3) / 4;
 }
 
 /// So many abnormal ends at once are not held up.
@@ -33,7 +31,7 @@ constexpr int abnormalBurst = 4;
 std::size_t processesFor(const Client::Options& options) {
   const std::size_t wanted =
       options.processes == 0 ? std::thread::hardware_concurrency() : options.processes;
-  return std::clamp<std::size_t>(wanted, 1, Client::Options::mostProcesses);
+  return std::clamp<std::size_t>(wanted, 1, Client::Options::maximumProcesses);
 }
 
 std::uint64_t cpuSeconds(const Client::Options& options) {
@@ -54,7 +52,7 @@ ServiceSettings settingsFor(const Client::Options& options, std::size_t processe
           .forks = options.isolation == Client::Isolation::fork,
           .messagesPerWorker = std::max<std::uint64_t>(options.messagesPerProcess, 1),
           .cpuSecondsPerWorker = cpuSeconds(options),
-          .maximumWorkers = slotsPerPlace * processes};
+          .maximumWorkers = slotsPerProcess * processes};
 }
 
 }  // namespace
@@ -87,7 +85,7 @@ Pool::Pool(const Client::Options& options)
       // Each worker's channel twice while it is forked, the two ends of each service, of which
       // every call may hold an old one, and what a call waits on.
       registry_(2 * settings_.maximumWorkers + 5 * (processes_ + 4)),
-      places_(processes_, largePlaces(processes_), registry_),
+      permits_(processes_, largePermits(processes_), registry_),
       supervisor_(settings_, log_, registry_),
       abnormalEnds_(options.abnormalEndsPerSecond) {}
 
@@ -123,15 +121,12 @@ std::variant<Worker, Wait> Pool::take(std::size_t length, bool fresh, Deadline d
     throw HostError(Reason::startFailed, failure.sentence);
   }
   service->readNews();
-  const Deadline now = Clock::now();
-  if (now >= deadline) {
+  if (Clock::now() >= deadline) {
     // A zygote that frees no worker for so long serves nobody else either.
     service->retire();
     throw HostError(Reason::timedOut, "no process came free in time");
   }
-  return Wait{.descriptor = service->descriptor(),
-              .events = POLLIN,
-              .until = std::min(deadline, now + secondLook)};
+  return service->waitForNews(deadline);
 }
 
 /// An idle worker that is still there. What was to be had from another has been waiting for no
@@ -171,12 +166,12 @@ void Pool::tidy() noexcept {
   supervisor_.tidy();
 }
 
-/// How many workers to fork for the calls that come next. The place that the calling thread holds,
+/// How many workers to fork for the calls that come next. The permit that the calling thread holds,
 /// if any, counts as free: it has its reply.
 std::size_t Pool::startForking(const ServiceProcess& service) noexcept {
   const std::size_t each = messagesPerWorker() == 1 ? 2 : 1;
   const std::lock_guard lock(mutex_);
-  const std::size_t held = places_.held();
+  const std::size_t held = permits_.held();
   busy_.note(held, Clock::now());
   const std::size_t wanted = each * busy_.value();
   // Those of a service that was replaced were kept before those of its successor.

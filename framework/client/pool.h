@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 /// The workers of a client: one message each by default, and a fresh one forked ahead. A call waits
-/// for one of `places()` first, and then for a worker that it can `take()`.
+/// for one of `permits()` first, of which there is one for each process that the options grant, and
+/// then for a worker that it can `take()`.
 #pragma once
 
 #include "framework/client/fair_semaphore.h"
@@ -77,7 +78,7 @@ class Pool {
   /// When a message that ended abnormally may be answered.
   Deadline noteAbnormalEnd() noexcept;
 
-  [[nodiscard]] FairSemaphore& places() noexcept { return places_; }
+  [[nodiscard]] FairSemaphore& permits() noexcept { return permits_; }
   [[nodiscard]] bool isLarge(std::size_t length) const noexcept;
   [[nodiscard]] std::size_t processes() const noexcept { return processes_; }
   [[nodiscard]] const LogSink& log() const noexcept { return log_; }
@@ -105,7 +106,7 @@ class Pool {
   const std::uint64_t expectedLength_;
   const LogSink log_;
   DescriptorRegistry registry_;
-  FairSemaphore places_;
+  FairSemaphore permits_;
   Supervisor supervisor_;
 
   std::mutex mutex_;

@@ -21,7 +21,7 @@ namespace {
 
 constexpr const char* serviceName = "VespKeelgateService";
 /// As many as the kernel follows.
-constexpr int mostLinks = 40;
+constexpr int maximumLinks = 40;
 
 String errorText(int error) {
   return std::generic_category().message(error);
@@ -68,7 +68,7 @@ class Walk {
       rest.erase(0, name.size() + 1);
       if (name.empty() || name == ".") continue;
       if (!step(name)) continue;
-      if (++links > mostLinks) fail("The service " + program_ + ": " + errorText(ELOOP));
+      if (++links > maximumLinks) fail("The service " + program_ + ": " + errorText(ELOOP));
       const String target = linkTarget();
       current_ = std::move(before_);
       rest = rest.empty() ? target : target + '/' + rest;

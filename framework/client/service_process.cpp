@@ -35,6 +35,10 @@ constexpr milliseconds startPatience{10'000};
 /// An honest worker is gone so long after its last answer; the slots are looked at as often.
 constexpr milliseconds leavePatience{4};
 
+/// Two may wait for the same news, and the one who reads it does not tell the other; and slots come
+/// free with time.
+constexpr milliseconds newsInterval{4};
+
 /// After one that was not gone by then nobody is waited for who holds the last slot.
 constexpr milliseconds impatience{100};
 
@@ -118,6 +122,12 @@ void ServiceProcess::readNews() noexcept {
   for (Slot& slot : slots_) {
     if (slot.state == SlotState::leaving) slot.state = SlotState::overdue;
   }
+}
+
+Wait ServiceProcess::waitForNews(Deadline until) const noexcept {
+  return {.descriptor = handles_.control.get(),
+          .events = POLLIN,
+          .until = std::min(until, Clock::now() + newsInterval)};
 }
 
 void ServiceProcess::noteFrame(const ControlFrame& frame) noexcept {

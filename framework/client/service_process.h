@@ -2,8 +2,8 @@
 /// One service, seen from its client: the launcher's pidfd and the control channel to the zygote,
 /// which forks workers, kills them and tells how they ended.
 ///
-/// Nothing here waits but finishEnd(). Whoever needs news waits for descriptor() and calls
-/// readNews(), which reads for all.
+/// Nothing here waits. Whoever needs news waits for waitForNews() and calls readNews(), which reads
+/// for all.
 #pragma once
 
 #include "framework/client/launch.h"
@@ -78,8 +78,8 @@ class ServiceProcess {
 
   /// Takes note of what the zygote has said, without waiting, and of workers that should have left.
   void readNews() noexcept;
-  /// To wait for news on; -1 once it is being ended.
-  [[nodiscard]] int descriptor() const noexcept { return handles_.control.get(); }
+  /// What to wait for before readNews() is called again, `until` at the latest.
+  [[nodiscard]] Wait waitForNews(Deadline until) const noexcept;
 
   /// It is given no further message. Workers are copies of one zygote and share its address layout:
   /// an attacker who could make one after the other fail could search for it.

@@ -8,7 +8,7 @@
 namespace Keelgate {
 
 /// What the deepest reply takes, and as much again.
-constexpr std::size_t leastStack = std::size_t{256} << 10;
+constexpr std::size_t minimumStack = std::size_t{256} << 10;
 
 /// Throws HostError (resourcesExhausted) where the calling thread has less than that left. A stack
 /// of the application's own making, as of a coroutine, is not known to the system and not checked.

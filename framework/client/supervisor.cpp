@@ -24,8 +24,8 @@ constexpr ServiceProcess::Patience aside{
 constexpr ServiceProcess::Patience atTheEnd{
     .closed = milliseconds(100), .asked = milliseconds(70), .killed = milliseconds(20)};
 
-/// Two threads may wait for the same news, and the one who reads it does not tell the other.
-constexpr milliseconds secondLook{10};
+/// For the thread that spawns a service; it does not tell the others when it has.
+constexpr milliseconds spawnInterval{4};
 
 /// A standby that could not be started is tried again so much later.
 constexpr milliseconds standbyPatience{1000};
@@ -66,9 +66,8 @@ std::variant<Supervisor::Service, Wait> Supervisor::demand(Deadline deadline) {
         return current_;
       case State::starting:
         if (now >= deadline) giveUp(deadline);
-        return Wait{.descriptor = current_ ? current_->descriptor() : -1,
-                    .events = POLLIN,
-                    .until = std::min(deadline, now + secondLook)};
+        return current_ ? current_->waitForNews(deadline)
+                        : Wait{.until = std::min(deadline, now + spawnInterval)};
       case State::backingOff:
         if (backOff_.notBefore() >= deadline || !lastFailure_->mayPass) giveUp(deadline);
         return Wait{.until = backOff_.notBefore()};

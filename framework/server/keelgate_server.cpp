@@ -21,7 +21,7 @@ void KeelgateServer::add(std::size_t record, Handler handler) {
   handlers_.at(record) = std::move(handler);
 }
 
-Reply KeelgateServer::answer(const Request& request) const {
+Reply KeelgateServer::answer(const ReceivedMessage& request) const {
   // Outside the try, so that what was logged before an error travels with it.
   LogCapture capture;
   Reply reply{.kind = ReplyKind::error, .body = {}, .log = {}};

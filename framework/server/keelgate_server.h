@@ -19,7 +19,7 @@ namespace Keelgate {
 enum class SandboxID { keelgate };
 
 /// One message, as it arrived. Everything is borrowed for the time of the call.
-struct Request {
+struct ReceivedMessage {
   /// recordNumber<Record> of the record that is asked for.
   std::size_t record;
   Bytes message;
@@ -45,14 +45,14 @@ class KeelgateServer {
   template <OutputRecord R, MessageUnpacker U>
   requires std::same_as<typename U::SchemaType, R>
   void registerUnpacker(U unpacker) {
-    add(recordNumber<R>, [unpacker = std::move(unpacker)](const Request& request) {
+    add(recordNumber<R>, [unpacker = std::move(unpacker)](const ReceivedMessage& request) {
       return Transport::lendRecord(unpacker.unpack(request.message));
     });
   }
   template <OutputRecord R, ContextualUnpacker U>
   requires std::same_as<typename U::SchemaType, R>
   void registerUnpacker(U unpacker) {
-    add(recordNumber<R>, [unpacker = std::move(unpacker)](const Request& request) {
+    add(recordNumber<R>, [unpacker = std::move(unpacker)](const ReceivedMessage& request) {
       return Transport::lendRecord(unpacker.unpack(
           request.message,
           typename U::Context{.command = request.command, .service = String(request.service)}));
@@ -65,10 +65,10 @@ class KeelgateServer {
 
   /// Unpacks one message. Errors of the message are in the reply; std::bad_alloc comes through. A
   /// request for a record that nobody is registered for gives a Breach.
-  [[nodiscard]] Reply answer(const Request& request) const;
+  [[nodiscard]] Reply answer(const ReceivedMessage& request) const;
 
  private:
-  using Handler = std::function<Transport::Body(const Request&)>;
+  using Handler = std::function<Transport::Body(const ReceivedMessage&)>;
 
   void add(std::size_t record, Handler handler);
 

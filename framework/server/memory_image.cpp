@@ -19,10 +19,10 @@ namespace {
 constexpr std::uint64_t pageSize = 4096;
 
 /// More than that is not what a message of a short one's kind does; a fork is as cheap then.
-constexpr std::uint64_t mostPages = 384;
+constexpr std::uint64_t maximumPages = 384;
 
 /// As many runs as one message may leave; more than that is unusual enough.
-constexpr std::size_t mostRuns = 512;
+constexpr std::size_t maximumRuns = 512;
 
 constexpr std::array<std::byte, pageSize> zeros{};
 
@@ -42,7 +42,7 @@ UnsharedMemory::UnsharedMemory(std::size_t size) noexcept {
 }
 
 bool MemoryImage::take(const WorkerFiles& files) {
-  runs_ = UnsharedMemory(mostRuns * sizeof(PageRun));
+  runs_ = UnsharedMemory(maximumRuns * sizeof(PageRun));
   if (runs_.size() == 0) return false;
   std::size_t offset = 0;
   for (std::size_t i = 0; i < files.areas.count; ++i) {
@@ -76,8 +76,8 @@ Optional<std::span<const PageRun>> MemoryImage::scan(const WorkerFiles& files,
                           .end = area.end,
                           .walkEnd = 0,
                           .runs = reinterpret_cast<std::uint64_t>(runs_.at(0)),
-                          .runCount = mostRuns,
-                          .maximumPages = mostPages + 1,
+                          .runCount = maximumRuns,
+                          .maximumPages = maximumPages + 1,
                           .invertedCategories = 0,
                           .allOf = Sandbox::pageIsWritten,
                           // A page that was never there counts as written, too.
@@ -97,7 +97,7 @@ bool MemoryImage::restore(const WorkerFiles& files) {
     for (const PageRun& run : *runs) {
       if (i == 0 && run.begin < stack.begin) return false;
       restored += (run.end - run.begin) / pageSize;
-      if (restored > mostPages || !restoreRun(files.memory.get(), run)) return false;
+      if (restored > maximumPages || !restoreRun(files.memory.get(), run)) return false;
     }
   }
   return true;

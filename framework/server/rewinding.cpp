@@ -17,7 +17,7 @@ namespace {
 constexpr unsigned missesPerWorker = 16;
 
 /// Each takes five descriptors. Whoever has more messages in work has the others forked.
-constexpr std::size_t mostWorkers = 64;
+constexpr std::size_t maximumWorkers = 64;
 
 rusage difference(const rusage& now, const rusage& before) {
   rusage used = now;
@@ -44,7 +44,7 @@ bool Rewinding::give(std::uint32_t slot, int channel) {
 bool Rewinding::isAnotherWorthIt() {
   const bool isOneStarting = std::any_of(members_.begin(), members_.end(),
                                          [](const Member& m) { return !m.worker->isReady(); });
-  if (isOneStarting || isHopeless() || members_.size() >= mostWorkers) return false;
+  if (isOneStarting || isHopeless() || members_.size() >= maximumWorkers) return false;
   missed_ = (missed_ + 1) % missesPerWorker;
   return missed_ == 0;
 }

@@ -33,7 +33,7 @@ class Rewinding {
   /// Such a fork, or -1 where it failed.
   void add(pid_t process);
   /// Whether it has turned out that the machine does not let it.
-  [[nodiscard]] bool isHopeless() const noexcept { return failures_ >= mostFailures; }
+  [[nodiscard]] bool isHopeless() const noexcept { return failures_ >= maximumFailures; }
   [[nodiscard]] bool isEmpty() const noexcept { return members_.empty(); }
 
   /// What the one that is getting ready waits for, or -1; and what to do when it is readable.
@@ -53,7 +53,7 @@ class Rewinding {
   Optional<End> note(pid_t process, int status, const rusage& used);
 
  private:
-  static constexpr unsigned mostFailures = 3;
+  static constexpr unsigned maximumFailures = 3;
 
   struct Member {
     std::unique_ptr<RewindableWorker> worker;

@@ -35,7 +35,7 @@ const KeelgateServer& server() {
 void requireJSON(const std::string& text) {
   std::string line = R"({"record":"PulseUserPayload","message":"","id":)" + text + "}";
   const CLI::RequestLine read = CLI::readRequestLine(line);
-  require(std::holds_alternative<CLI::Request>(read.content), "a record's JSON is JSON");
+  require(std::holds_alternative<CLI::StreamRequest>(read.content), "a record's JSON is JSON");
   require(read.id == text, "a record's JSON is the one spelling of what it says");
 }
 

@@ -133,19 +133,19 @@ class KEELGATE_API Client {
 
   struct Options {
     /// Bounds the processes and descriptors that a client takes.
-    static constexpr unsigned mostProcesses = 128;
+    static constexpr unsigned maximumProcesses = 128;
     /// Positions in a message are stored in 32 bits.
-    static constexpr std::size_t greatestLargestMessage = 0xffff'ffff;
+    static constexpr std::size_t maximumMessageSize = 0xffff'ffff;
 
     /// How many messages are processed at a time; 0 stands for the number of processors, and a
-    /// number above `mostProcesses` for that. Messages of 4 MiB and more get at most three quarters
-    /// of the processes, but at least one.
+    /// number above `maximumProcesses` for that. Messages of 4 MiB and more get at most three
+    /// quarters of the processes, but at least one.
     unsigned processes = 0;
     /// From the call until the record, including the wait for a free process; a message that takes
     /// longer is given up. It bounds the cost of a hostile message, so it cannot be switched off;
     /// more than a year counts as a year.
     std::chrono::milliseconds timeLimit{5000};
-    /// In bytes, at most `greatestLargestMessage`. Checked before anything is sent, so a longer
+    /// In bytes, at most `maximumMessageSize`. Checked before anything is sent, so a longer
     /// message costs nothing.
     std::size_t largestMessage = std::size_t{64} << 20;
     /// How many messages a process may see before a fresh one takes its place. With 1, a process

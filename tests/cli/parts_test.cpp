@@ -102,7 +102,7 @@ TEST(RequestLine, AStringStandsForItsCharacters) {
     String line = lineOf(spelt);
     const RequestLine read = readRequestLine(line);
     ASSERT_EQ(problemOf(read), "ok") << spelt;
-    const auto& request = std::get<Request>(read.content);
+    const auto& request = std::get<StreamRequest>(read.content);
     const auto& context = std::get<VespClientMessageContext>(request.subject);
     EXPECT_EQ(context.service, text);
     EXPECT_EQ(context.command, 7u);

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// What becomes of services and places: an abnormal end costs the others nothing (C14).
+// What becomes of services and permits: an abnormal end costs the others nothing (C14).
 #include "framework/client/pool.h"
 #include "framework/client/stack.h"
 #include "tests/host/host_testing.h"
@@ -14,7 +14,7 @@ namespace Keelgate::Host {
 namespace {
 
 using std::chrono::seconds;
-using Place = FairSemaphore::Place;
+using Permit = FairSemaphore::Permit;
 using State = ServiceProcess::State;
 
 const Script fault = Script().then(Op::raise, SIGSEGV);
@@ -66,7 +66,7 @@ TEST(C14, OthersKeepTheirMessageWhateverEndsBesideThem) {
   }
 }
 
-TEST(C14, GiantsLeaveAPlaceForSmallMessages) {
+TEST(C14, GiantsLeaveAProcessForSmallMessages) {
   Client client(fakeOptions());
   Script giant = Script().then(Op::pause, 1500).answer(0).then(Op::exit);
   giant.resize(std::size_t{4} << 20);
@@ -202,17 +202,17 @@ TEST(Supervision, APeakIsForgottenAfterAWhile) {
   }
 }
 
-TEST(Places, AreGivenInTurnAndSomeAreKeptForSmallOnes) {
+TEST(Permits, AreGivenInTurnAndSomeAreKeptForSmallOnes) {
   DescriptorRegistry registry(16);
   FairSemaphore semaphore(2, 1, registry);
-  Place large(semaphore, true);
-  Place secondLarge(semaphore, true);
-  Place small(semaphore, false);
+  Permit large(semaphore, true);
+  Permit secondLarge(semaphore, true);
+  Permit small(semaphore, false);
   EXPECT_TRUE(large.isAdmitted() && !secondLarge.isAdmitted() && small.isAdmitted());
   EXPECT_EQ(semaphore.held(), 2u);
-  Place gone(semaphore, false);
-  Place next(semaphore, false);
-  // Nobody is called who has left the line, and a place that comes free goes to the next.
+  Permit gone(semaphore, false);
+  Permit next(semaphore, false);
+  // Nobody is called who has left the line, and a permit that comes free goes to the next.
   gone.leave();
   small.leave();
   EXPECT_TRUE(next.isAdmitted() && !secondLarge.isAdmitted());
@@ -221,8 +221,8 @@ TEST(Places, AreGivenInTurnAndSomeAreKeptForSmallOnes) {
   EXPECT_EQ(waitFor({.descriptor = secondLarge.descriptor(), .events = POLLIN, .until = {}}),
             POLLIN);
   // Who comes late does not overtake.
-  Place third(semaphore, true);
-  Place last(semaphore, false);
+  Permit third(semaphore, true);
+  Permit last(semaphore, false);
   secondLarge.leave();
   EXPECT_TRUE(third.isAdmitted() && !last.isAdmitted());
   EXPECT_EQ(waitFor({.descriptor = last.descriptor(), .events = POLLIN, .until = {}}), 0);
@@ -255,8 +255,8 @@ TEST(Stack, WhatIsPromisedIsEnoughAndLessIsRefused) {
         .get();
   };
   // In this order: the C library gives a thread the stack of one before it that had more.
-  EXPECT_EQ(runWith(leastStack - (32u << 10)), "resourcesExhausted");
-  EXPECT_EQ(runWith(leastStack + (32u << 10)), "record 0");
+  EXPECT_EQ(runWith(minimumStack - (32u << 10)), "resourcesExhausted");
+  EXPECT_EQ(runWith(minimumStack + (32u << 10)), "record 0");
 }
 #endif
 
