@@ -111,11 +111,9 @@ void Supervisor::fail(StartFailure failure) {
   backOff_.noteDeath();
   state_ = State::backingOff;
   lastFailure_ = std::move(failure);
-  if (!lastFailure_->mayPass) throw HostError(Reason::startFailed, lastFailure_->sentence);
 }
 
-/// Takes note of what has happened to the services. Throws HostError when one could not start and
-/// will not be able to.
+/// Takes note of what has happened to the services.
 void Supervisor::settle() {
   if (current_) current_->readNews();
   if (standby_) standby_->readNews();

@@ -46,7 +46,11 @@ struct Sent {
                          : lies ? "protocolViolation"
                                 : "record " + std::to_string(i));
     }
-    for (const Script& script : scripts) requests.push_back({.message = script});
+    // With names of many lengths in front of the messages.
+    for (const Script& script : scripts) {
+      const String service(requests.size() % 5, 's');
+      requests.push_back({.message = script, .context = {.command = none, .service = service}});
+    }
   }
 };
 

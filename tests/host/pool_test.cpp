@@ -12,6 +12,7 @@
 #include <sys/un.h>
 
 #include <array>
+#include <limits>
 
 namespace Keelgate::Host {
 namespace {
@@ -28,6 +29,16 @@ String startOf(const Client::Options& options) {
   }
 }
 
+/// A socket that has the path, for which nobody listens yet.
+int boundTo(const String& path) {
+  sockaddr_un address{};
+  address.sun_family = AF_UNIX;
+  path.copy(address.sun_path, sizeof address.sun_path - 1);
+  const int listener = socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0);
+  if (bind(listener, reinterpret_cast<sockaddr*>(&address), sizeof address) != 0) abort();
+  return listener;
+}
+
 TEST(Start, AFailureSaysWhatIsWrong) {
   const auto with = [](String Client::Options::*member, const String& path) {
     Client::Options options = fakeOptions();
@@ -37,6 +48,8 @@ TEST(Start, AFailureSaysWhatIsWrong) {
   constexpr auto program = &Client::Options::servicePath;
   constexpr auto socket = &Client::Options::socket;
   const String longPath(sizeof sockaddr_un::sun_path, 's');
+  const String deaf = temporaryPath("deaf");
+  const int listener = boundTo(deaf);
   Client::Options layers = fakeOptions("bare");
   layers.requireLayers = true;
   const std::pair<Client::Options, const char*> rows[] = {
@@ -44,6 +57,7 @@ TEST(Start, AFailureSaysWhatIsWrong) {
       {with(program, "/etc/passwd"), "/etc/passwd could not be started: Permission denied"},
       {with(socket, "/nowhere/socket"),
        "No service answers on the socket /nowhere/socket: No such file"},
+      {with(socket, deaf), "refused; start the unit that listens there; it is not tried again for"},
       {with(socket, longPath), "The socket's path is longer than the system allows: sss"},
       {layers, "Running without: user namespace, mount namespace"},
 #ifndef KEELGATE_UNSEALED
@@ -65,6 +79,8 @@ TEST(Start, AFailureSaysWhatIsWrong) {
     EXPECT_EQ(passes, String(sentence).ends_with("it is not tried again for")) << outcome;
   }
   EXPECT_TRUE(children().empty());
+  close(listener);
+  std::filesystem::remove(deaf);
 }
 
 TEST(Start, MissingSecondWallsAreToldOnceAndReported) {
@@ -113,6 +129,59 @@ TEST(Start, ThereMayBeTooFewDescriptors) {
   while (withSpare(spare, wait) == "startFailed") ++spare;
   EXPECT_GE(spare, least);
   EXPECT_EQ(wait(), "record 1");
+}
+
+TEST(Start, ThereMayBeTooFewProcesses) {
+  EXPECT_EQ(inFork([] {
+              const rlimit none{};
+              setrlimit(RLIMIT_NPROC, &none);
+              if (geteuid() == 0 && setresuid(65'534, 65'534, 65'534) != 0) return 2;
+              Client::Options options = fakeOptions();
+              options.servicePath = "/bin/true";
+              return startOf(options).find("ulimit -u") != String::npos ? 0 : 1;
+            }),
+            0);
+}
+
+TEST(Pool, WorkersAreForkedAheadAndNoMoreThanAreNeeded) {
+  for (const auto& [messages, ready] : {std::pair(1u, 2u), {100u, 1u}}) {
+    Client::Options options = fakeOptions();
+    options.messagesPerProcess = messages;
+    Client client(options);
+    for (int i = 0; i < 5; ++i) EXPECT_EQ(outcomeOf(client, good), "record 7");
+    const pid_t zygote = zygoteOf(client);
+    const auto areReady = [&, count = ready] {
+      return children(zygote).size() == count;
+    };
+    EXPECT_TRUE(comesTrue(areReady)) << messages;
+    usleep(50'000);
+    EXPECT_TRUE(areReady()) << messages;
+  }
+}
+
+/// Sizes around those at which a channel is widened, and the room for a reply is doubled or mapped.
+TEST(Pool, LongMessagesAndRepliesArriveAsTheyWereSent) {
+  for (const std::size_t allowed : {1, 100}) {
+    Client::Options options = fakeOptions();
+    options.messagesPerProcess = allowed;
+    Client client(options);
+    std::vector<Script> scripts;
+    std::vector<String> texts;
+    for (const unsigned shift : {16u, 17u, 18u, 20u, 21u, 22u, 23u}) {
+      for (const int beside : {-200, -20, 0, 20}) {
+        VespCommandResponse record{};
+        record.applicationId = String((1u << shift) + static_cast<unsigned>(beside), 'a');
+        scripts.push_back(Script().answer(Transport::encodeRecord(record)));
+        texts.push_back(std::move(*record.applicationId));
+      }
+    }
+    std::vector<Client::Request> requests;
+    for (const Script& script : scripts) requests.push_back({.message = script});
+    auto outcomes = client.unpackBatch<VespCommandResponse>(requests);
+    for (std::size_t i = 0; i < texts.size(); ++i) {
+      EXPECT_TRUE(outcomes[i].record().applicationId == texts[i]) << texts[i].size();
+    }
+  }
 }
 
 TEST(Pool, AMachineWithoutProcessesIsNotTheMessagesFault) {
@@ -167,6 +236,10 @@ TEST(Pool, WhatCannotBeAnsweredIsNotSent) {
   Client client(options);
   EXPECT_EQ(outcomeOf(client, Data(1001)), "messageTooLarge");
   EXPECT_EQ(outcomeOf(client, Data(1000)), "crashed");
+  options.largestMessage = std::numeric_limits<std::size_t>::max();
+  // Its length alone is looked at.
+  Client unlimited(options);
+  EXPECT_EQ(outcomeOf(unlimited, Bytes(good.data(), std::size_t{1} << 32)), "messageTooLarge");
   const auto naming = [&](std::size_t length) {
     return outcomeOf([&] {
       client.unpackClientMessage({}, {.command = 1, .service = String(length, 's')});
@@ -280,11 +353,7 @@ class Activator {
   /// `user` listens; the service is started under the name `manner`.
   explicit Activator(uid_t user = geteuid(), const char* manner = "fake_service") {
     options.socket = temporaryPath("socket");
-    sockaddr_un address{};
-    address.sun_family = AF_UNIX;
-    options.socket.copy(address.sun_path, sizeof address.sun_path - 1);
-    listener_ = socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0);
-    if (bind(listener_, reinterpret_cast<sockaddr*>(&address), sizeof address) != 0) abort();
+    listener_ = boundTo(options.socket);
     if (seteuid(user) != 0 || listen(listener_, 8) != 0 || seteuid(getuid()) != 0) abort();
     pid_ = fork();
     signal(SIGCHLD, pid_ == 0 ? SIG_IGN : SIG_DFL);

@@ -8,6 +8,8 @@
 
 #include <pthread.h>
 
+#include <array>
+#include <deque>
 #include <future>
 
 namespace Keelgate::Host {
@@ -150,6 +152,41 @@ TEST_F(Supervised, AServiceHasSoManyWorkersAtATime) {
   EXPECT_EQ(service->state(), State::running);
 }
 
+/// Whoever has answered is given its time, unless one was killed since it stayed.
+TEST_F(Supervised, OneThatStayedMakesTheOthersGoAtOnce) {
+  using Leaving = ServiceProcess::Leaving;
+  const Supervisor::Service service = running();
+  const auto workers = [zygote = *children().begin()] {
+    return children(zygote).size();
+  };
+  std::array<Optional<ServiceProcess::Forked>, 3> forked;
+  const auto fill = [&] {
+    for (auto& worker : forked) {
+      EXPECT_TRUE(comesTrue([&] {
+        service->readNews();
+        if (!worker) worker = service->fork(1000);
+        return worker.has_value();
+      }));
+    }
+  };
+  const auto goesAtOnceAfter = [&](Leaving how) {
+    fill();
+    service->release(forked[0]->slot, how);
+    EXPECT_TRUE(comesTrue([&] { return service->readNews(), workers() == 2; }));
+    forked[0].reset();
+    fill();
+    service->release(forked[1]->slot, Leaving::byItself);
+    EXPECT_FALSE(service->fork(1000));
+    usleep(30'000);
+    const bool isGone = workers() == 2;
+    forked[1].reset();
+    return isGone;
+  };
+  EXPECT_FALSE(goesAtOnceAfter(Leaving::killed));
+  // A machine that is busy may take longer than anybody is impatient.
+  EXPECT_TRUE(comesTrue([&] { return goesAtOnceAfter(Leaving::byItself); }));
+}
+
 TEST(Supervision, AServiceThatCannotLiveIsTriedLessAndLess) {
   BackOff backOff;
   for (int round = 0; round < 2; ++round) {
@@ -199,6 +236,17 @@ TEST(Supervision, APeakIsForgottenAfterAWhile) {
   for (const auto& [second, calls, expected] : rows) {
     peak.note(calls, now + seconds(second));
     EXPECT_EQ(peak.value(), expected) << second;
+  }
+}
+
+TEST(Permits, AQuarterIsKeptForSmallMessages) {
+  for (const auto& [permits, forLarge] :
+       {std::pair(1u, 1), {2u, 1}, {3u, 2}, {4u, 3}, {5u, 3}, {8u, 6}, {9u, 6}}) {
+    Pool pool(fakeOptions("honest", milliseconds(100), permits));
+    EXPECT_TRUE(pool.isLarge(4u << 20) && !pool.isLarge((4u << 20) - 1));
+    std::deque<Permit> all;
+    for (unsigned i = 0; i < permits; ++i) all.emplace_back(pool.permits(), true);
+    EXPECT_EQ(std::ranges::count_if(all, &Permit::isAdmitted), forLarge) << permits;
   }
 }
 
