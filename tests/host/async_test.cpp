@@ -85,6 +85,29 @@ TEST(Batch, TellsOutcomesAsTheyComeUntilItsVisitorThrows) {
   EXPECT_EQ(Host::outcomeOf(client, quick), "record 1");
 }
 
+/// Sizes around those at which a channel is widened, and the room for a reply is doubled or mapped.
+TEST(Batch, TakesLongMessagesAndRepliesWhole) {
+  for (const std::size_t allowed : {1, 100}) {
+    Client::Options options = fakeOptions();
+    options.messagesPerProcess = allowed;
+    Client client(options);
+    std::vector<Script> scripts;
+    for (std::size_t size = 1 << 16; size <= 8 << 20; size *= 2) {
+      for (const int beside : {-200, -20, 0, 20}) {
+        Response record{};
+        record.applicationId = String(size + static_cast<std::size_t>(beside), 'a');
+        scripts.push_back(Script().answer(Transport::encodeRecord(record)));
+      }
+    }
+    std::vector<Client::Request> requests;
+    for (const Script& script : scripts) requests.push_back({.message = script});
+    std::size_t next = 0;
+    for (auto& outcome : client.unpackBatch<Response>(requests)) {
+      EXPECT_TRUE(Script().answer(Transport::encodeRecord(outcome.record())) == scripts[next++]);
+    }
+  }
+}
+
 /// Each message has its own time limit; the batch as a whole may take longer.
 TEST(Batch, HoldsEachMessageToItsTimeLimit) {
   for (const std::size_t allowed : {1, 100}) {

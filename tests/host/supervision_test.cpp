@@ -137,22 +137,8 @@ TEST_F(Supervised, AServiceThatDiesIsReplacedAtOnceAsLongAsAnswersCome) {
   EXPECT_LT(Clock::now() - start, seconds(5));
 }
 
-TEST_F(Supervised, AServiceHasSoManyWorkersAtATime) {
-  const Supervisor::Service service = running();
-  std::vector<Optional<ServiceProcess::Forked>> forked;
-  for (int i = 0; i < 3; ++i) forked.push_back(service->fork(1000));
-  for (const auto& worker : forked) ASSERT_TRUE(worker);
-  EXPECT_FALSE(service->fork(1000));
-  // Its slot is free when its end is known, and not before.
-  service->release(forked[1]->slot, ServiceProcess::Leaving::killed);
-  EXPECT_TRUE(comesTrue([&] {
-    service->readNews();
-    return service->fork(1000).has_value();
-  }));
-  EXPECT_EQ(service->state(), State::running);
-}
-
-/// Whoever has answered is given its time, unless one was killed since it stayed.
+/// The slots are few. Whoever has answered is given its time, unless one was killed since it
+/// stayed.
 TEST_F(Supervised, OneThatStayedMakesTheOthersGoAtOnce) {
   using Leaving = ServiceProcess::Leaving;
   const Supervisor::Service service = running();
@@ -185,6 +171,7 @@ TEST_F(Supervised, OneThatStayedMakesTheOthersGoAtOnce) {
   EXPECT_FALSE(goesAtOnceAfter(Leaving::killed));
   // A machine that is busy may take longer than anybody is impatient.
   EXPECT_TRUE(comesTrue([&] { return goesAtOnceAfter(Leaving::byItself); }));
+  EXPECT_EQ(service->state(), State::running);
 }
 
 TEST(Supervision, AServiceThatCannotLiveIsTriedLessAndLess) {
