@@ -3,17 +3,9 @@
 
 #include <fmt/format.h>
 
-#include <numeric>
-
 namespace Keelgate::CLI {
 
 namespace {
-
-using Reason = HostError::Reason;
-
-constexpr std::size_t place(Reason reason) {
-  return static_cast<std::size_t>(reason);
-}
 
 /// With a comma between thousands.
 String grouped(UInt64 number) {
@@ -24,52 +16,47 @@ String grouped(UInt64 number) {
 
 }  // namespace
 
-void Tally::count(const JSON::Reply& reply) {
-  const std::lock_guard lock(mutex_);
+void Tally::count(const JSON::Reply& reply) noexcept {
   bytes_ += JSON::sizeOf(reply.json);
   if (reply.reason) {
-    ++givenUp_[place(*reply.reason)];
+    messages_.count(*reply.reason);
   } else if (reply.outcome == JSON::Outcome::record) {
-    ++records_;
+    messages_.countRecord();
   } else if (reply.outcome == JSON::Outcome::rejected) {
-    ++rejected_;
+    messages_.countRejection();
   } else {
     ++unusable_;
   }
 }
 
-UInt64 Tally::givenUp() const {
-  return std::accumulate(givenUp_.begin(), givenUp_.end(), UInt64{0});
-}
-
 String Tally::sentence() const {
-  const std::lock_guard lock(mutex_);
-  const UInt64 messages = records_ + rejected_ + givenUp();
-  const UInt64 crashed = givenUp_[place(Reason::crashed)];
-  const UInt64 timedOut = givenUp_[place(Reason::timedOut)];
-  String sentence = fmt::format("{} message{}", grouped(messages), messages == 1 ? "" : "s");
+  const Statistics all = messages_.read();
+  String sentence =
+      fmt::format("{} message{}", grouped(all.messages), all.messages == 1 ? "" : "s");
   const auto add = [&](UInt64 number, const char* what) {
     if (number > 0) sentence += fmt::format(", {} {}", grouped(number), what);
   };
-  add(rejected_, "rejected");
-  add(crashed, "crashed");
-  add(timedOut, "timed out");
-  add(givenUp() - crashed - timedOut, "failed");
+  add(all.rejections, "rejected");
+  add(all.crashed, "crashed");
+  add(all.timedOut, "timed out");
+  add(all.messages - all.records - all.rejections - all.crashed - all.timedOut, "failed");
   const std::chrono::duration<double> time = std::chrono::steady_clock::now() - begin_;
   return sentence + fmt::format(", {:.2f} s", time.count());
 }
 
 String Tally::metrics() const {
-  const std::lock_guard lock(mutex_);
+  const Statistics all = messages_.read();
   String text =
       "# HELP keelgate_messages_total Messages answered, by what became of them.\n"
       "# TYPE keelgate_messages_total counter\n";
   const auto add = [&](std::string_view outcome, UInt64 number) {
     text += fmt::format("keelgate_messages_total{{outcome=\"{}\"}} {}\n", outcome, number);
   };
-  add("record", records_);
-  add("rejected", rejected_);
-  for (const auto& [name, number] : casesOf<Reason>) add(name, givenUp_[number]);
+  add("record", all.records);
+  add("rejected", all.rejections);
+  for (const auto& [name, number] : casesOf<HostError::Reason>) {
+    add(name, messages_.of(static_cast<HostError::Reason>(number)));
+  }
   const auto addCounter = [&](std::string_view name, std::string_view help, UInt64 number) {
     text += fmt::format("# HELP keelgate_{0} {1}\n# TYPE keelgate_{0} counter\nkeelgate_{0} {2}\n",
                         name, help, number);

@@ -2,21 +2,18 @@
 /// What became of the messages of one run: the sum-up for people, the counters for monitoring.
 #pragma once
 
+#include "framework/client/outcome_counts.h"
 #include "framework/json/reply.h"
 
-#include <keelgate/errors.h>
-
-#include <array>
+#include <atomic>
 #include <chrono>
-#include <cstddef>
-#include <mutex>
 
 namespace Keelgate::CLI {
 
 /// May be used from many threads at once. Throws nothing but std::bad_alloc.
 class Tally {
  public:
-  void count(const JSON::Reply& reply);
+  void count(const JSON::Reply& reply) noexcept;
 
   /// "1,001 messages, 2 rejected, 1 crashed, 1 timed out, 3 failed, 0.41 s": what is zero is left
   /// out, and what was never a message is not counted.
@@ -26,15 +23,9 @@ class Tally {
   [[nodiscard]] String metrics() const;
 
  private:
-  [[nodiscard]] UInt64 givenUp() const;
-
-  mutable std::mutex mutex_;
-  UInt64 records_ = 0;
-  UInt64 rejected_ = 0;
-  UInt64 unusable_ = 0;
-  UInt64 bytes_ = 0;
-  /// By the host, for each reason, whose numbers have no gaps.
-  std::array<UInt64, casesOf<HostError::Reason>.size()> givenUp_{};
+  OutcomeCounts messages_;
+  std::atomic<UInt64> unusable_ = 0;
+  std::atomic<UInt64> bytes_ = 0;
   const std::chrono::steady_clock::time_point begin_ = std::chrono::steady_clock::now();
 };
 

@@ -85,10 +85,9 @@ KEELGATE_C_API void keelgate_options_init(keelgate_options* options, size_t size
 KEELGATE_C_API keelgate_client* keelgate_open(const keelgate_options* options, char** error);
 
 /**
- * Unpacks the `length` bytes at `message`, which may be NULL if `length` is 0. `record` is
- * "PulseUserPayload", "VespCommandResponse", "VespCommandWebTunnelResponse", "VespInvitation" or
- * "PropertyList". Sets `*reply` to the reply object as compact JSON, or to NULL with
- * KEELGATE_WRONG_USE.
+ * Unpacks the `length` bytes at `message`, which may be NULL if `length` is 0. `record` is a name
+ * that `keelgate unpack --help` lists, e.g. "PulseUserPayload". Sets `*reply` to the reply object as
+ * compact JSON, or to NULL with KEELGATE_WRONG_USE.
  */
 KEELGATE_C_API int keelgate_unpack(keelgate_client* client, const char* record, const void* message,
                                    size_t length, char** reply);

@@ -1,13 +1,19 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "framework/client/call.h"
 
+#include "framework/client/pipeline.h"
+#include "framework/client/stack.h"
+#include "framework/contracts/memory_budget.h"
 #include "framework/contracts/start_step.h"
-#include "framework/transport/wire.h"
+#include "framework/transport/error_coding.h"
+#include "framework/transport/record_coding.h"
+#include "text/utf8.h"
 
 #include <poll.h>
 #include <sys/wait.h>
 
 #include <algorithm>
+#include <array>
 #include <csignal>
 #include <cstring>
 
@@ -15,6 +21,7 @@ namespace Keelgate {
 
 using Reason = HostError::Reason;
 using std::chrono::milliseconds;
+using VespKeelgateService::VespClientMessageUnpackingError;
 
 namespace {
 
@@ -45,39 +52,112 @@ HostError explain(const ServiceProcess::Exit& exit) {
   return {Reason::crashed, "signal " + std::to_string(signal) + " (" + strsignal(signal) + ")"};
 }
 
-HostError outOfMemory() {
-  return {Reason::resourcesExhausted, "this process has no memory for the reply"};
+/// Reads the body of a record frame into a record that is there: a function for each output record.
+using RecordReader = void (*)(Bytes body, const Transport::ReadLimits& limits, void* record);
+
+constexpr auto recordReaders = [] {
+  std::array<RecordReader, OutputRecords::size> readers{};
+  OutputRecords::each([&]<class R>(std::type_identity<R>) {
+    readers[recordNumber<R>] = [](Bytes body, const Transport::ReadLimits& limits, void* record) {
+      *static_cast<R*>(record) = Transport::decodeRecord<R>(body, limits);
+    };
+  });
+  return readers;
+}();
+
+void checkSize(const char* what, std::size_t size, std::size_t limit) {
+  if (size <= limit) return;
+  throw HostError(Reason::messageTooLarge, String(what) + " has " + std::to_string(size) +
+                                               " bytes, and " + std::to_string(limit) +
+                                               " are allowed");
 }
 
 }  // namespace
 
-Call::Call(Pool& pool, const OutgoingMessage& request, Deadline deadline, bool alone,
-           Accept accept) try
-    : pool_(pool),
-      request_(request),
-      deadline_(deadline),
-      accept_(std::move(accept)),
-      permit_(pool.permits(), pool.isLarge(request.message.size())),
-      retried_(alone) {
-} catch (const StartFailure& failure) {
-  throw HostError(Reason::startFailed, failure.sentence);
+Call::Call(ClientState& client, Pool& pool, std::size_t recordNumber, Client::Request request,
+           std::unique_ptr<Detail::Sink> sink, Deadline deadline)
+    : client_(client),
+      pool_(pool),
+      request_(std::move(request)),
+      message_{.record = static_cast<std::uint16_t>(recordNumber),
+               .command = request_.context.command,
+               .service = request_.context.service,
+               .message = request_.message},
+      sink_(std::move(sink)),
+      deadline_(deadline) {}
+
+bool Call::isShared() const noexcept {
+  return !alone_ && message_.message.size() <= Pipeline::longest;
 }
 
-Optional<Wait> Call::advance() noexcept {
+bool Call::mayBeSent() noexcept try {
+  check();
+  return true;
+} catch (...) {
+  // What is wrong is found again, and told then.
+  alone_ = true;
+  return false;
+}
+
+void Call::beginTime() noexcept {
+  if (deadline_ == Deadline::max()) deadline_ = deadlineAfter(client_.options.timeLimit);
+}
+
+bool Call::take(const Exchange& exchange) noexcept try {
+  read(exchange);
+  // A reply can be made to take long to read, too.
+  return Clock::now() < deadline_;
+} catch (...) {
+  return false;
+}
+
+bool Call::advance() noexcept {
+  // First of all, so that nothing that follows goes uncounted.
+  beginTime();
   while (state_ != State::done) {
     try {
-      if (const Optional<Wait> wait = step()) return wait;
+      if (const Optional<Wait> wait = step()) {
+        wait_ = *wait;
+        return true;
+      }
     } catch (const std::bad_alloc&) {
-      finish(std::make_exception_ptr(outOfMemory()));
+      const char* const what = state_ == State::begun ? "this process has no memory for the message"
+                                                      : "this process has no memory for the reply";
+      finish(std::make_exception_ptr(HostError(Reason::resourcesExhausted, what)));
     } catch (...) {
       finish(std::current_exception());
     }
   }
-  return std::nullopt;
+  return false;
+}
+
+void Call::complete() {
+  try {
+    if (error_) std::rethrow_exception(error_);
+    client_.outcomes.countRecord();
+  } catch (const HostError& error) {
+    client_.outcomes.count(error.reason);
+  } catch (...) {
+    client_.outcomes.countRejection();
+  }
+  sink_->complete(std::move(error_));
+}
+
+void Call::check() const {
+  requireStack();
+  checkSize("the message", message_.message.size(), client_.options.largestMessage);
+  checkSize("the service identifier", message_.service.size(), Protocol::maximumServiceLength);
+  // What is not UTF-8 could not travel, and the table of services has none such.
+  if (!Text::isUtf8(message_.service)) {
+    throw VespClientMessageUnpackingError::noUnpackerForService(request_.context.service);
+  }
 }
 
 Optional<Wait> Call::step() {
   switch (state_) {
+    case State::begun:
+      stepBegun();
+      break;
     case State::queued:
       return stepQueued();
     case State::taking:
@@ -96,23 +176,29 @@ Optional<Wait> Call::step() {
   return std::nullopt;
 }
 
+void Call::stepBegun() {
+  check();
+  permit_.emplace(pool_.permits(), pool_.isLarge(message_.message.size()));
+  state_ = State::queued;
+}
+
 Optional<Wait> Call::stepQueued() {
-  if (permit_.isAdmitted()) {
+  if (permit_->isAdmitted()) {
     state_ = State::taking;
     return std::nullopt;
   }
   if (Clock::now() >= deadline_) throw HostError(Reason::timedOut, "no process came free in time");
-  return Wait{.descriptor = permit_.descriptor(), .events = POLLIN, .until = deadline_};
+  return Wait{.descriptor = permit_->descriptor(), .events = POLLIN, .until = deadline_};
 }
 
 Optional<Wait> Call::stepTaking() {
-  auto taken = pool_.take(request_.message.size(), retried_, deadline_);
+  auto taken = pool_.take(message_.message.size(), alone_, deadline_);
   if (const Wait* wait = std::get_if<Wait>(&taken)) return *wait;
   worker_.emplace(std::get<Worker>(std::move(taken)));
   // Not sent any more: that it is late is not the worker's doing.
   if (Clock::now() >= deadline_) throw HostError(Reason::timedOut, "no process came free in time");
   exchange_.emplace(worker_->channel(), worker_->nextSequence());
-  exchange_->add(request_);
+  exchange_->add(message_);
   state_ = State::exchanging;
   return std::nullopt;
 }
@@ -168,9 +254,8 @@ void Call::acceptReply() {
     worker_->hangUp();
     pool_.tidy();
   }
-  std::exception_ptr error;
   try {
-    accept_({.kind = exchange_->kind(), .body = exchange_->body(), .deadline = deadline_});
+    read(*exchange_);
   } catch (const Transport::MalformedReply&) {
     fail({Reason::protocolViolation, ""});
     return;
@@ -178,20 +263,28 @@ void Call::acceptReply() {
     const bool late = reached.limit == Transport::ReadLimitReached::Limit::time;
     fail({late ? Reason::timedOut : Reason::resourcesExhausted, ""});
     return;
-  } catch (const std::bad_alloc&) {
-    throw;
-  } catch (...) {
-    error = std::current_exception();
   }
   exchange_.reset();
   pool_.noteReply(*worker_);
   pool_.giveBack(std::move(*worker_));
   worker_.reset();
-  // A reply can be made to take long to read, too.
-  if (Clock::now() >= deadline_) {
-    error = std::make_exception_ptr(HostError(Reason::timedOut, ""));
+  if (Clock::now() >= deadline_) throw HostError(Reason::timedOut, "");
+  finish(std::move(error_));
+}
+
+/// Takes a reply: the record, or the error that it holds. Throws what else comes of it.
+void Call::read(const Exchange& exchange) {
+  error_ = nullptr;
+  const Transport::ReadLimits limits{.memory = memoryBudget(message_.message.size()),
+                                     .deadline = deadline_};
+  try {
+    if (exchange.kind() == Protocol::ReplyKind::error) {
+      Transport::throwError(exchange.body(), limits);
+    }
+    recordReaders.at(message_.record)(exchange.body(), limits, sink_->makeRecord());
+  } catch (const Error&) {
+    error_ = std::current_exception();
   }
-  finish(std::move(error));
 }
 
 /// The message has cost its worker, and the service its layout.
@@ -204,8 +297,8 @@ void Call::fail(const HostError& why) {
   worker_.reset();
   // It may have been the doing of the messages before: this one gets a worker to itself. A message
   // that was alone with its worker has had its only try.
-  if (hadOthers && !retried_ && why.reason != Reason::timedOut) {
-    retried_ = true;
+  if (hadOthers && !alone_ && why.reason != Reason::timedOut) {
+    alone_ = true;
     state_ = State::taking;
     return;
   }
@@ -222,7 +315,7 @@ void Call::finish(std::exception_ptr error) noexcept {
   worker_.reset();
   error_ = std::move(error);
   state_ = State::done;
-  permit_.leave();
+  permit_.reset();
 }
 
 }  // namespace Keelgate

@@ -2,69 +2,96 @@
 /// One message, from its turn to its outcome, as a state machine that never waits: whoever drives
 /// it waits, for one call or for many at once.
 ///
-///     queued -> taking -> exchanging -> (explaining) -> (slowed) -> done
-///                 ^                          |
-///                 +--- once, in a worker of its own, when others had the worker before
+///     begun -> queued -> taking -> exchanging -> (explaining) -> (slowed) -> done
+///                          ^                          |
+///                          +--- once, in a worker of its own, when others had the worker before
+///
+/// A short message may go together with others instead (Pipeline). Then it comes this way only if
+/// that brings no good reply.
 #pragma once
 
+#include "framework/client/outcome_counts.h"
 #include "framework/client/pool.h"
 
-#include <functional>
+#include <list>
+#include <memory>
 
 namespace Keelgate {
 
-/// The bytes of a reply, not decoded.
-struct ReceivedReply {
-  Protocol::ReplyKind kind;
-  Bytes body;
-  /// When whoever reads it has to be done.
-  Deadline deadline;
+/// What the calls of a client share, in whatever process.
+struct ClientState {
+  const Client::Options options;
+  OutcomeCounts outcomes;
 };
 
 /// One thread at a time. It stays where it is. Dropped before it is done it gives its message up.
 class Call {
  public:
-  /// Takes the reply of an honest worker; throws MalformedReply when it is not one after all. What
-  /// else it throws is the outcome of the message.
-  using Accept = std::function<void(const ReceivedReply&)>;
+  /// The client, the pool and the bytes of the message outlive the call. Without a deadline it has
+  /// the time limit of the options from when it begins.
+  Call(ClientState& client, Pool& pool, std::size_t recordNumber, Client::Request request,
+       std::unique_ptr<Detail::Sink> sink, Deadline deadline = Deadline::max());
 
-  /// The pool and what the request borrows outlive the call. `alone`: in a worker that has served
-  /// nobody, and this is its last try. Throws HostError, std::bad_alloc.
-  Call(Pool& pool, const OutgoingMessage& request, Deadline deadline, bool alone, Accept accept);
+  /// When advance() ends it even if it has not begun.
+  [[nodiscard]] Deadline deadline() const noexcept { return deadline_; }
+  [[nodiscard]] const OutgoingMessage& message() const noexcept { return message_; }
 
-  /// Goes on as far as it can. Gives what to wait for, or nothing when it is done.
-  Optional<Wait> advance() noexcept;
+  /// Whether it may go together with others; otherwise it is to be advanced.
+  [[nodiscard]] bool isShared() const noexcept;
+  /// Before it does: false where it cannot be sent, and goes alone.
+  bool mayBeSent() noexcept;
+  /// It is at the head of those that share a worker: from now on its time counts.
+  void beginTime() noexcept;
+  /// Takes the reply to it. False: it is to go alone, because what came is not a good reply.
+  bool take(const Exchange& exchange) noexcept;
+  /// From now on: in a worker that has served nobody, and this is its last try.
+  void goAlone() noexcept { alone_ = true; }
 
-  /// Of a call that is done: nothing when `accept` took the reply, else what the message's caller
-  /// is to be thrown.
-  [[nodiscard]] const std::exception_ptr& error() const noexcept { return error_; }
+  /// Goes on by itself as far as it can. False when it is done.
+  bool advance() noexcept;
+  /// What to wait for before it is advanced again; at first nothing.
+  [[nodiscard]] const Wait& wait() const noexcept { return wait_; }
+
+  /// Counts the outcome of a call that has taken its reply or is done, and tells whoever asked for
+  /// it. Nothing is done with it afterwards.
+  void complete();
 
  private:
-  enum class State { queued, taking, exchanging, explaining, slowed, done };
+  enum class State { begun, queued, taking, exchanging, explaining, slowed, done };
 
+  void check() const;
   Optional<Wait> step();
+  void stepBegun();
   Optional<Wait> stepQueued();
   Optional<Wait> stepTaking();
   Optional<Wait> stepExchanging();
   Optional<Wait> stepExplaining();
   void acceptReply();
+  void read(const Exchange& exchange);
   void fail(const HostError& why);
   void finish(std::exception_ptr error) noexcept;
 
+  ClientState& client_;
   Pool& pool_;
-  const OutgoingMessage request_;
-  const Deadline deadline_;
-  const Accept accept_;
-  FairSemaphore::Permit permit_;
-  State state_ = State::queued;
-  /// Once an attempt has failed: the next worker is to have no past.
-  bool retried_;
+  const Client::Request request_;
+  const OutgoingMessage message_;
+  const std::unique_ptr<Detail::Sink> sink_;
+  Deadline deadline_;
+  State state_ = State::begun;
+  Wait wait_;
+  Optional<FairSemaphore::Permit> permit_;
+  /// It has shared a worker, or an attempt has failed: the next worker is to have no past.
+  bool alone_ = false;
   Optional<Worker> worker_;
   Optional<Exchange> exchange_;
   /// Of `explaining`: how long the service may take to say what happened. Of `slowed`: when the
   /// error is given.
   Deadline until_{};
+  /// Nothing with a record, else what the message's caller is to be thrown.
   std::exception_ptr error_;
 };
+
+/// So calls change hands without an allocation.
+using CallList = std::list<Call>;
 
 }  // namespace Keelgate

@@ -11,22 +11,21 @@ CallQueue::CallQueue(Pool& pool) : window_(pool.processes()) {
   while (pool.sharesWorkers() && pipelines_.size() < window_) pipelines_.emplace_back(pool);
 }
 
-void CallQueue::push(std::unique_ptr<Task> task) {
+void CallQueue::push(CallList calls) {
   const std::lock_guard lock(mutex_);
-  const Deadline deadline = task->deadline();
-  waiting_.push_back(std::move(task));
-  earliest_ = std::min(earliest_, deadline);
-  ++count_;
+  for (const Call& call : calls) earliest_ = std::min(earliest_, call.deadline());
+  count_ += calls.size();
+  waiting_.splice(waiting_.end(), calls);
 }
 
 void CallQueue::run(bool mayWait) {
   begin();
   advanceReady(mayWait && done_.empty());
   while (!done_.empty()) {
-    const std::unique_ptr<Task> task = std::move(done_.front());
-    done_.pop_front();
+    CallList one;
+    one.splice(one.end(), done_, done_.begin());
     --count_;
-    task->complete();
+    one.front().complete();
   }
   begin();
 }
@@ -35,31 +34,29 @@ void CallQueue::run(bool mayWait) {
 void CallQueue::begin() {
   const std::lock_guard lock(mutex_);
   while (!waiting_.empty()) {
-    Task& next = *waiting_.front();
+    Call& next = waiting_.front();
     if (next.isShared() && !pipelines_.empty()) {
       Pipeline* const pipeline = freePipeline();
       if (pipeline == nullptr) break;
-      if (next.request() != nullptr) {
+      if (next.mayBeSent()) {
         pipeline->add(waiting_);
         continue;
       }
     }
     if (!mayBegin()) break;
-    running_.push_back({.task = std::move(waiting_.front())});
-    waiting_.pop_front();
+    running_.splice(running_.end(), waiting_, waiting_.begin());
   }
   const Deadline now = Clock::now();
   if (now < earliest_) return;
   earliest_ = Deadline::max();
-  std::erase_if(waiting_, [&](std::unique_ptr<Task>& task) {
-    const Deadline deadline = task->deadline();
-    if (deadline <= now) {
-      running_.push_back({.task = std::move(task)});
-      return true;
+  for (auto at = waiting_.begin(); at != waiting_.end();) {
+    const auto call = at++;
+    if (call->deadline() <= now) {
+      running_.splice(running_.end(), waiting_, call);
+    } else {
+      earliest_ = std::min(earliest_, call->deadline());
     }
-    earliest_ = std::min(earliest_, deadline);
-    return false;
-  });
+  }
 }
 
 /// As many as there are permits: whoever has begun is not to wait for one, because its time counts.
@@ -92,22 +89,16 @@ void CallQueue::advanceReady(bool mayWait) {
   const Deadline now = Clock::now();
   auto entry = entries.begin();
   for (auto at = running_.begin(); at != running_.end(); ++entry) {
-    const bool ready = entry->revents != 0 || at->wait.until <= now;
-    const Optional<Wait> wait = ready ? at->task->advance() : at->wait;
-    if (wait) {
-      at->wait = *wait;
-      ++at;
-    } else {
-      done_.push_back(std::move(at->task));
-      at = running_.erase(at);
-    }
+    const auto call = at++;
+    const bool isReady = entry->revents != 0 || call->wait().until <= now;
+    if (isReady && !call->advance()) done_.splice(done_.end(), running_, call);
   }
   advancePipelines();
 }
 
 /// All of them: one that has nothing to do finds out by one system call.
 void CallQueue::advancePipelines() noexcept {
-  TaskList alone;
+  CallList alone;
   for (Pipeline& pipeline : pipelines_) {
     if (pipeline.wait()) pipeline.advance(done_, alone);
   }

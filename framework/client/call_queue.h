@@ -7,8 +7,6 @@
 
 #include <atomic>
 #include <deque>
-#include <list>
-#include <memory>
 #include <mutex>
 
 namespace Keelgate {
@@ -19,7 +17,7 @@ class CallQueue {
  public:
   explicit CallQueue(Pool& pool);
 
-  void push(std::unique_ptr<Task> task);
+  void push(CallList calls);
   [[nodiscard]] bool isEmpty() const noexcept { return count_ == 0; }
   /// All that has not been completed.
   [[nodiscard]] std::size_t count() const noexcept { return count_; }
@@ -36,7 +34,7 @@ class CallQueue {
   /// Calls `visitor(const Wait&)` for all that is in work.
   template <class Visitor>
   void eachWait(Visitor visitor) const {
-    for (const Running& running : running_) visitor(running.wait);
+    for (const Call& call : running_) visitor(call.wait());
     for (const Pipeline& pipeline : pipelines_) {
       if (pipeline.wait()) visitor(*pipeline.wait());
     }
@@ -45,12 +43,6 @@ class CallQueue {
   [[nodiscard]] Deadline nextTime() const;
 
  private:
-  struct Running {
-    std::unique_ptr<Task> task;
-    /// Over from the start.
-    Wait wait{};
-  };
-
   void begin();
   [[nodiscard]] bool mayBegin() const noexcept;
   Pipeline* freePipeline() noexcept;
@@ -59,12 +51,12 @@ class CallQueue {
 
   const std::size_t window_;
   std::atomic<std::size_t> count_ = 0;
-  std::list<Running> running_;
+  CallList running_;
   std::deque<Pipeline> pipelines_;
-  TaskList done_;
+  CallList done_;
 
   mutable std::mutex mutex_;
-  TaskList waiting_;
+  CallList waiting_;
   /// The earliest deadline in `waiting_`, or earlier.
   Deadline earliest_ = Deadline::max();
 };

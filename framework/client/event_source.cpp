@@ -15,15 +15,14 @@ EventSource::EventSource(Pool& pool)
       timer_(pool.registry(), timerfd_create(CLOCK_MONOTONIC, TFD_CLOEXEC | TFD_NONBLOCK)),
       wakeUp_(pool.registry(), eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {
   if (!epoll_ || !timer_ || !wakeUp_) {
-    throw HostError(HostError::Reason::startFailed,
-                    shortage("No descriptor to poll could be made", errno).sentence);
+    throw shortage("No descriptor to poll could be made", errno);
   }
   arm(timer_.get(), EPOLLIN);
   arm(wakeUp_.get(), EPOLLIN);
 }
 
-void EventSource::start(std::unique_ptr<Task> task) {
-  queue_.push(std::move(task));
+void EventSource::start(CallList calls) {
+  queue_.push(std::move(calls));
   eventfd_write(wakeUp_.get(), 1);
 }
 

@@ -12,12 +12,11 @@ class EventSource {
   /// Throws HostError when there are no descriptors left.
   explicit EventSource(Pool& pool);
 
-  void start(std::unique_ptr<Task> task);
+  void start(CallList calls);
   /// Readable when dispatch() has something to do.
   [[nodiscard]] int descriptor() const noexcept { return epoll_.get(); }
   /// Goes on with all that can, and runs completions. Where another thread is doing that, nothing.
   void dispatch();
-  [[nodiscard]] bool isEmpty() const noexcept { return queue_.isEmpty(); }
 
  private:
   void arm(int descriptor, std::uint32_t events);

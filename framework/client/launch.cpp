@@ -26,10 +26,6 @@ namespace {
 
 constexpr const char* noChannel = "No channel for the service could be made";
 
-String errorText(int error) {
-  return std::generic_category().message(error);
-}
-
 /// Whose limit a call has met: a limit of this process, of its user or of the whole machine.
 const char* remedyFor(int error) {
   switch (error) {
@@ -116,6 +112,10 @@ class SpawnPlan {
 };
 
 }  // namespace
+
+String errorText(int error) {
+  return std::generic_category().message(error);
+}
 
 StartFailure shortage(std::string_view what, int error) {
   return {String(what) + ": " + errorText(error) + remedyFor(error), true};

@@ -8,24 +8,24 @@
 #include "framework/client/deadline.h"
 #include "framework/client/descriptor.h"
 
+#include <keelgate/errors.h>
 #include <keelgate/values.h>
 
-#include <exception>
 #include <string_view>
 
 namespace Keelgate {
 
-/// Why there is no service, for people to read, with what to do about it.
-class StartFailure : public std::exception {
- public:
-  /// `mayPass`: another try may go better, as after a death; a missing file stays missing.
-  StartFailure(String itsSentence, bool itMayPass)
-      : sentence(std::move(itsSentence)), mayPass(itMayPass) {}
-  [[nodiscard]] const char* what() const noexcept override { return sentence.c_str(); }
+/// Why there is no service (startFailed). The description says what to do about it.
+struct StartFailure : HostError {
+  StartFailure(String sentence, bool itMayPass)
+      : HostError(Reason::startFailed, std::move(sentence)), mayPass(itMayPass) {}
 
-  String sentence;
+  /// Another try may go better, as after a death; a missing file stays missing.
   bool mayPass;
 };
+
+/// What the system says of an errno.
+String errorText(int error);
 
 /// A failure that passes with the load on the process or the machine, and how to be rid of it.
 /// `error` is the errno of the call that failed.

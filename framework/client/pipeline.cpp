@@ -19,15 +19,15 @@ constexpr int silentPart = 4;
 
 }  // namespace
 
-void Pipeline::add(TaskList& from) noexcept {
-  bytes_ += from.front()->request()->message.size();
+void Pipeline::add(CallList& from) noexcept {
+  bytes_ += from.front().message().message.size();
   new_.splice(new_.end(), from, from.begin());
   if (count() == 1) oldest().beginTime();
   // To be sent at once.
   wait_ = Wait{};
 }
 
-void Pipeline::advance(TaskList& done, TaskList& alone) noexcept {
+void Pipeline::advance(CallList& done, CallList& alone) noexcept {
   try {
     wait_ = step(done, alone);
   } catch (const std::exception&) {
@@ -37,7 +37,7 @@ void Pipeline::advance(TaskList& done, TaskList& alone) noexcept {
   }
 }
 
-Optional<Wait> Pipeline::step(TaskList& done, TaskList& alone) {
+Optional<Wait> Pipeline::step(CallList& done, CallList& alone) {
   if (count() == 0) {
     leave();
     return std::nullopt;
@@ -74,13 +74,13 @@ void Pipeline::giveNew() {
   if (worker_->service().state() != ServiceProcess::State::running) turn_ = 0;
   if (given_.empty()) lastSign_ = Clock::now();
   for (; !new_.empty() && turn_ > 0; --turn_) {
-    exchange_->add(*new_.front()->request());
+    exchange_->add(new_.front().message());
     worker_->nextSequence();
     given_.splice(given_.end(), new_, new_.begin());
   }
 }
 
-Optional<Wait> Pipeline::exchange(TaskList& done, TaskList& alone) {
+Optional<Wait> Pipeline::exchange(CallList& done, CallList& alone) {
   Exchange::State state = exchange_->advance();
   for (; state == Exchange::State::answered; state = exchange_->advance()) {
     const bool isLast = exchange_->isLast();
@@ -115,13 +115,11 @@ Optional<Wait> Pipeline::exchange(TaskList& done, TaskList& alone) {
 }
 
 /// False when the reply is not one.
-bool Pipeline::takeReply(TaskList& done) {
+bool Pipeline::takeReply(CallList& done) {
   for (const String& line : exchange_->log()) logLine(pool_.log(), escapeLogLine(line));
-  Task& task = *given_.front();
-  const ReceivedReply reply{
-      .kind = exchange_->kind(), .body = exchange_->body(), .deadline = task.deadline()};
-  if (!task.take(reply)) return false;
-  bytes_ -= task.request()->message.size();
+  Call& call = given_.front();
+  if (!call.take(*exchange_)) return false;
+  bytes_ -= call.message().message.size();
   done.splice(done.end(), given_, given_.begin());
   if (count() > 0) oldest().beginTime();
   exchange_->drop();
@@ -132,11 +130,11 @@ bool Pipeline::takeReply(TaskList& done) {
 }
 
 /// Whatever has no reply goes alone.
-void Pipeline::fail(TaskList& alone) noexcept {
+void Pipeline::fail(CallList& alone) noexcept {
   exchange_.reset();
   worker_.reset();
   given_.splice(given_.end(), new_);
-  for (const std::unique_ptr<Task>& task : given_) task->goAlone();
+  for (Call& call : given_) call.goAlone();
   alone.splice(alone.end(), given_);
   bytes_ = 0;
   depth_ = 1;

@@ -113,12 +113,8 @@ std::variant<Worker, Wait> Pool::take(std::size_t length, bool fresh, Deadline d
   if (!fresh && length <= expectedLength_) {
     if (Optional<Worker> idle = takeIdle(service)) return std::move(*idle);
   }
-  try {
-    if (auto forked = service->fork(std::max<std::uint64_t>(length, expectedLength_))) {
-      return Worker(service, std::move(*forked));
-    }
-  } catch (const StartFailure& failure) {
-    throw HostError(Reason::startFailed, failure.sentence);
+  if (auto forked = service->fork(std::max<std::uint64_t>(length, expectedLength_))) {
+    return Worker(service, std::move(*forked));
   }
   service->readNews();
   if (Clock::now() >= deadline) {

@@ -13,7 +13,6 @@
 #include <cerrno>
 #include <cstdlib>
 #include <memory>
-#include <system_error>
 
 namespace Keelgate {
 
@@ -22,10 +21,6 @@ namespace {
 constexpr const char* serviceName = "VespKeelgateService";
 /// As many as the kernel follows.
 constexpr int maximumLinks = 40;
-
-String errorText(int error) {
-  return std::generic_category().message(error);
-}
 
 [[noreturn]] void fail(const String& sentence) {
   throw StartFailure(sentence, false);

@@ -37,7 +37,7 @@ class ServiceLocation : public testing::Test {
     try {
       return locateService(root_ / name, registry_).file ? "found" : "nothing";
     } catch (const StartFailure& failure) {
-      return failure.sentence;
+      return failure.description;
     }
   }
 
@@ -101,7 +101,7 @@ TEST_F(ServiceLocation, IsThatOfTheBuildThatTheCallerIsIn) {
   try {
     found = locateService("", registry_).path;
   } catch (const StartFailure& failure) {
-    found = failure.sentence;
+    found = failure.description;
   }
   EXPECT_NE(found.find(String(own / "../bin/VespKeelgateService")), String::npos) << found;
 }

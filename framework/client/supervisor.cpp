@@ -83,7 +83,7 @@ std::variant<Supervisor::Service, Wait> Supervisor::demand(Deadline deadline) {
 void Supervisor::giveUp(Deadline deadline) const {
   if (!lastFailure_) throw HostError(Reason::timedOut, "the service was restarting");
   const auto wait = backOff_.notBefore() - Clock::now();
-  String sentence = lastFailure_->sentence;
+  String sentence = lastFailure_->description;
   if (lastFailure_->mayPass && backOff_.notBefore() >= deadline && wait.count() > 0) {
     sentence += "; it is not tried again for " +
                 std::to_string(std::chrono::ceil<std::chrono::seconds>(wait).count()) + " s";

@@ -268,7 +268,6 @@ class KEELGATE_API Client {
 
  private:
   class Implementation;
-  class Message;
   using MakeSink = std::function<std::unique_ptr<Detail::Sink>(std::size_t position)>;
 
   // Defined in the library: no application compiles the reader of replies.

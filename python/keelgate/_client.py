@@ -88,8 +88,7 @@ class Client:
     def unpack(self, record: str, message: Buffer) -> Any:
         """The record that a message holds: a dict; of a "PropertyList", its top object.
 
-        record: "PulseUserPayload", "VespCommandResponse", "VespCommandWebTunnelResponse",
-        "VespInvitation" or "PropertyList".
+        record: a name that `keelgate unpack --help` lists.
 
         Raises DecodingError, Breach or HostError; ValueError for an unknown record.
         """
