@@ -305,39 +305,27 @@ UnpackOptions unpackOptions(const ::CLI::App& app, const Arguments& arguments) {
   return what;
 }
 
-/// Puts together what was parsed.
-std::function<void(Console&)> complete(const ::CLI::App& app, const Arguments& arguments,
-                                       std::string_view version) {
+/// Does what was parsed.
+void runParsed(const ::CLI::App& app, const Arguments& arguments, std::string_view version,
+               Console& console) {
   const Client::Options& host = arguments.host;
   if (app.get_subcommands().empty()) {
     if (!arguments.version) throw ::CLI::RequiredError("A subcommand");
-    if (arguments.verbose)
-      return [=](Console& console) {
-        reportVersions(version, host, console);
-      };
-    return [=](Console& console) {
-      console.print(fmt::format("keelgate {}\n", version));
-    };
+    if (arguments.verbose) return reportVersions(version, host, console);
+    console.print(fmt::format("keelgate {}\n", version));
+    return;
   }
   const ::CLI::App& chosen = *app.get_subcommands().front();
-  if (chosen.get_name() == "stream") {
-    return [=, metrics = arguments.metrics](Console& console) {
-      stream(host, metrics, console);
-    };
-  }
+  if (chosen.get_name() == "stream") return stream(host, arguments.metrics, console);
   if (chosen.get_name() == "describe") {
     // Asked for by count: an empty name is a name too, and nothing has it.
     const auto name = chosen.count("NAME") > 0 ? Optional<String>(arguments.name) : std::nullopt;
     const DescribeForm form = arguments.json         ? DescribeForm::json
                               : arguments.jsonSchema ? DescribeForm::jsonSchema
                                                      : DescribeForm::page;
-    return [=](Console& console) {
-      describe(name, form, console);
-    };
+    return describe(name, form, console);
   }
-  return [=, what = unpackOptions(chosen, arguments)](Console& console) {
-    unpack(host, what, console);
-  };
+  unpack(host, unpackOptions(chosen, arguments), console);
 }
 
 /// As the parser wants them. It loses the empty value of `--service=`, which is legal here and the
@@ -376,15 +364,14 @@ String hintFor(const ::CLI::App& app) {
 
 }  // namespace
 
-CommandLine readCommandLine(Array<String> words, std::string_view version, Console& console) {
+void run(Array<String> words, std::string_view version, Console& console) {
   ::CLI::App app("Unpacks untrusted messages in a sandbox and prints their records.", "keelgate");
   Arguments arguments;
-  CommandLine line;
   build(app, arguments);
   try {
     app.parse(reversed(std::move(words)));
-    line.run = complete(app, arguments, version);
-    line.logLevel = arguments.quiet ? LogLevel::quiet : arguments.logLevel;
+    console.setLogLevel(arguments.quiet ? LogLevel::quiet : arguments.logLevel);
+    runParsed(app, arguments, version, console);
   } catch (const ::CLI::Success&) {
     const auto chosen = app.get_subcommands();
     console.print(
@@ -394,7 +381,6 @@ CommandLine readCommandLine(Array<String> words, std::string_view version, Conso
     console.complain(hintFor(app));
     console.note(Status::unusable);
   }
-  return line;
 }
 
 }  // namespace Keelgate::CLI

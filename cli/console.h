@@ -2,6 +2,8 @@
 /// Where the command's words go: results to standard output, everything else to standard error.
 #pragma once
 
+#include "framework/json/reply.h"
+
 #include <keelgate/values.h>
 
 #include <array>
@@ -11,15 +13,7 @@
 
 namespace Keelgate::CLI {
 
-/// Exit statuses. The larger of two is the one that counts. Scripts go by them: the numbers stay as
-/// they are.
-enum class Status : std::uint8_t {
-  done = 0,
-  rejected = 1,
-  /// Wrong usage, an unreadable file, an invalid request, output that could not be written.
-  unusable = 2,
-  serviceLost = 3,
-};
+using JSON::Status;
 
 /// What is said beside errors, each with what stands before it.
 enum class LogLevel : std::uint8_t {

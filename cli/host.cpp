@@ -30,15 +30,6 @@ Client::Options completed(Client::Options options, Console& console, std::size_t
   return options;
 }
 
-/// The names and numbers of the two go together.
-constexpr Status statusOf(JSON::Outcome outcome) {
-  return static_cast<Status>(outcome);
-}
-static_assert(statusOf(JSON::Outcome::record) == Status::done);
-static_assert(statusOf(JSON::Outcome::rejected) == Status::rejected);
-static_assert(statusOf(JSON::Outcome::unusable) == Status::unusable);
-static_assert(statusOf(JSON::Outcome::serviceLost) == Status::serviceLost);
-
 }  // namespace
 
 Host::Host(Client::Options options, Console& console, std::size_t maximumMessages)
@@ -57,7 +48,7 @@ Bool Delivery::take(const std::vector<JSON::Reply>& due) noexcept {
       tally_.count(reply);
       for (const String& piece : reply.json) goOn = goOn && console_.print(piece);
       say(reply);
-      goOn = goOn && reply.outcome != JSON::Outcome::serviceLost;
+      goOn = goOn && reply.status != Status::serviceLost;
       if (!goOn) break;
     }
   } catch (const std::bad_alloc&) {
@@ -68,10 +59,10 @@ Bool Delivery::take(const std::vector<JSON::Reply>& due) noexcept {
 }
 
 void Delivery::say(const JSON::Reply& reply) {
-  const Bool lost = reply.outcome == JSON::Outcome::serviceLost;
+  const Bool lost = reply.status == Status::serviceLost;
   // In a stream a reply says it all, and a rejected message is a normal one.
-  if (kind_ == Kind::files || reply.outcome != JSON::Outcome::rejected) {
-    console_.note(statusOf(reply.outcome));
+  if (kind_ == Kind::files || reply.status != Status::rejected) {
+    console_.note(reply.status);
   }
   if (!reply.problem.empty() && (kind_ == Kind::files || lost)) {
     // The object before the sentence: at a terminal the sentence comments on it.

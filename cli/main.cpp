@@ -23,9 +23,7 @@ void forbidDumps() {
 Status keelgate(Array<String> words) {
   Console console;
   try {
-    const CommandLine line = readCommandLine(std::move(words), KEELGATE_VERSION, console);
-    console.setLogLevel(line.logLevel);
-    if (line.run) line.run(console);
+    run(std::move(words), KEELGATE_VERSION, console);
     console.flush();
   } catch (const std::exception& error) {
     console.complain(error.what());

@@ -32,7 +32,8 @@ std::size_t distance(std::string_view one, std::string_view other) {
 
 }  // namespace
 
-Array<std::string_view> nearestNames(Array<std::string_view> names, std::string_view name) {
+String suggestion(Array<std::string_view> names, std::string_view name,
+                  std::string_view otherwise) {
   // A third of the name may be mistyped; a part of a name is like it too.
   const auto unlike = [&](std::string_view candidate) {
     const Bool part = name.size() > 2 && candidate.find(name) != std::string_view::npos;
@@ -41,14 +42,8 @@ Array<std::string_view> nearestNames(Array<std::string_view> names, std::string_
   std::erase_if(names, [&](std::string_view n) { return unlike(n) > (name.size() + 2) / 3; });
   std::ranges::stable_sort(names, {}, unlike);
   if (names.size() > most) names.resize(most);
-  return names;
-}
-
-String suggestion(Array<std::string_view> names, std::string_view name,
-                  std::string_view otherwise) {
-  const Array<std::string_view> nearest = nearestNames(std::move(names), name);
-  if (nearest.empty()) return String(otherwise);
-  return fmt::format("did you mean {}?", fmt::join(nearest, " or "));
+  if (names.empty()) return String(otherwise);
+  return fmt::format("did you mean {}?", fmt::join(names, " or "));
 }
 
 }  // namespace Keelgate::CLI

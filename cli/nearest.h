@@ -8,10 +8,8 @@
 
 namespace Keelgate::CLI {
 
-/// Those of the names that are most like `name`, nearest first; empty when none is like it.
-Array<std::string_view> nearestNames(Array<std::string_view> names, std::string_view name);
-
-/// "did you mean a or b?"; `otherwise` when no name is like it.
+/// "did you mean a or b?" with those of the names that are most like `name`, nearest first;
+/// `otherwise` when none is like it.
 String suggestion(Array<std::string_view> names, std::string_view name, std::string_view otherwise);
 
 }  // namespace Keelgate::CLI

@@ -20,9 +20,9 @@ void Tally::count(const JSON::Reply& reply) noexcept {
   bytes_ += JSON::sizeOf(reply.json);
   if (reply.reason) {
     messages_.count(*reply.reason);
-  } else if (reply.outcome == JSON::Outcome::record) {
+  } else if (reply.status == JSON::Status::done) {
     messages_.countRecord();
-  } else if (reply.outcome == JSON::Outcome::rejected) {
+  } else if (reply.status == JSON::Status::rejected) {
     messages_.countRejection();
   } else {
     ++unusable_;

@@ -37,7 +37,7 @@ JSON::Reply unpackFile(const Host& host, const UnpackOptions& what, const String
   try {
     reply = replyTo(host, what, path);
   } catch (const std::system_error& error) {
-    reply = {.outcome = JSON::Outcome::unusable, .problem = error.code().message()};
+    reply = {.status = Status::unusable, .problem = error.code().message()};
   }
   if (!reply.problem.empty()) {
     reply.problem =

@@ -15,11 +15,10 @@
 #include <exception>
 #include <new>
 #include <string_view>
-#include <utility>
 
 using Keelgate::Client;
-using Keelgate::JSON::Outcome;
 using Keelgate::JSON::Reply;
+using Keelgate::JSON::Status;
 using Keelgate::JSON::Subject;
 
 /// The time limit beside the client, which has no way to ask for it: JSON is made within it too.
@@ -91,7 +90,7 @@ char* textOf(Keelgate::JSON::Pieces& pieces) noexcept {
 }
 
 int statusOf(const Reply& reply) {
-  if (reply.outcome == Outcome::record) return KEELGATE_RECORD;
+  if (reply.status == Status::done) return KEELGATE_RECORD;
   return reply.reason ? KEELGATE_GIVEN_UP : KEELGATE_REJECTED;
 }
 

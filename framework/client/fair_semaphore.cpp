@@ -5,6 +5,7 @@
 
 #include <sys/eventfd.h>
 
+#include <algorithm>
 #include <cerrno>
 
 namespace Keelgate {
@@ -19,15 +20,13 @@ FairSemaphore::FairSemaphore(std::size_t permits, std::size_t largePermits,
 FairSemaphore::Permit::Permit(FairSemaphore& semaphore, bool isLarge)
     : semaphore_(semaphore), large_(isLarge) {
   const std::lock_guard lock(semaphore.mutex_);
-  std::deque<Permit*>& line = large_ ? semaphore.waitingLarge_ : semaphore.waitingSmall_;
-  turn_ = semaphore.turns_++;
-  line.push_back(this);
+  semaphore.waiting_.push_back(this);
   semaphore.admitNext();
   if (state_ == State::admitted) return;
   try {
     wakeUp_ = semaphore.takeWakeUp();
   } catch (...) {
-    std::erase(line, this);
+    std::erase(semaphore.waiting_, this);
     throw;
   }
 }
@@ -45,7 +44,7 @@ void FairSemaphore::Permit::leave() noexcept {
     if (large_) ++semaphore_.freeLarge_;
   } else {
     // Under the lock, so nobody can admit one that has gone.
-    std::erase(large_ ? semaphore_.waitingLarge_ : semaphore_.waitingSmall_, this);
+    std::erase(semaphore_.waiting_, this);
   }
   state_ = State::left;
   if (wakeUp_ && semaphore_.spareWakeUps_.size() < semaphore_.permits_) {
@@ -63,18 +62,16 @@ std::size_t FairSemaphore::held() const {
 
 void FairSemaphore::admitNext() noexcept {
   while (free_ > 0) {
-    const bool anySmall = !waitingSmall_.empty();
-    const bool anyLarge = !waitingLarge_.empty() && freeLarge_ > 0;
-    if (!anySmall && !anyLarge) return;
-    const bool large =
-        anyLarge && (!anySmall || waitingLarge_.front()->turn_ < waitingSmall_.front()->turn_);
-    std::deque<Permit*>& line = large ? waitingLarge_ : waitingSmall_;
-    Permit& next = *line.front();
-    line.pop_front();
+    const auto next = std::find_if(waiting_.begin(), waiting_.end(), [this](const Permit* one) {
+      return !one->large_ || freeLarge_ > 0;
+    });
+    if (next == waiting_.end()) return;
+    Permit& admitted = **next;
+    waiting_.erase(next);
     --free_;
-    if (large) --freeLarge_;
-    next.state_ = Permit::State::admitted;
-    if (next.wakeUp_) eventfd_write(next.wakeUp_.get(), 1);
+    if (admitted.large_) --freeLarge_;
+    admitted.state_ = Permit::State::admitted;
+    if (admitted.wakeUp_) eventfd_write(admitted.wakeUp_.get(), 1);
   }
 }
 

@@ -44,8 +44,6 @@ class FairSemaphore {
     FairSemaphore& semaphore_;
     const bool large_;
     State state_ = State::waiting;
-    /// Its turn: lower ones come first.
-    std::uint64_t turn_ = 0;
     /// An eventfd; none where it did not have to wait.
     Descriptor wakeUp_;
   };
@@ -62,10 +60,8 @@ class FairSemaphore {
   std::size_t free_;
   std::size_t freeLarge_;
   const std::size_t permits_;
-  std::uint64_t turns_ = 0;
   /// First come, first served.
-  std::deque<Permit*> waitingSmall_;
-  std::deque<Permit*> waitingLarge_;
+  std::deque<Permit*> waiting_;
   /// For the next that wait.
   std::vector<Descriptor> spareWakeUps_;
 };

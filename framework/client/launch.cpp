@@ -14,7 +14,6 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <cerrno>
 #include <csignal>
 #include <cstring>
@@ -145,14 +144,8 @@ ServiceHandles launchService(const String& path, DescriptorRegistry& registry) {
   return handles;
 }
 
-void killLauncher(const Descriptor& launcher) noexcept {
-  syscall(SYS_pidfd_send_signal, launcher.get(), SIGKILL, nullptr, 0);
-}
-
-void askToEnd(const Descriptor& launcher) noexcept {
-  syscall(SYS_pidfd_send_signal, launcher.get(), SIGTERM, nullptr, 0);
-  // One that somebody stopped would not listen.
-  syscall(SYS_pidfd_send_signal, launcher.get(), SIGCONT, nullptr, 0);
+void signalLauncher(const Descriptor& launcher, int signal) noexcept {
+  syscall(SYS_pidfd_send_signal, launcher.get(), signal, nullptr, 0);
 }
 
 void reapLauncher(const Descriptor& launcher) noexcept {

@@ -45,9 +45,7 @@ struct ServiceHandles {
 ServiceHandles launchService(const String& path, DescriptorRegistry& registry);
 
 /// By pidfd, so that no other process can be meant.
-void killLauncher(const Descriptor& launcher) noexcept;
-/// A launcher that is asked kills its zygote, waits for all that this leaves, and ends.
-void askToEnd(const Descriptor& launcher) noexcept;
+void signalLauncher(const Descriptor& launcher, int signal) noexcept;
 /// Takes note of a launcher that has ended. The application may have waited for it already, or have
 /// told the kernel that nobody will.
 void reapLauncher(const Descriptor& launcher) noexcept;

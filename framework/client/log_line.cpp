@@ -16,19 +16,9 @@ namespace Keelgate {
 
 namespace {
 
-/// The length of the character at the front; 0 if there is none.
-std::size_t characterLength(std::string_view text) noexcept {
-  for (std::size_t n = 1; n <= 4 && n <= text.size(); ++n) {
-    if (Text::isUtf8(text.substr(0, n))) return n;
-  }
-  return 0;
-}
-
-bool isControl(std::string_view character) noexcept {
-  const auto first = static_cast<unsigned char>(character[0]);
-  if (character.size() == 1) return first < 0x20 || first == 0x7f;
+bool isControl(char32_t c) noexcept {
   // U+0080 to U+009F: a terminal may take these for escape sequences of one character.
-  return first == 0xc2 && static_cast<unsigned char>(character[1]) < 0xa0;
+  return c < 0x20 || (c >= 0x7f && c < 0xa0);
 }
 
 void appendEscaped(String& to, std::string_view bytes) {
@@ -66,14 +56,14 @@ void writeToStandardError(const String& text) noexcept {
 String escapeLogLine(std::string_view line) {
   String escaped;
   while (!line.empty()) {
-    const std::size_t length = characterLength(line);
-    const std::string_view character = line.substr(0, length == 0 ? 1 : length);
-    if (length == 0 || isControl(character)) {
-      appendEscaped(escaped, character);
+    const auto [codePoint, length] = Text::firstCharacter(line);
+    const std::string_view bytes = line.substr(0, length == 0 ? 1 : length);
+    if (length == 0 || isControl(codePoint)) {
+      appendEscaped(escaped, bytes);
     } else {
-      escaped += character;
+      escaped += bytes;
     }
-    line.remove_prefix(character.size());
+    line.remove_prefix(bytes.size());
   }
   return escaped;
 }

@@ -5,7 +5,6 @@
 
 #include <poll.h>
 
-#include <algorithm>
 #include <thread>
 
 namespace Keelgate {
@@ -165,7 +164,7 @@ void Pool::tidy() noexcept {
 /// How many workers to fork for the calls that come next. The permit that the calling thread holds,
 /// if any, counts as free: it has its reply.
 std::size_t Pool::startForking(const ServiceProcess& service) noexcept {
-  const std::size_t each = messagesPerWorker() == 1 ? 2 : 1;
+  const std::size_t each = settings_.messagesPerWorker == 1 ? 2 : 1;
   const std::lock_guard lock(mutex_);
   const std::size_t held = permits_.held();
   busy_.note(held, Clock::now());

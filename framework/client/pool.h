@@ -60,13 +60,13 @@ class Pool {
   std::variant<Worker, Wait> take(std::size_t length, bool fresh, Deadline deadline);
   /// Whether the worker has had its last message.
   [[nodiscard]] bool isSpent(const Worker& worker) const noexcept {
-    return worker.isFinished() || worker.served() >= messagesPerWorker();
+    return worker.isFinished() || worker.served() >= settings_.messagesPerWorker;
   }
   /// Whether a worker is used again.
-  [[nodiscard]] bool sharesWorkers() const noexcept { return messagesPerWorker() > 1; }
+  [[nodiscard]] bool sharesWorkers() const noexcept { return settings_.messagesPerWorker > 1; }
   /// How many more messages it may be given.
   [[nodiscard]] std::uint64_t messagesLeft(const Worker& worker) const noexcept {
-    return isSpent(worker) ? 0 : messagesPerWorker() - worker.served();
+    return isSpent(worker) ? 0 : settings_.messagesPerWorker - worker.served();
   }
   /// It gave a reply that was one.
   void noteReply(const Worker& worker) noexcept { supervisor_.noteReply(worker.service()); }
@@ -91,9 +91,6 @@ class Pool {
   void abandon() noexcept { registry_.closeAll(); }
 
  private:
-  [[nodiscard]] std::uint64_t messagesPerWorker() const noexcept {
-    return settings_.messagesPerWorker;
-  }
   Optional<Worker> takeIdle(const Supervisor::Service& service);
   std::size_t startForking(const ServiceProcess& service) noexcept;
   void forkAhead(const Supervisor::Service& service) noexcept;

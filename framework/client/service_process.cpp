@@ -82,9 +82,7 @@ ServiceProcess::ServiceProcess(const ServiceSettings& settings, DescriptorRegist
 }
 
 ServiceProcess::~ServiceProcess() {
-  constexpr Patience little{
-      .closed = milliseconds(0), .asked = milliseconds(300), .killed = milliseconds(100)};
-  while (!end(little)) waitFor(nextStep());
+  while (!end({})) waitFor(nextStep());
 }
 
 Optional<StartFailure> ServiceProcess::startFailure() const {
@@ -300,11 +298,14 @@ bool ServiceProcess::end(const Patience& patience) noexcept {
   }
   if (!over) return false;
   if (endStep_ == EndStep::closed) {
-    askToEnd(handles_.launcher);
+    // It kills its zygote, waits for all that this leaves, and ends.
+    signalLauncher(handles_.launcher, SIGTERM);
+    // One that somebody stopped would not listen.
+    signalLauncher(handles_.launcher, SIGCONT);
     endStep_ = EndStep::asked;
     nextStepAt_ = Clock::now() + patience.asked;
   } else {
-    killLauncher(handles_.launcher);
+    signalLauncher(handles_.launcher, SIGKILL);
     endStep_ = EndStep::killed;
     nextStepAt_ = Clock::now() + patience.killed;
   }

@@ -93,11 +93,12 @@ class ServiceProcess {
   /// How long each means of ending it is given before the next.
   struct Patience {
     /// For a zygote whose channel is closed, and its workers with it.
-    std::chrono::milliseconds closed;
-    /// For a launcher to kill its zygote and collect all that this leaves.
-    std::chrono::milliseconds asked;
+    std::chrono::milliseconds closed{100};
+    /// For a launcher to kill its zygote and collect all that this leaves: time, on a crowded
+    /// machine.
+    std::chrono::milliseconds asked{300};
     /// For the kernel, after SIGKILL.
-    std::chrono::milliseconds killed;
+    std::chrono::milliseconds killed{100};
   };
   /// One step of its end, without waiting. Whether it has ended; otherwise to be called again when
   /// nextStep() is over. One thread at a time, which nobody else uses it beside.

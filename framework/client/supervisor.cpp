@@ -16,13 +16,8 @@ using std::chrono::milliseconds;
 
 namespace {
 
-/// One that was replaced: nobody waits for its end, and a launcher on a crowded machine needs time
-/// to collect what it leaves.
-constexpr ServiceProcess::Patience aside{
-    .closed = milliseconds(100), .asked = milliseconds(300), .killed = milliseconds(100)};
-/// The client's own end, which has promised to be quick.
-constexpr ServiceProcess::Patience atTheEnd{
-    .closed = milliseconds(100), .asked = milliseconds(70), .killed = milliseconds(20)};
+/// For the client's own end, which has promised to be quick.
+constexpr ServiceProcess::Patience little{.asked = milliseconds(70), .killed = milliseconds(20)};
 
 /// For the thread that spawns a service; it does not tell the others when it has.
 constexpr milliseconds spawnInterval{4};
@@ -51,7 +46,7 @@ Supervisor::~Supervisor() {
   }
   // All at once: each takes its step before anybody is waited for.
   while (!replaced_.empty()) {
-    std::erase_if(replaced_, [](const Service& service) { return service->end(atTheEnd); });
+    std::erase_if(replaced_, [](const Service& service) { return service->end(little); });
     if (!replaced_.empty()) waitFor(replaced_.front()->nextStep());
   }
 }
@@ -189,7 +184,7 @@ void Supervisor::tidy() noexcept try {
     if (current_) current_->readNews();
     if (current_ && current_->state() != ServiceState::running) settle();
     std::erase_if(replaced_, [](const Service& service) {
-      return service.use_count() == 1 && service->end(aside);
+      return service.use_count() == 1 && service->end({});
     });
     // By whoever made the last one unusable, and not by whoever needs the next one.
     isMissing = wantsStandby_ && state_ == State::stopped;

@@ -92,7 +92,7 @@ Reply rejection(const E& error, const Form& form) {
     writeError(out, error);
     out.endObject();
   };
-  return {.json = object(form, {}, members), .outcome = Outcome::rejected, .problem = error.what()};
+  return {.json = object(form, {}, members), .status = Status::rejected, .problem = error.what()};
 }
 
 class Answer {
@@ -182,7 +182,7 @@ Reply givenUp(const HostError& error, const Form& form) {
   Reply reply = rejection(error, form);
   reply.reason = error.reason;
   reply.problem += advice(error.reason);
-  if (error.reason == HostError::Reason::startFailed) reply.outcome = Outcome::serviceLost;
+  if (error.reason == HostError::Reason::startFailed) reply.status = Status::serviceLost;
   return reply;
 }
 
@@ -195,7 +195,7 @@ Reply requestError(std::string_view description, const Form& form) {
     out.endObject();
   };
   return {.json = object(form, {}, members),
-          .outcome = Outcome::unusable,
+          .status = Status::unusable,
           .problem = String(description)};
 }
 

@@ -30,21 +30,24 @@ constexpr std::string_view propertyList = typeName<PropertyList>();
 const Array<std::string_view>& recordNames();
 Bool isRecordName(std::string_view name);
 
-/// From best to worst.
-enum class Outcome : std::uint8_t {
-  record,
+/// What became of a message, from best to worst. The worst of a run is the command's exit status:
+/// scripts go by the numbers.
+enum class Status : std::uint8_t {
+  /// There is a record.
+  done = 0,
   /// By the unpacker, or by the host: `Reply::reason` tells which.
-  rejected,
-  /// There is no message: no valid request, or a file that cannot be read.
-  unusable,
+  rejected = 1,
+  /// There is no message: wrong usage, an invalid request, a file that cannot be read. Or the reply
+  /// could not be written.
+  unusable = 2,
   /// There is no service, and the next message would fare no better.
-  serviceLost,
+  serviceLost = 3,
 };
 
 struct Reply {
   /// The reply object with its newline; empty where there is none.
   Pieces json = {};
-  Outcome outcome = Outcome::record;
+  Status status = Status::done;
   /// Where the host gave the message up.
   Optional<HostError::Reason> reason = {};
   /// What went wrong and what helps, as a sentence for people; empty with a record.

@@ -192,9 +192,7 @@ std::vector<sock_filter> compile(std::span<const Rule> rules, unsigned deniedAct
   return program;
 }
 
-namespace {
-
-int enforceWith(unsigned flags, std::span<const sock_filter> program) {
+int enforce(std::span<const sock_filter> program, unsigned flags) {
 #ifndef KEELGATE_UNSEALED
   const sock_fprog handed{.len = static_cast<unsigned short>(program.size()),
                           // The kernel only reads it.
@@ -206,15 +204,6 @@ int enforceWith(unsigned flags, std::span<const sock_filter> program) {
   static_cast<void>(flags), static_cast<void>(program);
   return 0;
 #endif
-}
-
-}  // namespace
-
-void enforce(std::span<const sock_filter> program) {
-  enforceWith(0, program);
-}
-int enforceNoticing(std::span<const sock_filter> program) {
-  return enforceWith(SECCOMP_FILTER_FLAG_NEW_LISTENER, program);
 }
 
 void proveEnforced(std::span<const Rule> rules) {

@@ -52,11 +52,9 @@ std::vector<sock_filter> compile(std::span<const Rule> rules,
                                  unsigned denied = SECCOMP_RET_KILL_PROCESS);
 
 /// Puts the calling thread under a program, in addition to those that it is under, for good;
-/// no_new_privs must be set. Throws StartError.
-void enforce(std::span<const sock_filter> program);
-
-/// The same for a program with notices, which are read from the descriptor that it returns.
-int enforceNoticing(std::span<const sock_filter> program);
+/// no_new_privs must be set. With SECCOMP_FILTER_FLAG_NEW_LISTENER it returns the descriptor that
+/// the program's notices are read from. Throws StartError.
+int enforce(std::span<const sock_filter> program, unsigned flags = 0);
 
 /// Has a child of the calling process make a call that a table forbids, under a trial copy of its
 /// program. An emulation of the kernel, or a kernel told to ignore filters, accepts filters and

@@ -3,7 +3,6 @@
 #pragma once
 
 #include <sys/resource.h>
-#include <cstddef>
 #include <cstdint>
 
 namespace Keelgate::Sandbox {

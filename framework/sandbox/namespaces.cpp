@@ -10,7 +10,6 @@
 #include <sched.h>
 #include <unistd.h>
 #include <array>
-#include <csignal>
 #include <string>
 
 namespace Keelgate::Sandbox {

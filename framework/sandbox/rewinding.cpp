@@ -172,7 +172,8 @@ void handOver() {
   const WorkerAreas areas = readAreas();
   prctl(PR_SET_DUMPABLE, 0, 0, 0, 0);
   const int tracking = track(areas);
-  const int notices = enforceNoticing(compile(returningRules(), SECCOMP_RET_ALLOW));
+  const int notices =
+      enforce(compile(returningRules(), SECCOMP_RET_ALLOW), SECCOMP_FILTER_FLAG_NEW_LISTENER);
   send(areas, {tracking, memory, pages, notices});
 }
 

@@ -9,7 +9,6 @@
 
 namespace Keelgate {
 
-#if defined __x86_64__
 namespace {
 
 /// More than any processor has.
@@ -55,26 +54,15 @@ bool writeRegisters(pid_t process, const Registers& registers) {
 }
 
 Registers beforeCall(Registers inCall) {
+  // Elsewhere no worker is made rewindable.
+#if defined __x86_64__
   constexpr unsigned long long lengthOfCall = 2;
   inCall.general.rip -= lengthOfCall;
   inCall.general.rax = inCall.general.orig_rax;
   // Not in a call: or the kernel would start it over by itself.
   inCall.general.orig_rax = ~0ULL;
-  return inCall;
-}
-#else
-bool Registers::operator==(const Registers&) const noexcept {
-  return false;
-}
-bool readRegisters(pid_t, Registers&) {
-  return false;
-}
-bool writeRegisters(pid_t, const Registers&) {
-  return false;
-}
-Registers beforeCall(Registers inCall) {
-  return inCall;
-}
 #endif
+  return inCall;
+}
 
 }  // namespace Keelgate

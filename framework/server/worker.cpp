@@ -7,7 +7,6 @@
 #include "framework/contracts/process.h"
 #include "framework/contracts/start_step.h"
 #include "framework/protocol/data_frames.h"
-#include "framework/sandbox/seal.h"
 #include "framework/server/message_memory.h"
 
 #include <unistd.h>
