@@ -247,6 +247,8 @@ def metrics():
         proc = pathlib.Path(f"/proc/{process.pid}")
         check(re.search(r"core file size +0 +0 ", (proc / "limits").read_text()), "a core file")
         check(os.getuid() == 0 or os.stat(proc / "environ").st_uid == 0, "a debugger")
+        check(run("stream", "--metrics", folder)[0] == 2 and not list(
+            pathlib.Path(folder).parent.glob(f"{pathlib.Path(folder).name}.*")), "a draft that stays")
         process.communicate(request(2).encode(), timeout=60)
         check(counters(file.read_text())['keelgate_messages_total{outcome="record"}'] == 2,
               "metrics at the end")
@@ -321,6 +323,9 @@ def stream():
     check([r.get("id") for r in replies] == [0, None, {"a": [1, None]}, 2, 3.5, 4], "ids in order")
     check(all(next(iter(r)) == "id" for r in replies if "id" in r), "the id comes first")
     check(b'"id":3.50,' in out, "an id as it was written")
+    check(replies[4]["error"] == {
+        "kind": "unpacking", "domain": "VespKeelgateService.VespClientMessageUnpackingError", "code": 1,
+        "case": "noUnpackerForService", "service": "none"}, f"all of an error: {replies[4]}")
     check([r["error"]["kind"] if "error" in r else r["record"] for r in replies]
           == ["VespCommandResponse", "request", "VespCommandResponse", "request", "unpacking",
               "dataCorrupted"], f"outcomes: {replies}")
@@ -423,19 +428,32 @@ def json_schema():
           "every record has a definition")
     replies = jsonschema.Draft202012Validator(schema)
     replies.check_schema(schema)
-    for file in sorted(messages.glob("*.json")):
-        reply = json.loads(file.read_text())
-        check(replies.is_valid(reply), f"{file.name} against the schema of replies")
-        for wrong in ({**reply, "more": 1}, {key: reply[key] for key in list(reply)[1:]}):
-            check(not replies.is_valid(wrong), f"{file.name} changed: {list(wrong)}")
+
+    def spoilt(value):
+        """The value with one thing more or of no type, wherever that can be."""
+        yield [[None]]
+        if isinstance(value, dict):
+            yield {**value, "more": 1}
+        if isinstance(value, (dict, list)):
+            for key in value if isinstance(value, dict) else range(len(value)):
+                for part in spoilt(value[key]):
+                    whole = value.copy()
+                    whole[key] = part
+                    yield whole
+
+    errors = [{"error": error} for error in (
+        {"kind": "keyNotFound", "codingPath": [1, "a"], "description": "", "key": "k"},
+        {"kind": "unpacking", "domain": "", "code": 0, "case": "noUnpackerForService"},
+        {"kind": "host", "reason": "crashed", "description": ""})]
+    for reply in errors + [json.loads(file.read_text()) for file in sorted(messages.glob("*.json"))]:
+        check(replies.is_valid({"id": [], **reply}), f"{reply} against the schema of replies")
+        for wrong in (*spoilt(reply), {key: reply[key] for key in list(reply)[1:]}):
+            check(not replies.is_valid(wrong), f"{wrong} against the schema of replies")
         if "record" in reply:
             own = json.loads(run("describe", "--json-schema", reply["record"])[1])
             value = jsonschema.Draft202012Validator(own)
-            check(value.is_valid(reply["value"]), f"{file.name} against {reply['record']}")
-            check(not value.is_valid({**reply["value"], "more": 1}), f"{file.name} with more")
-    for key, path in (("key", []), (None, [1, "a"])):
-        error = {"kind": "keyNotFound", "codingPath": path, "description": "", "key": key}
-        check(replies.is_valid({"id": [], "error": error}) == (key is not None), f"error {error}")
+            check(value.is_valid(reply["value"]), f"{reply} against {reply['record']}")
+            check(not value.is_valid({**reply["value"], "more": 1}), f"{reply} with more")
     check(run("describe", "--json-schema", "VespSessionInvitationSchema")[0] == 2, "not printed")
 
 
