@@ -218,6 +218,11 @@ def long_replies():
         check(status == 1 and out.count(b'"reason": "resourcesExhausted"') == 1
               and out.count(b'"record"') == 2, f"long replies: {status}")
         check(memory < 300_000_000, f"a long reply takes {memory} bytes")
+    # On the stacks of the service and of the command.
+    payload = b"<dict><key>c</key><integer>1</integer>"
+    deepest = (payload + b"<key>mml</key><array>") * 255 + payload + b"</dict></array>" * 255
+    check(run("unpack", "--record", "PulseUserPayload", "-", stdin=b"<plist>" + deepest
+              + b"</dict></plist>")[0] == 0, "the deepest message")
 
 
 def metrics():

@@ -194,21 +194,6 @@ TEST_F(Worker, C2EveryCallButThreeKillsIt) {
   EXPECT_EQ(survivors, survivedOrders.size());
 }
 
-TEST(Stack, TheDeepestMessageFits) {
-  RawClient service(VESP_KEELGATE_SERVICE);
-  ASSERT_TRUE(service.ready()) << service.refusal();
-  std::string message = "<dict><key>c</key><integer>1</integer></dict>";
-  for (int level = 0; level < 255; ++level) {
-    message.insert(0, "<dict><key>c</key><integer>1</integer><key>mml</key><array>");
-    message += "</array></dict>";
-  }
-  const int channel = service.fork(0);
-  sendMessage(channel, "<plist>" + message + "</plist>", 0, recordNumber<PulseUserPayload>);
-  EXPECT_EQ(receiveReply(channel).kind, Protocol::ReplyKind::record);
-  close(channel);
-  EXPECT_EQ(service.end(0).exitStatus(), 0);
-}
-
 TEST_F(Worker, C5ProcessorTimeIsLimitedWithoutTheClient) {
   // Whatever whoever starts it has done with the signal.
   const auto ignore = [] {
