@@ -146,6 +146,7 @@ TEST(Start, ThereMayBeTooFewProcesses) {
 TEST(Pool, AMachineWithoutProcessesIsNotTheMessagesFault) {
   Client client(fakeOptions("barren"));
   EXPECT_EQ(outcomeOf(client, good), "startFailed");
+  EXPECT_EQ(client.statistics().messages, 1u);
 }
 
 TEST(Pool, WorkersAreForkedAheadAndThoseThatStayAreKilled) {
