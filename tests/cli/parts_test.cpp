@@ -7,13 +7,10 @@
 
 #include <gtest/gtest.h>
 
-#include <sys/resource.h>
-
 #include <atomic>
 #include <cstring>
 #include <latch>
 #include <semaphore>
-#include <system_error>
 #include <thread>
 
 namespace Keelgate::CLI {
@@ -247,15 +244,6 @@ TEST(OrderedWork, WhatWaitsIsBoundedInBytesAndGivenBack) {
     EXPECT_EQ(taken, count);
     EXPECT_EQ(bytes, row.reply * count);
   }
-}
-
-TEST(OrderedWork, NeedsADescriptor) {
-  rlimit before{};
-  getrlimit(RLIMIT_NOFILE, &before);
-  const rlimit none{.rlim_cur = 0, .rlim_max = before.rlim_max};
-  setrlimit(RLIMIT_NOFILE, &none);
-  EXPECT_THROW(OrderedWork([](const Due&, Bool) { return true; }), std::system_error);
-  setrlimit(RLIMIT_NOFILE, &before);
 }
 
 TEST(OrderedWork, AJobWithoutMemoryEndsTheWorkAndNotTheProgram) {
