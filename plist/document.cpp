@@ -60,32 +60,40 @@ EntryRange Value::entries() const {
 
 void Value::find(const KnownKeys& keys, std::uint64_t* present, std::uint32_t* values) const {
   const Store& store = *store_;
-  const bool areNumbers = store.known == &keys;
-  const auto note = [&, nodes = store.nodes.data()](std::uint32_t key, std::uint32_t value) {
-    const std::uint32_t number = nodes[key].key();
-    std::size_t position = number - 1;
-    if (!areNumbers) {
-      position = keys.find(store.digest(number), [&] { return store.text(nodes[key]); });
-    }
-    if (position >= keys.count) return;
-    present[position / 64] |= std::uint64_t{1} << position % 64;
-    values[position] = value;
-  };
   const std::uint32_t count = expect(Type::dictionary).count;
-  std::size_t place = store.firstChild(number_);
   const std::size_t size = store.referenceSize;
-  if (size == 0) {
-    for (std::uint32_t left = count; left > 0; --left, place = store.nextKey(place)) {
-      const auto key = static_cast<std::uint32_t>(place);
-      note(key, key + 1);
+  const auto findBy = [&](auto positionOf) {
+    const auto note = [&, known = keys.count, nodes = store.nodes.data() ](
+        std::uint32_t key, auto value) __attribute__((always_inline)) {
+      const std::size_t position = positionOf(nodes[key]);
+      if (position >= known) return;
+      present[position / 64] |= std::uint64_t{1} << position % 64;
+      values[position] = value();
+    };
+    std::size_t place = store.firstChild(number_);
+    if (size == 0) {
+      for (std::uint32_t left = count; left > 0; --left, place = store.nextKey(place)) {
+        const auto key = static_cast<std::uint32_t>(place);
+        note(key, [&] { return key + 1; });
+      }
+      return;
     }
-    return;
-  }
-  const auto reference = [message = store.message, size](std::size_t position) {
-    return static_cast<std::uint32_t>(Cursor::bigEndianAt(message, position, size));
+    const auto reference = [message = store.message, size](std::size_t position) {
+      return static_cast<std::uint32_t>(Cursor::bigEndianAt(message, position, size));
+    };
+    const std::size_t apart = size * count;
+    for (const std::size_t end = place + apart; place < end; place += size) {
+      note(reference(place), [&] { return reference(place + apart); });
+    }
   };
-  const std::size_t end = place + size * count;
-  for (; place < end; place += size) note(reference(place), reference(place + size * count));
+  // A key's number is its position, counted from 1, where the document was told of these keys.
+  if (store.known == &keys) {
+    findBy([](const Node& key) { return std::size_t{key.key()} - 1; });
+  } else {
+    findBy([&](const Node& key) {
+      return keys.find(store.digest(key.key()), [&] { return store.text(key); });
+    });
+  }
 }
 
 /// The first bytes decide; a binary one of another version is refused there, never tried as XML.

@@ -31,25 +31,22 @@ constexpr std::uint64_t loadWord(std::string_view text) noexcept {
   return word;
 }
 
-/// What a key is known by. A key of at most seven bytes is its digest: length and bytes, so that
-/// two of them are the same where their digests are. Longer ones are told by the highest bit; they
-/// may share a digest, and are then to be compared. The digest has no secret: whoever wants keys
-/// with one hash can have them, and no look-up may rely on there being few.
-constexpr std::uint64_t keyDigest(std::string_view key) noexcept {
-  const std::size_t size = key.size();
-  if (size < 8) {
-    std::uint64_t word = 0;
-    // Two loads that overlap give each byte its place, whatever the length.
-    if (size >= 4) {
-      word = loadWord<4>(key) | loadWord<4>(key.substr(size - 4)) << (8 * (size - 4));
-    } else if (size > 0) {
-      word = loadWord<1>(key) | loadWord<1>(key.substr(size / 2)) << (8 * (size / 2)) |
-             loadWord<1>(key.substr(size - 1)) << (8 * (size - 1));
-    }
-    return word | std::uint64_t{size} << 56;
-  }
-  std::uint64_t hash = size * keyFactor;
-  const auto add = [&hash](std::uint64_t word) {
+/// The digest of a key of at most seven bytes, given as the beginning of its object in a binary
+/// property list: 0x50 and the length in the lowest byte, then the text, then what does not matter.
+/// No two of them have one digest: that of a shorter one has more zeros below its first byte, and
+/// where there are none, the lowest bit of that byte, which is lost, is known.
+constexpr std::uint64_t shortKeyDigest(std::uint64_t object) noexcept {
+  return object << 8 * (7 - (object & 7)) >> 1;
+}
+/// The bits of that digest that are set where a byte of the text is above 0x7f.
+inline constexpr std::uint64_t shortKeyHighBits = 0x4040'4040'4040'4040;
+
+/// The digest of a key of at least eight bytes. Calls `see(word)` for words that have all of it.
+template <class See>
+constexpr std::uint64_t longKeyDigest(std::string_view key, See&& see) noexcept {
+  std::uint64_t hash = key.size() * keyFactor;
+  const auto add = [&](std::uint64_t word) {
+    see(word);
     hash = (hash ^ word) * keyFactor;
     hash ^= hash >> 32;
   };
@@ -59,10 +56,21 @@ constexpr std::uint64_t keyDigest(std::string_view key) noexcept {
   return hash * keyFactor | std::uint64_t{1} << 63;
 }
 
-/// The same of a key of at most seven bytes, given as the lowest bytes of a number, first byte
-/// lowest. What stands above them does not matter.
-constexpr std::uint64_t shortKeyDigest(std::uint64_t bytes, std::size_t size) noexcept {
-  return (bytes & ~(~std::uint64_t{0} << 8 * size)) | std::uint64_t{size} << 56;
+/// What a key is known by. A key of at most seven bytes is its digest. Longer ones are told by the
+/// highest bit; they may share a digest, and are then to be compared. The digest has no secret:
+/// whoever wants keys with one hash can have them, and no look-up may rely on there being few.
+constexpr std::uint64_t keyDigest(std::string_view key) noexcept {
+  const std::size_t size = key.size();
+  if (size >= 8) return longKeyDigest(key, [](std::uint64_t) {});
+  std::uint64_t word = 0;
+  // Two loads that overlap give each byte its place, whatever the length.
+  if (size >= 4) {
+    word = loadWord<4>(key) | loadWord<4>(key.substr(size - 4)) << (8 * (size - 4));
+  } else if (size > 0) {
+    word = loadWord<1>(key) | loadWord<1>(key.substr(size / 2)) << (8 * (size / 2)) |
+           loadWord<1>(key.substr(size - 1)) << (8 * (size - 1));
+  }
+  return shortKeyDigest(word << 8 | 0x50 | size);
 }
 
 /// Whether the digest is all of the key.

@@ -2,6 +2,8 @@
 #include "plist/key_table.h"
 
 #include <bit>
+#include <span>
+#include <utility>
 
 namespace PropertyList {
 namespace {
@@ -33,26 +35,31 @@ KeyTable::KeyTable(Store& store) : store_(store), known_(*store.known), collidin
   last_.zero(known_.count);
 }
 
-std::size_t KeyTable::add(std::uint32_t dictionary, std::span<const Named> keys, std::size_t left) {
-  const std::uint32_t mark = dictionary + 1;
-  std::size_t added = 0;
-  for (const Named& key : keys) {
-    const std::uint32_t its = key.number != 0 ? key.number : number(key, left);
-    --left;
-    std::uint32_t& last = last_[its - 1];
-    if (last == mark) break;
-    last = mark;
-    ++added;
-  }
-  return added;
+void KeyTable::addOther(const Other& key) {
+  // Of a large table the cache has few.
+  __builtin_prefetch(slots_.data() + keyHash(key.digest, bits_), 1);
+  waiting_[waitingCount_++] = key;
+  if (waitingCount_ == waiting_.size()) addWaiting();
 }
 
-/// Of a key that had none when it was named.
-std::uint32_t KeyTable::number(const Named& key, std::size_t left) {
+void KeyTable::addWaiting() {
+  for (const Other& key : std::span(waiting_).first(std::exchange(waitingCount_, 0))) {
+    note(number(key), key.position);
+  }
+}
+
+/// Unless another key that came before it is to be refused.
+void KeyTable::refuse(std::size_t position) {
+  addWaiting();
+  throw MalformedDocument(Problem::duplicateKey, position);
+}
+
+/// Of a key that had none when it came.
+std::uint32_t KeyTable::number(const Other& key) {
   Node& node = store_.nodes[key.node];
   // A dictionary may name one string twice.
   if (node.key() != 0) return node.key();
-  if (2 * (store_.keys.size() + left) > slots_.size()) grow(store_.keys.size() + left);
+  if (2 * most_ > slots_.size()) grow(most_);
   const std::uint32_t next = known_.count + static_cast<std::uint32_t>(store_.keys.size()) + 1;
   // As a rule a key is new, and nothing is where it would be.
   store_.keys.push({.digest = key.digest, .node = key.node});
@@ -70,7 +77,7 @@ std::uint32_t KeyTable::number(const Named& key, std::size_t left) {
 
 /// The number of the key with this text: of those that are there, or the next, which is the key's
 /// own.
-std::uint32_t KeyTable::find(const Named& key, std::uint32_t next) {
+std::uint32_t KeyTable::find(const Other& key, std::uint32_t next) {
   const std::string_view itsText = store_.text(store_.nodes[key.node]);
   for (std::uint32_t step = 0; step < triedSlots; ++step) {
     Slot& tried = slot(key.digest, step);

@@ -15,10 +15,10 @@
 #include "plist/small_buffer.h"
 #include "plist/store.h"
 
+#include <array>
 #include <cstddef>
 #include <cstdint>
 #include <set>
-#include <span>
 #include <string_view>
 
 namespace PropertyList {
@@ -27,37 +27,41 @@ class KeyTable {
  public:
   explicit KeyTable(Store& store);
 
-  /// A key of a dictionary by its node, a string, with its number or, before it has one, the digest
-  /// of its text.
-  struct Named {
-    std::uint32_t node;
-    std::uint32_t number;
-    std::uint64_t digest;
-  };
-
-  /// For `add`; no text is hashed twice. The slot where a key that is not known will be looked for
-  /// is fetched meanwhile: of a large table the cache has few.
-  Named named(std::uint32_t node) noexcept {
-    const Node& key = store_.nodes[node];
-    if (key.key() != 0) return {node, key.key(), 0};
-    return named(node, keyDigest(store_.text(key)));
+  /// The keys of one dictionary come one after the other, with those of no other dictionary between
+  /// them: begin, add for each, end. The last two throw MalformedDocument for the first key that
+  /// the dictionary has already, and std::bad_alloc.
+  void begin(std::uint32_t dictionary, std::size_t keys) noexcept {
+    dictionary_ = dictionary + 1;
+    most_ = store_.keys.size() + keys;
   }
-  Named named(std::uint32_t node, std::uint64_t digest) noexcept {
+  /// A key with its node, a string, the digest of its text, and where the error says that it
+  /// stands.
+  [[gnu::always_inline]] void add(std::uint32_t node, std::uint64_t digest, std::size_t position) {
     Node& key = store_.nodes[node];
     const std::size_t known = known_.find(digest, [&] { return store_.text(key); });
-    if (known != KnownKeys::none) {
-      key.setKey(static_cast<std::uint32_t>(known + 1));
-      return {node, key.key(), 0};
+    if (known == KnownKeys::none) {
+      return addOther({digest, node, static_cast<std::uint32_t>(position)});
     }
-    __builtin_prefetch(slots_.data() + keyHash(digest, bits_), 1);
-    return {node, 0, digest};
+    const auto number = static_cast<std::uint32_t>(known + 1);
+    key.setKey(number);
+    note(number, position);
   }
-  /// Numbers keys of one dictionary, of which `left` are still to come with these. Returns how many
-  /// come before the first that the dictionary has already: its keys are added one after the other,
-  /// with those of no other dictionary between them. Throws std::bad_alloc.
-  std::size_t add(std::uint32_t dictionary, std::span<const Named> keys, std::size_t left);
+  /// A key that may have been met before: no text is hashed twice.
+  void add(std::uint32_t node, std::size_t position) {
+    const Node& key = store_.nodes[node];
+    if (key.key() == 0) return add(node, keyDigest(store_.text(key)), position);
+    note(key.key(), position);
+  }
+  void end() { addWaiting(); }
 
  private:
+  /// A key that is not known.
+  struct Other {
+    std::uint64_t digest;
+    std::uint32_t node;
+    std::uint32_t position;
+  };
+
   struct Less {
     using is_transparent = void;
     const KeyTable* table;
@@ -81,8 +85,16 @@ class KeyTable {
   Slot& slot(std::uint64_t digest, std::uint32_t step) noexcept {
     return slots_[(keyHash(digest, bits_) + step * (step + 1) / 2) & (slots_.size() - 1)];
   }
-  std::uint32_t number(const Named& key, std::size_t left);
-  std::uint32_t find(const Named& key, std::uint32_t next);
+  [[gnu::always_inline]] void note(std::uint32_t number, std::size_t position) {
+    std::uint32_t& last = last_[number - 1];
+    if (last == dictionary_) refuse(position);
+    last = dictionary_;
+  }
+  void addOther(const Other& key);
+  void addWaiting();
+  [[noreturn]] void refuse(std::size_t position);
+  std::uint32_t number(const Other& key);
+  std::uint32_t find(const Other& key, std::uint32_t next);
   void grow(std::size_t keys);
   void place(std::uint32_t number);
   std::string_view text(std::uint32_t number) const noexcept {
@@ -91,6 +103,13 @@ class KeyTable {
 
   Store& store_;
   const KnownKeys known_;
+  /// The one at hand, counted from 1, and how many keys that are not known there may be with it.
+  std::uint32_t dictionary_ = 0;
+  std::size_t most_ = 0;
+  /// Keys that are not known are looked up some at a time, so that the memory of many look-ups is
+  /// fetched at once: one after the other, a million keys would wait a million times.
+  std::array<Other, 16> waiting_;
+  std::size_t waitingCount_ = 0;
   /// The last dictionary that has the key with this number, both counted from 1; 0 for none.
   SmallBuffer<std::uint32_t, 512> last_;
   /// Of the keys that are not known. Open addressing, at most half of them taken; a power of two,

@@ -33,14 +33,29 @@ struct KnownKeys {
   /// The position of the key with this digest, or `none`. `text()` is asked for the key only where
   /// another one may have its digest.
   template <class Text>
-  constexpr std::size_t find(std::uint64_t digest, Text&& text) const {
+  [[gnu::always_inline]] constexpr std::size_t find(std::uint64_t digest, Text&& text) const {
+    // Most keys stand in the slot where they are looked for.
+    const std::size_t slot = keyHash(digest, bits);
+    const std::uint16_t position = slots[slot];
+    if (position == none || isAt(position, digest, text)) return position;
+    return findBehind(slot, digest, text);
+  }
+
+ private:
+  template <class Text>
+  [[gnu::always_inline]] constexpr bool isAt(std::size_t position, std::uint64_t digest,
+                                             Text& text) const {
+    return digests[position] == digest &&
+           (isWholeKey(digest) || isSameLongKey(keys[position], text()));
+  }
+  template <class Text>
+  [[gnu::noinline]] constexpr std::size_t findBehind(std::size_t slot, std::uint64_t digest,
+                                                     Text& text) const {
     // Ends: most slots are vacant.
-    for (std::size_t at = keyHash(digest, bits);; at = (at + 1) & ((std::size_t{1} << bits) - 1)) {
-      const std::uint16_t position = slots[at];
-      if (position == none || (digests[position] == digest &&
-                               (isWholeKey(digest) || isSameLongKey(keys[position], text())))) {
-        return position;
-      }
+    for (;;) {
+      slot = (slot + 1) & ((std::size_t{1} << bits) - 1);
+      const std::uint16_t position = slots[slot];
+      if (position == none || isAt(position, digest, text)) return position;
     }
   }
 };

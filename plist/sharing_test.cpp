@@ -141,6 +141,9 @@ TEST(Keys, AreComparedByMeaning) {
       problemIn(binary({"\xD2\x01\x02\x03\x03", "\x52\x61\x62", bytes("\x62\0a\0b"), "\x09"})),
       Problem::duplicateKey);
   EXPECT_EQ(problemIn(binary({"\xD2\x01\x01\x02\x02", "\x51\x61", "\x09"})), Problem::duplicateKey);
+  // The first fault of a dictionary is told: not the key behind it that is not a text.
+  EXPECT_EQ(problemIn(binary({"\xD3\x01\x01\x02\x02\x02\x02", "\x51\x61", "\x09"})),
+            Problem::duplicateKey);
   EXPECT_EQ(problemIn(xml("<dict><key>a&lt;</key><true/><key><![CDATA[a<]]></key><true/></dict>")),
             Problem::duplicateKey);
   EXPECT_EQ(problemIn(xml("<dict><key>a</key><dict><key>a</key><true/></dict></dict>")),

@@ -3,6 +3,7 @@
 #pragma once
 
 #include "plist/cursor.h"
+#include "plist/key_hash.h"
 #include "plist/store.h"
 
 #include <array>
@@ -60,10 +61,42 @@ struct Objects {
     // Inside the table, since the number is below the count that the table was checked for.
     const std::size_t entry = tableStart + number * offsetSize;
     const std::uint64_t offset = Cursor::bigEndianAt(message, entry, offsetSize);
-    if (offset < magic.size() || offset >= tableStart) {
+    // Below the first object it wraps.
+    if (offset - magic.size() >= tableStart - magic.size()) {
       throw MalformedDocument(Problem::objectOutside, entry);
     }
     return static_cast<std::size_t>(offset);
+  }
+  /// Reads a text of fewer than 256 ASCII characters. Its digest, which is never 0; or 0 for any
+  /// other object, and for what is wrong with one.
+  [[gnu::always_inline]] std::uint64_t readKey(std::size_t offset, std::uint64_t& claimable,
+                                               Node& node) const noexcept {
+    const std::uint64_t object = Cursor::wordAt(message, offset);
+    std::uint64_t digest = 0;
+    std::uint32_t length = object & 0xf;
+    std::size_t start = offset + 1;
+    if ((object & 0xf8) == 0x50) {
+      // All of the text is in the word.
+      digest = shortKeyDigest(object);
+      if ((digest & shortKeyHighBits) != 0 || start + length > tableStart) return 0;
+    } else {
+      if ((object & 0xf0) != 0x50) return 0;
+      if (length == 0xf) {
+        // The length follows, as an integer of one byte.
+        if ((object & 0xff00) != 0x1000) return 0;
+        length = object >> 16 & 0xff;
+        start += 2;
+      }
+      if (length < 8 || start + length > tableStart) return 0;
+      std::uint64_t seen = 0;
+      digest = longKeyDigest(Cursor::textAt(message, start, length),
+                             [&](std::uint64_t word) { seen |= word; });
+      if ((seen & 0x8080'8080'8080'8080) != 0) return 0;
+    }
+    if (length > claimable) return 0;
+    claimable -= length;
+    node = {.bits = start, .count = length, .type = Type::string, .flags = Node::read};
+    return digest;
   }
   /// Reads an object that has no length and begins with these bytes. False for any other, and for
   /// what is wrong with one.

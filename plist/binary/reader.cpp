@@ -42,9 +42,7 @@ class BinaryReader {
   void walk(Frame& frame);
   void readKeys(Frame& frame);
   void leave(const Frame& frame);
-  [[gnu::always_inline]] inline KeyTable::Named readKey(const Objects& objects,
-                                                        std::size_t position);
-  KeyTable::Named readOtherKey(std::uint32_t number, std::size_t position);
+  void readOtherKey(std::uint32_t number, std::size_t position);
   [[gnu::always_inline]] inline bool load(const Objects& objects, std::uint32_t number);
   [[gnu::always_inline]] inline bool readShort(const Objects& objects, std::size_t offset,
                                                Node& node) noexcept;
@@ -130,52 +128,32 @@ void BinaryReader::walk(Frame& frame) {
   leave(frame);
 }
 
-/// All keys of a dictionary, which stand before its values. Some at a time, so that the memory of
-/// many look-ups is fetched at once: one after the other, a million keys would wait a million
-/// times.
-void BinaryReader::readKeys(Frame& frame) {
+/// All keys of a dictionary, which stand before its values. Of several faults the first is told.
+void BinaryReader::readKeys(Frame& frame) try {
   const Objects objects = objects_;
-  std::array<KeyTable::Named, 16> named;
-  std::size_t left = objects.nodes[frame.node].count;
   const std::size_t end = frame.end;
-  for (std::size_t next = frame.next; next < end;) {
-    const std::size_t first = next;
-    std::size_t count = 0;
-    for (; count < named.size() && next < end; next += objects.referenceSize) {
-      named[count++] = readKey(objects, next);
-    }
-    const std::size_t distinct = keys_.add(frame.node, {named.data(), count}, left);
-    left -= count;
-    if (distinct < count) {
-      throw MalformedDocument(Problem::duplicateKey, first + distinct * objects.referenceSize);
+  keys_.begin(frame.node, objects.nodes[frame.node].count);
+  for (std::size_t next = frame.next; next < end; next += objects.referenceSize) {
+    const std::uint32_t number = objects.reference(next);
+    Node& node = objects.nodes[number];
+    const std::uint64_t digest =
+        node.has(Node::read) ? 0 : objects.readKey(objects.offset(number), claimable_, node);
+    if (digest != 0) {
+      keys_.add(number, digest, next);
+    } else {
+      readOtherKey(number, next);
     }
   }
+  keys_.end();
   frame.next = end;
-}
-
-/// The key that is named at this position: one of up to 7 bytes that is met for the first time, as
-/// most are.
-KeyTable::Named BinaryReader::readKey(const Objects& objects, std::size_t position) {
-  const std::uint32_t number = objects.reference(position);
-  Node& node = objects.nodes[number];
-  if (node.has(Node::read)) return readOtherKey(number, position);
-  const std::size_t offset = objects.offset(number);
-  // With a text of up to 7 bytes, all of the object.
-  const std::uint64_t object = Cursor::wordAt(objects.message, offset);
-  const std::uint32_t length = object & 7;
-  const std::uint64_t digest = shortKeyDigest(object >> 8, length);
-  if ((object & 0xf8) != 0x50 || (digest & 0x80'8080'8080'8080) != 0 ||
-      offset + length >= objects.tableStart || length > claimable_) {
-    return readOtherKey(number, position);
-  }
-  claimable_ -= length;
-  node = {.bits = offset + 1, .count = length, .type = Type::string, .flags = Node::read};
-  return keys_.named(number, digest);
+} catch (const MalformedDocument&) {
+  // A key that waits for its look-up may be a fault that stands before this one.
+  keys_.end();
+  throw;
 }
 
 /// Any other. Apart, so that the first kind has the registers.
-[[gnu::noinline]] KeyTable::Named BinaryReader::readOtherKey(std::uint32_t number,
-                                                             std::size_t position) {
+[[gnu::noinline]] void BinaryReader::readOtherKey(std::uint32_t number, std::size_t position) {
   Node& node = objects_.nodes[number];
   if (node.has(Node::read)) {
     revisit(node, position);
@@ -183,7 +161,7 @@ KeyTable::Named BinaryReader::readKey(const Objects& objects, std::size_t positi
     load(objects_, number);
   }
   if (node.type != Type::string) throw MalformedDocument(Problem::keyNotString, position);
-  return keys_.named(number);
+  keys_.add(number, position);
 }
 
 /// Another reference to what was read before. Heights make the limit exact although every object is
