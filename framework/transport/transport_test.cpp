@@ -21,7 +21,8 @@ std::size_t peakBytes = 0;
 /// The peak where a body had been read, before it was written again.
 std::size_t readBytes = 0;
 
-void giveBack(void* block) noexcept {
+/// Not inlined: g++ 14 would take `free` for the other half of `new`.
+[[gnu::noinline]] void giveBack(void* block) noexcept {
   if (block == nullptr) return;
   std::size_t* const cost = static_cast<std::size_t*>(block) - 2;
   liveBytes -= *cost;

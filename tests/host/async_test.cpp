@@ -87,7 +87,7 @@ TEST(Batch, TellsOutcomesAsTheyComeUntilItsVisitorThrows) {
 
 /// Sizes around those at which a channel is widened, and the room for a reply is doubled or mapped.
 TEST(Batch, TakesLongMessagesAndRepliesWhole) {
-  for (const std::size_t allowed : {1, 100}) {
+  for (const std::size_t allowed : {1U, 100U}) {
     Client::Options options = fakeOptions();
     options.messagesPerProcess = allowed;
     Client client(options);
@@ -110,7 +110,7 @@ TEST(Batch, TakesLongMessagesAndRepliesWhole) {
 
 /// Each message has its own time limit; the batch as a whole may take longer.
 TEST(Batch, HoldsEachMessageToItsTimeLimit) {
-  for (const std::size_t allowed : {1, 100}) {
+  for (const std::size_t allowed : {1U, 100U}) {
     Client::Options options = fakeOptions("honest", milliseconds(1500));
     options.messagesPerProcess = allowed;
     Client client(options);
