@@ -140,7 +140,7 @@ TEST(Table, HasItsColumnsWhereTheyFit) {
   table.add({"a", "b c"});
   table.add({"long", "dddd ee"});
   const String wide = "  Name  Is\n  a     b c\n  long  dddd ee\n";
-  for (const std::size_t width : {15, 80}) EXPECT_EQ(table.text(width, false), wide);
+  for (const std::size_t width : {15U, 80U}) EXPECT_EQ(table.text(width, false), wide);
   EXPECT_EQ(table.text(14, true), "\033[1m  Name  Is\033[0m\n  a  b c\n  long  dddd\n      ee\n");
   // The last column is broken where it leaves room for some words.
   Table words({"N", "T"});
