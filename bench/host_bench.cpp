@@ -165,10 +165,11 @@ void freshWorkerWithoutSpare(benchmark::State& state) {
     Worker worker(service, *service->fork(shortMessage));
     Exchange exchange(worker.channel(), worker.nextSequence());
     exchange.add(request);
-    while (exchange.advance() <= Exchange::State::receiving) {
-      waitFor({.descriptor = worker.channel(), .events = POLLIN, .until = Deadline::max()});
+    Exchange::State reached{};
+    while ((reached = exchange.advance()) <= Exchange::State::receiving) {
+      waitFor(exchange.wait(Deadline::max()));
     }
-    if (exchange.state() != Exchange::State::answered) state.SkipWithError("no reply");
+    if (reached != Exchange::State::answered) state.SkipWithError("no reply");
     worker.finish();
   });
 }

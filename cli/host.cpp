@@ -2,12 +2,12 @@
 #include "cli/host.h"
 
 #include "cli/commands.h"
+#include "framework/client/pool.h"
 
 #include <fmt/format.h>
 
 #include <algorithm>
 #include <new>
-#include <thread>
 #include <utility>
 
 namespace Keelgate::CLI {
@@ -18,15 +18,11 @@ Client::Options completed(Client::Options options, Console& console, std::size_t
   options.log = [&console](std::string_view line) {
     console.log(line.starts_with("keelgate: ") ? LogLevel::warning : LogLevel::error, line);
   };
-  if (options.processes == 0) {
-    options.processes = std::max(1U, std::thread::hardware_concurrency());
-  }
   // Deliberate: whoever made a message fail does not wait for the answer himself, but all those
   // whose answers come behind it do.
   options.abnormalEndsPerSecond = 0;
   // No more processes than messages: the others would be started for nothing.
-  options.processes =
-      static_cast<unsigned>(std::min<std::size_t>(options.processes, maximumMessages));
+  options.processes = static_cast<unsigned>(std::min(processesFor(options), maximumMessages));
   return options;
 }
 

@@ -207,10 +207,7 @@ Optional<Wait> Call::stepExchanging() {
   const Exchange::State state = exchange_->advance();
   const bool goesOn = state == Exchange::State::sending || state == Exchange::State::receiving;
   if (goesOn && Clock::now() < deadline_) {
-    return Wait{
-        .descriptor = worker_->channel(),
-        .events = static_cast<short>(state == Exchange::State::sending ? POLLIN | POLLOUT : POLLIN),
-        .until = deadline_};
+    return exchange_->wait(deadline_);
   }
   for (const String& line : exchange_->log()) logLine(pool_.log(), escapeLogLine(line));
   switch (state) {

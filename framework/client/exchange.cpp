@@ -159,6 +159,11 @@ Exchange::State Exchange::advance() {
   return state_ = receive();
 }
 
+Wait Exchange::wait(Deadline until) const noexcept {
+  const int events = state_ == State::sending ? POLLIN | POLLOUT : POLLIN;
+  return {.descriptor = channel_, .events = static_cast<short>(events), .until = until};
+}
+
 void Exchange::send() {
   for (int i = 0; i < callsPerStep && hasUnsent(); ++i) {
     // Many pieces and one call: messages, which may be large, are copied by the kernel alone.

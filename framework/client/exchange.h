@@ -85,8 +85,8 @@ class Exchange {
   /// Goes on without waiting, and for a bounded time, however much the worker takes or sends.
   /// Throws std::bad_alloc.
   State advance();
-  /// What advance() said last.
-  [[nodiscard]] State state() const noexcept { return state_; }
+  /// While it is sending or receiving: what to wait for before it is advanced again.
+  [[nodiscard]] Wait wait(Deadline until) const noexcept;
 
   /// With State::answered, of the oldest request.
   [[nodiscard]] Protocol::ReplyKind kind() const noexcept { return parser_->kind(); }

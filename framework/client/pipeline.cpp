@@ -108,10 +108,7 @@ Optional<Wait> Pipeline::exchange(CallList& done, CallList& alone) {
     fail(alone);
     return std::nullopt;
   }
-  const bool isSending = state == Exchange::State::sending;
-  return Wait{.descriptor = worker_->channel(),
-              .events = static_cast<short>(isSending ? POLLIN | POLLOUT : POLLIN),
-              .until = until};
+  return exchange_->wait(until);
 }
 
 /// False when the reply is not one.

@@ -27,12 +27,6 @@ constexpr std::size_t largePermits(std::size_t processes) {
 /// So many abnormal ends at once are not held up.
 constexpr int abnormalBurst = 4;
 
-std::size_t processesFor(const Client::Options& options) {
-  const std::size_t wanted =
-      options.processes == 0 ? std::thread::hardware_concurrency() : options.processes;
-  return std::clamp<std::size_t>(wanted, 1, Client::Options::maximumProcesses);
-}
-
 std::uint64_t cpuSeconds(const Client::Options& options) {
   // Stands behind the deadline, so it is rounded up generously; a worker's messages add up.
   constexpr std::int64_t day = 86'400;
@@ -55,6 +49,12 @@ ServiceSettings settingsFor(const Client::Options& options, std::size_t processe
 }
 
 }  // namespace
+
+std::size_t processesFor(const Client::Options& options) {
+  const std::size_t wanted =
+      options.processes == 0 ? std::thread::hardware_concurrency() : options.processes;
+  return std::clamp<std::size_t>(wanted, 1, Client::Options::maximumProcesses);
+}
 
 void RecentPeak::note(std::size_t now, Deadline at) noexcept {
   constexpr std::chrono::seconds window(2);

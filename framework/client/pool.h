@@ -18,6 +18,9 @@
 
 namespace Keelgate {
 
+/// The number of processes that options stand for.
+std::size_t processesFor(const Client::Options& options);
+
 /// The most calls at a time in the last seconds. What was needed once and is no more is forgotten.
 class RecentPeak {
  public:

@@ -71,7 +71,7 @@ std::variant<Supervisor::Service, Wait> Supervisor::demand(Deadline deadline) {
         state_ = State::starting;
     }
   }
-  start();
+  start(current_);
   return Wait{};
 }
 
@@ -86,8 +86,8 @@ void Supervisor::giveUp(Deadline deadline) const {
   throw HostError(Reason::startFailed, std::move(sentence));
 }
 
-/// Without the lock: to spawn a process takes its time.
-void Supervisor::start() {
+/// The current one or the standby. Without the lock: to spawn a process takes its time.
+void Supervisor::start(Service& which) {
   Service fresh;
   Optional<StartFailure> failure;
   try {
@@ -98,8 +98,13 @@ void Supervisor::start() {
     failure.emplace("There is no memory to start the service", true);
   }
   const std::lock_guard lock(mutex_);
-  current_ = std::move(fresh);
-  if (failure) fail(std::move(*failure));
+  which = std::move(fresh);
+  if (&which == &standby_) {
+    // Whoever needs one finds out what is wrong.
+    noStandbyBefore_ = failure ? Clock::now() + standbyPatience : Deadline();
+  } else if (failure) {
+    fail(std::move(*failure));
+  }
 }
 
 void Supervisor::fail(StartFailure failure) {
@@ -190,7 +195,7 @@ void Supervisor::tidy() noexcept try {
     isMissing = wantsStandby_ && state_ == State::stopped;
     if (isMissing) state_ = State::starting;
   }
-  if (isMissing) start();
+  if (isMissing) start(current_);
   startStandby();
 } catch (const std::exception&) {
   // A start that failed for good is met again by whoever asks for a service.
@@ -199,22 +204,10 @@ void Supervisor::tidy() noexcept try {
 void Supervisor::startStandby() {
   {
     const std::lock_guard lock(mutex_);
-    if (!current_ || standby_ || !wantsStandby_ || spawningStandby_ ||
-        Clock::now() < noStandbyBefore_) {
-      return;
-    }
-    spawningStandby_ = true;
+    if (!current_ || standby_ || !wantsStandby_ || Clock::now() < noStandbyBefore_) return;
+    noStandbyBefore_ = Deadline::max();
   }
-  Service fresh;
-  try {
-    fresh = std::make_shared<ServiceProcess>(settings_, registry_);
-  } catch (const std::exception&) {
-    // Whoever needs one finds out what is wrong.
-  }
-  const std::lock_guard lock(mutex_);
-  spawningStandby_ = false;
-  standby_ = std::move(fresh);
-  if (!standby_) noStandbyBefore_ = Clock::now() + standbyPatience;
+  start(standby_);
 }
 
 }  // namespace Keelgate

@@ -63,7 +63,7 @@ class Supervisor {
  private:
   enum class State { stopped, starting, running, backingOff };
 
-  void start();
+  void start(Service& which);
   void startStandby();
   void settle();
   void replaceCurrent();
@@ -82,7 +82,7 @@ class Supervisor {
   Service standby_;
   /// A single call, as of a command, is done before a standby could be of use.
   bool wantsStandby_ = false;
-  bool spawningStandby_ = false;
+  /// Never, as long as one is being spawned.
   Deadline noStandbyBefore_{};
   /// Replaced, and not ended as long as somebody has a worker of them.
   std::vector<Service> replaced_;
