@@ -49,8 +49,9 @@ TEST_F(ServiceLocation, FollowsLinksDotsAndRelativePaths) {
   fs::create_symlink("../outer/./inner", root_ / "outer/again");
   fs::create_symlink(root_ / "outer/inner", root_ / "whole");
   fs::create_symlink("round", root_ / "round");
+  fs::create_symlink(".", root_ / "same");
   for (const char* path : {"outer/inner/service", "link/inner/service", "outer/again/service",
-                           "whole/../inner//./service"}) {
+                           "whole/../inner//./service", "same/outer/inner/service"}) {
     EXPECT_EQ(outcome(path), "found") << path;
   }
   EXPECT_NE(outcome("round").find("Too many levels of symbolic links"), String::npos);

@@ -60,13 +60,6 @@ TEST_F(Reused, C4AMessageHasTheSameMemoryInEveryWorker) {
   }
 }
 
-TEST_F(Reused, C4AWorkerThatHasTakenMuchEndsAndGivesItBack) {
-  EXPECT_FALSE(obeyNext(toEat(100 << 20, piece, 0)).last);
-  EXPECT_FALSE(obeyNext("answer").last);
-  EXPECT_TRUE(obeyNext(toEat(130 << 20, piece, 1 << 20)).last);
-  EXPECT_EQ(leave().exitStatus(), 0);
-}
-
 /// From start to start: of a few dozen addresses every bit that is random has both values.
 TEST_F(Worker, C13AddressesAreRandom) {
   int bits = 0;
