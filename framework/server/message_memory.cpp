@@ -26,7 +26,9 @@ constexpr std::size_t arenaSize = std::size_t{256} << 10;
 constexpr std::size_t smallBlock = 512;
 std::byte* arena = nullptr;
 std::size_t arenaUsed = arenaSize;
-/// Of the arena's blocks, those that were not released.
+/// Below it is what messages have left behind, in some static object.
+std::size_t arenaBegin = 0;
+/// Of the blocks behind it, those that were not released.
 std::size_t arenaBlocks = 0;
 
 /// With what the allocator keeps beside each block.
@@ -40,9 +42,14 @@ void begin(std::size_t bytes) noexcept {
   // A block of this size has the allocator join the small ones that the last message has left.
   constexpr std::size_t joining = 2048;
   std::free(std::malloc(joining));
-  if (arena == nullptr) arena = static_cast<std::byte*>(std::malloc(arenaSize));
-  // What the last message has left behind, in some static object, keeps its place.
-  if (arenaBlocks == 0) arenaUsed = arena == nullptr ? arenaSize : 0;
+  if (arena == nullptr) {
+    arena = static_cast<std::byte*>(std::malloc(arenaSize));
+    arenaBegin = arena == nullptr ? arenaSize : 0;
+  } else if (arenaBlocks != 0) {
+    arenaBegin = arenaUsed;
+  }
+  arenaUsed = arenaBegin;
+  arenaBlocks = 0;
   atBegin = most = allocated;
   limit = allocated + bytes;
 }
@@ -75,7 +82,7 @@ void release(void* block) noexcept {
   if (block == nullptr) return;
   const std::less<const void*> isBefore;
   if (!isBefore(block, arena) && isBefore(block, arena + arenaSize)) {
-    --arenaBlocks;
+    if (!isBefore(block, arena + arenaBegin)) --arenaBlocks;
     return;
   }
   allocated -= costOf(block);
