@@ -110,6 +110,21 @@ class SpawnPlan {
   posix_spawnattr_t attributes_;
 };
 
+/// As which user the peer listens: of a service manager's socket, that is the manager. Whoever else
+/// can put a socket there would be given the messages, and asked for the records.
+void requirePeer(const String& socket, const Descriptor& control, Optional<unsigned> alsoAllowed) {
+  ucred peer{};
+  socklen_t size = sizeof peer;
+  if (getsockopt(control.get(), SOL_SOCKET, SO_PEERCRED, &peer, &size) != 0) {
+    throw shortage(noChannel, errno);
+  }
+  if (peer.uid == 0 || peer.uid == geteuid() || peer.uid == alsoAllowed) return;
+  throw StartFailure("User " + std::to_string(peer.uid) + " listens on the socket " + socket +
+                         ", who is neither root nor the caller: if that is meant, say so "
+                         "(socketUser)",
+                     false);
+}
+
 }  // namespace
 
 String errorText(int error) {
@@ -152,25 +167,6 @@ void reapLauncher(const Descriptor& launcher) noexcept {
   siginfo_t ignored;
   waitid(P_PIDFD, static_cast<id_t>(launcher.get()), &ignored, WEXITED | WNOHANG);
 }
-
-namespace {
-
-/// As which user the peer listens: of a service manager's socket, that is the manager. Whoever else
-/// can put a socket there would be given the messages, and asked for the records.
-void requirePeer(const String& socket, const Descriptor& control, Optional<unsigned> alsoAllowed) {
-  ucred peer{};
-  socklen_t size = sizeof peer;
-  if (getsockopt(control.get(), SOL_SOCKET, SO_PEERCRED, &peer, &size) != 0) {
-    throw shortage(noChannel, errno);
-  }
-  if (peer.uid == 0 || peer.uid == geteuid() || peer.uid == alsoAllowed) return;
-  throw StartFailure("User " + std::to_string(peer.uid) + " listens on the socket " + socket +
-                         ", who is neither root nor the caller: if that is meant, say so "
-                         "(socketUser)",
-                     false);
-}
-
-}  // namespace
 
 ServiceHandles connectService(const String& socket, Optional<unsigned> socketUser,
                               DescriptorRegistry& registry) {

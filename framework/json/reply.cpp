@@ -13,7 +13,6 @@ namespace Keelgate::JSON {
 
 namespace {
 
-using std::chrono::steady_clock;
 using VespKeelgateService::VespClientMessageUnpackingError;
 
 /// What a record may have of JSON: some room for any message, and what the worst honest spelling
@@ -95,48 +94,35 @@ Reply rejection(const E& error, const Form& form) {
   return {.json = object(form, {}, members), .status = Status::rejected, .problem = error.what()};
 }
 
-class Answer {
- public:
-  Answer(Client& client, steady_clock::time_point deadline, Bytes message, const Form& form)
-      : client_(client), deadline_(deadline), message_(message), form_(form) {}
-
-  Pieces to(const String& name) {
-    Pieces json;
-    // Only here does a name become a type: behind it everything is checked by the compiler.
-    OutputRecords::each([&]<class R>(std::type_identity<R>) {
-      if constexpr (!std::is_same_v<R, VespClientMessageResult>) {
-        if (typeName<R>() == name) json = object(client_.unpack<R>(message_));
+template <class R>
+Pieces recordObject(const R& record, Budget budget, const Form& form) {
+  return object(form, budget, [&](Writer& out) {
+    writeField(out, "record", typeName<R>());
+    if constexpr (std::is_same_v<R, PropertyList>) {
+      if (form.typed) {
+        out.key("value");
+        return writeTyped(out, record.value);
       }
-    });
-    return json;
-  }
+    }
+    writeField(out, "value", record);
+  });
+}
 
-  Pieces to(const VespClientMessageContext& context) {
-    return object(client_.unpackClientMessage(message_, context));
+Pieces unpacked(Client& client, const Subject& subject, Bytes message, Budget budget,
+                const Form& form) {
+  if (const auto* context = std::get_if<VespClientMessageContext>(&subject)) {
+    return recordObject(client.unpackClientMessage(message, *context), budget, form);
   }
-
- private:
-  template <class R>
-  Pieces object(const R& record) const {
-    const Budget budget{.bytes = anyMessage + perByte * message_.size() + form_.preface.size(),
-                        .deadline = deadline_};
-    return JSON::object(form_, budget, [&](Writer& out) {
-      writeField(out, "record", typeName<R>());
-      if constexpr (std::is_same_v<R, PropertyList>) {
-        if (form_.typed) {
-          out.key("value");
-          return writeTyped(out, record.value);
-        }
-      }
-      writeField(out, "value", record);
-    });
-  }
-
-  Client& client_;
-  steady_clock::time_point deadline_;
-  Bytes message_;
-  const Form& form_;
-};
+  Pieces json;
+  // Only here does a name become a type: behind it everything is checked by the compiler.
+  OutputRecords::each([&]<class R>(std::type_identity<R>) {
+    if constexpr (!std::is_same_v<R, VespClientMessageResult>) {
+      if (typeName<R>() != std::get<String>(subject)) return;
+      json = recordObject(client.unpack<R>(message), budget, form);
+    }
+  });
+  return json;
+}
 
 }  // namespace
 
@@ -159,9 +145,10 @@ Bool isRecordName(std::string_view name) {
 
 Reply answer(Client& client, std::chrono::milliseconds timeLimit, const Subject& subject,
              Bytes message, const Form& form) {
-  Answer answer(client, steady_clock::now() + timeLimit, message, form);
+  const Budget budget{.bytes = anyMessage + perByte * message.size() + form.preface.size(),
+                      .deadline = std::chrono::steady_clock::now() + timeLimit};
   try {
-    return {.json = std::visit([&](const auto& what) { return answer.to(what); }, subject)};
+    return {.json = unpacked(client, subject, message, budget, form)};
   } catch (const DecodingError& error) {
     return rejection(error, form);
   } catch (const Breach& error) {

@@ -125,11 +125,8 @@ bool Zygote::takeFrame() {
 }
 
 void Zygote::fork(std::uint32_t slot, int channel) {
-  const bool taken = std::any_of(children_.begin(), children_.end(),
-                                 [slot](const Child& child) { return child.slot == slot; }) ||
-                     rewinding_.processOf(slot) != 0;
   // Two workers on one slot: an exit could be told of the wrong one.
-  if (taken) throw StartError(StartStep::readFrame, 0);
+  if (processOf(slot) != 0) throw StartError(StartStep::readFrame, 0);
   // Workers for long messages write to more memory than it pays to restore.
   if (!seal_.canRewind || workerSeal_.longestMessage > shortMessage) {
     forkOnce(slot, channel);
@@ -180,15 +177,18 @@ void Zygote::forkOnce(std::uint32_t slot, int channel) {
   }
 }
 
+pid_t Zygote::processOf(std::uint32_t slot) const noexcept {
+  for (const Child& child : children_) {
+    if (child.slot == slot) return child.process;
+  }
+  return rewinding_.processOf(slot);
+}
+
 void Zygote::kill(std::uint32_t slot) {
   // One that has just answered may be rewound yet.
   reap();
-  if (const pid_t process = rewinding_.processOf(slot); process != 0) ::kill(process, SIGKILL);
-  for (const Child& child : children_) {
-    if (child.slot != slot) continue;
-    // Not reaped yet, so the number is still this child's.
-    ::kill(child.process, SIGKILL);
-  }
+  // Not reaped yet, so the number is still this worker's.
+  if (const pid_t process = processOf(slot); process != 0) ::kill(process, SIGKILL);
 }
 
 void Zygote::reap() {

@@ -53,6 +53,8 @@ class Zygote {
   void forkToRewind();
   /// From here on it forks and does nothing else.
   void renounceRewinding();
+  /// The worker of a slot, forked or rewound, or 0.
+  [[nodiscard]] pid_t processOf(std::uint32_t slot) const noexcept;
   void kill(std::uint32_t slot);
   /// Tells the client of every worker that has ended.
   void reap();
