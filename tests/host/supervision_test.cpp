@@ -92,17 +92,32 @@ class Supervised : public testing::Test {
   }
 
   DescriptorRegistry registry_{64};
-  Supervisor supervisor_{{.path = fakeService(),
-                          .socket = {},
-                          .socketUser = {},
-                          .requireLayers = false,
-                          .forks = false,
-                          .messagesPerWorker = 1,
-                          .cpuSecondsPerWorker = 5,
-                          .maximumWorkers = 3},
-                         [](std::string_view) {},
-                         registry_};
+  ServiceSettings settings_{.path = fakeService(),
+                            .socket = {},
+                            .socketUser = {},
+                            .requireLayers = false,
+                            .forks = false,
+                            .messagesPerWorker = 1,
+                            .cpuSecondsPerWorker = 5,
+                            .maximumWorkers = 3};
+  Supervisor supervisor_{settings_, [](std::string_view) {}, registry_};
 };
+
+/// One that does not see its channel closed, and was stopped: that it is killed is the last means.
+TEST_F(Supervised, AServiceHasTimeToEndAndIsAskedTo) {
+  settings_.path = fakeService("stuck");
+  ServiceProcess service(settings_, registry_);
+  const auto isRunning = [&] {
+    return service.readNews(), service.state() == State::running;
+  };
+  EXPECT_TRUE(comesTrue(isRunning));
+  kill(*children().begin(), SIGSTOP);
+  const auto start = Clock::now();
+  const ServiceProcess::Patience patience{
+      .closed = milliseconds(200), .asked = seconds(60), .killed = seconds(60)};
+  EXPECT_TRUE(comesTrue([&] { return service.end(patience); }));
+  EXPECT_GE(Clock::now() - start, patience.closed);
+}
 
 TEST_F(Supervised, ALayoutIsGivenUpAfterSoManyReplies) {
   const Supervisor::Service first = running();
