@@ -125,6 +125,20 @@ TEST(Batch, HoldsEachMessageToItsTimeLimit) {
   }
 }
 
+/// Beside one that goes alone, those that share a worker have their turn behind it.
+TEST(Batch, TheTimeOfAMessageBeginsWithItsTurn) {
+  Client::Options options = fakeOptions("honest", milliseconds(1500), 1);
+  options.messagesPerProcess = 100;
+  Client client(options);
+  Script large = answer(1, 1000);
+  large.resize(std::size_t{4} << 20);
+  const Script quick = answer(1, 700);
+  const Client::Request requests[] = {{.message = large}, {.message = quick}};
+  for (auto& outcome : client.unpackBatch<Response>(requests)) {
+    EXPECT_EQ(outcomeOf(outcome), "record 1");
+  }
+}
+
 TEST(Async, IsCancelledAtItsDeadlineAlsoBeforeItsTurn) {
   Client client(fakeOptions("honest", milliseconds(20'000), 1));
   const Script stays = Script().then(Op::pause, 60'000);
