@@ -159,11 +159,6 @@ void Supervisor::tellLayers() {
   }
 }
 
-bool Supervisor::isCurrent(const ServiceProcess* service) const {
-  const std::lock_guard lock(mutex_);
-  return service == current_.get() && service->state() == ServiceState::running;
-}
-
 Supervisor::Service Supervisor::current() const {
   const std::lock_guard lock(mutex_);
   return state_ == State::running && current_->state() == ServiceState::running ? current_

@@ -49,8 +49,10 @@ class Supervisor {
   std::variant<Service, Wait> demand(Deadline deadline);
 
   /// Whether this is the one that messages are given to.
-  [[nodiscard]] bool isCurrent(const ServiceProcess* service) const;
-  /// The same without waiting or starting one; null when none is running.
+  [[nodiscard]] bool isCurrent(const ServiceProcess* service) const {
+    return current().get() == service;
+  }
+  /// It, without waiting or starting one; null when none is running.
   [[nodiscard]] Service current() const;
 
   /// A worker of it gave a reply that was one.

@@ -81,17 +81,23 @@ Pieces object(const Form& form, Budget budget, const Members& members) {
   return std::move(out).take();
 }
 
-/// Errors are as long as the message's keys and no longer, and have no budget: an answer there must
-/// be.
-template <class E>
-Reply rejection(const E& error, const Form& form) {
-  const auto members = [&](Writer& out) {
+/// The reply {"error": …} around what `members` writes. Errors are as long as the message's keys
+/// and no longer, and have no budget: an answer there must be.
+template <class Members>
+Pieces errorObject(const Form& form, const Members& members) {
+  return object(form, {}, [&](Writer& out) {
     out.key("error");
     out.beginObject();
-    writeError(out, error);
+    members(out);
     out.endObject();
-  };
-  return {.json = object(form, {}, members), .status = Status::rejected, .problem = error.what()};
+  });
+}
+
+template <class E>
+Reply rejection(const E& error, const Form& form) {
+  return {.json = errorObject(form, [&](Writer& out) { writeError(out, error); }),
+          .status = Status::rejected,
+          .problem = error.what()};
 }
 
 template <class R>
@@ -175,13 +181,10 @@ Reply givenUp(const HostError& error, const Form& form) {
 
 Reply requestError(std::string_view description, const Form& form) {
   const auto members = [&](Writer& out) {
-    out.key("error");
-    out.beginObject();
     writeField(out, "kind", "request");
     writeField(out, "description", description);
-    out.endObject();
   };
-  return {.json = object(form, {}, members),
+  return {.json = errorObject(form, members),
           .status = Status::unusable,
           .problem = String(description)};
 }
