@@ -42,6 +42,11 @@ TEST(Decoding, ReadsFieldsByTheirKeysAndStopsAtTheFirstFailureInDeclarationOrder
   for (const auto& [name, message, expected] : rows) {
     EXPECT_EQ(outcome(sample, message), expected) << name;
   }
+  // Also of faults in fields of different types.
+  const Dictionary faults{{"c", 1}, {"s", "x"}, {"P", 1}};
+  EXPECT_EQ(outcome(payload, faults), "typeMismatch @P");
+  EXPECT_EQ(outcome(payload, Dictionary{{"c", 1}, {"mml", Array{faults}}}),
+            "typeMismatch @mml.0.P");
 }
 
 /// Which XML has not.

@@ -23,6 +23,10 @@ class FieldSet {
 
   constexpr void insert(std::size_t field) { words_[field / 64] |= std::uint64_t{1} << field % 64; }
 
+  [[nodiscard]] constexpr bool contains(std::size_t field) const {
+    return (words_[field / 64] >> field % 64 & 1) != 0;
+  }
+
   /// The first field that the other set has and this one lacks, or `size`.
   [[nodiscard]] constexpr std::size_t firstMissing(const FieldSet& other) const {
     for (std::size_t i = 0; i < words_.size(); ++i) {

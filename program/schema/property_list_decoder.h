@@ -9,11 +9,11 @@
 /// The second never makes the schema: each field is decoded where the record has it, so that a
 /// message of many records inside one another moves none of them and never holds both.
 ///
-/// The whole document is checked before any field is read. Fields are read in declaration order and
-/// the first failure ends the decoding: what is thrown is a DecodingError (or what a schema's own
-/// decoding throws), and nothing partial escapes. A plain field is required, an Optional one may be
-/// missing or null; a value of the wrong type fails the message in both. Keys that the schema does
-/// not have are ignored.
+/// The whole document is checked before any field is read. Fields are read as if in declaration
+/// order, and the first failure ends the decoding: what is thrown is a DecodingError (or what a
+/// schema's own decoding throws), and nothing partial escapes. A plain field is required, an
+/// Optional one may be missing or null; a value of the wrong type fails the message in both. Keys
+/// that the schema does not have are ignored.
 ///
 /// A decoder is used for one message and by one thread.
 #pragma once
@@ -51,7 +51,10 @@ constexpr bool isScalar = !Keelgate::CaseKeyed<T> && !Keelgate::Schema<T> && !Ke
 
 /// What the readers of one message share. Handed down by reference; lives as long as the decoding.
 struct Decoding {
-  PropertyList::ExpansionBudget& budget;
+  PropertyList::ExpansionBudget budget;
+  /// Whether fields are read in the order by type, in which a processor foresees the jumps to their
+  /// code, or as declared.
+  bool isByType = true;
 };
 
 /// A value that a schema describes as W. What is filled is a W, or what W fills.
@@ -99,8 +102,8 @@ class KeyedContainer {
   const CodingPath& path_;
 };
 
-/// The values of a dictionary, each at the position of its field. Kept as bare numbers: there is
-/// one of these on the stack for every nested payload.
+/// The values of a dictionary, each at the place of its field in the order by type. Kept as bare
+/// numbers: there is one of these on the stack for every nested payload.
 template <Keelgate::Schema S>
 class FieldValues {
  public:
@@ -126,13 +129,14 @@ class FieldValues {
   std::array<std::uint32_t, S::CodingKeys::size> numbers_;
 };
 
+/// By their places, too.
 template <Keelgate::Schema S>
 constexpr auto requiredFields = [] {
   Keelgate::FieldSet<S::CodingKeys::size> required;
   std::size_t position = 0;
   S::CodingKeys::each([&](auto field) {
-    if (!Keelgate::isOptional<typename decltype(field)::Value>) required.insert(position);
-    ++position;
+    const std::size_t place = Keelgate::byType<S>.places[position++];
+    if (!Keelgate::isOptional<typename decltype(field)::Value>) required.insert(place);
   });
   return required;
 }();
@@ -172,21 +176,32 @@ struct FieldDecoder {
   using PresentOf = decltype(presentOf(static_cast<const W*>(nullptr)));
 };
 
-/// In declaration order, whatever the order in the message: the same faults give the same error.
 template <Keelgate::Schema S, class R>
 void decodeFields(Decoding& decoding, const PropertyList::Value& value, const CodingPath& path,
                   R& into) {
   constexpr auto& decoders = decodersOf<S, R, FieldDecoder<S, R>>;
-  static_assert(decoders.misfit == S::CodingKeys::size,
+  constexpr auto& order = Keelgate::byType<S>;
+  constexpr std::size_t size = S::CodingKeys::size;
+  static_assert(decoders.misfit == size,
                 "a field of the record cannot hold what the schema's field does");
   const FieldValues<S> values(value);
-  // What stands before the first field that is missing may be wrong, too.
-  const std::size_t end = values.present().firstMissing(requiredFields<S>);
-  values.present().eachBelow(end, [&](std::size_t position) {
+  const auto decode = [&](std::size_t place) {
+    const std::size_t position = order.positions.data()[place];
     // NOLINTNEXTLINE(clang-analyzer-core.CallAndMessage): none is null, which was asserted.
-    decoders.functions.data()[position](decoding, values.at(position), path, position, into);
-  });
-  if (end < S::CodingKeys::size) throw Errors::keyNotFound(path, S::CodingKeys::keys[end]);
+    decoders.functions.data()[position](decoding, values.at(place), path, position, into);
+  };
+  if (decoding.isByType && values.present().firstMissing(requiredFields<S>) == size) {
+    return values.present().eachBelow(size, decode);
+  }
+  // What stands before the first field that is missing may be wrong, too.
+  for (std::size_t position = 0; position < size; ++position) {
+    const std::size_t place = order.places.data()[position];
+    if (values.present().contains(place)) {
+      decode(place);
+    } else if (requiredFields<S>.contains(place)) {
+      throw Errors::keyNotFound(path, S::CodingKeys::keys[position]);
+    }
+  }
 }
 
 template <Keelgate::Schema S, class R>
@@ -268,6 +283,15 @@ class PropertyListDecoder {
   [[nodiscard]] R decode(Keelgate::Bytes from) {
     R decoded{};
     read(from, knownKeys<S>, [&](Decoding& decoding, const PropertyList::Value& top) {
+      const PropertyList::ExpansionBudget budget = decoding.budget;
+      try {
+        return decodeSchema<S>(decoding, top, CodingPath(), decoded);
+      } catch (...) {  // NOLINT(bugprone-empty-catch): the same is met again, or another first.
+      }
+      // The same faults give the same error, whatever the order in the message or by type: the one
+      // that comes first as declared.
+      decoding = {.budget = budget, .isByType = false};
+      decoded = R{};
       decodeSchema<S>(decoding, top, CodingPath(), decoded);
     });
     return decoded;
@@ -280,8 +304,7 @@ class PropertyListDecoder {
   void read(Keelgate::Bytes from, const PropertyList::KnownKeys& known, Body&& body) {
     try {
       const PropertyList::Document document(from, known);
-      PropertyList::ExpansionBudget budget(from.size());
-      Decoding decoding{budget};
+      Decoding decoding{.budget = PropertyList::ExpansionBudget(from.size())};
       body(decoding, document.top());
     } catch (const PropertyList::MalformedDocument& error) {
       // From the check of the document, or from the budget while fields are read.
