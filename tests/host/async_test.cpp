@@ -127,16 +127,18 @@ TEST(Batch, HoldsEachMessageToItsTimeLimit) {
 
 /// Beside one that goes alone, those that share a worker have their turn behind it.
 TEST(Batch, TheTimeOfAMessageBeginsWithItsTurn) {
-  Client::Options options = fakeOptions("honest", milliseconds(1500), 1);
+  Client::Options options = fakeOptions("honest", milliseconds(2000), 1);
   options.messagesPerProcess = 100;
   Client client(options);
   Script large = answer(1, 1000);
   large.resize(std::size_t{4} << 20);
-  const Script quick = answer(1, 700);
-  const Client::Request requests[] = {{.message = large}, {.message = quick}};
+  const Script slow = answer(1, 1600);
+  const Client::Request requests[] = {{.message = large}, {.message = slow}};
   for (auto& outcome : client.unpackBatch<Response>(requests)) {
     EXPECT_EQ(outcomeOf(outcome), "record 1");
   }
+  // Such a client has a second service ready.
+  EXPECT_TRUE(comesTrue([] { return children().size() == 2; }));
 }
 
 TEST(Async, IsCancelledAtItsDeadlineAlsoBeforeItsTurn) {

@@ -176,10 +176,10 @@ TEST(C8, WorkersThatSpeakBeforeTheyAreAskedAreNotBelieved) {
 
 TEST(C8, LogLinesSteerNoTerminalAndCannotEndTheApplication) {
   const String longest(Protocol::maximumLogLength, 'x');
-  Script logs = Script().log("plain, Zürich €").log("\x1b[2J\r\n\t\x7f");
+  Script logs = Script().log("plain,\u00a0Zürich €").log("\x1b[2J\r\n\t\x7f");
   logs.log("\xc2\x9b@A \xff\xc0\x80 \xed\xa0\x80").log(longest).answer(7);
   const String expected =
-      "plain, Zürich €\n\\x1b[2J\\x0d\\x0a\\x09\\x7f\n"
+      "plain,\u00a0Zürich €\n\\x1b[2J\\x0d\\x0a\\x09\\x7f\n"
       "\\xc2\\x9b@A \\xff\\xc0\\x80 \\xed\\xa0\\x80\n" +
       longest + '\n';
   EXPECT_EQ(inFork([&] {
