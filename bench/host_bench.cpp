@@ -303,21 +303,21 @@ void idleService(benchmark::State& state) {
 BENCHMARK(bareForkExitWait)->UseManualTime()->Iterations(500);
 BENCHMARK(freshWorkerWithoutSpare)->UseManualTime()->Iterations(500);
 constexpr auto forked = Isolation::fork;
-constexpr auto setBack = Isolation::rewind;
+constexpr auto rewound = Isolation::rewind;
 constexpr std::chrono::milliseconds pause{2};
 constexpr std::chrono::milliseconds none{0};
 constexpr std::size_t endless = 1'000'000'000;
 BENCHMARK_CAPTURE(clientCall, spareForkedAhead, 1, forked, pause)->UseManualTime()->Iterations(500);
-BENCHMARK_CAPTURE(clientCall, spareSetBack, 1, setBack, pause)->UseManualTime()->Iterations(500);
+BENCHMARK_CAPTURE(clientCall, spareRewound, 1, rewound, pause)->UseManualTime()->Iterations(500);
 BENCHMARK_CAPTURE(clientCall, oneAfterTheOtherForked, 1, forked, none)
     ->UseManualTime()
     ->Iterations(2000);
-BENCHMARK_CAPTURE(clientCall, oneAfterTheOtherSetBack, 1, setBack, none)
+BENCHMARK_CAPTURE(clientCall, oneAfterTheOtherRewound, 1, rewound, none)
     ->UseManualTime()
     ->Iterations(2000);
 BENCHMARK_CAPTURE(clientCall, warm, endless, forked, none)->UseManualTime()->Iterations(5000);
 BENCHMARK_CAPTURE(batch, forked, 1, forked)->UseManualTime()->Iterations(1);
-BENCHMARK_CAPTURE(batch, setBack, 1, setBack)->UseManualTime()->Iterations(1);
+BENCHMARK_CAPTURE(batch, rewound, 1, rewound)->UseManualTime()->Iterations(1);
 BENCHMARK_CAPTURE(batch, reused, endless, forked)->UseManualTime()->Iterations(1);
 BENCHMARK(coldStart)->UseManualTime()->Iterations(50);
 BENCHMARK(idleService)->UseManualTime()->Iterations(1);

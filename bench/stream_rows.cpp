@@ -167,13 +167,13 @@ void stream(benchmark::State& state, Way way, int processors) {
 }
 
 constexpr Way forked{"1", "fork"};
-constexpr Way setBack{"1", "rewind"};
+constexpr Way rewound{"1", "rewind"};
 constexpr Way reused{"1000000000", "fork"};
 BENCHMARK_CAPTURE(stream, forkedOnOneProcessor, forked, 1)->UseManualTime()->Iterations(5);
-BENCHMARK_CAPTURE(stream, setBackOnOneProcessor, setBack, 1)->UseManualTime()->Iterations(5);
+BENCHMARK_CAPTURE(stream, rewoundOnOneProcessor, rewound, 1)->UseManualTime()->Iterations(5);
 BENCHMARK_CAPTURE(stream, reusedOnOneProcessor, reused, 1)->UseManualTime()->Iterations(5);
 BENCHMARK_CAPTURE(stream, forkedOnTwoProcessors, forked, 2)->UseManualTime()->Iterations(5);
-BENCHMARK_CAPTURE(stream, setBackOnTwoProcessors, setBack, 2)->UseManualTime()->Iterations(5);
+BENCHMARK_CAPTURE(stream, rewoundOnTwoProcessors, rewound, 2)->UseManualTime()->Iterations(5);
 BENCHMARK_CAPTURE(stream, reusedOnTwoProcessors, reused, 2)->UseManualTime()->Iterations(5);
 
 }  // namespace
