@@ -86,8 +86,8 @@ KEELGATE_C_API keelgate_client* keelgate_open(const keelgate_options* options, c
 
 /**
  * Unpacks the `length` bytes at `message`, which may be NULL if `length` is 0. `record` is a name
- * that `keelgate unpack --help` lists, e.g. "PulseUserPayload". Sets `*reply` to the reply object as
- * compact JSON, or to NULL with KEELGATE_WRONG_USE.
+ * that `keelgate unpack --help` lists, e.g. "PulseUserPayload". Sets `*reply` to the reply object
+ * as compact JSON, or to NULL with KEELGATE_WRONG_USE.
  */
 KEELGATE_C_API int keelgate_unpack(keelgate_client* client, const char* record, const void* message,
                                    size_t length, char** reply);
