@@ -107,7 +107,8 @@ TEST(Malformed, XmlMarkup) {
   all(Problem::notPropertyList, {"plist", "{}", "\xEF\xBB\xBFx", "\xFF" + sound});
   all(Problem::truncated, {" ", "<?xml version='1.0'?>\n", "\xEF\xBB\xBF"});
   all(Problem::badDocumentType,
-      {"<!DOCTYPE plist PUBLIC '{' 'x'>" + sound, "<!DOCTYPE plist [<!ENTITY a 'b'>]>" + sound});
+      {"<!DOCTYPE plist PUBLIC '{' 'x'>" + sound, "<!DOCTYPE plist PUBLIC '`' 'x'>" + sound,
+       "<!DOCTYPE plist [<!ENTITY a 'b'>]>" + sound});
   all(Problem::unknownElement, {type + type + sound, xml(type + "<true/>")});
   all(Problem::badComment, {xml("<!-- -- --><true/>"), xml("<!-- ---><true/>")});
 }

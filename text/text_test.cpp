@@ -1,5 +1,4 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "text/ascii.h"
 #include "text/base64.h"
 #include "text/date_time.h"
 #include "text/utf8.h"
@@ -98,22 +97,6 @@ TEST(Utf8, WhatIsMalformedIsFoundAnywhere) {
         EXPECT_TRUE(isUtf8(text)) << before << ' ' << after;
       }
     }
-  }
-}
-
-TEST(Ascii, ClassesHaveTheirCharactersAndNoOthers) {
-  const std::string_view small = "abcdefghijklmnopqrstuvwxyz", large = "ABCDEFGHIJKLMNOPQRSTUVWXYZ";
-  const auto in = [](std::string_view all, char c) {
-    return all.find(c) != all.npos;
-  };
-  for (int number = 0; number < 256; ++number) {
-    const char c = static_cast<char>(number);
-    EXPECT_EQ(isLetter(c), in(small, c) || in(large, c)) << number;
-    EXPECT_EQ(isDigit(c), in("0123456789", c)) << number;
-    EXPECT_EQ(isSpace(c), in(" \t\r\n", c)) << number;
-    EXPECT_EQ(lowerCase(c), in(large, c) ? small[large.find(c)] : c) << number;
-    const std::size_t digit = std::string_view("0123456789abcdef").find(lowerCase(c));
-    EXPECT_EQ(hexDigit(c), digit == std::string_view::npos ? -1 : static_cast<int>(digit));
   }
 }
 

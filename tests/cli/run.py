@@ -127,14 +127,16 @@ def many_files():
     check(host_error(endless) == "messageTooLarge", f"input without end: {endless}")
     with tempfile.TemporaryDirectory() as folder:
         # Longer than what workers are forked ahead for, and up to the limit; short ones between.
-        sizes = [1 << 18, (1 << 18) + 1, len(data), 20 << 20, (1 << 18) - 1]
+        # The first is the last to be answered.
+        sizes = [20 << 20, 1 << 18, (1 << 18) + 1, len(data), (1 << 18) - 1]
         files = [pathlib.Path(folder, str(size)) for size in sizes]
         for file, size in zip(files, sizes):
             file.write_bytes(data.ljust(size))
         for reuse in (1, 3):
             status, out, _ = run(*record, "--max-message", 20 << 20, "--messages-per-process",
                                  reuse, *files)
-            check(status == 0 and len(objects(out)) == len(sizes), f"long messages: {out[:500]}")
+            check(status == 0 and [r["file"] for r in objects(out)] == [*map(str, files)],
+                  f"long messages: {out[:500]}")
     reply = objects(run("unpack", "--service=", "--command", "1", stdin=data)[1])[0]
     check(reply["error"].get("service") == "", f"an empty service: {reply}")
 
@@ -191,8 +193,6 @@ def property_lists():
              for typed in ({}, {"typed": False}, {"typed": True})]
     replies = objects(run("stream", stdin="\n".join(lines).encode())[1])
     check([reply["value"].get("type") for reply in replies] == [None, None, "dictionary"], "stream")
-    status, out, err = run("check", messages / "damaged.bplist")
-    check((status, out) == (1, b"") and re.search("at byte [0-9]+", err), f"check: {err}")
     check(run("check", stdin=(messages / "check-in.xml").read_bytes()) == (0, b"", ""), "check")
 
 
@@ -408,17 +408,6 @@ def described():
         for name in everything[section] if isinstance(everything[section], dict) else ():
             one = json.loads(run("describe", name, "--json")[1])
             check(one[section] == {name: everything[section][name]}, f"describe {name}")
-    pages = [[], ["VespOstrelProtocolPayload"], ["com.tessen.private.braid.viso.audio"], ["232"],
-             ["CommandType"], ["VespClientMessageType"], ["WMMessageType"]]
-    for words in pages:
-        whole = run("describe", *words, env={**os.environ, "COLUMNS": "20"})[1].decode()
-        letters = set(whole.split())
-        check(max(map(len, whole.splitlines())) > 20, f"describe {words} is wrapped without need")
-        for width in (48, 60, 80, 132, 1000):
-            out = on_terminal("describe", *words, NO_COLOR="1", COLUMNS=str(width)).decode()
-            check(all(len(line) <= width and line == line.rstrip() for line in out.splitlines())
-                  and out.split() and set(out.split()) == letters, f"describe {words} in {width}")
-        check(out.replace("\r", "") == whole, f"describe {words} in a wide terminal")
     answered = json.loads(run("describe", "245", "--json")[1])
     check([row["name"] for row in answered["commands"]] == ["livePhoto"] and
           all(row.get("command", 245) == 245 for service in answered["services"]
@@ -494,7 +483,11 @@ def terminal():
         said = on_terminal("describe", window=window, COLUMNS=columns, NO_COLOR="1")
         check(said == on_terminal("describe", COLUMNS=str(expected), NO_COLOR="1"),
               f"{columns} in a window of {window}")
-    check(all(len(line) <= 60 for line in on_terminal("unpack", "--help", COLUMNS="60").splitlines()), "help")
+    for words in (["unpack", "--help"], ["describe"], ["describe", "VespOstrelProtocolPayload"],
+                  ["describe", "com.tessen.private.braid.viso.audio"], ["describe", "CommandType"]):
+        said = on_terminal(*words, COLUMNS="60", NO_COLOR="1").decode()
+        check(all(len(line) <= 60 and line == line.rstrip() for line in said.splitlines())
+              and set(said.split()) == set(run(*words)[1].decode().split()), f"{words} in 60 columns")
     check(b"\033" not in on_terminal("describe", NO_COLOR="1"), "NO_COLOR")
 
 

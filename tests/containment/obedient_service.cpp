@@ -13,14 +13,13 @@
 ///                      lie
 ///     count            how many of these this process has been given
 ///     log N LENGTH     logs N lines of that length, and answers
-///     fault | trap | abort | recurse | spin | throw | execute
+///     fault | recurse | spin | throw | execute
 ///     answer           behaves
 #include "framework/contracts/log.h"
 #include "framework/contracts/process.h"
 #include "framework/server/keelgate_server.h"
 #include "tests/containment/machine.h"
 
-#include <cstdlib>
 #include <cstring>
 #include <forward_list>
 #include <memory>
@@ -66,8 +65,6 @@ void misbehave(const std::string& how) {
   // Volatile, so that no compiler sees through it.
   volatile std::size_t address = 8;
   if (how == "fault") *reinterpret_cast<volatile int*>(address) = 1;
-  if (how == "trap") __builtin_trap();
-  if (how == "abort") std::abort();
   if (how == "recurse") recurse(1'000'000);
   if (how == "throw") throw 1;
   while (how == "spin") asm volatile("");
