@@ -127,12 +127,12 @@ TEST(Batch, HoldsEachMessageToItsTimeLimit) {
 
 /// Beside one that goes alone, those that share a worker have their turn behind it.
 TEST(Batch, TheTimeOfAMessageBeginsWithItsTurn) {
-  Client::Options options = fakeOptions("honest", milliseconds(2000), 1);
+  Client::Options options = fakeOptions("honest", milliseconds(4000), 1);
   options.messagesPerProcess = 100;
   Client client(options);
-  Script large = answer(1, 1000);
+  Script large = answer(1, 2000);
   large.resize(std::size_t{4} << 20);
-  const Script slow = answer(1, 1600);
+  const Script slow = answer(1, 2500);
   const Client::Request requests[] = {{.message = large}, {.message = slow}};
   for (auto& outcome : client.unpackBatch<Response>(requests)) {
     EXPECT_EQ(outcomeOf(outcome), "record 1");
