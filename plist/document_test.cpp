@@ -97,6 +97,16 @@ TEST(Document, AskingForAnotherTypeIsRefused) {
   EXPECT_THROW(top.elements(), std::logic_error);
 }
 
+TEST(Writers, RefuseWhatTheFormatHasNot) {
+  for (const Tree& tree :
+       {Tree(nullptr), Tree(Uid{1}), Tree(Set{}), Tree(Date{0.5}), Tree(Date{-63'113'904'001}),
+        Tree(Date{252'423'993'600}), Tree("\x01"), Tree("\xEF\xBF\xBF"), Tree("\xFF")}) {
+    EXPECT_THROW(writeXml(tree), std::invalid_argument);
+  }
+  EXPECT_THROW(writeBinary("\xC0\x80"), std::invalid_argument);
+  EXPECT_THROW(writeBinary(Date{std::numeric_limits<double>::infinity()}), std::invalid_argument);
+}
+
 constexpr std::int64_t lowest = std::numeric_limits<std::int64_t>::min();
 constexpr std::uint64_t highest = std::numeric_limits<std::uint64_t>::max();
 

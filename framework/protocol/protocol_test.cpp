@@ -41,6 +41,33 @@ State parse(Bytes reply) {
   return ReplyParser(sequence, largestBody).parse(reply);
 }
 
+TEST(Reply, IsTheSameInWhateverPiecesItArrives) {
+  const Data reply = replyOf(2, 5, 20, ReplyKind::error);
+  for (std::size_t step = 1; step <= reply.size(); ++step) {
+    ReplyParser parser(sequence, largestBody);
+    std::size_t arrived = 0;
+    State state = parser.parse({});
+    while (state == State::incomplete) {
+      ASSERT_LT(arrived, reply.size());
+      // It never wants more than there is, or a reader that waits for it would wait for ever.
+      EXPECT_GT(parser.needed(), arrived);
+      EXPECT_LE(parser.needed(), reply.size());
+      // To the end of a header, or of a body.
+      const std::size_t inFrame = parser.needed() % (sizeof(ReplyHeader) + 5);
+      EXPECT_TRUE(inFrame == sizeof(ReplyHeader) || inFrame == 0 ||
+                  parser.needed() == reply.size());
+      arrived = std::min(arrived + step, reply.size());
+      state = parser.parse(Bytes(reply).first(arrived));
+    }
+    ASSERT_EQ(state, State::complete) << step;
+    EXPECT_EQ(parser.kind(), ReplyKind::error);
+    EXPECT_TRUE(parser.isLast());
+    EXPECT_EQ(parser.log(), Array<String>(2, "xxxxx"));
+    EXPECT_EQ(parser.body(reply).size(), 20u);
+    EXPECT_EQ(parser.body(reply).data(), reply.data() + reply.size() - 20);
+  }
+}
+
 TEST(Reply, KeepsItsLimits) {
   EXPECT_EQ(parse(replyOf(maximumLogFrames, maximumLogLength, largestBody)), State::complete);
   EXPECT_EQ(parse(replyOf(maximumLogFrames + 1, 1, 1)), State::malformed);
@@ -73,6 +100,22 @@ TEST(Reply, EveryWrongFieldShowsInItsHeader) {
   }
   for (const int kind : {0, 4, 65535}) {
     EXPECT_EQ(headerWith(ReplyKind(kind), [](ReplyHeader&) {}), State::malformed) << kind;
+  }
+}
+
+TEST(Request, IsExpectedWithinItsLimits) {
+  const RequestHeader right = makeRequestHeader(1, 2, maximumServiceLength, 100, sequence);
+  EXPECT_TRUE(isExpected(right, sequence, 100));
+  EXPECT_FALSE(isExpected(right, sequence, 99));
+  EXPECT_FALSE(isExpected(right, sequence + 1, 100));
+  for (const auto change : std::initializer_list<void (*)(RequestHeader&)>{
+           [](auto& h) { h.magic ^= 1; }, [](auto& h) { ++h.version; },
+           [](auto& h) {
+             ++h.serviceLength;
+           }}) {
+    RequestHeader wrong = right;
+    change(wrong);
+    EXPECT_FALSE(isExpected(wrong, sequence, 100));
   }
 }
 

@@ -165,6 +165,14 @@ TEST(Pool, WorkersAreForkedAheadAndThoseThatStayAreKilled) {
   }
 }
 
+TEST(Pool, AZygoteThatDoesNotServeIsReplacedInTime) {
+  Client client(fakeOptions("stuck", milliseconds(100)));
+  const std::set<pid_t> before = children();
+  EXPECT_EQ(outcomeOf(client, good), "timedOut");
+  EXPECT_EQ(outcomeOf(client, good), "timedOut");
+  EXPECT_NE(children(), before);
+}
+
 TEST(Pool, OnlyAMessageThatFollowedOthersIsTriedAgain) {
   std::size_t tries = 0;
   Client::Options options = fakeOptions("honest", milliseconds(20'000), 1);
