@@ -21,6 +21,7 @@ Client::Options completed(Client::Options options, Console& console, std::size_t
   // Deliberate: whoever made a message fail does not wait for the answer himself, but all those
   // whose answers come behind it do.
   options.abnormalEndsPerSecond = 0;
+  options.largestMessage = std::min(options.largestMessage, Client::Options::maximumMessageSize);
   // No more processes than messages: the others would be started for nothing.
   options.processes = static_cast<unsigned>(std::min(processesFor(options), maximumMessages));
   return options;

@@ -46,10 +46,12 @@ class KeyTable {
     key.setKey(number);
     note(number, position);
   }
-  /// A key that may have been met before: no text is hashed twice.
+  /// A key that may have been met before: no text that has a number is hashed again.
   void add(std::uint32_t node, std::size_t position) {
     const Node& key = store_.nodes[node];
     if (key.key() == 0) return add(node, keyDigest(store_.text(key)), position);
+    // One of those that wait may be the same.
+    addWaiting();
     note(key.key(), position);
   }
   void end() { addWaiting(); }

@@ -141,6 +141,16 @@ TEST(Keys, AreComparedByMeaning) {
       problemIn(binary({"\xD2\x01\x02\x03\x03", "\x52\x61\x62", bytes("\x62\0a\0b"), "\x09"})),
       Problem::duplicateKey);
   EXPECT_EQ(problemIn(binary({"\xD2\x01\x01\x02\x02", "\x51\x61", "\x09"})), Problem::duplicateKey);
+  // Of two that are the same the second is told, also where another dictionary has had it before.
+  const std::string repeated =
+      binary({"\xA2\x01\x02", "\xD1\x03\x05", "\xD3\x04\x06\x03\x05\x05\x05", "\x53zzz", "\x53zzz",
+              "\x09", "\x53yyy"});
+  try {
+    const Document document(bytesOf(repeated));
+    ADD_FAILURE();
+  } catch (const MalformedDocument& error) {
+    EXPECT_EQ(error.offset(), repeated.find('\xD3') + 3);
+  }
   // The first fault of a dictionary is told: not the key behind it that is not a text.
   EXPECT_EQ(problemIn(binary({"\xD3\x01\x01\x02\x02\x02\x02", "\x51\x61", "\x09"})),
             Problem::duplicateKey);

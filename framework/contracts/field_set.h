@@ -36,14 +36,12 @@ class FieldSet {
     return size;
   }
 
-  /// Calls `visitor(field)` for the fields below `end`, in ascending order.
+  /// Calls `visitor(field)` for the fields, in ascending order.
   template <class Visitor>
-  constexpr void eachBelow(std::size_t end, Visitor&& visitor) const {
+  constexpr void each(Visitor&& visitor) const {
     for (std::size_t i = 0; i < words_.size(); ++i) {
       for (std::uint64_t left = words_[i]; left != 0; left &= left - 1) {
-        const std::size_t field = 64 * i + static_cast<std::size_t>(std::countr_zero(left));
-        if (field >= end) return;
-        visitor(field);
+        visitor(64 * i + static_cast<std::size_t>(std::countr_zero(left)));
       }
     }
   }

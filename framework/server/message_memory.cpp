@@ -26,7 +26,7 @@ constexpr std::size_t arenaSize = std::size_t{256} << 10;
 constexpr std::size_t smallBlock = 512;
 std::byte* arena = nullptr;
 std::size_t arenaUsed = arenaSize;
-/// Below it is what messages have left behind, in some static object.
+/// Below it is what messages have left behind, in some static object, with what lies before that.
 std::size_t arenaBegin = 0;
 /// Of the blocks behind it, those that were not released.
 std::size_t arenaBlocks = 0;

@@ -105,7 +105,7 @@ template <class T>
 void writeRecord(Writer& to, const T& record) {
   const auto present = presentIn(record);
   for (std::size_t i = 0; i < presenceWords<T>; ++i) to.word(present.words()[i]);
-  present.eachBelow(FieldsOf<T>::size, [&](std::size_t place) {
+  present.each([&](std::size_t place) {
     const std::size_t position = byType<T>.positions.data()[place];
     codingsOf<T, Writing<T>>.data()[position](to, record, position);
   });
@@ -229,7 +229,7 @@ void readRecord(Reader& from, T& value, int depth) {
   // A bit that no field has is a second spelling of the same record.
   const bool isSpeltOtherwise = (words.back() & ~allFields<T>.words().back()) != 0;
   if (isSpeltOtherwise || present.firstMissing(requiredFields<T>) < size) throw MalformedReply();
-  present.eachBelow(size, [&](std::size_t place) {
+  present.each([&](std::size_t place) {
     const std::size_t position = byType<T>.positions.data()[place];
     codingsOf<T, Reading<T>>.data()[position](from, value, position, depth);
   });

@@ -191,7 +191,7 @@ void decodeFields(Decoding& decoding, const PropertyList::Value& value, const Co
     decoders.functions.data()[position](decoding, values.at(place), path, position, into);
   };
   if (decoding.isByType && values.present().firstMissing(requiredFields<S>) == size) {
-    return values.present().eachBelow(size, decode);
+    return values.present().each(decode);
   }
   // What stands before the first field that is missing may be wrong, too.
   for (std::size_t position = 0; position < size; ++position) {
@@ -286,7 +286,8 @@ class PropertyListDecoder {
       const PropertyList::ExpansionBudget budget = decoding.budget;
       try {
         return decodeSchema<S>(decoding, top, CodingPath(), decoded);
-      } catch (...) {  // NOLINT(bugprone-empty-catch): the same is met again, or another first.
+      } catch (...) {  // NOLINT(bugprone-empty-catch)
+        // Deliberate: dropped, because the same fault is met again below, or one that comes first.
       }
       // The same faults give the same error, whatever the order in the message or by type: the one
       // that comes first as declared.

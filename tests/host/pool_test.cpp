@@ -41,7 +41,7 @@ int boundTo(const String& path) {
 
 TEST(Start, AFailureSaysWhatIsWrong) {
   const auto with = [](String Client::Options::*member, const String& path) {
-    Client::Options options = fakeOptions();
+    Client::Options options = fakeOptions("honest", milliseconds(5000));
     options.*member = path;
     return options;
   };

@@ -68,7 +68,7 @@ TEST(C14, OthersKeepTheirMessageWhateverEndsBesideThem) {
   }
 }
 
-TEST(C14, GiantsLeaveAPlaceForSmallMessages) {
+TEST(C14, GiantsLeaveRoomForSmallMessages) {
   Client client(fakeOptions());
   Script giant = Script().then(Op::pause, 60'000);
   giant.resize(std::size_t{4} << 20);
