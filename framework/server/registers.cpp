@@ -7,6 +7,10 @@
 
 #include <cstring>
 
+#if defined __x86_64__
+#include <sys/reg.h>
+#endif
+
 namespace Keelgate {
 
 namespace {
@@ -24,7 +28,7 @@ bool putSet(pid_t process, unsigned which, const void* from, std::size_t size) {
   return ptrace(PTRACE_SETREGSET, process, reinterpret_cast<void*>(std::size_t{which}), &set) == 0;
 }
 
-bool readGeneral(pid_t process, user_regs_struct& general) {
+bool readGeneral(pid_t process, elf_gregset_t& general) {
   iovec set{.iov_base = &general, .iov_len = sizeof general};
   return getSet(process, NT_PRSTATUS, set) && set.iov_len == sizeof general;
 }
@@ -49,7 +53,7 @@ bool writeRegisters(pid_t process, const Registers& registers) {
     return false;
   }
   // The sets of 32-bit code have other sizes, and take a part of these.
-  user_regs_struct now;
+  elf_gregset_t now;
   return readGeneral(process, now) && std::memcmp(&now, &registers.general, sizeof now) == 0;
 }
 
@@ -57,10 +61,10 @@ Registers beforeCall(Registers inCall) {
   // Elsewhere no worker is made rewindable.
 #if defined __x86_64__
   constexpr unsigned long long lengthOfCall = 2;
-  inCall.general.rip -= lengthOfCall;
-  inCall.general.rax = inCall.general.orig_rax;
+  inCall.general[RIP] -= lengthOfCall;
+  inCall.general[RAX] = inCall.general[ORIG_RAX];
   // Not in a call: or the kernel would start it over by itself.
-  inCall.general.orig_rax = ~0ULL;
+  inCall.general[ORIG_RAX] = ~0ULL;
 #endif
   return inCall;
 }

@@ -2,8 +2,8 @@
 /// All registers of a process that is stopped under its tracer, which alone may call this.
 #pragma once
 
+#include <sys/procfs.h>
 #include <sys/types.h>
-#include <sys/user.h>
 
 #include <cstddef>
 #include <vector>
@@ -12,7 +12,7 @@ namespace Keelgate {
 
 struct Registers {
   /// With the segments and their bases.
-  user_regs_struct general;
+  elf_gregset_t general;
   /// x87, vector and mask registers, protection keys, their control words: all that the processor
   /// saves as one block, with the mask of what is in use.
   std::vector<std::byte> extended;

@@ -17,6 +17,7 @@
 #include <gtest/gtest.h>
 #include <poll.h>
 #include <sys/ptrace.h>
+#include <sys/reg.h>
 #include <sys/rseq.h>
 #include <sys/socket.h>
 #include <sys/wait.h>
@@ -87,7 +88,7 @@ State::State(pid_t process) {
 std::string compare(State before, State after) {
   // The kernel writes the number of the processor for each thread, in two places.
   const std::uint64_t sequences =
-      before.registers.general.fs_base + static_cast<std::uint64_t>(__rseq_offset);
+      before.registers.general[FS_BASE] + static_cast<std::uint64_t>(__rseq_offset);
   for (const std::size_t at : {0U, 4U, 20U, 24U}) {
     const std::uint64_t address = sequences + at;
     for (auto* pages : {&before.pages, &after.pages}) {
