@@ -20,7 +20,9 @@
 namespace PropertyList {
 
 struct KnownKeys {
-  const std::string_view* keys;
+  const std::string_view* texts;
+  /// Which text is that of the key at a position.
+  const std::uint16_t* order;
   const std::uint64_t* digests;
   /// Open addressing with 2^bits slots: the position of a key, or `none`.
   const std::uint16_t* slots;
@@ -46,7 +48,7 @@ struct KnownKeys {
   [[gnu::always_inline]] constexpr bool isAt(std::size_t position, std::uint64_t digest,
                                              Text& text) const {
     return digests[position] == digest &&
-           (isWholeKey(digest) || isSameLongKey(keys[position], text()));
+           (isWholeKey(digest) || isSameLongKey(texts[order[position]], text()));
   }
   template <class Text>
   [[gnu::noinline]] constexpr std::size_t findBehind(std::size_t slot, std::uint64_t digest,
@@ -60,35 +62,39 @@ struct KnownKeys {
   }
 };
 
-/// The table of an array of distinct keys, to be kept as a constant beside them.
+/// The table of distinct keys in an order of theirs, to be kept as a constant beside both.
 template <std::size_t count>
 struct KnownKeysTable {
+  using Texts = std::array<std::string_view, count>;
+  using Order = std::array<std::uint16_t, count>;
   // A quarter of the slots are taken at most.
   static constexpr int bits = std::bit_width(4 * count + 1);
   std::array<std::uint64_t, count + 1> digests{};
   std::array<std::uint16_t, std::size_t{1} << bits> slots{};
 
-  constexpr explicit KnownKeysTable(const std::array<std::string_view, count>& keys) {
+  constexpr KnownKeysTable(const Texts& texts, const Order& order) {
     slots.fill(KnownKeys::none);
     for (std::size_t i = 0; i < count; ++i) {
-      digests[i] = keyDigest(keys[i]);
+      digests[i] = keyDigest(texts[order[i]]);
       std::size_t at = keyHash(digests[i], bits);
       while (slots[at] != KnownKeys::none) at = (at + 1) % slots.size();
       slots[at] = static_cast<std::uint16_t>(i);
     }
   }
 
-  constexpr KnownKeys of(const std::array<std::string_view, count>& keys) const {
-    return {keys.data(), digests.data(), slots.data(), bits, static_cast<std::uint32_t>(count)};
+  constexpr KnownKeys of(const Texts& texts, const Order& order) const {
+    return {texts.data(), order.data(), digests.data(),
+            slots.data(), bits,         static_cast<std::uint32_t>(count)};
   }
 };
 
 namespace Detail {
-inline constexpr std::array<std::string_view, 0> noKeys{};
-inline constexpr KnownKeysTable<0> noKeysTable{noKeys};
+inline constexpr KnownKeysTable<0>::Texts noKeys{};
+inline constexpr KnownKeysTable<0>::Order noOrder{};
+inline constexpr KnownKeysTable<0> noKeysTable{noKeys, noOrder};
 }  // namespace Detail
 
 /// For who has no schema.
-inline constexpr KnownKeys noKnownKeys = Detail::noKeysTable.of(Detail::noKeys);
+inline constexpr KnownKeys noKnownKeys = Detail::noKeysTable.of(Detail::noKeys, Detail::noOrder);
 
 }  // namespace PropertyList

@@ -11,9 +11,6 @@
 #include <keelgate/describe.h>
 
 #include <algorithm>
-#include <array>
-#include <cstddef>
-#include <string_view>
 
 namespace VespKeelgateService {
 
@@ -28,17 +25,12 @@ class KeyTable {
   static_assert(keysAreDistinct(), "two fields of a schema travel under one wire key");
 
  public:
-  static constexpr auto keys = [] {
-    std::array<std::string_view, S::CodingKeys::size> all{};
-    for (std::size_t i = 0; i < all.size(); ++i) {
-      all[i] = S::CodingKeys::keys[Keelgate::byType<S>.positions[i]];
-    }
-    return all;
-  }();
-  static constexpr PropertyList::KnownKeysTable<S::CodingKeys::size> table{keys};
+  static constexpr PropertyList::KnownKeysTable<S::CodingKeys::size> table{
+      S::CodingKeys::keys, Keelgate::byType<S>.positions};
 };
 
 template <Keelgate::Schema S>
-constexpr PropertyList::KnownKeys knownKeys = KeyTable<S>::table.of(KeyTable<S>::keys);
+constexpr PropertyList::KnownKeys knownKeys = KeyTable<S>::table.of(S::CodingKeys::keys,
+                                                                    Keelgate::byType<S>.positions);
 
 }  // namespace VespKeelgateService
