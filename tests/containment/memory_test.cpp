@@ -79,8 +79,14 @@ TEST_F(Worker, C13AddressesAreRandom) {
   // Some kernels place programs of 2 MiB and more, as this one is, on bounds of 2 MiB instead of
   // pages. What is shipped is smaller, which the test of the packages sees to.
   const int ofProgram = std::filesystem::file_size(OBEDIENT_SERVICE) < (2U << 20) ? 28 : 19;
+  // The kernel's own constant, whatever it is set to: 18 bits of a stack's pages, 8 in its page.
+#if defined __aarch64__
+  constexpr int ofStack = 26;
+#else
+  constexpr int ofStack = 28;
+#endif
   for (const auto& [what, seen] : differences) {
-    EXPECT_GE(std::popcount(seen), what == 0 ? ofProgram : 28) << what;
+    EXPECT_GE(std::popcount(seen), what == 0 ? ofProgram : what == 1 ? ofStack : 28) << what;
   }
 }
 
