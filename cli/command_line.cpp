@@ -1,7 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
 /// The only file that includes the parser of the command line, which is heavy.
-#include "cli/command_line.h"
-
 #include "cli/commands.h"
 #include "cli/files.h"
 #include "cli/nearest.h"

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-/// What the subcommands do, once the command line is understood. Each says what it has to say on
-/// the console and notes the exit status there; HostError (startFailed) is thrown through.
+/// The command line, and what the subcommands do once it is understood. Each says what it has to
+/// say on the console and notes the exit status there; HostError (startFailed) is thrown through.
 #pragma once
 
 #include "cli/console.h"
@@ -9,6 +9,10 @@
 #include <keelgate/client.h>
 
 namespace Keelgate::CLI {
+
+/// Understands the command line, and does what it asks for. `words` are without the command's own
+/// name. Help is printed; wrong usage is said and noted.
+void run(Array<String> words, std::string_view version, Console& console);
 
 struct UnpackOptions {
   JSON::Subject subject;

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-/// One description, printed twice: as JSON for programs and as tables for people. Neither knows a
-/// record by name.
+/// One description, printed twice: as JSON for programs and as tables for people, by the same
+/// columns. Neither knows a record by name.
 #include "cli/commands.h"
 #include "cli/description.h"
 #include "cli/json_schema.h"
@@ -10,9 +10,58 @@
 
 #include <fmt/format.h>
 
+#include <concepts>
+
 namespace Keelgate::CLI {
 
 namespace {
+
+// ---------------------------------------------------------------------------------- columns
+
+// A row shows its columns one after the other: the heading, the key in JSON, the value, and what
+// people read where there is none.
+
+void eachColumn(const MessageUnpackerRow& row, const auto& show) {
+  show("RECORD", "record", row.record);
+  show("UNPACKER", "unpacker", row.unpacker);
+  show("SCHEMA", "schema", row.schema, "(any)");
+}
+
+void eachColumn(const CommandRow& row, const auto& show) {
+  show("COMMAND", "command", row.command, "any known");
+  show("SCHEMA", "schema", row.schema, "(not decoded)");
+  show("CASE", "case", row.caseName);
+}
+
+void eachColumn(const EnumerationCase& row, const auto& show) {
+  show("NUMBER", "rawValue", row.rawValue);
+  show("NAME", "name", row.name);
+}
+
+/// Schemas say what a message must have, records what they may lack.
+void eachColumn(const FieldRow& row, const auto& show) {
+  show("FIELD", "field", row.name);
+  if (row.key) show("KEY", "key", *row.key);
+  show("TYPE", "type", row.type);
+  show("", row.key ? "required" : "optional", row.required == row.key.has_value());
+}
+
+/// In the overview: sixty tables of fields would bury the rest.
+void eachColumn(const StructTable& table, const auto& show) {
+  show("NAME", "", table.name);
+  show("FIELDS", "", table.fields.size());
+}
+
+/// As in "unknown = 0, timer = 1; any other number: unknown".
+void eachColumn(const EnumerationTable& table, const auto& show) {
+  String cases;
+  for (const EnumerationCase& entry : table.cases) {
+    cases += fmt::format("{}{} = {}", cases.empty() ? "" : ", ", entry.name, entry.rawValue);
+  }
+  if (table.fallback) cases += fmt::format("; any other number: {}", *table.fallback);
+  show("NAME", "", table.name);
+  show("CASES", "", cases);
+}
 
 // ------------------------------------------------------------------------------------- JSON
 
@@ -32,31 +81,18 @@ void writeRows(Writer& out, std::string_view key, const Rows& rows, WriteMembers
   out.endArray();
 }
 
-void writeServices(Writer& out, const Description& what) {
-  writeRows(out, "services", what.services, [&](const ServiceRow& service) {
-    writeField(out, "service", service.service);
-    writeField(out, "unpacker", service.unpacker);
-    writeRows(out, "commands", service.commands, [&](const CommandRow& row) {
-      writeField(out, "command", row.command);
-      writeField(out, "schema", row.schema);
-      writeField(out, "case", row.caseName);
-    });
+template <class Row>
+void writeColumns(Writer& out, std::string_view key, const Array<Row>& rows) {
+  writeRows(out, key, rows, [&](const Row& row) {
+    eachColumn(row, [&](std::string_view, std::string_view member, const auto& value,
+                        std::string_view = {}) { writeField(out, member, value); });
   });
 }
 
-/// Schemas say what a message must have, records what they may lack: one table, two ways to ask.
-void writeTables(Writer& out, std::string_view key, const Array<StructTable>& tables,
-                 Bool schemas) {
+void writeTables(Writer& out, std::string_view key, const Array<StructTable>& tables) {
   out.key(key);
   out.beginObject();
-  for (const StructTable& table : tables) {
-    writeRows(out, table.name, table.fields, [&](const FieldRow& field) {
-      writeField(out, "field", field.name);
-      if (schemas) writeField(out, "key", field.key);
-      writeField(out, "type", field.type);
-      writeField(out, schemas ? "required" : "optional", field.required == schemas);
-    });
-  }
+  for (const StructTable& table : tables) writeColumns(out, table.name, table.fields);
   out.endObject();
 }
 
@@ -78,23 +114,31 @@ void writeEnumerations(Writer& out, const Description& what) {
 
 void writeDescription(Writer& out, const Description& what) {
   out.beginObject();
-  writeRows(out, "messageUnpackers", what.messageUnpackers, [&](const MessageUnpackerRow& row) {
-    writeField(out, "record", row.record);
-    writeField(out, "unpacker", row.unpacker);
-    writeField(out, "schema", row.schema);
+  writeColumns(out, "messageUnpackers", what.messageUnpackers);
+  writeRows(out, "services", what.services, [&](const ServiceRow& service) {
+    writeField(out, "service", service.service);
+    writeField(out, "unpacker", service.unpacker);
+    writeColumns(out, "commands", service.commands);
   });
-  writeServices(out, what);
-  writeRows(out, "commands", what.commands, [&](const EnumerationCase& command) {
-    writeField(out, "rawValue", command.rawValue);
-    writeField(out, "name", command.name);
-  });
-  writeTables(out, "schemas", what.schemas, true);
-  writeTables(out, "records", what.records, false);
+  writeColumns(out, "commands", what.commands);
+  writeTables(out, "schemas", what.schemas);
+  writeTables(out, "records", what.records);
   writeEnumerations(out, what);
   out.endObject();
 }
 
 // ----------------------------------------------------------------------------------- tables
+
+template <class V>
+String cell(std::string_view key, const V& value, std::string_view absent) {
+  if constexpr (isOptional<V>) {
+    return value ? cell(key, *value, absent) : String(absent);
+  } else if constexpr (std::same_as<V, Bool>) {
+    return value ? String(key) : String();
+  } else {
+    return fmt::format("{}", value);
+  }
+}
 
 /// Lays a description out for people.
 class Page {
@@ -108,107 +152,49 @@ class Page {
     }
   }
 
-  /// A table with a row for each element.
-  template <class Rows, class Cells>
-  void table(Array<String> headings, const Rows& rows, const Cells& cells) {
-    Table table(std::move(headings));
-    for (const auto& row : rows) table.add(cells(row));
+  /// A table with a row for each element. Of a single name most are empty, and a heading without
+  /// rows would say nothing.
+  template <class Row>
+  void table(const String& title, const Array<Row>& rows) {
+    if (rows.empty()) return;
+    heading(title);
+    Table table(cells(rows.front(), true));
+    for (const Row& row : rows) table.add(cells(row, false));
     text_ += table.text(width_, colour_);
   }
 
  private:
+  static Array<String> cells(const auto& row, Bool ofHeadings) {
+    Array<String> all;
+    eachColumn(row, [&](std::string_view heading, std::string_view key, const auto& value,
+                        std::string_view absent = {}) {
+      all.push_back(ofHeadings ? String(heading) : cell(key, value, absent));
+    });
+    return all;
+  }
+
   String text_;
   // Asked once, so that a page is of one kind.
   std::size_t width_ = outputWidth();
   Bool colour_ = outputHasColour();
 };
 
-void addUnpackers(Page& page, const Description& what) {
-  // Of a single name most tables are empty, and headings without rows would say nothing.
-  if (what.messageUnpackers.empty()) return;
-  page.heading("Record types");
-  page.table(
-      {"RECORD", "UNPACKER", "SCHEMA"}, what.messageUnpackers,
-      [](const MessageUnpackerRow& row) -> Array<String> {
-        return {String(row.record), String(row.unpacker), String(row.schema.value_or("(any)"))};
-      });
-}
-
-void addServices(Page& page, const Description& what) {
-  for (const ServiceRow& service : what.services) {
-    page.heading(fmt::format("Service {}, by {}", service.service, service.unpacker));
-    page.table({"COMMAND", "SCHEMA", "CASE"}, service.commands,
-               [](const CommandRow& row) -> Array<String> {
-                 return {row.command ? fmt::format("{}", *row.command) : "any known",
-                         String(row.schema.value_or("(not decoded)")), String(row.caseName)};
-               });
-  }
-}
-
-void addCommands(Page& page, const Description& what) {
-  if (what.commands.empty()) return;
-  page.heading("Commands");
-  page.table({"NUMBER", "NAME"}, what.commands, [](const EnumerationCase& row) -> Array<String> {
-    return {fmt::format("{}", row.rawValue), String(row.name)};
-  });
-}
-
-/// In the overview: sixty tables of fields would bury the rest.
-void addNames(Page& page, const String& title, const Array<StructTable>& tables) {
-  page.heading(title);
-  page.table({"NAME", "FIELDS"}, tables, [](const StructTable& table) -> Array<String> {
-    return {String(table.name), fmt::format("{}", table.fields.size())};
-  });
-}
-
-void addFields(Page& page, const Description& what) {
-  for (const StructTable& table : what.schemas) {
-    page.heading(fmt::format("Schema {}", table.name));
-    page.table({"FIELD", "KEY", "TYPE", ""}, table.fields,
-               [](const FieldRow& field) -> Array<String> {
-                 return {String(field.name), String(field.key), field.type,
-                         field.required ? "required" : ""};
-               });
-  }
-  for (const StructTable& table : what.records) {
-    page.heading(fmt::format("Record {}", table.name));
-    page.table({"FIELD", "TYPE", ""}, table.fields, [](const FieldRow& field) -> Array<String> {
-      return {String(field.name), field.type, field.required ? "" : "optional"};
-    });
-  }
-}
-
-/// "unknown = 0, timer = 1; any other number: unknown"
-String casesText(const EnumerationTable& table) {
-  String text;
-  for (const EnumerationCase& entry : table.cases) {
-    text += fmt::format("{}{} = {}", text.empty() ? "" : ", ", entry.name, entry.rawValue);
-  }
-  if (table.fallback) text += fmt::format("; any other number: {}", *table.fallback);
-  return text;
-}
-
-void addEnumerations(Page& page, const Description& what) {
-  if (what.enumerations.empty()) return;
-  page.heading("Enumerations");
-  page.table({"NAME", "CASES"}, what.enumerations,
-             [](const EnumerationTable& table) -> Array<String> {
-               return {String(table.name), casesText(table)};
-             });
-}
-
 String pageText(const Description& what, Bool overview) {
   Page page;
-  addUnpackers(page, what);
-  addServices(page, what);
-  addCommands(page, what);
-  if (overview) {
-    addNames(page, "Schemas", what.schemas);
-    addNames(page, "Records", what.records);
-  } else {
-    addFields(page, what);
+  page.table("Record types", what.messageUnpackers);
+  for (const ServiceRow& service : what.services) {
+    page.table(fmt::format("Service {}, by {}", service.service, service.unpacker),
+               service.commands);
   }
-  addEnumerations(page, what);
+  page.table("Commands", what.commands);
+  if (overview) {
+    page.table("Schemas", what.schemas);
+    page.table("Records", what.records);
+  } else {
+    for (const auto& table : what.schemas) page.table("Schema " + String(table.name), table.fields);
+    for (const auto& table : what.records) page.table("Record " + String(table.name), table.fields);
+  }
+  page.table("Enumerations", what.enumerations);
   // An overview is the only page that does not show all there is.
   if (overview) page.heading("`keelgate describe NAME` shows the fields of one.");
   return std::move(page).take();
@@ -221,7 +207,7 @@ void describe(const Optional<String>& name, DescribeForm form, Console& console)
   // Everything is described and then cut down: one walk, whatever is asked.
   const Description what = name ? describeNamed(all, *name) : all;
   Writer out(JSON::Layout::pretty);
-  if (isEmpty(what)) {
+  if (namesOf(what).empty()) {
     console.complain(
         fmt::format("nothing is called \"{}\"; {}", *name,
                     suggestion(namesOf(all), *name, "`keelgate describe` lists all names")));
@@ -234,9 +220,7 @@ void describe(const Optional<String>& name, DescribeForm form, Console& console)
   }
   if (form == DescribeForm::json) {
     writeDescription(out, what);
-  } else if (!name) {
-    writeReplySchema(out, all);
-  } else if (!writeJsonSchema(out, all, *name)) {
+  } else if (!writeJsonSchema(out, all, name)) {
     console.complain(fmt::format("\"{}\" is not a record: it has no JSON", *name));
     console.note(Status::unusable);
     return;

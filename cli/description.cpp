@@ -40,6 +40,9 @@ class Walk {
     const std::size_t position = section.size();
     section.push_back({.name = typeName<T>(), .fields = {}, .kind = kindOf<T>()});
     Array<FieldRow> fields = fieldsOf<T>(section);
+    if (&section == &to_.records) {
+      for (FieldRow& field : fields) field.key.reset();
+    }
     section[position].fields = std::move(fields);
   }
 
@@ -152,6 +155,18 @@ Array<CommandRow> commandsOf(Walk& walk) {
 /// All commands together.
 constexpr std::string_view commandsName = typeName<CommandType>();
 
+/// Calls `visitor(rows, label...)` for each section, with the members of a row that are names of
+/// it.
+template <class D, class Visitor>
+void eachSection(D& description, Visitor visitor) {
+  visitor(description.messageUnpackers, &MessageUnpackerRow::record, &MessageUnpackerRow::unpacker);
+  visitor(description.services, &ServiceRow::service, &ServiceRow::unpacker);
+  visitor(description.commands, &EnumerationCase::name);
+  visitor(description.schemas, &StructTable::name);
+  visitor(description.records, &StructTable::name);
+  visitor(description.enumerations, &EnumerationTable::name);
+}
+
 /// Who answers it, and how. Empty where the framework does not know it.
 Description describeCommand(const Description& all, UInt64 number) {
   Description chosen;
@@ -193,35 +208,19 @@ Description describeAll() {
 
 Description describeNamed(const Description& all, std::string_view name) {
   if (const Optional<UInt64> number = decimal(name)) return describeCommand(all, *number);
-  // The rows of which one of the labels is the name.
-  const auto named = [&](const auto& rows, auto... labels) {
-    auto chosen = rows;
-    std::erase_if(chosen, [&](const auto& row) { return (... && (row.*labels != name)); });
-    return chosen;
-  };
-  return {
-      .messageUnpackers =
-          named(all.messageUnpackers, &MessageUnpackerRow::record, &MessageUnpackerRow::unpacker),
-      .services = named(all.services, &ServiceRow::service, &ServiceRow::unpacker),
-      .commands = name == commandsName ? all.commands : named(all.commands, &EnumerationCase::name),
-      .schemas = named(all.schemas, &StructTable::name),
-      .records = named(all.records, &StructTable::name),
-      .enumerations = named(all.enumerations, &EnumerationTable::name)};
-}
-
-Bool isEmpty(const Description& description) {
-  return namesOf(description).empty();
+  Description chosen = all;
+  eachSection(chosen, [&](auto& rows, auto... labels) {
+    std::erase_if(rows, [&](const auto& row) { return (... && (row.*labels != name)); });
+  });
+  if (name == commandsName) chosen.commands = all.commands;
+  return chosen;
 }
 
 Array<std::string_view> namesOf(const Description& all) {
   Array<std::string_view> names;
-  for (const auto& row : all.messageUnpackers)
-    names.insert(names.end(), {row.record, row.unpacker});
-  for (const auto& row : all.services) names.insert(names.end(), {row.service, row.unpacker});
-  for (const auto& row : all.commands) names.push_back(row.name);
-  for (const auto& table : all.schemas) names.push_back(table.name);
-  for (const auto& table : all.records) names.push_back(table.name);
-  for (const auto& table : all.enumerations) names.push_back(table.name);
+  eachSection(all, [&](const auto& rows, auto... labels) {
+    for (const auto& row : rows) (names.push_back(row.*labels), ...);
+  });
   if (all.commands.size() > 1) names.push_back(commandsName);
   std::ranges::sort(names);
   // The record of a message unpacker stands among the records too, and services share unpackers.

@@ -43,8 +43,8 @@ struct ServiceRow {
 /// A field of a schema or a record, or a case of a case-keyed enumeration, which is not required.
 struct FieldRow {
   std::string_view name;
-  /// On the wire; of a record's field, which does not travel, its name.
-  std::string_view key;
+  /// On the wire; absent of a record's field, which does not travel.
+  Optional<std::string_view> key;
   /// "string", "uint64", a schema's name, "[data]" and so on.
   String type;
   Bool required;
@@ -85,7 +85,6 @@ Description describeAll();
 /// What is called `name`: a record type, unpacker, service, command, schema, record or enumeration.
 /// One name can stand for several of them. Empty when there is none.
 Description describeNamed(const Description& all, std::string_view name);
-Bool isEmpty(const Description& description);
 
 /// All names, sorted and each once.
 Array<std::string_view> namesOf(const Description& description);

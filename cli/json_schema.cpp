@@ -48,36 +48,41 @@ constexpr Scalar scalars[] = {
 /// A member of an object that is printed.
 struct Member {
   std::string_view name;
-  /// As a field's type.
+  /// As a field's type; empty for one of `texts`.
   std::string_view type;
   Bool required = true;
+  Array<std::string_view> texts = {};
 };
 
-struct ErrorShape {
-  Array<std::string_view> kinds;
-  Array<Member> members;
-};
+Member oneOf(std::string_view name, Array<std::string_view> texts) {
+  return {.name = name, .type = {}, .texts = std::move(texts)};
+}
 
-/// What errors have beside their `kind`.
-Array<ErrorShape> errorShapes() {
+/// The members of each kind of error.
+Array<Array<Member>> errorShapes() {
   using Kind = DecodingError::Kind;
   Array<std::string_view> others;
   for (const EnumerationCase& kind : casesOf<Kind>) {
     if (kind.rawValue != rawValueOf(Kind::keyNotFound)) others.push_back(kind.name);
   }
   return {
-      {{nameOf(Kind::keyNotFound)},
-       {{"key", "string"}, {"codingPath", "codingPath"}, {"description", "string"}}},
-      {others, {{"codingPath", "codingPath"}, {"description", "string"}}},
-      {{"breach"}, {{"domain", "string"}, {"errorType", "string"}, {"keyPath", "string", false}}},
-      {{"unpacking"},
-       {{"domain", "string"},
-        {"code", "int"},
-        {"case", "case"},
-        {"command", "uint64", false},
-        {"service", "string", false}}},
-      {{"host"}, {{"reason", "reason"}, {"description", "string"}}},
-      {{"request"}, {{"description", "string"}}},
+      {oneOf("kind", {nameOf(Kind::keyNotFound)}),
+       {"key", "string"},
+       {"codingPath", "codingPath"},
+       {"description", "string"}},
+      {oneOf("kind", others), {"codingPath", "codingPath"}, {"description", "string"}},
+      {oneOf("kind", {"breach"}),
+       {"domain", "string"},
+       {"errorType", "string"},
+       {"keyPath", "string", false}},
+      {oneOf("kind", {"unpacking"}),
+       {"domain", "string"},
+       {"code", "int"},
+       {"case", "case"},
+       {"command", "uint64", false},
+       {"service", "string", false}},
+      {oneOf("kind", {"host"}), {"reason", "reason"}, {"description", "string"}},
+      {oneOf("kind", {"request"}), {"description", "string"}},
   };
 }
 
@@ -101,14 +106,14 @@ class Schema {
   }
 
   void reply() {
-    out_.key("anyOf");
-    out_.beginArray();
-    for (const std::string_view name : JSON::recordNames()) answer(name);
-    answer(typeName<VespClientMessageResult>());
-    out_.beginObject();
-    object({{"error", "error"}}, [&] { return preface(); });
-    out_.endObject();
-    out_.endArray();
+    Array<Array<Member>> shapes;
+    for (const std::string_view name : JSON::recordNames()) {
+      shapes.push_back({oneOf("record", {name}), {"value", name}});
+    }
+    constexpr std::string_view result = typeName<VespClientMessageResult>();
+    shapes.push_back({oneOf("record", {result}), {"value", result}});
+    shapes.push_back({{"error", "error"}});
+    anyOf(shapes, true);
     end();
   }
 
@@ -139,49 +144,43 @@ class Schema {
     if (std::ranges::find(names_, type) == names_.end()) names_.push_back(type);
   }
 
-  void oneOf(std::string_view key, const Array<std::string_view>& values) {
-    out_.key(key);
-    out_.beginObject();
-    writeField(out_, "enum", values);
-    out_.endObject();
+  void anyOf(const Array<Array<Member>>& shapes, Bool areReplies = false) {
+    out_.key("anyOf");
+    out_.beginArray();
+    for (const Array<Member>& members : shapes) {
+      out_.beginObject();
+      object(members, areReplies);
+      out_.endObject();
+    }
+    out_.endArray();
   }
 
-  /// An object with these members and those that `others` writes, which gives the names of those of
-  /// its own that are required, and no more.
-  template <class Others>
-  void object(const Array<Member>& members, const Others& others) {
+  /// An object with these members and no more, but for what a reply may begin with.
+  void object(const Array<Member>& members, Bool isReply = false) {
     writeField(out_, "type", "object");
     out_.key("properties");
     out_.beginObject();
-    Array<std::string_view> required = others();
+    if (isReply) {
+      out_.key("id");
+      out_.raw("true");
+      out_.key("file");
+      out_.raw(R"({"type":"string"})");
+    }
+    Array<std::string_view> required;
     for (const Member& member : members) {
       out_.key(member.name);
       out_.beginObject();
-      referTo(member.type);
+      if (member.type.empty()) {
+        writeField(out_, "enum", member.texts);
+      } else {
+        referTo(member.type);
+      }
       out_.endObject();
       if (member.required) required.push_back(member.name);
     }
     out_.endObject();
     writeField(out_, "required", required);
     writeField(out_, "additionalProperties", false);
-  }
-
-  Array<std::string_view> preface() {
-    out_.key("id");
-    out_.raw("true");
-    out_.key("file");
-    out_.raw(R"({"type":"string"})");
-    return {};
-  }
-
-  void answer(std::string_view name) {
-    out_.beginObject();
-    object({{"value", name}}, [&] {
-      preface();
-      oneOf("record", {name});
-      return Array<std::string_view>{"record"};
-    });
-    out_.endObject();
   }
 
   void define(std::string_view name) {
@@ -195,7 +194,7 @@ class Schema {
     } else if (enumeration != all_.enumerations.end()) {
       writeField(out_, "enum", namesOf(enumeration->cases));
     } else if (name == "error") {
-      defineError();
+      anyOf(errorShapes());
     } else if (name == "reason") {
       writeField(out_, "enum", namesOf(casesOf<HostError::Reason>));
     } else {
@@ -210,25 +209,11 @@ class Schema {
     for (const FieldRow& field : table.fields) {
       members.push_back({field.name, field.type, field.required});
     }
-    object(members, [] { return Array<std::string_view>(); });
+    object(members);
     if (table.kind == StructTable::Kind::oneOfItsFields) {
       writeField(out_, "minProperties", Int{1});
       writeField(out_, "maxProperties", Int{1});
     }
-  }
-
-  void defineError() {
-    out_.key("anyOf");
-    out_.beginArray();
-    for (const ErrorShape& shape : errorShapes()) {
-      out_.beginObject();
-      object(shape.members, [&] {
-        oneOf("kind", shape.kinds);
-        return Array<std::string_view>{"kind"};
-      });
-      out_.endObject();
-    }
-    out_.endArray();
   }
 
   Writer& out_;
@@ -239,17 +224,17 @@ class Schema {
 
 }  // namespace
 
-Bool writeJsonSchema(Writer& out, const Description& all, std::string_view name) {
-  if (std::ranges::count(all.records, name, &StructTable::name) == 0 &&
-      std::ranges::count(all.enumerations, name, &EnumerationTable::name) == 0) {
+Bool writeJsonSchema(Writer& out, const Description& all, const Optional<String>& name) {
+  if (!name) {
+    Schema(out, all).reply();
+    return true;
+  }
+  if (std::ranges::count(all.records, *name, &StructTable::name) == 0 &&
+      std::ranges::count(all.enumerations, *name, &EnumerationTable::name) == 0) {
     return false;
   }
-  Schema(out, all).value(name);
+  Schema(out, all).value(*name);
   return true;
-}
-
-void writeReplySchema(Writer& out, const Description& all) {
-  Schema(out, all).reply();
 }
 
 }  // namespace Keelgate::CLI

@@ -8,10 +8,8 @@
 namespace Keelgate::CLI {
 
 /// Of the value of a record, an enumeration or a case-keyed one; what it contains stands under
-/// `$defs`. False when nothing that is printed has this name.
-Bool writeJsonSchema(JSON::Writer& out, const Description& all, std::string_view name);
-
-/// Of the reply object, with every record under `$defs`.
-void writeReplySchema(JSON::Writer& out, const Description& all);
+/// `$defs`. Without a name of the reply object, with every record. False when nothing that is
+/// printed has the name.
+Bool writeJsonSchema(JSON::Writer& out, const Description& all, const Optional<String>& name);
 
 }  // namespace Keelgate::CLI

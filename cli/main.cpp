@@ -1,6 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "cli/command_line.h"
-#include "cli/console.h"
+#include "cli/commands.h"
 
 #include <sys/prctl.h>
 #include <sys/resource.h>

@@ -24,16 +24,15 @@ void writeNumber(Writer& out, const PropertyListUID& uid) {
   out.string("0x" + String(text.data(), end));
 }
 
-/// What the two forms share: the containers, and what JSON has a value for.
-template <class WriteValue>
-struct Walk {
+/// Writes a value below its type in the typed form, in place of it in the plain one.
+struct Tree {
   Writer& out;
-  WriteValue writeValue;
+  Bool typed;
 
   void operator()(std::nullptr_t) const { out.raw("null"); }
   void operator()(const Array<PropertyListValue>& elements) const {
     out.beginArray();
-    for (const PropertyListValue& element : elements) writeValue(out, element);
+    for (const PropertyListValue& element : elements) inner(element);
     out.endArray();
   }
   void operator()(const PropertyListSet& set) const { (*this)(set.elements); }
@@ -41,31 +40,30 @@ struct Walk {
     out.beginObject();
     for (const PropertyListEntry& entry : entries) {
       out.key(entry.key);
-      writeValue(out, entry.value);
+      inner(entry.value);
     }
+    out.endObject();
+  }
+  void operator()(Date date) const {
+    // Text has microseconds, and no room for what is outside the calendar.
+    typed ? out.number(date.secondsSinceReferenceDate) : write(out, date);
+  }
+  void operator()(const PropertyListUID& uid) const {
+    if (typed) return writeNumber(out, uid);
+    out.beginObject();
+    out.key("uid");
+    writeNumber(out, uid);
     out.endObject();
   }
   template <class T>
   void operator()(const T& scalar) const {
     write(out, scalar);
   }
-};
 
-struct Plain : Walk<void (*)(Writer&, const PropertyListValue&)> {
-  using Walk::operator();
-  void operator()(const PropertyListUID& uid) const {
-    out.beginObject();
-    out.key("uid");
-    writeNumber(out, uid);
-    out.endObject();
+ private:
+  void inner(const PropertyListValue& value) const {
+    typed ? writeTyped(out, value) : write(out, value);
   }
-};
-
-struct Typed : Walk<void (*)(Writer&, const PropertyListValue&)> {
-  using Walk::operator();
-  // Text has microseconds, and no room for what is outside the calendar.
-  void operator()(Date date) const { out.number(date.secondsSinceReferenceDate); }
-  void operator()(const PropertyListUID& uid) const { writeNumber(out, uid); }
 };
 
 }  // namespace
@@ -83,14 +81,14 @@ void write(Writer& out, const UUID& uuid) {
 }
 
 void write(Writer& out, const PropertyListValue& value) {
-  std::visit(Plain{{out, write}}, value);
+  std::visit(Tree{out, false}, value);
 }
 
 void writeTyped(Writer& out, const PropertyListValue& value) {
   out.beginObject();
   writeField(out, "type", PropertyListValue::caseNames[value.index()]);
   out.key("value");
-  std::visit(Typed{{out, writeTyped}}, value);
+  std::visit(Tree{out, true}, value);
   out.endObject();
 }
 
