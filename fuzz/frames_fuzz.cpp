@@ -25,7 +25,8 @@ std::optional<ReplyParser> parsed(Bytes reply, std::size_t step, ReplyParser::St
   state = ReplyParser::State::incomplete;
   for (std::size_t have = 0; have < reply.size() && state == ReplyParser::State::incomplete;) {
     have = std::min(have + step, reply.size());
-    const Bytes received = reply.first(have);
+    // A copy of exact size: what lies behind it has not arrived.
+    const Data received(reply.begin(), reply.begin() + static_cast<std::ptrdiff_t>(have));
     state = parser.parse(received);
     if (state == ReplyParser::State::incomplete) {
       require(parser.needed() > have, "an incomplete reply needs more than there is");
@@ -44,12 +45,10 @@ void checkReply(Bytes reply, std::size_t step) {
   ReplyParser::State state{};
   const auto whole = parsed(reply, reply.size() + 1, state);
   if (!whole) return;
+  require(whole->kind() == ReplyKind::record || whole->kind() == ReplyKind::error,
+          "a reply is a record or an error");
   const auto inPieces = parsed(reply, step, state);
-  if (!inPieces) {
-    // Honest only from its first byte to its last: what stands behind a reply came too early.
-    require(state == ReplyParser::State::malformed, "pieces of a whole reply are not incomplete");
-    return;
-  }
+  require(inPieces.has_value(), "a whole reply is one in pieces, too");
   Data again;
   for (const String& line : whole->log()) {
     appendReplyFrame(again, 7, ReplyKind::log, std::as_bytes(std::span(line)));

@@ -111,8 +111,24 @@ void addMessage(Folder& folder, std::size_t which, const std::vector<std::uint8_
   if (!messages.empty()) addRequest(folder, target, messages.front());
 }
 
-void addControlFrames(Folder& folder) {
+/// Beside an honest frame those that are not: one byte of its head is another, one is missing, one
+/// is too many.
+void addFrame(Folder& folder, Data seed) {
+  folder.add("frames_fuzz", seed);
+  for (std::size_t at = 2; at < 2 + sizeof(Protocol::ReplyHeader); ++at) {
+    seed[at] ^= std::byte{1};
+    folder.add("frames_fuzz", seed);
+    seed[at] ^= std::byte{1};
+  }
+  seed.push_back({});
+  folder.add("frames_fuzz", seed);
+  seed.resize(seed.size() - 2);
+  folder.add("frames_fuzz", seed);
+}
+
+void addFrames(Folder& folder) {
   using Protocol::ControlKind;
+  using Protocol::ReplyKind;
   for (auto kind = static_cast<int>(ControlKind::hello);
        kind <= static_cast<int>(ControlKind::refused); ++kind) {
     const auto frame = Protocol::makeControlFrame(static_cast<ControlKind>(kind), 3, {1, 2, 0, 0});
@@ -120,7 +136,20 @@ void addControlFrames(Folder& folder) {
       Data seed{std::byte{1}, hasDescriptor};
       const Bytes bytes = std::as_bytes(std::span(&frame, 1));
       seed.insert(seed.end(), bytes.begin(), bytes.end());
-      folder.add("frames_fuzz", seed);
+      addFrame(folder, seed);
+    }
+  }
+  for (const bool isLast : {false, true}) {
+    Data reply(2);
+    for (int i = 0; i < 2 * isLast; ++i) {
+      Protocol::appendReplyFrame(reply, 7, ReplyKind::log, Data(5));
+    }
+    Protocol::appendReplyFrame(reply, 7, ReplyKind::record, Data(20), isLast);
+    addFrame(folder, reply);
+    // In pieces of every size.
+    for (std::size_t step = 1; step < reply.size(); ++step) {
+      reply[1] = static_cast<std::byte>(step);
+      folder.add("frames_fuzz", reply);
     }
   }
 }
@@ -183,7 +212,7 @@ int main(int count, char** arguments) try {
       addMessage(folder, which, input);
     }
   }
-  addControlFrames(folder);
+  addFrames(folder);
   folder.addText("keys.dict", dictionary());
   return 0;
 } catch (const std::exception& problem) {

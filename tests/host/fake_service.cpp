@@ -74,8 +74,7 @@ void obey(Bytes script, std::uint32_t sequence) {
   }
 }
 
-[[noreturn]] void work(std::uint64_t messages, bool early) {
-  if (early) writeFrame(0, {});
+[[noreturn]] void work(std::uint64_t messages) {
   for (std::uint64_t i = 0; i < messages; ++i) {
     RequestHeader header;
     if (!readAll(channel, std::as_writable_bytes(std::span(&header, 1)))) break;
@@ -127,7 +126,7 @@ struct Zygote {
       prctl(PR_SET_PDEATHSIG, SIGKILL);
       dup2(descriptor, channel);
       for (int other = channel + 1; other < 64; ++other) close(other);
-      work(messages, manner == "early");
+      work(messages);
     }
     close(descriptor);
     slots[pid] = slot;

@@ -9,6 +9,8 @@
 
 #include <fcntl.h>
 #include <poll.h>
+#include <sys/socket.h>
+#include <sys/un.h>
 
 #include <algorithm>
 #include <atomic>
@@ -27,6 +29,16 @@ using std::chrono::steady_clock;
 inline String temporaryPath(const String& name) {
   return std::filesystem::temp_directory_path() /
          ("keelgate-" + std::to_string(getpid()) + '-' + name);
+}
+
+/// A socket that has the path, for which nobody listens yet.
+inline int boundTo(const String& path) {
+  sockaddr_un address{};
+  address.sun_family = AF_UNIX;
+  path.copy(address.sun_path, sizeof address.sun_path - 1);
+  const int listener = socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC, 0);
+  if (bind(listener, reinterpret_cast<sockaddr*>(&address), sizeof address) != 0) abort();
+  return listener;
 }
 
 /// The fake service under a name that tells it how to start.

@@ -122,21 +122,6 @@ TEST_P(Hostile, EveryAttackHasItsOutcomeInTimeAndCostsItsLayout) {
   }
 }
 
-TEST_P(Hostile, WhatComesBehindTheAnswerCostsTheLayoutToo) {
-  Client client(options(fakeOptions()));
-  const Script good = Script().answer(1);
-  std::vector<Script> scripts{Script(good).then(Op::raise, SIGSEGV),
-                              Script(good).then(Op::raise, SIGKILL)};
-  // A worker that gets no other message is not listened to.
-  if (GetParam() > 1) scripts.push_back(Script(good).then(Op::pause, 20).write(Data(3)));
-  for (const Script& script : scripts) {
-    const pid_t before = zygoteOf(client);
-    EXPECT_EQ(Host::outcomeOf(client, script), "record 1");
-    usleep(200'000);
-    EXPECT_TRUE(comesTrue([&] { return zygoteOf(client) != before; }));
-  }
-}
-
 /// Each worker counts the messages that it was given. One that has taken much is not used again:
 /// what it was given besides goes to the next.
 TEST(C6, AWorkerSeesOneMessageUnlessMoreAreAllowed) {
@@ -163,15 +148,6 @@ TEST(C6, AWorkerSeesOneMessageUnlessMoreAreAllowed) {
     }
     EXPECT_EQ(counts, expected);
   }
-}
-
-TEST(C8, WorkersThatSpeakBeforeTheyAreAskedAreNotBelieved) {
-  Client client(fakeOptions("early"));
-  // What comes after the message can't be told from its answer: a worker must be early.
-  EXPECT_TRUE(comesTrue([&] {
-    usleep(100'000);
-    return Host::outcomeOf(client, Script().answer(7)) == "protocolViolation";
-  }));
 }
 
 TEST(C8, LogLinesSteerNoTerminalAndCannotEndTheApplication) {

@@ -8,7 +8,6 @@
 
 #include <pthread.h>
 
-#include <array>
 #include <deque>
 #include <future>
 
@@ -17,7 +16,6 @@ namespace {
 
 using std::chrono::seconds;
 using Permit = FairSemaphore::Permit;
-using State = ServiceProcess::State;
 
 const Script fault = Script().then(Op::raise, SIGSEGV);
 
@@ -78,109 +76,6 @@ TEST(C14, GiantsLeaveRoomForSmallMessages) {
   for (int i = 0; i < 2; ++i) client.start<VespCommandResponse>({.message = giant}, never);
   client.dispatch();
   EXPECT_EQ(outcomeOf(client, Script().answer(1)), "record 1");
-}
-
-class Supervised : public testing::Test {
- protected:
-  Supervisor::Service running() {
-    auto service = supervisor_.demand(deadlineAfter(seconds(10)));
-    for (; std::holds_alternative<Wait>(service);
-         service = supervisor_.demand(deadlineAfter(seconds(10)))) {
-      waitFor(std::get<Wait>(service));
-    }
-    return std::get<Supervisor::Service>(service);
-  }
-
-  DescriptorRegistry registry_{64};
-  ServiceSettings settings_{.path = fakeService(),
-                            .socket = {},
-                            .socketUser = {},
-                            .requireLayers = false,
-                            .forks = false,
-                            .messagesPerWorker = 1,
-                            .cpuSecondsPerWorker = 5,
-                            .maximumWorkers = 3};
-  Supervisor supervisor_{settings_, [](std::string_view) {}, registry_};
-};
-
-/// One that does not see its channel closed, and was stopped: that it is killed is the last means.
-TEST_F(Supervised, AServiceHasTimeToEndAndIsAskedTo) {
-  settings_.path = fakeService("stuck");
-  ServiceProcess service(settings_, registry_);
-  const auto isRunning = [&] {
-    return service.readNews(), service.state() == State::running;
-  };
-  EXPECT_TRUE(comesTrue(isRunning));
-  kill(*children().begin(), SIGSTOP);
-  const auto start = Clock::now();
-  const ServiceProcess::Patience patience{
-      .closed = milliseconds(200), .asked = seconds(60), .killed = seconds(60)};
-  EXPECT_TRUE(comesTrue([&] { return service.end(patience); }));
-  EXPECT_GE(Clock::now() - start, patience.closed);
-}
-
-TEST_F(Supervised, ALayoutIsGivenUpAfterSoManyReplies) {
-  const Supervisor::Service first = running();
-  EXPECT_TRUE(supervisor_.isCurrent(first.get()));
-  // As long as there is no other, this one stays.
-  for (std::uint64_t i = 0; i <= repliesPerLayout; ++i) supervisor_.noteReply(*first);
-  supervisor_.tidy();
-  EXPECT_EQ(first->state(), State::running);
-  EXPECT_TRUE(comesTrue([&] {
-    supervisor_.noteReply(*first);
-    return first->state() == State::retired;
-  }));
-  EXPECT_NE(running(), first);
-  EXPECT_FALSE(supervisor_.isCurrent(first.get()));
-}
-
-/// Each death before a first answer makes the wait longer, and an answer ends that.
-TEST_F(Supervised, AServiceThatDiesIsReplacedAtOnceAsLongAsAnswersCome) {
-  const auto start = Clock::now();
-  for (int i = 0; i < 8; ++i) {
-    const Supervisor::Service service = running();
-    if (i % 3 == 2) supervisor_.noteReply(*service);
-    for (const pid_t child : children()) kill(child, SIGKILL);
-    EXPECT_TRUE(comesTrue([&] { return service->readNews(), service->state() != State::running; }));
-  }
-  EXPECT_LT(Clock::now() - start, seconds(5));
-}
-
-/// The slots are few. Whoever has answered is given its time, unless one was killed since it
-/// stayed.
-TEST_F(Supervised, OneThatStayedMakesTheOthersGoAtOnce) {
-  using Leaving = ServiceProcess::Leaving;
-  const Supervisor::Service service = running();
-  const auto workers = [zygote = *children().begin()] {
-    return children(zygote).size();
-  };
-  std::array<Optional<ServiceProcess::Forked>, 3> forked;
-  const auto fill = [&] {
-    for (auto& worker : forked) {
-      EXPECT_TRUE(comesTrue([&] {
-        service->readNews();
-        if (!worker) worker = service->fork(1000);
-        return worker.has_value();
-      }));
-    }
-  };
-  const auto goesAtOnceAfter = [&](Leaving how) {
-    fill();
-    service->release(forked[0]->slot, how);
-    EXPECT_TRUE(comesTrue([&] { return service->readNews(), workers() == 2; }));
-    forked[0].reset();
-    fill();
-    service->release(forked[1]->slot, Leaving::byItself);
-    EXPECT_FALSE(service->fork(1000));
-    usleep(30'000);
-    const bool isGone = workers() == 2;
-    forked[1].reset();
-    return isGone;
-  };
-  EXPECT_FALSE(goesAtOnceAfter(Leaving::killed));
-  // A machine that is busy may take longer than anybody is impatient.
-  EXPECT_TRUE(comesTrue([&] { return goesAtOnceAfter(Leaving::byItself); }));
-  EXPECT_EQ(service->state(), State::running);
 }
 
 TEST(Supervision, AServiceThatCannotLiveIsTriedLessAndLess) {
