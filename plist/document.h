@@ -55,9 +55,15 @@ class Value {
   bool boolean() const { return expect(Type::boolean).bits != 0; }
   Integer integer() const {
     const Node& node = expect(Type::integer);
-    return {node.bits, node.has(Node::negative)};
+    if (node.count == 0) return {node.bits, node.has(Node::negative)};
+    const std::uint64_t bits = store_->number(node);
+    // The narrow ones have no sign.
+    return {bits, node.count == 8 && bits >> 63 != 0};
   }
-  double real() const { return std::bit_cast<double>(expect(Type::real).bits); }
+  double real() const {
+    const Node& node = expect(Type::real);
+    return std::bit_cast<double>(node.count == 0 ? node.bits : store_->number(node));
+  }
   // Seconds since 2001-01-01T00:00:00Z, finite.
   double date() const { return std::bit_cast<double>(expect(Type::date).bits); }
   // Valid UTF-8.

@@ -93,6 +93,11 @@ struct Store {
     return Cursor::textAt(message, node.position(), node.count);
   }
 
+  /// Of a number that the reader has left in the message.
+  std::uint64_t number(const Node& node) const noexcept {
+    return Cursor::bigEndianAt(message, node.position(), node.count);
+  }
+
   /// Of a key by its number.
   std::uint64_t digest(std::uint32_t number) const noexcept {
     return number > known->count ? otherKey(number).digest : known->digests[number - 1];

@@ -29,9 +29,11 @@ namespace Keelgate::Transport {
 
 // ---------------------------------------------------------------------------------- writing
 
-// Declared before its special cases: they and it call one another.
+// Declared before its special cases: they and it call one another. Texts and data that are written
+// are given back at once, field by field in the order by type: a destructor that comes to them in
+// the order as declared has jumps that no processor foresees.
 template <class T>
-void write(Writer& to, const T& value);
+void write(Writer& to, T& value);
 
 /// Whether a field may be absent.
 template <class V>
@@ -89,11 +91,14 @@ constexpr auto codingsOf = [] {
 
 template <class T>
 struct Writing {
-  using Function = void (*)(Writer& to, const T& record, std::size_t position);
+  using Function = void (*)(Writer& to, T& record, std::size_t position);
   template <class V>
-  static void field(Writer& to, const T& record, std::size_t position) {
-    const V& member = record.*membersOf<T, V>.data()[position];
-    if constexpr (isOptional<V>) {
+  static void field(Writer& to, T& record, std::size_t position) {
+    V& member = record.*membersOf<T, V>.data()[position];
+    if constexpr (std::same_as<V, Optional<String>> || std::same_as<V, Optional<Data>>) {
+      write(to, *member);
+      if (!Writer::borrows(member->size())) member.reset();
+    } else if constexpr (isOptional<V>) {
       write(to, *member);
     } else {
       write(to, member);
@@ -102,7 +107,7 @@ struct Writing {
 };
 
 template <class T>
-void writeRecord(Writer& to, const T& record) {
+void writeRecord(Writer& to, T& record) {
   const auto present = presentIn(record);
   for (std::size_t i = 0; i < presenceWords<T>; ++i) to.word(present.words()[i]);
   present.each([&](std::size_t place) {
@@ -113,13 +118,13 @@ void writeRecord(Writer& to, const T& record) {
 
 /// Behind its count, which the reader holds against the bytes that follow.
 template <class T>
-requires(isArray<Array<T>>) void write(Writer& to, const Array<T>& values) {
+requires(isArray<Array<T>>) void write(Writer& to, Array<T>& values) {
   to.word(values.size());
-  for (const T& value : values) write(to, value);
+  for (T& value : values) write(to, value);
 }
 
 template <class T>
-void write(Writer& to, const T& value) {
+void write(Writer& to, T& value) {
   if constexpr (std::same_as<T, std::nullptr_t>) {
     // Its case says it all.
   } else if constexpr (std::same_as<T, Bool>) {
@@ -139,7 +144,7 @@ void write(Writer& to, const T& value) {
   } else if constexpr (CaseKeyed<T>) {
     // A byte is enough: the largest of these enumerations has twelve cases.
     to.byte(static_cast<std::uint8_t>(value.index()));
-    std::visit([&](const auto& payload) { write(to, payload); }, value);
+    std::visit([&](auto& payload) { write(to, payload); }, value);
   } else {
     writeRecord(to, value);
   }
@@ -282,7 +287,7 @@ Body lendRecord(T record) {
 }
 /// The same in one piece.
 template <Record T>
-Data encodeRecord(const T& record) {
+Data encodeRecord(T record) {
   Writer to;
   write(to, record);
   return std::move(to).take().joined();

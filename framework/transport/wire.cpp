@@ -17,9 +17,6 @@ constexpr std::size_t smallestBlock = 32;
 
 constexpr unsigned readsPerClock = 1024;
 
-/// What is longer costs more to copy than to be written by a call of its own.
-constexpr std::size_t copiedOctets = std::size_t{16} << 10;
-
 }  // namespace
 
 std::size_t Body::size() const noexcept {
@@ -38,7 +35,7 @@ Data Body::joined() && {
 
 void Writer::octets(Bytes value) {
   word(value.size());
-  if (value.size() > copiedOctets) {
+  if (borrows(value.size())) {
     loans_.push_back({.position = size_, .octets = value});
   } else if (!value.empty()) {
     std::memcpy(room(value.size()), value.data(), value.size());

@@ -84,6 +84,8 @@ class Writer {
   void byte(std::uint8_t value) { *room(1) = std::byte{value}; }
   /// As it lies in memory.
   void word(std::uint64_t value) { std::memcpy(room(sizeof value), &value, sizeof value); }
+  /// What is longer costs more to copy than to be written by a call of its own.
+  static constexpr bool borrows(std::size_t size) { return size > std::size_t{16} << 10; }
   /// Behind their length, so that no octet needs escaping. Long ones are borrowed.
   void octets(Bytes value);
   void text(std::string_view value) {

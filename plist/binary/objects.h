@@ -7,8 +7,6 @@
 #include "plist/store.h"
 
 #include <array>
-#include <bit>
-#include <cmath>
 #include <cstddef>
 #include <cstdint>
 #include <string_view>
@@ -18,25 +16,35 @@ namespace PropertyList {
 /// What a binary message begins with.
 inline constexpr std::string_view magic = "bplist00";
 
-/// What a first byte says of an object that has no length: its type, how many bytes follow, and the
-/// bits of its value that stand in none of them. Null where it says something else.
-struct Fixed {
+/// What a first byte says of an object that is read at one glance. Numbers are left where they
+/// stand until somebody asks for them: most of the work is then done where fields of one type
+/// follow one another.
+struct Glance {
+  /// Null for any other object.
   Type type = Type::null;
-  std::uint8_t width = 0;
-  std::uint8_t bits = 0;
-  bool isSigned = false;
+  /// How many bytes it has.
+  std::uint8_t length = 0;
+  /// Ones where that many follow as an integer of one byte says.
+  std::uint8_t follows = 0;
+  /// Ones where its bytes are claimed, and where they have to be ASCII.
+  std::uint8_t claims = 0;
+  std::uint8_t ascii = 0;
 };
 
-inline constexpr auto fixedObjects = [] {
-  std::array<Fixed, 256> all{};
-  all[0x08] = {.type = Type::boolean};
-  all[0x09] = {.type = Type::boolean, .bits = 1};
-  all[0x10] = {.type = Type::integer, .width = 1};
-  all[0x11] = {.type = Type::integer, .width = 2};
-  all[0x12] = {.type = Type::integer, .width = 4};
-  all[0x13] = {.type = Type::integer, .width = 8, .isSigned = true};
-  all[0x23] = {.type = Type::real, .width = 8};
-  all[0x33] = {.type = Type::date, .width = 8};
+inline constexpr auto glances = [] {
+  constexpr std::uint8_t ones = 0xff;
+  std::array<Glance, 256> all{};
+  all[0x10] = {.type = Type::integer, .length = 1};
+  all[0x11] = {.type = Type::integer, .length = 2};
+  all[0x12] = {.type = Type::integer, .length = 4};
+  all[0x13] = {.type = Type::integer, .length = 8};
+  all[0x23] = {.type = Type::real, .length = 8};
+  for (std::uint8_t i = 0; i < 0xf; ++i) {
+    all[0x40U + i] = {.type = Type::data, .length = i, .claims = ones};
+    all[0x50U + i] = {.type = Type::string, .length = i, .claims = ones, .ascii = ones};
+  }
+  all[0x4f] = {.type = Type::data, .follows = ones, .claims = ones};
+  all[0x5f] = {.type = Type::string, .follows = ones, .claims = ones, .ascii = ones};
   return all;
 }();
 
@@ -98,21 +106,23 @@ struct Objects {
     node = {.bits = start, .count = length, .type = Type::string, .flags = Node::read};
     return digest;
   }
-  /// Reads an object that has no length and begins with these bytes. False for any other, and for
-  /// what is wrong with one.
-  [[gnu::always_inline]] bool readFixed(std::uint64_t head, std::size_t offset,
+  /// Reads one of the commonest objects. False for any other, and for what is wrong with one. There
+  /// are few branches that could not be foreseen: what does not apply is computed, and masked.
+  [[gnu::always_inline]] bool readShort(std::size_t offset, std::uint64_t& claimable,
                                         Node& node) const noexcept {
-    const Fixed fixed = fixedObjects.data()[head >> 56];
-    if (fixed.type == Type::null || offset + 1 + fixed.width > tableStart) return false;
-    const std::uint64_t word = Cursor::bigEndianAt(message, offset + 1, 8);
-    // Shifted in two steps: of no bytes, by all 64 bits.
-    const unsigned half = 32U - 4U * fixed.width;
-    const std::uint64_t bits = word >> half >> half | fixed.bits;
-    if (fixed.type == Type::date && !std::isfinite(std::bit_cast<double>(bits))) return false;
-    const bool isNegative = fixed.isSigned & (bits >> 63 != 0);
-    node = {.bits = bits,
-            .type = fixed.type,
-            .flags = static_cast<std::uint8_t>(Node::read | (isNegative ? Node::negative : 0))};
+    const auto byte = [this](std::size_t at) {
+      return std::to_integer<std::uint32_t>(message.data()[at]);
+    };
+    const Glance& form = glances.data()[byte(offset)];
+    const std::uint32_t follows = form.follows;
+    const std::uint32_t length = form.length | (byte(offset + 2) & follows);
+    const std::size_t start = offset + 1 + (follows & 2);
+    const std::uint32_t claimed = length & form.claims;
+    if (form.type == Type::null || start + length > tableStart || claimed > claimable) return false;
+    const std::uint32_t otherCount = (byte(offset + 1) ^ 0x10) & follows;
+    if ((Cursor::highBitsAt(message, start, length & form.ascii) | otherCount) != 0) return false;
+    claimable -= claimed;
+    node = {.bits = start, .count = length, .type = form.type, .flags = Node::read};
     return true;
   }
 };

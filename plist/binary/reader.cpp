@@ -44,8 +44,6 @@ class BinaryReader {
   void leave(const Frame& frame);
   void readOtherKey(std::uint32_t number, std::size_t position);
   [[gnu::always_inline]] inline bool load(const Objects& objects, std::uint32_t number);
-  [[gnu::always_inline]] inline bool readShort(const Objects& objects, std::size_t offset,
-                                               Node& node) noexcept;
   void open(std::uint32_t number);
   void revisit(Node& node, std::size_t position);
   Node readObject(std::size_t offset);
@@ -190,38 +188,10 @@ void BinaryReader::leave(const Frame& frame) {
 bool BinaryReader::load(const Objects& objects, std::uint32_t number) {
   const std::size_t offset = objects.offset(number);
   Node& node = objects.nodes[number];
-  if (readShort(objects, offset, node)) return false;
+  if (objects.readShort(offset, claimable_, node)) return false;
   node = readObject(offset);
   node.set(Node::read);
   return node.has(Node::open);
-}
-
-/// The commonest objects in few instructions, and few branches that could not be foreseen: texts
-/// and data of a length below 256, integers, reals, dates and booleans. False for any other, and
-/// for what is wrong with one of these: that is for readObject to tell.
-bool BinaryReader::readShort(const Objects& objects, std::size_t offset, Node& node) noexcept {
-  const std::uint64_t head = Cursor::bigEndianAt(objects.message, offset, 8);
-  const auto low = static_cast<std::uint32_t>(head >> 56) & 0xf;
-  if (head >> 61 == 2) {
-    // Where the length follows, it is an integer of one byte here.
-    const bool isLong = low == 0xf;
-    const bool isString = (head >> 60 & 1) != 0;
-    const std::size_t start = offset + 1 + 2 * std::size_t{isLong};
-    const std::uint32_t length = isLong ? static_cast<std::uint32_t>(head >> 40 & 0xff) : low;
-    if (start + length > objects.tableStart || length > claimable_) return false;
-    // Of what does not apply, nothing is kept.
-    const std::uint64_t otherCount = ((head >> 48 & 0xff) ^ 0x10) & -std::uint64_t{isLong};
-    const std::uint64_t highBits =
-        Cursor::highBitsAt(objects.message, start, length) & -std::uint64_t{isString};
-    if ((otherCount | highBits) != 0) return false;
-    claimable_ -= length;
-    node = {.bits = start,
-            .count = length,
-            .type = isString ? Type::string : Type::data,
-            .flags = Node::read};
-    return true;
-  }
-  return objects.readFixed(head, offset, node);
 }
 
 /// Makes a container that was read the innermost frame.

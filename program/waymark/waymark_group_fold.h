@@ -1,9 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
-/// A check-in whose numbered recipient fields are decoded where the record has them: in one record
-/// for each group.
+/// A check-in whose fields are decoded where the record has them: each in the member with its name,
+/// the numbered ones in the record of their group.
 ///
-/// Goes by the fields' names, which are the wire keys, so that the 124 numbered fields need no list
-/// of their own that could differ from the schema's.
+/// Goes by the fields' names, which are the wire keys, so that the 153 fields need no list of their
+/// own that could differ from the schema's.
 #pragma once
 
 #include "program/schema/fields_into.h"
@@ -19,18 +19,29 @@
 
 namespace VespKeelgateService {
 
-/// Has the groups 2 to 32, each exactly once, also where all their fields are absent. The numbered
-/// fields of the schema stay empty.
-struct FoldedCheckIn {
-  WaymarkSchema fields{};
-  Array<Keelgate::WaymarkGroupFields> groups = numberedGroups();
+/// The fields that the record has as enumerations. Plain numbers until all is decoded.
+struct WaymarkCodes {
+  KEELGATE_SCHEMA(WaymarkCodes,
+      (UInt, messageType),
+      (Optional<UInt>, sessionType),
+      (Optional<UInt>, sessionDestinationType),
+      (Optional<UInt>, lowPowerModeWarningState),
+      (Optional<UInt>, referenceFrame),
+      (Optional<UInt>, triggerType));
+};
 
+/// Has the groups 2 to 32, each exactly once, also where all their fields are absent. The codes of
+/// the message are not set.
+struct FoldedCheckIn {
   static constexpr UInt first = 2;
   static constexpr UInt last = 32;
-  static Array<Keelgate::WaymarkGroupFields> numberedGroups() {
-    Array<Keelgate::WaymarkGroupFields> groups(last - first + 1);
+
+  Keelgate::WaymarkMessage message{};
+  WaymarkCodes codes{};
+
+  FoldedCheckIn() {
+    auto& groups = message.groupFields.emplace(last - first + 1);
     for (UInt number = first; number <= last; ++number) groups[number - first].groupNumber = number;
-    return groups;
   }
 };
 
@@ -66,7 +77,7 @@ struct Place {
 };
 
 /// By the position of the field; made by the compiler.
-inline constexpr auto places = [] {
+inline constexpr auto numbered = [] {
   constexpr auto& names = WaymarkSchema::CodingKeys::names;
   std::array<Place, WaymarkSchema::CodingKeys::size> all{};
   for (std::size_t i = 0; i < names.size(); ++i) {
@@ -79,7 +90,35 @@ inline constexpr auto places = [] {
   }
   return all;
 }();
-static_assert(std::ranges::count_if(places,
+
+/// The members of T that are of type V, by the position of the check-in's field with their name.
+template <class T, class V>
+constexpr auto namesakes = [] {
+  constexpr auto& names = WaymarkSchema::CodingKeys::names;
+  std::array<V T::*, WaymarkSchema::CodingKeys::size> members{};
+  Keelgate::FieldsOf<T>::each([&]<class Value>(Keelgate::Field<T, Value> field) {
+    if constexpr (std::same_as<Value, V>) {
+      const auto name = std::ranges::find(names, field.name);
+      members.at(static_cast<std::size_t>(name - names.begin())) = field.member;
+    }
+  });
+  return members;
+}();
+
+constexpr bool everyFieldHasOnePlace() {
+  std::size_t position = 0;
+  bool isSo = true;
+  WaymarkSchema::CodingKeys::each([&]<class V>(Keelgate::Field<WaymarkSchema, V>) {
+    const int places = (numbered[position].to != nullptr) +
+                       (namesakes<Keelgate::WaymarkMessage, V>[position] != nullptr) +
+                       (namesakes<WaymarkCodes, V>[position] != nullptr);
+    isSo = isSo && places == 1;
+    ++position;
+  });
+  return isSo;
+}
+static_assert(everyFieldHasOnePlace());
+static_assert(std::ranges::count_if(numbered,
                                     [](const Place& place) { return place.to != nullptr; }) ==
                   (FoldedCheckIn::last - FoldedCheckIn::first + 1) * std::size(families),
               "not every group has all of its fields");
@@ -91,11 +130,16 @@ struct Places<FoldedCheckIn> {
   using Listed = WaymarkSchema;
   template <class V>
   static V& at(FoldedCheckIn& checkIn, std::size_t position) {
+    using Keelgate::WaymarkMessage;
     if constexpr (std::same_as<V, Optional<String>>) {
-      const Fold::Place& place = Fold::places.data()[position];
-      if (place.to != nullptr) return checkIn.groups[place.group].*place.to;
+      const Fold::Place& place = Fold::numbered.data()[position];
+      if (place.to != nullptr) return (*checkIn.message.groupFields)[place.group].*place.to;
     }
-    return checkIn.fields.*membersOf<WaymarkSchema, V>[position];
+    if constexpr (std::same_as<V, UInt> || std::same_as<V, Optional<UInt>>) {
+      const auto code = Fold::namesakes<WaymarkCodes, V>.data()[position];
+      if (code != nullptr) return checkIn.codes.*code;
+    }
+    return checkIn.message.*Fold::namesakes<WaymarkMessage, V>.data()[position];
   }
 };
 
