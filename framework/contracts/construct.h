@@ -11,7 +11,6 @@
 #include <keelgate/type_name.h>
 
 #include <string_view>
-#include <utility>
 
 namespace Keelgate {
 

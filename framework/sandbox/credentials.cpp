@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "framework/sandbox/credentials.h"
+#include "framework/sandbox/steps.h"
 
 #include "framework/contracts/start_step.h"
 #include "framework/sandbox/namespaces.h"

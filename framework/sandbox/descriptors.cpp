@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "framework/sandbox/descriptors.h"
+#include "framework/sandbox/steps.h"
 
 #include "framework/contracts/process.h"
 #include "framework/contracts/start_step.h"

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "framework/sandbox/empty_root.h"
+#include "framework/sandbox/steps.h"
 
 #include <sys/mount.h>
 #include <sys/syscall.h>

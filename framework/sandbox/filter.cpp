@@ -3,7 +3,6 @@
 
 #include "framework/contracts/process.h"
 #include "framework/contracts/start_step.h"
-#include "framework/sandbox/architecture.h"
 #include "framework/sandbox/page_scan.h"
 #include "framework/sandbox/processes.h"
 #include "framework/sandbox/rewinding.h"

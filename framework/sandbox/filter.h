@@ -5,12 +5,33 @@
 /// calling convention. Everything here is single-threaded; a compiled filter may be shared.
 #pragma once
 
+#include <linux/audit.h>
 #include <linux/filter.h>
 #include <linux/seccomp.h>
+#include <bit>
 #include <span>
 #include <vector>
 
 namespace Keelgate::Sandbox {
+
+/// The calling convention that is let in. Each architecture has others with numbers of their own:
+/// `int 0x80` on x86-64, 32-bit programs on arm64. A filter need not know more of its architecture:
+/// the tables have the kernel's own names, and none that only some architectures have.
+#if defined __x86_64__
+inline constexpr unsigned nativeCalls = AUDIT_ARCH_X86_64;
+#elif defined __aarch64__
+inline constexpr unsigned nativeCalls = AUDIT_ARCH_AARCH64;
+#elif defined KEELGATE_UNSEALED
+// For tests of what reads messages, on machines of any kind.
+inline constexpr unsigned nativeCalls = 0;
+#else
+#error "A filter is proven for each architecture; so far for x86-64 and arm64."
+#endif
+
+#ifndef KEELGATE_UNSEALED
+/// A filter reads the half of an argument that comes first in memory.
+static_assert(std::endian::native == std::endian::little);
+#endif
 
 enum class Verdict {
   /// The call is made.

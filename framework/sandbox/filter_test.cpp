@@ -4,7 +4,6 @@
 #include "framework/sandbox/filter.h"
 
 #include "framework/contracts/start_step.h"
-#include "framework/sandbox/architecture.h"
 #include "framework/sandbox/page_scan.h"
 #include "framework/sandbox/rewinding.h"
 

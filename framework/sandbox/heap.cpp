@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "framework/sandbox/heap.h"
+#include "framework/sandbox/steps.h"
 
 #include "framework/contracts/memory_budget.h"
 #include "framework/contracts/start_step.h"

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "framework/sandbox/landlock.h"
+#include "framework/sandbox/steps.h"
 
 #include <linux/landlock.h>
 #include <sys/syscall.h>

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "framework/sandbox/launcher.h"
+#include "framework/sandbox/steps.h"
 
 #include "framework/contracts/layers.h"
 #include "framework/contracts/process.h"

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "framework/sandbox/pages.h"
+#include "framework/sandbox/steps.h"
 
 #include <link.h>
 #include <array>

@@ -3,7 +3,6 @@
 
 #include "framework/contracts/process.h"
 #include "framework/contracts/start_step.h"
-#include "framework/sandbox/credentials.h"
 #include "framework/sandbox/filter.h"
 #include "framework/sandbox/limits.h"
 #include "framework/sandbox/page_scan.h"

@@ -4,18 +4,12 @@
 #include "framework/contracts/layers.h"
 #include "framework/contracts/memory_budget.h"
 #include "framework/contracts/process.h"
-#include "framework/sandbox/credentials.h"
-#include "framework/sandbox/descriptors.h"
-#include "framework/sandbox/empty_root.h"
 #include "framework/sandbox/filter.h"
-#include "framework/sandbox/heap.h"
-#include "framework/sandbox/landlock.h"
-#include "framework/sandbox/launcher.h"
 #include "framework/sandbox/limits.h"
 #include "framework/sandbox/namespaces.h"
-#include "framework/sandbox/pages.h"
 #include "framework/sandbox/processes.h"
 #include "framework/sandbox/rewinding.h"
+#include "framework/sandbox/steps.h"
 
 #include <poll.h>
 #include <unistd.h>

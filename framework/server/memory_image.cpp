@@ -31,19 +31,21 @@ WritableArea wholeStack(const WritableArea& stack) {
   return {.begin = std::min(stack.begin, stack.end - Sandbox::stackLimit), .end = stack.end};
 }
 
-}  // namespace
-
-UnsharedMemory::UnsharedMemory(std::size_t size) noexcept {
+/// Null where there is none to be had.
+UnsharedMemory unsharedMemory(std::size_t size) noexcept {
   void* const from =
       mmap(nullptr, size, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
-  if (from == MAP_FAILED) return;
-  bytes_ = {static_cast<std::byte*>(from), size};
-  if (madvise(from, size, MADV_DONTFORK) != 0) *this = UnsharedMemory();
+  if (from == MAP_FAILED) return {};
+  UnsharedMemory memory(static_cast<std::byte*>(from), {.size = size});
+  if (madvise(from, size, MADV_DONTFORK) != 0) return {};
+  return memory;
 }
 
+}  // namespace
+
 bool MemoryImage::take(const WorkerFiles& files) {
-  runs_ = UnsharedMemory(maximumRuns * sizeof(PageRun));
-  if (runs_.size() == 0) return false;
+  runs_ = unsharedMemory(maximumRuns * sizeof(PageRun));
+  if (!runs_) return false;
   std::size_t offset = 0;
   for (std::size_t i = 0; i < files.areas.count; ++i) {
     const auto runs = scan(files, files.areas.areas[i], Sandbox::scanProtecting);
@@ -55,14 +57,14 @@ bool MemoryImage::take(const WorkerFiles& files) {
   }
   std::sort(pieces_.begin(), pieces_.end(),
             [](const Piece& one, const Piece& other) { return one.begin < other.begin; });
-  bytes_ = UnsharedMemory(offset);
-  return bytes_.size() == offset && keep(files);
+  bytes_ = unsharedMemory(offset);
+  return bytes_ && keep(files);
 }
 
 bool MemoryImage::keep(const WorkerFiles& files) {
   return std::all_of(pieces_.begin(), pieces_.end(), [&](const Piece& piece) {
     const std::size_t size = piece.end - piece.begin;
-    return pread(files.memory.get(), bytes_.at(piece.offset), size,
+    return pread(files.memory.get(), bytes_.get() + piece.offset, size,
                  static_cast<off_t>(piece.begin)) == static_cast<ssize_t>(size);
   });
 }
@@ -75,7 +77,7 @@ Optional<std::span<const PageRun>> MemoryImage::scan(const WorkerFiles& files,
                           .start = area.begin,
                           .end = area.end,
                           .walkEnd = 0,
-                          .runs = reinterpret_cast<std::uint64_t>(runs_.at(0)),
+                          .runs = reinterpret_cast<std::uint64_t>(runs_.get()),
                           .runCount = maximumRuns,
                           .maximumPages = maximumPages + 1,
                           .invertedCategories = 0,
@@ -85,7 +87,7 @@ Optional<std::span<const PageRun>> MemoryImage::scan(const WorkerFiles& files,
                           .reported = Sandbox::pageIsWritten};
   const int found = ioctl(files.pages.get(), Sandbox::scanPages, &order);
   if (found < 0 || order.walkEnd != area.end) return std::nullopt;
-  return std::span(reinterpret_cast<const PageRun*>(runs_.at(0)), static_cast<std::size_t>(found));
+  return std::span(reinterpret_cast<const PageRun*>(runs_.get()), static_cast<std::size_t>(found));
 }
 
 bool MemoryImage::restore(const WorkerFiles& files) {
@@ -115,7 +117,7 @@ bool MemoryImage::restoreRun(int memory, const PageRun& run) const {
     const std::byte* from = zeros.data();
     if (piece != pieces_.end() && piece->begin <= at) {
       end = std::min(end, piece->end);
-      from = bytes_.at(piece->offset + (at - piece->begin));
+      from = bytes_.get() + piece->offset + (at - piece->begin);
     } else {
       // A page that was not there: it reads as zeros.
       if (piece != pieces_.end()) end = std::min(end, piece->begin);

@@ -9,19 +9,40 @@
 
 #include "framework/sandbox/page_scan.h"
 #include "framework/sandbox/rewinding.h"
-#include "framework/server/file.h"
 
 #include <keelgate/values.h>
 
 #include <sys/mman.h>
+#include <unistd.h>
 
 #include <cstddef>
 #include <cstdint>
+#include <memory>
 #include <span>
 #include <utility>
 #include <vector>
 
 namespace Keelgate {
+
+/// A descriptor that is closed with its owner. For one thread.
+class File {
+ public:
+  explicit File(int descriptor = -1) noexcept : descriptor_(descriptor) {}
+  File(File&& other) noexcept : descriptor_(std::exchange(other.descriptor_, -1)) {}
+  File& operator=(File&& other) noexcept {
+    std::swap(descriptor_, other.descriptor_);
+    return *this;
+  }
+  ~File() {
+    if (descriptor_ >= 0) close(descriptor_);
+  }
+
+  [[nodiscard]] int get() const noexcept { return descriptor_; }
+  explicit operator bool() const noexcept { return descriptor_ >= 0; }
+
+ private:
+  int descriptor_;
+};
 
 /// What a worker has handed over.
 struct WorkerFiles {
@@ -32,27 +53,12 @@ struct WorkerFiles {
   Sandbox::WorkerAreas areas;
 };
 
-/// Memory that no fork gets a copy of: the next worker's image would hold the one before it, too.
-/// Nothing where there is none to be had.
-class UnsharedMemory {
- public:
-  UnsharedMemory() noexcept = default;
-  explicit UnsharedMemory(std::size_t size) noexcept;
-  UnsharedMemory(UnsharedMemory&& other) noexcept : bytes_(std::exchange(other.bytes_, {})) {}
-  UnsharedMemory& operator=(UnsharedMemory&& other) noexcept {
-    std::swap(bytes_, other.bytes_);
-    return *this;
-  }
-  ~UnsharedMemory() {
-    if (!bytes_.empty()) munmap(bytes_.data(), bytes_.size());
-  }
-
-  [[nodiscard]] std::byte* at(std::size_t offset) const noexcept { return bytes_.data() + offset; }
-  [[nodiscard]] std::size_t size() const noexcept { return bytes_.size(); }
-
- private:
-  std::span<std::byte> bytes_;
+struct Unmap {
+  std::size_t size = 0;
+  void operator()(std::byte* bytes) const noexcept { munmap(bytes, size); }
 };
+/// Memory that no fork gets a copy of: the next worker's image would hold the one before it, too.
+using UnsharedMemory = std::unique_ptr<std::byte[], Unmap>;
 
 /// For one thread.
 class MemoryImage {

@@ -34,7 +34,7 @@ bool isAtEnd(int status) {
 
 bool Rewinding::give(std::uint32_t slot, int channel) {
   for (Member& member : members_) {
-    if (member.slot || !member.worker->isReady() || !member.worker->give(channel)) continue;
+    if (member.slot || !member.worker.isReady() || !member.worker.give(channel)) continue;
     member.slot = slot;
     return true;
   }
@@ -43,7 +43,7 @@ bool Rewinding::give(std::uint32_t slot, int channel) {
 
 bool Rewinding::isAnotherWorthIt() {
   const bool isOneStarting = std::any_of(members_.begin(), members_.end(),
-                                         [](const Member& m) { return !m.worker->isReady(); });
+                                         [](const Member& m) { return !m.worker.isReady(); });
   if (isOneStarting || isHopeless() || members_.size() >= maximumWorkers) return false;
   missed_ = (missed_ + 1) % missesPerWorker;
   return missed_ == 0;
@@ -51,34 +51,34 @@ bool Rewinding::isAnotherWorthIt() {
 
 void Rewinding::add(pid_t process) {
   if (process < 0) return;
-  members_.emplace_back().worker = std::make_unique<RewindableWorker>(process);
+  members_.push_back({.worker = RewindableWorker(process), .slot = {}});
 }
 
 int Rewinding::startStep() const noexcept {
   for (const Member& member : members_) {
-    if (const int step = member.worker->startStep(); step >= 0) return step;
+    if (const int step = member.worker.startStep(); step >= 0) return step;
   }
   return -1;
 }
 
 void Rewinding::takeStep() {
-  for (const Member& member : members_) {
-    if (member.worker->startStep() < 0) continue;
-    if (!member.worker->takeStep()) throwAway(member);
+  for (Member& member : members_) {
+    if (member.worker.startStep() < 0) continue;
+    if (!member.worker.takeStep()) throwAway(member);
     return;
   }
 }
 
 pid_t Rewinding::processOf(std::uint32_t slot) const noexcept {
   for (const Member& member : members_) {
-    if (member.slot == slot) return member.worker->process();
+    if (member.slot == slot) return member.worker.process();
   }
   return 0;
 }
 
 Optional<Rewinding::End> Rewinding::note(pid_t process, int status, const rusage& used) {
   const auto member = std::find_if(members_.begin(), members_.end(), [process](const Member& m) {
-    return m.worker->process() == process;
+    return m.worker.process() == process;
   });
   if (member == members_.end()) return std::nullopt;
   if (WIFSTOPPED(status)) return noteStop(*member, status, used);
@@ -86,7 +86,7 @@ Optional<Rewinding::End> Rewinding::note(pid_t process, int status, const rusage
   if (member->slot) {
     end = {.slot = *member->slot, .status = status, .used = difference(used, member->usedBefore)};
   }
-  if (!member->worker->isReady()) {
+  if (!member->worker.isReady()) {
     ++failures_;
     RewindableWorker::forgetHandedOver();
   }
@@ -95,7 +95,7 @@ Optional<Rewinding::End> Rewinding::note(pid_t process, int status, const rusage
 }
 
 Optional<Rewinding::End> Rewinding::noteStop(Member& member, int status, const rusage& used) {
-  RewindableWorker& worker = *member.worker;
+  RewindableWorker& worker = member.worker;
   if (!worker.isReady()) {
     if (!worker.keep() || !worker.goOn()) throwAway(member);
     return std::nullopt;
@@ -127,7 +127,7 @@ bool Rewinding::isTired(const rusage& used) const noexcept {
 
 /// Its end is noticed like any other, and nobody is told of it who knows of its end already.
 void Rewinding::throwAway(const Member& member) noexcept {
-  kill(member.worker->process(), SIGKILL);
+  kill(member.worker.process(), SIGKILL);
 }
 
 }  // namespace Keelgate

@@ -12,7 +12,6 @@
 #include <sys/resource.h>
 #include <sys/types.h>
 
-#include <memory>
 #include <vector>
 
 namespace Keelgate {
@@ -56,7 +55,7 @@ class Rewinding {
   static constexpr unsigned maximumFailures = 3;
 
   struct Member {
-    std::unique_ptr<RewindableWorker> worker;
+    RewindableWorker worker;
     /// Whoever has none is on its way back, or waits.
     Optional<std::uint32_t> slot;
     rusage usedBefore{};
