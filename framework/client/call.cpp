@@ -34,12 +34,11 @@ HostError explain(const ServiceProcess::Exit& exit) {
   if (exit.neverStarted) {
     return {Reason::startFailed, startFailureSentence(StartStep::startProcesses, 0)};
   }
+  // The exit status of one that a signal ended is 0.
   const int status = exit.status;
-  if (WIFEXITED(status) && WEXITSTATUS(status) == Protocol::resourceExitStatus) {
-    return {Reason::resourcesExhausted, ""};
-  }
+  if (WEXITSTATUS(status) == Protocol::resourceExitStatus) return {Reason::resourcesExhausted, ""};
   // What it could not have is memory: the zygote had all the rest.
-  if (WIFEXITED(status) && WEXITSTATUS(status) == Protocol::refusedExitStatus) {
+  if (WEXITSTATUS(status) == Protocol::refusedExitStatus) {
     return {Reason::resourcesExhausted, "the machine has no memory for its worker"};
   }
   if (WIFEXITED(status)) {
@@ -95,7 +94,6 @@ bool Call::mayBeSent() noexcept try {
   return true;
 } catch (...) {
   // What is wrong is found again, and told then.
-  alone_ = true;
   return false;
 }
 

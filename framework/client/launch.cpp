@@ -184,7 +184,7 @@ ServiceHandles connectService(const String& socket, Optional<unsigned> socketUse
     const int error = errno;
     throw StartFailure("No service answers on the socket " + socket + ": " + errorText(error) +
                            "; start the unit that listens there",
-                       error == EAGAIN || error == ECONNREFUSED || error == EINTR);
+                       error == EAGAIN || error == ECONNREFUSED);
   }
   requirePeer(socket, control, socketUser);
   return {.control = std::move(control), .launcher = {}};

@@ -56,9 +56,10 @@ void writeToStandardError(const String& text) noexcept {
 String escapeLogLine(std::string_view line) {
   String escaped;
   while (!line.empty()) {
+    // A byte that is not UTF-8 counts as a control character, 0.
     const auto [codePoint, length] = Text::firstCharacter(line);
     const std::string_view bytes = line.substr(0, length == 0 ? 1 : length);
-    if (length == 0 || isControl(codePoint)) {
+    if (isControl(codePoint)) {
       appendEscaped(escaped, bytes);
     } else {
       escaped += bytes;

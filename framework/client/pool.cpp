@@ -145,12 +145,14 @@ Optional<Worker> Pool::takeIdle(const Supervisor::Service& service) {
 }
 
 void Pool::giveBack(Worker worker) noexcept {
-  if (isSpent(worker)) {
-    worker.finish();
-    return;
-  }
   const std::lock_guard lock(mutex_);
-  keepIdle(std::move(worker));
+  // Of those that messages had to themselves, one after the other, there may be more than are used
+  // again: they would hold all slots.
+  if (isSpent(worker) || idle_.size() >= processes_) {
+    worker.finish();
+  } else {
+    keepIdle(std::move(worker));
+  }
 }
 
 void Pool::tidy() noexcept {

@@ -8,7 +8,6 @@
 
 #include <cmath>
 #include <limits>
-#include <tuple>
 
 namespace Keelgate::JSON {
 namespace {
@@ -88,47 +87,6 @@ TEST(JSON, LongValuesAreWholeWhateverPiecesTheyAreMadeIn) {
     EXPECT_TRUE(compact(Data(size)) == '"' + encoded + '"') << size;
   }
   EXPECT_EQ(compact(dataOf("\xfb\xff")), "\"+/8=\"");
-}
-
-TEST(JSON, PropertyListsAreTreesAndTypedOnesLoseNothing) {
-  using Value = PropertyListValue;
-  const auto typed = [](const Value& value) {
-    Writer out(Layout::compact);
-    writeTyped(out, value);
-    return textIn(std::move(out));
-  };
-  const UInt64 largest = std::numeric_limits<UInt64>::max();
-  const std::tuple<Value, const char*, const char*> table[] = {
-      {nullptr, "null", R"({"type":"null","value":null})"},
-      {true, "true", R"({"type":"boolean","value":true})"},
-      {Int64{-1}, "-1", R"({"type":"integer","value":-1})"},
-      {Value(std::in_place_index<3>, largest), "18446744073709551615",
-       R"({"type":"integer","value":18446744073709551615})"},
-      {Double{2}, "2.0", R"({"type":"real","value":2.0})"},
-      {-std::numeric_limits<Double>::infinity(), R"("-inf")", R"({"type":"real","value":"-inf"})"},
-      {Date{0.1234567}, R"("2001-01-01T00:00:00.123457Z")", R"({"type":"date","value":0.1234567})"},
-      {String("a\n"), R"("a\n")", R"({"type":"string","value":"a\n"})"},
-      {dataOf("f"), R"("Zg==")", R"({"type":"data","value":"Zg=="})"},
-      {PropertyListUID{0, largest}, R"({"uid":18446744073709551615})",
-       R"({"type":"uid","value":18446744073709551615})"},
-      {PropertyListUID{0x1a, 0xb}, R"({"uid":"0x1a000000000000000b"})",
-       R"({"type":"uid","value":"0x1a000000000000000b"})"},
-      {PropertyListSet{{Value(true)}}, "[true]",
-       R"({"type":"set","value":[{"type":"boolean","value":true}]})"},
-      {Array<Value>{}, "[]", R"({"type":"array","value":[]})"},
-      {Array<PropertyListEntry>{{"z", Value(nullptr)}, {"a", Value(Array<Value>{Value(Int64{3})})}},
-       R"({"z":null,"a":[3]})",
-       R"({"type":"dictionary","value":{"z":{"type":"null","value":null},)"
-       R"("a":{"type":"array","value":[{"type":"integer","value":3}]}}})"},
-  };
-  for (const auto& [value, plainText, typedText] : table) {
-    EXPECT_EQ(compact(value), plainText);
-    EXPECT_EQ(compact(PropertyList{value}), plainText);
-    EXPECT_EQ(typed(value), typedText);
-  }
-  Writer pretty(Layout::pretty);
-  write(pretty, std::get<0>(std::end(table)[-1]));
-  EXPECT_EQ(textIn(std::move(pretty)), "{\n  \"z\": null,\n  \"a\": [\n    3\n  ]\n}");
 }
 
 TEST(JSON, TheBudgetIsKeptToTheByte) {

@@ -439,7 +439,8 @@ def json_schema():
         {"kind": "keyNotFound", "codingPath": [1, "a"], "description": "", "key": "k"},
         {"kind": "unpacking", "domain": "", "code": 0, "case": "noUnpackerForService"},
         {"kind": "host", "reason": "crashed", "description": ""})]
-    for reply in errors + [json.loads(file.read_text()) for file in sorted(messages.glob("*.json"))]:
+    for reply in errors + [json.loads(file.read_text()) for file in sorted(messages.glob("*.json"))
+                           if not file.name.startswith("property-list")]:
         check(replies.is_valid({"id": [], **reply}), f"{reply} against the schema of replies")
         for wrong in (*spoilt(reply), {key: reply[key] for key in list(reply)[1:]}):
             check(not replies.is_valid(wrong), f"{wrong} against the schema of replies")

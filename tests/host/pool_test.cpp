@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // The life of a client: starting, sharing, retrying, forking, ending.
-#include "framework/client/descriptor.h"
+#include "framework/client/launch.h"
 #include "tests/host/host_testing.h"
 
 #include <gtest/gtest.h>
@@ -40,8 +40,13 @@ TEST(Start, AFailureSaysWhatIsWrong) {
   constexpr auto program = &Client::Options::servicePath;
   constexpr auto socket = &Client::Options::socket;
   const String longPath(sizeof sockaddr_un::sun_path, 's');
+  DescriptorRegistry registry(8);
   const String deaf = temporaryPath("deaf");
   const int listener = boundTo(deaf);
+  const String full = temporaryPath("full");
+  const int queue = boundTo(full);
+  listen(queue, 0);
+  const auto first = connectService(full, {}, registry);
   Client::Options layers = fakeOptions("bare");
   layers.requireLayers = true;
   const std::pair<Client::Options, const char*> rows[] = {
@@ -50,6 +55,8 @@ TEST(Start, AFailureSaysWhatIsWrong) {
       {with(socket, "/nowhere/socket"),
        "No service answers on the socket /nowhere/socket: No such file"},
       {with(socket, deaf), "refused; start the unit that listens there; it is not tried again for"},
+      {with(socket, full),
+       "unavailable; start the unit that listens there; it is not tried again for"},
       {with(socket, longPath), "The socket's path is longer than the system allows: sss"},
       {layers, "Running without: user namespace, mount namespace"},
 #ifndef KEELGATE_UNSEALED
@@ -77,8 +84,8 @@ TEST(Start, AFailureSaysWhatIsWrong) {
     EXPECT_EQ(passes, String(sentence).ends_with("it is not tried again for")) << outcome;
   }
   EXPECT_TRUE(children().empty());
-  close(listener);
-  std::filesystem::remove(deaf);
+  for (const int end : {listener, queue}) close(end);
+  for (const String& path : {deaf, full}) std::filesystem::remove(path);
 }
 
 TEST(Start, ThereMayBeTooFewDescriptors) {
@@ -237,6 +244,25 @@ TEST(Application, MayHaveNoStandardDescriptors) {
               return 0;
             }),
             0);
+}
+
+TEST(Application, ItsForkClosesWhatWasOpenOnce) {
+  DescriptorRegistry registry(2);
+  const auto before = openDescriptors();
+  const auto open = [&] {
+    return Descriptor(registry, dup(STDERR_FILENO));
+  };
+  Descriptor first = open(), second = open(), beyond = open();
+  second = Descriptor();
+  Descriptor third = open();
+  EXPECT_EQ(openDescriptors(), before + 3);
+  registry.closeAll();
+  EXPECT_EQ(openDescriptors(), before + 1) << "what had no room stays";
+  // Nothing else has these numbers' place.
+  const int again = dup(STDERR_FILENO);
+  registry.closeAll();
+  EXPECT_EQ(openDescriptors(), before + 2);
+  EXPECT_EQ(again, first.get());
 }
 
 /// A process number may be the same in another namespace.

@@ -165,6 +165,13 @@ TEST(Permits, AreGivenInTurnAndSomeAreKeptForSmallOnes) {
   secondLarge.leave();
   EXPECT_TRUE(third.isAdmitted() && !last.isAdmitted());
   EXPECT_EQ(waitFor({.descriptor = last.descriptor(), .events = POLLIN, .until = {}}), 0);
+  // What they wait on is kept for the next, but not for as many as have waited.
+  const auto before = openDescriptors();
+  {
+    std::deque<Permit> many;
+    for (int i = 0; i < 10; ++i) many.emplace_back(semaphore, false);
+  }
+  EXPECT_LE(openDescriptors(), before + 2);
 }
 
 // A sanitizer makes frames larger: nothing of this holds there.

@@ -37,12 +37,12 @@ class Zygote : public testing::Test {
   }
 
   /// Answers the hello of the service that has connected last; gives its numbers, or nothing.
-  Optional<std::array<std::uint64_t, 4>> greet() {
+  Optional<std::array<std::uint64_t, 4>> greet(ControlKind answer = ControlKind::ready) {
     pollfd entry{.fd = listener_, .events = POLLIN, .revents = 0};
     if (poll(&entry, 1, 0) != 1) return std::nullopt;
     ends_.push_back(accept(listener_, nullptr, nullptr));
     next();
-    say(ControlKind::ready, 0, {~std::uint64_t{0}, Protocol::ownVersion()});
+    say(answer, 0, {~std::uint64_t{0}, Protocol::ownVersion()});
     return last_.numbers;
   }
   void say(ControlKind kind, std::uint32_t slot, std::array<std::uint64_t, 4> numbers = {}) {
@@ -174,6 +174,10 @@ TEST_F(Zygote, IsLostWhenItSaysWhatItShouldNot) {
   hangUp();
   EXPECT_FALSE(service.fork(1));
   EXPECT_EQ(service.state(), State::lost);
+  ServiceProcess odd(settings_, registry_);
+  greet(ControlKind::exit);
+  odd.readNews();
+  EXPECT_TRUE(odd.state() == State::lost && odd.startFailure() && odd.startFailure()->mayPass);
 }
 
 TEST_F(Zygote, IsToldLaterWhatItHasNoRoomFor) {
@@ -309,13 +313,17 @@ TEST_F(Zygote, WorkersAreForkedAheadAndUsedWhileTheyAreQuiet) {
     EXPECT_TRUE(pool.messagesLeft(*worker) == messages - 1 &&
                 pool.isSpent(*worker) == (messages == 1));
     pool.giveBack(std::move(*worker));
-    // All but one have gone meanwhile, and that one speaks up.
-    for (const auto& [slot, channel] : std::exchange(channels_, {})) {
-      if (slot == 3 && write(channel, "x", 1) == 1) continue;
-      close(channel);
-    }
+    // One has gone meanwhile: another takes its place, and another service follows.
+    close(channels_.extract(2).mapped());
+    EXPECT_EQ(take().served(), 0u);
+    EXPECT_TRUE(std::holds_alternative<Wait>(pool.take(10, false, soon)));
+    EXPECT_TRUE(greet());
+    // One speaks up without having been asked.
+    EXPECT_EQ(take().served(), 0u);
+    pool.tidy();
+    while (next() != nothing) continue;
+    EXPECT_EQ(write(channels_.at(1), "x", 1), 1);
     EXPECT_EQ(outcomeOf([&] { return take().served(); }), "protocolViolation");
-    // Another is needed, which forks nothing: its slots are all taken.
     EXPECT_TRUE(std::holds_alternative<Wait>(pool.take(10, false, soon)));
     EXPECT_TRUE(greet());
     std::deque<Worker> all;
