@@ -39,11 +39,16 @@ class BinaryReader {
   };
 
   std::uint32_t readTrailer();
+  template <class Widths>
+  [[gnu::noinline]] void walkAll();
+  template <class Widths>
   void walk(Frame& frame);
+  template <class Widths>
   void readKeys(Frame& frame);
   void leave(const Frame& frame);
   void readOtherKey(std::uint32_t number, std::size_t position);
   [[gnu::always_inline]] inline bool load(const Objects& objects, std::uint32_t number);
+  template <class Widths>
   void open(std::uint32_t number);
   void revisit(Node& node, std::size_t position);
   Node readObject(std::size_t offset);
@@ -65,10 +70,32 @@ class BinaryReader {
   std::array<Frame, Limits::nestedContainers> frames_;
 };
 
+/// Of offsets and references. The commonest are compiled in, so that they are read without shifts
+/// by numbers that a register has to hold.
+struct AnyWidths {
+  static Objects of(const Objects& objects) { return objects; }
+};
+template <std::size_t offsetSize, std::size_t referenceSize>
+struct FixedWidths {
+  static Objects of(Objects objects) {
+    objects.offsetSize = offsetSize;
+    objects.referenceSize = referenceSize;
+    return objects;
+  }
+};
+
 void BinaryReader::read() {
   store_.top = readTrailer();
-  if (load(objects_, store_.top)) open(store_.top);
-  while (depth_ > 0) walk(frames_[depth_ - 1]);
+  if (objects_.offsetSize == 1 && objects_.referenceSize == 1) return walkAll<FixedWidths<1, 1>>();
+  if (objects_.offsetSize == 2 && objects_.referenceSize == 1) return walkAll<FixedWidths<2, 1>>();
+  if (objects_.offsetSize == 2 && objects_.referenceSize == 2) return walkAll<FixedWidths<2, 2>>();
+  walkAll<AnyWidths>();
+}
+
+template <class Widths>
+void BinaryReader::walkAll() {
+  if (load(objects_, store_.top)) open<Widths>(store_.top);
+  while (depth_ > 0) walk<Widths>(frames_[depth_ - 1]);
 }
 
 /// Returns the number of the top object.
@@ -109,8 +136,9 @@ std::uint32_t BinaryReader::readTrailer() {
 }
 
 /// Walks the references of the innermost container, as far as one that opens another container.
+template <class Widths>
 void BinaryReader::walk(Frame& frame) {
-  const Objects objects = objects_;
+  const Objects objects = Widths::of(objects_);
   const std::size_t end = frame.end;
   for (std::size_t next = frame.next; next < end; next += objects.referenceSize) {
     const std::uint32_t number = objects.reference(next);
@@ -121,14 +149,15 @@ void BinaryReader::walk(Frame& frame) {
     }
     if (!load(objects, number)) continue;
     frame.next = next + objects.referenceSize;
-    return open(number);
+    return open<Widths>(number);
   }
   leave(frame);
 }
 
 /// All keys of a dictionary, which stand before its values. Of several faults the first is told.
+template <class Widths>
 void BinaryReader::readKeys(Frame& frame) try {
-  const Objects objects = objects_;
+  const Objects objects = Widths::of(objects_);
   const std::size_t end = frame.end;
   keys_.begin(frame.node, objects.nodes[frame.node].count);
   for (std::size_t next = frame.next; next < end; next += objects.referenceSize) {
@@ -195,13 +224,14 @@ bool BinaryReader::load(const Objects& objects, std::uint32_t number) {
 }
 
 /// Makes a container that was read the innermost frame.
+template <class Widths>
 void BinaryReader::open(std::uint32_t number) {
   const Node& node = objects_.nodes[number];
   const std::size_t length = node.count * objects_.referenceSize;
   Frame& frame = frames_[depth_++];
   frame = {.node = number, .highest = 0, .next = node.position(), .end = node.position() + length};
   if (node.type != Type::dictionary) return;
-  readKeys(frame);
+  readKeys<Widths>(frame);
   frame.end += length;
 }
 

@@ -40,7 +40,8 @@ struct FoldedCheckIn {
   WaymarkCodes codes{};
 
   FoldedCheckIn() {
-    auto& groups = message.groupFields.emplace(last - first + 1);
+    // As copies of one: others would have all their bytes set to zero first.
+    auto& groups = message.groupFields.emplace(last - first + 1, Keelgate::WaymarkGroupFields{});
     for (UInt number = first; number <= last; ++number) groups[number - first].groupNumber = number;
   }
 };
