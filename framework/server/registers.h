@@ -12,7 +12,7 @@ namespace Keelgate {
 
 struct Registers {
   /// With the segments and their bases.
-  elf_gregset_t general;
+  elf_gregset_t general{};
   /// x87, vector and mask registers, protection keys, their control words: all that the processor
   /// saves as one block, with the mask of what is in use.
   std::vector<std::byte> extended;
