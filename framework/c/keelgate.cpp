@@ -59,13 +59,6 @@ void tell(char** error, std::string_view sentence) noexcept {
   if (error != nullptr) *error = copyOf(std::array{sentence});
 }
 
-/// The options as the caller knows them, and the defaults for the rest.
-keelgate_options complete(const keelgate_options* given) {
-  keelgate_options options = defaults();
-  if (given != nullptr) std::memcpy(&options, given, given->size);
-  return options;
-}
-
 Client::Options optionsFrom(const keelgate_options& options) {
   Client::Options made;
   made.processes = options.processes;
@@ -94,13 +87,16 @@ int statusOf(const Reply& reply) {
   return reply.reason ? KEELGATE_GIVEN_UP : KEELGATE_REJECTED;
 }
 
-/// What the functions that unpack have in common; `subject` makes a Subject, or throws.
+/// What the functions that unpack have in common; `subject` makes a Subject, or throws, and is not
+/// asked where there is none.
 template <class MakeSubject>
 int unpack(keelgate_client* client, const void* message, std::size_t length, char** reply,
-           const MakeSubject& subject, bool typed = false) noexcept {
+           bool hasSubject, const MakeSubject& subject, bool typed = false) noexcept {
   if (reply == nullptr) return KEELGATE_WRONG_USE;
   *reply = nullptr;
-  if (client == nullptr || (message == nullptr && length > 0)) return KEELGATE_WRONG_USE;
+  if (!hasSubject || client == nullptr || (message == nullptr && length > 0)) {
+    return KEELGATE_WRONG_USE;
+  }
   int status = KEELGATE_GIVEN_UP;
   try {
     Reply answer =
@@ -135,7 +131,9 @@ keelgate_client* keelgate_open(const keelgate_options* options, char** error) {
     return nullptr;
   }
   try {
-    const keelgate_options all = complete(options);
+    // As the caller knows them, and the defaults for the rest.
+    keelgate_options all = defaults();
+    if (options != nullptr) std::memcpy(&all, options, options->size);
     return new keelgate_client{.client = Client(optionsFrom(all)),
                                .timeLimit = std::chrono::milliseconds(all.time_limit_ms)};
   } catch (const Keelgate::HostError& failure) {
@@ -150,27 +148,21 @@ keelgate_client* keelgate_open(const keelgate_options* options, char** error) {
 
 int keelgate_unpack(keelgate_client* client, const char* record, const void* message, size_t length,
                     char** reply) {
-  if (record == nullptr || !Keelgate::JSON::isRecordName(record)) {
-    if (reply != nullptr) *reply = nullptr;
-    return KEELGATE_WRONG_USE;
-  }
-  return unpack(client, message, length, reply, [&] { return Subject(Keelgate::String(record)); });
+  const bool isRecord = record != nullptr && Keelgate::JSON::isRecordName(record);
+  return unpack(client, message, length, reply, isRecord,
+                [&] { return Subject(Keelgate::String(record)); });
 }
 
 int keelgate_unpack_typed(keelgate_client* client, const void* message, size_t length,
                           char** reply) {
   return unpack(
-      client, message, length, reply,
+      client, message, length, reply, true,
       [] { return Subject(Keelgate::String(Keelgate::JSON::propertyList)); }, true);
 }
 
 int keelgate_unpack_client_message(keelgate_client* client, const char* service, uint64_t command,
                                    const void* message, size_t length, char** reply) {
-  if (service == nullptr) {
-    if (reply != nullptr) *reply = nullptr;
-    return KEELGATE_WRONG_USE;
-  }
-  return unpack(client, message, length, reply, [&] {
+  return unpack(client, message, length, reply, service != nullptr, [&] {
     return Subject(Keelgate::VespClientMessageContext{.command = command, .service = service});
   });
 }

@@ -12,8 +12,7 @@
 #pragma once
 
 #include "framework/contracts/construct.h"
-#include "framework/contracts/field_set.h"
-#include "framework/contracts/fields_by_type.h"
+#include "framework/contracts/fields.h"
 #include "framework/transport/wire.h"
 
 #include <keelgate/describe.h>

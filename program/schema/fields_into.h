@@ -9,7 +9,7 @@
 /// Constants and pure functions; callable from any thread.
 #pragma once
 
-#include "framework/contracts/fields_by_type.h"
+#include "framework/contracts/fields.h"
 
 #include <keelgate/describe.h>
 

@@ -5,7 +5,7 @@
 /// Made by the compiler; constants, usable from any thread.
 #pragma once
 
-#include "framework/contracts/fields_by_type.h"
+#include "framework/contracts/fields.h"
 #include "plist/known_keys.h"
 
 #include <keelgate/describe.h>

@@ -18,7 +18,7 @@
 /// A decoder is used for one message and by one thread.
 #pragma once
 
-#include "framework/contracts/field_set.h"
+#include "framework/contracts/fields.h"
 #include "plist/document.h"
 #include "plist/expansion_budget.h"
 #include "program/schema/coding_path.h"
