@@ -43,8 +43,21 @@ std::size_t plainLength(std::string_view text) {
 }
 
 /// The short escapes are those that people expect to see.
-constexpr std::string_view shortlyEscaped = "\"\\\n\r\t";
-constexpr std::string_view shortEscapes = "\"\\nrt";
+char shortEscape(char32_t c) {
+  switch (c) {
+    case '"':
+    case '\\':
+      return static_cast<char>(c);
+    case '\n':
+      return 'n';
+    case '\r':
+      return 'r';
+    case '\t':
+      return 't';
+    default:
+      return '\0';
+  }
+}
 
 template <class T>
 std::string_view decimal(std::array<char, 32>& to, T value) {
@@ -177,16 +190,19 @@ void Writer::quotedCharacter(std::string_view& text) {
   // Of ASCII only controls come here, beside those that have a letter.
   const Bool control = character < 0xa0;
   const Bool lineEnd = character == 0x2028 || character == 0x2029;
-  if (const auto place = shortlyEscaped.find(text.front()); place != std::string_view::npos) {
-    const char escape[] = {'\\', shortEscapes[place]};
+  if (const char letter = shortEscape(character); letter != '\0') {
+    const char escape[] = {'\\', letter};
     put({escape, sizeof escape});
   } else if (control || lineEnd || length == 0) {
     // All of these are in the basic plane, so four digits do.
-    String escape = "\\u0000";
-    for (std::size_t digit = 5; digit > 1; --digit, character >>= 4) {
-      escape[digit] = "0123456789abcdef"[character & 15];
-    }
-    put(escape);
+    constexpr const char* digits = "0123456789abcdef";
+    const char escape[] = {'\\',
+                           'u',
+                           digits[character >> 12],
+                           digits[character >> 8 & 15],
+                           digits[character >> 4 & 15],
+                           digits[character & 15]};
+    put({escape, sizeof escape});
   } else {
     put(text.substr(0, length));
   }
