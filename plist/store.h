@@ -52,7 +52,7 @@ struct Node {
   /// A scalar's value. The position of bytes or references, and above it a key's number. An XML
   /// container's end in the node table.
   std::uint64_t bits;
-  std::uint32_t count = 0;   // bytes, elements or entries
+  std::uint32_t count = 0;   // bytes, elements or entries; 0 where a number is in `bits`
   std::uint16_t height = 0;  // binary containers: the longest chain of containers from here
   Type type;
   std::uint8_t flags = 0;
