@@ -259,10 +259,8 @@ void Call::acceptReply() {
     fail({late ? Reason::timedOut : Reason::resourcesExhausted, ""});
     return;
   }
-  exchange_.reset();
   pool_.noteReply(*worker_);
   pool_.giveBack(std::move(*worker_));
-  worker_.reset();
   if (Clock::now() >= deadline_) throw HostError(Reason::timedOut, "");
   finish(std::move(error_));
 }

@@ -2,6 +2,7 @@
 // Workers that were taken over: whatever they do and whenever they end, a message has one outcome
 // (C8, C9), in time (C5), no other message is theirs (C6), nor the address layout that they have
 // seen (C13), and the next one is served.
+#include "framework/contracts/memory_budget.h"
 #include "framework/protocol/data_frames.h"
 #include "tests/host/host_testing.h"
 
@@ -125,13 +126,17 @@ TEST_P(Hostile, EveryAttackHasItsOutcomeInTimeAndCostsItsLayout) {
 /// Each worker counts the messages that it was given. One that has taken much is not used again:
 /// what it was given besides goes to the next.
 TEST(C6, AWorkerSeesOneMessageUnlessMoreAreAllowed) {
-  const String eats = "eat 117440512 65536" + String(200'000, ' ');
+  const String order = "eat " + std::to_string(allocationLimit(0)) + " 65536";
+  const String eats = order + String(200'000, ' ');
+  // Among others, which share the worker.
+  const String eatsShort = order + String(16'000, ' ');
   const std::tuple<std::size_t, String, std::vector<Int64>> rows[] = {
       {1, "count", {1, 1, 1, 1, 1, 1, 1, 1, 1}},
       {3, "count", {1, 2, 3, 1, 2, 3, 1, 2, 3}},
 // A sanitizer's allocator counts for itself.
 #ifndef KEELGATE_UNSEALED
       {100, eats, {1, 2, 3, 4, 0, 1, 2, 3, 4}},
+      {100, eatsShort, {1, 2, 3, 4, 0, 1, 2, 3, 4}},
 #endif
   };
   for (const auto& [allowed, fifth, expected] : rows) {

@@ -131,6 +131,7 @@ TEST(Supervision, APeakIsForgottenAfterAWhile) {
 }
 
 TEST(Permits, AQuarterIsKeptForSmallMessages) {
+  EXPECT_EQ(processesFor(fakeOptions("honest", milliseconds(100), 1000)), 128U);
   for (const auto& [permits, forLarge] :
        {std::pair(1u, 1), {2u, 1}, {3u, 2}, {4u, 3}, {5u, 3}, {8u, 6}, {9u, 6}}) {
     Pool pool(fakeOptions("honest", milliseconds(100), permits));
