@@ -1,6 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 // What each kind of message gives, and which error, in tables. Every row runs in both encodings.
+#include "framework/transport/wire.h"
+#include "plist/limits.h"
 #include "plist/test_messages.h"
+#include "program/property_list/property_list_unpacker.h"
 #include "program/schema/mirror_encoding.h"
 #include "program/schema/property_list_decoder.h"
 #include "program/service/tables.h"
@@ -9,6 +12,9 @@
 #include <gtest/gtest.h>
 
 namespace VespKeelgateService::Testing {
+
+// What the service can read the client can read back.
+static_assert(Keelgate::Transport::maximumNesting == PropertyList::Limits::nestedContainers);
 
 namespace {
 
@@ -80,6 +86,40 @@ TEST(Payloads, SharedOnesAreRefusedBeforeTheyTakeMemoryOrTime) {
   EXPECT_EQ(shared("mml", 100, 1000), "dataCorrupted @");
   EXPECT_EQ(shared("zzz", 60'000, 1000), ".command=1");
   EXPECT_TRUE(shared("mml", 100, 20).ends_with("[99].command=1"));
+}
+
+TEST(PropertyLists, SharedObjectsAreRefusedBeforeTheyTakeMemory) {
+  // One long text, as a value or as a key, and a level of containers that doubles at each step.
+  const auto shared = [](const std::string& object, const std::string& marker,
+                         std::size_t references) {
+    using PropertyList::bigEndian;
+    PropertyList::Raw raw{{"\xaf\x11" + bigEndian(references, 2), object, "\x08"}, 2};
+    for (std::size_t i = 0; i < references; ++i) {
+      raw.objects[0] += bigEndian(raw.objects.size(), 2);
+      raw.objects.push_back(marker);
+    }
+    const std::string message = raw.message();
+    return errorOf([&] { PropertyListUnpacker().unpack(PropertyList::bytesOf(message)); });
+  };
+  constexpr std::size_t length = 60'000;
+  const std::string text =
+      "\x5f\x12" + PropertyList::bigEndian(length, 4) + std::string(length, 'x');
+  // What is made counts twice, since it is written into the reply too.
+  namespace Limits = PropertyList::Limits;
+  const std::size_t allowed =
+      (Limits::expansionBase + Limits::expansionFactor * text.size()) / (2 * length);
+  for (const std::string& marker :
+       {PropertyList::bytes("\xa1\x00\x01"), PropertyList::bytes("\xd1\x00\x01\x00\x02")}) {
+    EXPECT_EQ(shared(text, marker, allowed * 4 / 5), "");
+    EXPECT_EQ(shared(text, marker, allowed * 6 / 5), "dataCorrupted @");
+  }
+
+  std::vector<std::string> doubling;
+  for (char i = 1; i < 60; ++i) doubling.push_back({'\xa2', i, i});
+  doubling.emplace_back("\xa0");
+  const std::string message = PropertyList::binary(doubling);
+  EXPECT_EQ(errorOf([&] { PropertyListUnpacker().unpack(PropertyList::bytesOf(message)); }),
+            "dataCorrupted @");
 }
 
 TEST(Invitations, FailInTheOrderOfTheirFields) {

@@ -43,7 +43,8 @@ constexpr milliseconds newsInterval{4};
 constexpr milliseconds impatience{100};
 
 /// Ending of its own will, or by our hand, shows nothing of the address layout. Anything else may
-/// be somebody's miss, and the next try must not meet the same layout.
+/// be somebody's miss, and the next try must not meet the same layout. (One that never started has
+/// status 0.)
 bool isAbnormal(int status, bool killed) noexcept {
   if (WIFEXITED(status)) return WEXITSTATUS(status) != 0;
   return !(killed && WTERMSIG(status) == SIGKILL);
@@ -150,9 +151,7 @@ void ServiceProcess::noteFrame(const ControlFrame& frame) noexcept {
 
 void ServiceProcess::noteExit(Slot& slot, const Exit& exit) noexcept {
   const bool stayed = slot.state == SlotState::stayed;
-  if (!exit.neverStarted && isAbnormal(exit.status, stayed || slot.state == SlotState::killed)) {
-    retire();
-  }
+  if (isAbnormal(exit.status, stayed || slot.state == SlotState::killed)) retire();
   // Others of its sender may hold more slots.
   if (stayed && WIFSIGNALED(exit.status)) impatientUntil_ = Clock::now() + impatience;
   slot = {.state = slot.state == SlotState::held ? SlotState::ended : SlotState::free,

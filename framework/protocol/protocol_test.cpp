@@ -28,13 +28,12 @@ Data octets(std::size_t size) {
   return Data(size, std::byte{'x'});
 }
 
-Data replyOf(std::size_t logLines, std::size_t logLength, std::size_t bodyLength,
-             ReplyKind kind = ReplyKind::record) {
+Data replyOf(std::size_t logLines, std::size_t logLength, std::size_t bodyLength) {
   Data reply;
   for (std::size_t i = 0; i < logLines; ++i) {
     appendReplyFrame(reply, sequence, ReplyKind::log, octets(logLength));
   }
-  appendReplyFrame(reply, sequence, kind, octets(bodyLength), kind == ReplyKind::error);
+  appendReplyFrame(reply, sequence, ReplyKind::record, octets(bodyLength));
   return reply;
 }
 

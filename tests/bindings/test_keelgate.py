@@ -130,12 +130,8 @@ def test_wrong_use_is_a_value_error(client):
 
 
 @pytest.mark.parametrize("error, fields, call", [
-    (keelgate.UnpackingError, dict(case="unimplementedCommand", code=0, command=236, service=None),
-     lambda client: client.unpack_client_message(b"", command=236, service=VIDEO)),
     (keelgate.UnpackingError, dict(case="noUnpackerForService", code=1, command=None, service="nobody"),
      lambda client: client.unpack_client_message(b"", command=1, service="nobody")),
-    (keelgate.DecodingError, dict(kind="keyNotFound", key="c", coding_path=[]),
-     lambda client: client.unpack("VespInvitation", b"<plist><dict/></plist>")),
     (keelgate.HostError, dict(reason="messageTooLarge"),
      lambda _: keelgate.Client(max_message=9).unpack("PropertyList", bytes(10))),
     (keelgate.HostError, dict(reason="startFailed"),

@@ -161,7 +161,7 @@ int main(int, char** arguments) {
   ready.numbers[1] = ownVersion() + (manner == "newer" ? 1 : 0);
   if (manner == "refuses") {
     ready.kind = ControlKind::refused;
-    ready.numbers[0] = static_cast<std::uint64_t>(StartStep::loadFilter);
+    ready.numbers = {static_cast<std::uint64_t>(StartStep::loadFilter), EPERM, 0, 0};
   }
   if (manner == "babbles") ready.magic = 0;
   if (manner != "mute") send(ready);

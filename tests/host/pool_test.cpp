@@ -62,7 +62,7 @@ TEST(Start, AFailureSaysWhatIsWrong) {
 #ifndef KEELGATE_UNSEALED
       {fakeOptions("unsealed"), "built without its seal"},
 #endif
-      {fakeOptions("refuses"), "The kernel refused the system call filter: use a kernel with"},
+      {fakeOptions("refuses"), "that the service is started under (Operation not permitted)"},
       {fakeOptions("newer"), "and its client of"},
       {fakeOptions("dies"),
        "The service ended, or said something unknown, while it was starting: check that it is a "
@@ -360,16 +360,10 @@ TEST(Application, TrustsTheListenersThatItNames) {
   }
 }
 
-TEST(Application, MayUseAnActivatedServiceAndIsToldWhereItSaysWhyNot) {
+TEST(Application, IsToldWhereAnActivatedServiceSaysWhyNot) {
   const String outcome = startOf(Activator(geteuid(), "fake_service.dies").options);
   for (const char* hint : {"journalctl -u", "MaxConnections"}) {
     EXPECT_NE(outcome.find(hint), String::npos) << outcome;
-  }
-  const Activator activator;
-  Client client(activator.options);
-  for (int i = 0; i < 2; ++i) {
-    EXPECT_EQ(outcomeOf(client, fault), "crashed");
-    EXPECT_EQ(outcomeOf(client, good), "record 7");
   }
 }
 
