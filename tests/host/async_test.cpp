@@ -1,6 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
 // Batches, and calls that an event loop of the application drives.
-#include "framework/client/exchange.h"
 #include "framework/protocol/data_frames.h"
 #include "framework/transport/error_coding.h"
 #include "tests/host/host_testing.h"
@@ -141,34 +140,6 @@ TEST(Batch, TheTimeOfAMessageBeginsWithItsTurn) {
   }
   // Such a client has a second service ready.
   EXPECT_TRUE(comesTrue([] { return children().size() == 2; }));
-}
-
-/// To requests that are under way together, in whatever pieces they come.
-TEST(Exchange, GivesEachReplyWhole) {
-  const std::size_t sizes[] = {0, 70'000, 3, 200'000, 1};
-  const OutgoingMessage request{.record = 0, .command = 1, .service = "s", .message = {}};
-  for (const std::size_t piece : {1'000U, 69'999U, 70'000U, 100'000U, 1'000'000U}) {
-    int ends[2];
-    ASSERT_EQ(socketpair(AF_UNIX, SOCK_STREAM, 0, ends), 0);
-    Exchange exchange(ends[0], 7);
-    Data replies;
-    for (const std::size_t size : sizes) {
-      exchange.add(request);
-      Protocol::appendReplyFrame(replies, static_cast<std::uint32_t>(7 + (&size - sizes)),
-                                 Protocol::ReplyKind::record, Data(size, std::byte(size)));
-    }
-    Bytes left = replies;
-    for (const std::size_t size : sizes) {
-      for (exchange.advance(); exchange.advance() != Exchange::State::answered;) {
-        ASSERT_FALSE(left.empty());
-        left = left.subspan(std::size_t(std::max<ssize_t>(
-            0, send(ends[1], left.data(), std::min(piece, left.size()), MSG_DONTWAIT))));
-      }
-      EXPECT_EQ(Data(exchange.body().begin(), exchange.body().end()), Data(size, std::byte(size)));
-      exchange.drop();
-    }
-    for (const int end : ends) close(end);
-  }
 }
 
 TEST(Async, IsCancelledAtItsDeadlineAlsoBeforeItsTurn) {
