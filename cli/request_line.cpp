@@ -5,7 +5,6 @@
 #include "cli/request_line.h"
 
 #include "framework/json/writer.h"
-#include "text/ascii.h"
 #include "text/base64.h"
 #include "text/utf8.h"
 
@@ -19,8 +18,6 @@
 namespace Keelgate::CLI {
 
 namespace {
-
-using Text::isDigit;
 
 enum Member : std::size_t { record, service, command, message, typed, id, none };
 
@@ -55,6 +52,10 @@ using Members = std::array<Optional<std::span<char>>, none>;
 
 std::string_view textOf(std::span<const char> characters) {
   return {characters.data(), characters.size()};
+}
+
+constexpr bool isDigit(char c) {
+  return c >= '0' && c <= '9';
 }
 
 /// The value of four hexadecimal digits; nothing where they are not that.
@@ -105,20 +106,6 @@ std::string_view unescaped(std::span<char> characters) {
   return {characters.data(), out};
 }
 
-/// JSON that is well-formed, without the white space between its parts, and fit for a terminal.
-String compacted(std::string_view json) {
-  String text;
-  bool inString = false;
-  for (std::size_t i = 0; i < json.size(); ++i) {
-    if (!inString && Text::isSpace(json[i])) continue;
-    text += json[i];
-    if (json[i] == '"') inString = !inString;
-    // Whatever is escaped does not end the string.
-    if (json[i] == '\\') text += json[++i];
-  }
-  return JSON::withoutControls(text);
-}
-
 /// Reads JSON from the beginning of a text, strictly. Throws Invalid at the first thing that is not
 /// JSON.
 class Reader {
@@ -126,7 +113,7 @@ class Reader {
   explicit Reader(std::span<char> line) : line_(line) {}
 
   void skipSpace() {
-    while (Text::isSpace(peek())) ++at_;
+    while (peek() == ' ' || peek() == '\t' || peek() == '\r' || peek() == '\n') ++at_;
   }
   /// 0 at the end. A null character is not JSON anywhere, so it may look like it.
   [[nodiscard]] char peek() const { return at_ < line_.size() ? line_[at_] : '\0'; }
@@ -169,20 +156,22 @@ class Reader {
   }
 
   /// A value of any depth, without recursion, which would let a nested id choose the depth of the
-  /// stack.
-  std::span<char> value() {
+  /// stack. `copy` gets what it is made of, without white space between.
+  std::span<char> value(String* copy) {
     String open;
     const std::size_t begin = at_;
     do {
-      if (beginsValue(open)) continue;
+      if (beginsValue(open, copy)) continue;
       while (!open.empty()) {
         skipSpace();
         if (take(',')) {
-          if (open.back() == '}') key();
+          add(copy, ",");
+          if (open.back() == '}') member(copy);
           skipSpace();
           break;
         }
         expect(open.back());
+        add(copy, {&open.back(), 1});
         open.pop_back();
       }
     } while (!open.empty());
@@ -194,15 +183,21 @@ class Reader {
   }
 
  private:
+  static void add(String* copy, std::string_view text) {
+    if (copy != nullptr) *copy += text;
+  }
+
   /// A scalar, an empty container, or the beginning of another: true where a value comes next.
-  bool beginsValue(String& open) {
+  bool beginsValue(String& open, String* copy) {
+    const std::size_t begin = at_;
     const char c = peek();
     if (c == '{' || c == '[') {
       ++at_;
       open += c == '{' ? '}' : ']';
+      add(copy, {&c, 1});
       skipSpace();
       if (peek() == open.back()) return false;
-      if (c == '{') key();
+      if (c == '{') member(copy);
       return true;
     }
     if (c == '"') {
@@ -212,7 +207,14 @@ class Reader {
     } else {
       literal();
     }
+    // What the id has in it goes to a terminal as it stands.
+    if (copy != nullptr) *copy += JSON::withoutControls(textOf(line_.subspan(begin, at_ - begin)));
     return false;
+  }
+
+  void member(String* copy) {
+    const std::span<char> name = key();
+    if (copy != nullptr) *copy += '"' + JSON::withoutControls(textOf(name)) + "\":";
   }
 
   void skipEscape() {
@@ -285,9 +287,9 @@ class RequestReader {
 
   [[nodiscard]] const Members& members() const { return members_; }
   [[nodiscard]] const String& problem() const { return problem_; }
-  [[nodiscard]] Optional<String> idText() const {
+  [[nodiscard]] Optional<String> takeId() {
     if (idIsAmbiguous_ || !members_[id]) return std::nullopt;
-    return compacted(textOf(*members_[id]));
+    return std::move(id_);
   }
 
  private:
@@ -318,12 +320,14 @@ class RequestReader {
       wrong(fmt::format("\"{}\" must be {}", rules[member].key, rules[member].demand));
     }
     const Bool isString = reader_.peek() == '"';
-    const std::span<char> value = isString && member != id ? reader_.string() : reader_.value();
+    std::span<char> value =
+        isString && member != id ? reader_.string() : reader_.value(member == id ? &id_ : nullptr);
     if (fits) members_[member] = value;
   }
 
   Reader reader_;
   Members members_;
+  String id_;
   String problem_;
   bool idIsAmbiguous_ = false;
 };
@@ -382,7 +386,7 @@ RequestLine readRequestLine(std::span<char> line) {
     RequestReader request(line);
     request.read();
     // Only from a line that was read to its end: half an id is another one.
-    read.id = request.idText();
+    read.id = request.takeId();
     demand(request.problem().empty(), request.problem());
     read.content = requestOf(request.members());
   } catch (Invalid& invalid) {
