@@ -6,7 +6,8 @@
 #pragma once
 
 #include "program/invitation/vesp_invitation_unpacker.h"
-#include "program/payload/vesp_command_response_unpackers.h"
+#include "program/payload/vesp_command_response_unpacker.h"
+#include "program/payload/vesp_command_web_tunnel_response_unpacker.h"
 #include "program/payload/vesp_ostrel_payload_unpacker.h"
 #include "program/property_list/property_list_unpacker.h"
 #include "program/service/vesp_sample_message_unpacker.h"

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The delivery service's answer to a command, and to an HTTP request that it made on the device's
-/// behalf. Deliberate: their message numbers are not strings.
+/// The answer to an HTTP request made on the device's behalf. Deliberate: its message number is no
+/// string.
 #pragma once
 
 #include "program/payload/vesp_payload_nested_schemas.h"
@@ -9,24 +9,6 @@
 #include <keelgate/describe.h>
 
 namespace VespKeelgateService {
-
-/// Only the command is required.
-struct VespCommandResponseSchema {
-  KEELGATE_SCHEMA(VespCommandResponseSchema,
-      (Int, command, "c"),
-      (Optional<Int64>, messageId, "i"),
-      (Optional<Data>, messageUUID, "U"),
-      (Optional<Int>, responseStatus, "s"),
-      (Optional<Int>, failReason, "fR"),
-      (Optional<Data>, token, "t"),
-      (Optional<Bool>, internalBuild, "x-internal"),
-      (Optional<Bool>, loggingProfile, "x-logging"),
-      (Optional<String>, applicationId, "qai"),
-      (Optional<Int>, requestType, "qat"),
-      (Optional<Data>, vespSessionId, "qvesp"),
-      (Optional<Bool>, sharedSession, "hlss"),
-      (Optional<Int>, protocolVersion, "qv"));
-};
 
 /// Only the command is required. "h" is the dictionary of headers here as in a payload.
 struct VespCommandWebTunnelResponseSchema {

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "program/payload/vesp_command_response_unpackers.h"
+#include "program/payload/vesp_command_response_unpacker.h"
 
 #include "framework/contracts/construct.h"
 #include "program/schema/property_list_decoder.h"
@@ -8,13 +8,6 @@ namespace VespKeelgateService {
 
 Keelgate::VespCommandResponse VespCommandResponseUnpacker::unpack(Bytes from) const {
   return Keelgate::construct(PropertyListDecoder().decode<Schema, SchemaType>(from));
-}
-
-Keelgate::VespCommandWebTunnelResponse VespCommandWebTunnelResponseUnpacker::unpack(
-    Bytes from) const {
-  auto response = PropertyListDecoder().decode<Schema, SchemaType>(from);
-  Keelgate::constructInPlace(response.httpHeaders);
-  return Keelgate::construct(std::move(response));
 }
 
 }  // namespace VespKeelgateService
