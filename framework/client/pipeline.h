@@ -2,10 +2,10 @@
 /// Many short messages on their way to one worker that is used again: both sides make a system call
 /// for many of them.
 ///
-/// It only ever gives good news. Where a worker ends, lies, or says nothing for long, each message
-/// that has no reply yet is tried once more, alone in a fresh worker (Call), and what becomes of it
-/// there is its outcome: so that one message never costs another, and each error is the right
-/// one's.
+/// It only ever gives good news. Where a worker ends, violates the protocol, or says nothing for
+/// long, each message that has no reply yet is tried once more, alone in a fresh worker (Call), and
+/// what becomes of it there is its outcome: so that one message never costs another, and each error
+/// is the right one's.
 #pragma once
 
 #include "framework/client/call.h"

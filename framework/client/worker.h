@@ -35,7 +35,7 @@ class Worker {
   /// Nothing more is to come from it. Before the next worker is forked: to close a socket while
   /// another one is on its way to a process has the kernel look for lost ones.
   void hangUp() noexcept { channel_.close(); }
-  /// It ends by itself: it has had its last message.
+  /// It ends by itself: it has had its last message, or its channel is closed.
   void finish() noexcept { finished_ = true; }
   [[nodiscard]] bool isFinished() const noexcept { return finished_; }
 

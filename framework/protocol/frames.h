@@ -78,8 +78,8 @@ static_assert(sizeof(RequestHeader) == 32);
 /// Frames of `log` come first; one of the others is the last.
 enum class ReplyKind : std::uint16_t { log = 1, record, error };
 
-/// Stands before every frame that a worker sends. It may be taken over by then: any of these may be
-/// a lie.
+/// Stands before every frame that a worker sends. It may be taken over by then: none of these
+/// has to be true.
 struct ReplyHeader {
   std::uint32_t magic;
   std::uint16_t version;

@@ -17,8 +17,8 @@ Data encodeError(const Breach& error);
 Data encodeError(const VespKeelgateService::VespClientMessageUnpackingError& error);
 
 /// Throws the error that a body holds, MalformedReply when it does not hold one, ReadLimitReached
-/// or std::bad_alloc. The bytes may be a lie: of the error's fields only those that go together are
-/// taken, and of its texts only UTF-8.
+/// or std::bad_alloc. The bytes may be anything: of the error's fields only those that go together
+/// are taken, and of its texts only UTF-8.
 [[noreturn]] void throwError(Bytes body, const ReadLimits& limits = {});
 
 }  // namespace Keelgate::Transport

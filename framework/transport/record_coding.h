@@ -28,9 +28,9 @@ namespace Keelgate::Transport {
 
 // ---------------------------------------------------------------------------------- writing
 
-// Declared before its special cases: they and it call one another. Texts and data that are written
-// are given back at once, field by field in the order by type: a destructor that comes to them in
-// the order as declared has jumps that no processor foresees.
+// Declared before its special cases: they and it call one another. Optional texts and data that
+// were copied are given back at once, field by field in the order by type: a destructor that comes
+// to them in the order as declared has jumps that no processor foresees.
 template <class T>
 void write(Writer& to, T& value);
 
@@ -192,7 +192,7 @@ requires(isArray<Array<T>>) void read(Reader& from, Array<T>& values, int depth)
   for (std::size_t i = 0; i < count; ++i) read(from, values.emplace_back(), inside);
 }
 
-/// The case that the byte names; a byte that names none is a lie.
+/// The case that the byte names; a byte that names none is refused.
 template <class T, std::size_t... i>
 void readCase(Reader& from, T& value, int depth, std::index_sequence<i...>) {
   const std::size_t which = from.byte();

@@ -46,7 +46,8 @@ struct ReadLimits {
 };
 
 /// So many containers of a property list stand in one another, and so many at most what a reply
-/// brings. A lying service must not get any deeper into the client's stack than an honest one.
+/// brings. A service that was taken over must not get any deeper into the client's stack than an
+/// honest one.
 constexpr int maximumNesting = 512;
 
 /// The body of a reply, in parts: what is long is borrowed from where it lies, and never copied.
@@ -151,7 +152,7 @@ class Reader {
  private:
   /// Everything that is read comes through here.
   Bytes take(std::uint64_t size) {
-    // Compared, not added to a position: no length that a liar announces can wrap.
+    // Compared, not added to a position: no length that is announced can wrap.
     if (size > rest_.size()) throw MalformedReply();
     if (untilClock_-- == 0) checkTime();
     const Bytes taken = rest_.first(size);

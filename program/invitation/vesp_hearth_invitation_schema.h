@@ -51,7 +51,7 @@ struct VespHearthInvitationSchema {
       (Optional<Int64>, inviteePrivilege, "HRHomeInviteePrivilegeCodingKey"),
       (Optional<Bool>, doesHomeHaveCameras, "HRIncomingInvitationHomeHasCamerasCodingKey"),
       (Optional<VespHearthInviteeScheduleSchema>, inviteeSchedule, "HR.RG.Schedule"),
-      // Texts on the wire. One that is no UUID fails the message.
+      // Texts on the wire. One that is not a UUID fails the message.
       (Optional<UUID>, homeUUID, "kHomeUUID"),
       (Optional<Data>, controllerPublicKey, "kControllerPublicKey"),
       (Optional<String>, controllerPairingName, "kControllerPairingNameKey"),

@@ -77,7 +77,7 @@ DecodingError invalidRawValue(const CodingPath& path, std::string_view enumerati
 }
 
 DecodingError invalidUUID(const CodingPath& path) {
-  return corrupted(path, "The string is no UUID.");
+  return corrupted(path, "The string is not a UUID.");
 }
 
 // Without a path: what is malformed, or too much, is the message as a whole.

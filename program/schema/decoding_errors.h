@@ -36,7 +36,7 @@ DecodingError numberDoesNotFit(const CodingPath& path, std::string_view expected
 /// The number at `path` is not a raw value of the enumeration.
 DecodingError invalidRawValue(const CodingPath& path, std::string_view enumeration);
 
-/// The string at `path` is no UUID.
+/// The string at `path` is not a UUID.
 DecodingError invalidUUID(const CodingPath& path);
 
 /// The message is not a property list, or expands out of proportion.

@@ -118,11 +118,17 @@ constexpr bool everyFieldHasOnePlace() {
   });
   return isSo;
 }
-static_assert(everyFieldHasOnePlace());
+static_assert(everyFieldHasOnePlace(), "a field of the check-in has no place, or two");
+constexpr std::size_t numberedFields =
+    (FoldedCheckIn::last - FoldedCheckIn::first + 1) * std::size(families);
 static_assert(std::ranges::count_if(numbered,
                                     [](const Place& place) { return place.to != nullptr; }) ==
-                  (FoldedCheckIn::last - FoldedCheckIn::first + 1) * std::size(families),
+                  numberedFields,
               "not every group has all of its fields");
+// The list of groups is the record's alone.
+static_assert(WaymarkSchema::CodingKeys::size - numberedFields + 1 ==
+                  Keelgate::FieldsOf<Keelgate::WaymarkMessage>::size,
+              "a field of the record is not in the schema");
 
 }  // namespace Fold
 
