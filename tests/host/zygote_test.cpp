@@ -321,6 +321,17 @@ TEST_F(Zygote, WorkersAreForkedAheadAndUsedWhileTheyAreQuiet) {
     EXPECT_EQ(take().served(), 0u);
     EXPECT_TRUE(std::holds_alternative<Wait>(pool.take(10, false, soon)));
     EXPECT_TRUE(greet());
+    // One speaks up behind its answer: the next message has another worker, then another service.
+    if (messages > 1) {
+      Worker answered = take();
+      EXPECT_EQ(std::get<ControlKind>(next()), ControlKind::fork);
+      answered.nextSequence();
+      EXPECT_EQ(write(channels_.at(last_.slot), "x", 1), 1);
+      pool.giveBack(std::move(answered));
+      EXPECT_EQ(take().served(), 0u);
+      EXPECT_TRUE(std::holds_alternative<Wait>(pool.take(10, false, soon)));
+      EXPECT_TRUE(greet());
+    }
     // One speaks up without having been asked.
     EXPECT_EQ(take().served(), 0u);
     pool.tidy();
