@@ -180,13 +180,12 @@ template <Keelgate::Schema S, class R>
 void decodeFields(Decoding& decoding, const PropertyList::Value& value, const CodingPath& path,
                   R& into) {
   constexpr auto& decoders = decodersOf<S, R, FieldDecoder<S, R>>;
-  constexpr auto& order = Keelgate::byType<S>;
   constexpr std::size_t size = S::CodingKeys::size;
   static_assert(decoders.misfit == size,
                 "a field of the record cannot hold what the schema's field does");
   const FieldValues<S> values(value);
   const auto decode = [&](std::size_t place) {
-    const std::size_t position = order.positions.data()[place];
+    const std::size_t position = Keelgate::byType<S>.positions.data()[place];
     // NOLINTNEXTLINE(clang-analyzer-core.CallAndMessage): none is null, which was asserted.
     decoders.functions.data()[position](decoding, values.at(place), path, position, into);
   };
@@ -195,7 +194,7 @@ void decodeFields(Decoding& decoding, const PropertyList::Value& value, const Co
   }
   // What stands before the first field that is missing may be wrong, too.
   for (std::size_t position = 0; position < size; ++position) {
-    const std::size_t place = order.places.data()[position];
+    const std::size_t place = Keelgate::byType<S>.places.data()[position];
     if (values.present().contains(place)) {
       decode(place);
     } else if (requiredFields<S>.contains(place)) {
