@@ -76,8 +76,6 @@ TEST(Malformed, BinaryObjects) {
 }
 
 TEST(Malformed, Objects8BytesWide) {
-  const Raw wide{{"\xA1" + bigEndian(1, 8), "\x09"}, 8, 8};
-  EXPECT_EQ(read(wide.message()), Tree(Array{true}));
   const Raw far{{"\xA1" + bigEndian((1ull << 63) + 1, 8), "\x09"}, 8, 8};
   EXPECT_EQ(problemIn(far.message()), Problem::referenceOutOfRange);
   for (std::size_t size = 1; size <= 8; ++size) {
@@ -140,6 +138,7 @@ TEST(Malformed, XmlElements) {
        xml("<true a='' a='' b='1'/>")});
   all(Problem::badInteger, {xml("<integer/>")});
   all(Problem::badReal, {xml("<real></real>")});
+  all(Problem::badBase64, {xml("<data>Q</data>"), xml("<data><![CDATA[QQ]]></data>")});
   all(Problem::badDate, {xml("<date/>")});
 }
 
@@ -157,17 +156,13 @@ TEST(Malformed, SaysWhereAndWhatInOneSentence) {
   const std::string key = "<key>a</key>";
   const std::pair<std::string, std::string> cases[] = {
       {"", "byte 1: the message is empty"},
-      {"\x1F\x8B", "byte 1: the message is gzip-compressed and must be decompressed first"},
-      {"hello", "line 1, column 1: the message is neither binary nor XML"},
       {binary({"\xA1\x01", "\x70"}), "byte 11: an object has an unknown marker"},
       {binary({"\xD2\x01\x02\x03\x03", "\x51\x61", "\x51\x61", "\x09"}),
        "byte 11: a dictionary has the same key twice"},
       {"\n\n <x/>", "line 3, column 2: an element is unknown"},
       {xml("\r\n\r<integer>x</integer>"),
        "line 3, column 10: an integer is misspelt or does not fit 64 bits"},
-      {xml("<array>\n\xC3\xA9</array>"), "line 2, column 1: text stands where only elements may"},
       {xml("<string>\xC3\xA9\xFF</string>"), "line 1, column 18: the text is not valid UTF-8"},
-      {xml("<dict>\n" + key + "\n</dict>"), "line 3, column 1: a value is missing"},
       {xml("<dict>\n" + key + "<true/>\n" + key + "<true/></dict>"),
        "line 3, column 6: a dictionary has the same key twice"},
       {xml("<dict>" + key + "<true/>\n<key>&#97;</key><true/>\n</dict>"),

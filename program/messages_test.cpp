@@ -34,9 +34,7 @@ TEST(Sessions, TheCommandAloneSelectsTheSchema) {
       {"unknown subcommand", reinitiate, with({{"ri", 4}}, triple), "dataCorrupted @ri"},
       {"unknown end reason", cancel, with({{"e", 77}}, triple), "dataCorrupted @e"},
       {"negative end reason", cancel, with({{"e", -1}}, triple), "dataCorrupted @e"},
-      {"end reason as text", cancel, with({{"e", "4"}}, triple), "typeMismatch @e"},
       {"decline sent as reinitiate", reinitiate, triple, "keyNotFound ri @"},
-      {"negative version", accept, with({{"v", -1}}, triple), "dataCorrupted @v"},
       {"empty octets are not absent", decline, with({{"c", data("")}}, triple),
        ".result.sessionDecline.version=1 .result.sessionDecline.sessionID=S "
        ".result.sessionDecline.participantID=P .result.sessionDecline.sessionMessageContext="},
@@ -45,8 +43,6 @@ TEST(Sessions, TheCommandAloneSelectsTheSchema) {
 
 TEST(Payloads, AreStrictAtEveryDepth) {
   check({
-      {"text where the answers have a number", payload, Dictionary{{"c", 1}, {"i", 5}},
-       "typeMismatch @i"},
       {"deep in the headers", payload,
        Dictionary{{"c", 1},
                   {"mml", Array{Dictionary{{"c", 1}},
@@ -152,10 +148,6 @@ TEST(Invitations, FailInTheOrderOfTheirFields) {
        "typeMismatch @c.cD.ObjectDataKey"},
       {"a UUID without dashes", home("kHomeUUID", "0f8fad5bd9cb469fa16570867728950e"),
        "dataCorrupted @c.cD.kHomeUUID"},
-      {"a UUID in either case", home("kHomeUUID", "0f8FAD5b-d9cb-469f-A165-70867728950e"),
-       ".context.schema=ht-invite-v1 .context.contextType=1 "
-       ".context.context.dictionary.vespHearthInvitation.homeUUID="
-       "15:143:173:91:217:203:70:159:161:101:112:134:119:40:149:14: .state=-5 .identifier=u"},
       {"an empty home token", home("HRDHomeInvitationShareTokenKey", data("")),
        token + "Empty sharing token"},
       {"an empty coffer token", kind(cofferSchema, with({{"invitationToken", data("")}}, coffer)),
@@ -190,30 +182,29 @@ TEST(Invitations, TheMirrorOfAContextIsCaseKeyedAndDoesNotComeBack) {
 
 TEST(Invitations, TheStandardDecodersOfTheCaseKeyedFormWantExactlyOneKey) {
   const Dictionary body{{"_0", Dictionary{}}};
-  const std::string notOne = "Invalid number of keys found, expected one.";
+  const std::string mismatch = "typeMismatch @dictionaryContext._0";
   const auto form = [](Dictionary kind) {
     return Dictionary{{"dictionaryContext", Dictionary{{"_0", std::move(kind)}}}};
   };
   const std::pair<Dictionary, std::string> rows[] = {
       {form({{"vespSampleInvitation", body}}), ""},
-      {{}, "0 " + notOne},
-      {form({}), "2 " + notOne},
-      {form({{"vespSampleInvitation", body}, {"vespHearthInvitation", body}}), "2 " + notOne},
-      {form({{"vespOtherInvitation", body}}), "2 " + notOne},
-      {form({{"vespSampleInvitation", Dictionary{}}}), "3 No value associated with key \"_0\"."}};
+      {{}, "typeMismatch @"},
+      {form({}), mismatch},
+      {form({{"vespSampleInvitation", body}, {"vespHearthInvitation", body}}), mismatch},
+      {form({{"vespOtherInvitation", body}}), mismatch},
+      {form({{"vespSampleInvitation", Dictionary{}}}),
+       "keyNotFound _0 @dictionaryContext._0.vespSampleInvitation"}};
   for (const auto& [tree, expected] : rows) {
     const auto bytes = PropertyList::writeBinary(tree);
     const PropertyList::Document document(bytes);
     PropertyList::ExpansionBudget budget(bytes.size());
     Decoding decoding{budget};
     VespDictionaryContextData contextData;
-    std::string told;
-    try {
-      decodeValue<VespDictionaryContextData>(decoding, document.top(), CodingPath(), contextData);
-    } catch (const Keelgate::DecodingError& error) {
-      told = std::to_string(error.codingPath.size()) + " " + error.debugDescription;
-    }
-    EXPECT_EQ(told, expected);
+    EXPECT_EQ(errorOf([&] {
+                decodeValue<VespDictionaryContextData>(decoding, document.top(), CodingPath(),
+                                                       contextData);
+              }),
+              expected);
   }
 }
 
@@ -232,7 +223,6 @@ TEST(CheckIns, FoldTheirGroupsAndTolerateUnknownCodes) {
   EXPECT_NE(plain.find("messageType=2"), std::string::npos) << "a known code stays";
   EXPECT_EQ(unpacked({{"triggerType", -1}}), "dataCorrupted @triggerType");
   EXPECT_EQ(unpacked({{"isSOSTrigger", 1}}), "typeMismatch @isSOSTrigger");
-  EXPECT_EQ(unpacked({{"latitude", "48"}}), "typeMismatch @latitude");
 }
 
 }  // namespace

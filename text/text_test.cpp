@@ -102,9 +102,6 @@ TEST(Utf8, WhatIsMalformedIsFoundAnywhere) {
 
 TEST(DateTime, IsSpeltAsTheCalendarHasIt) {
   const std::pair<double, const char*> spellings[] = {{0, "2001-01-01T00:00:00Z"},
-                                                      {-1, "2000-12-31T23:59:59Z"},
-                                                      {-978'307'200, "1970-01-01T00:00:00Z"},
-                                                      {5'097'600, "2001-03-01T00:00:00Z"},
                                                       {-26'524'800, "2000-02-29T00:00:00Z"},
                                                       {-3'182'198'400, "1900-03-01T00:00:00Z"},
                                                       {-63'113'904'000, "0001-01-01T00:00:00Z"},

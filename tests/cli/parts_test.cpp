@@ -3,7 +3,6 @@
 #include "cli/nearest.h"
 #include "cli/ordered_work.h"
 #include "cli/request_line.h"
-#include "cli/table.h"
 
 #include <gtest/gtest.h>
 
@@ -131,21 +130,6 @@ TEST(Suggestion, IsWhatAThirdOfTheNameMayBeMistypedFor) {
   for (const auto& [names, name, said] : table) {
     EXPECT_EQ(suggestion(names, name, "nothing"), said);
   }
-}
-
-TEST(Table, HasItsColumnsWhereTheyFit) {
-  Table table({"Name", "Is"});
-  table.add({"a", "b c"});
-  table.add({"long", "dddd ee"});
-  const String wide = "  Name  Is\n  a     b c\n  long  dddd ee\n";
-  for (const std::size_t width : {15U, 80U}) EXPECT_EQ(table.text(width, false), wide);
-  EXPECT_EQ(table.text(14, true), "\033[1m  Name  Is\033[0m\n  a  b c\n  long  dddd\n      ee\n");
-  // The last column is broken where it leaves room for some words.
-  Table words({"N", "T"});
-  words.add({"x", "aaaa bbbb cccc dddd eeee ffff gggg hhhh"});
-  EXPECT_EQ(words.text(35, false),
-            "  N  T\n  x  aaaa bbbb cccc dddd eeee ffff\n         gggg hhhh\n");
-  EXPECT_EQ(words.text(34, false), "  N  T\n  x  aaaa bbbb cccc dddd eeee ffff\n      gggg hhhh\n");
 }
 
 using Job = OrderedWork::Job;

@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // Compiles as it stands. The mistakes in it that must not, and what each must be told, are in
 // run.py.
-#include "framework/contracts/construct.h"
 #include "program/schema/property_list_decoder.h"
 #include "program/schema/values.h"
 
@@ -35,11 +34,6 @@ static_assert(knownKeys<Schema>.find(PropertyList::keyDigest("1"), [] { return "
 
 Record decode(Bytes from) {
   return PropertyListDecoder().decode<Schema, Record>(from);
-}
-
-Record byHand(Schema&& schema) {
-  return Keelgate::construct<Record>(
-      {.one = schema.one, .two = std::move(schema.two), .three = {}});
 }
 
 }  // namespace VespKeelgateService

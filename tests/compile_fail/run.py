@@ -5,7 +5,6 @@
 usage: run.py COMPILER ROOT
 """
 import pathlib
-import re
 import subprocess
 import sys
 
@@ -23,13 +22,7 @@ mistakes = [
      "has another name than the schema's field"),
     ("(Optional<InnerRecord>, three)", "(Optional<Int>, three)",
      "a field of the record cannot hold what the schema's field does"),
-    (".one = schema.one, .two = std::move(schema.two)",
-     ".two = std::move(schema.two), .one = schema.one",
-     "does not match declaration order|out of declaration order|specified in declaration order"),
 ]
-if "clang" not in compiler:  # clang does not see it
-    mistakes.append((".two = std::move(schema.two), ", "",
-                     "missing initializer for member .*two"))
 
 
 def compile(source):
@@ -46,7 +39,7 @@ failed = 0
 for there, mistake, message in mistakes:
     assert sound.count(there) == 1, there
     told = compile(sound.replace(there, mistake))
-    if told.returncode == 0 or not re.search(message, told.stderr):
+    if told.returncode == 0 or message not in told.stderr:
         failed += 1
         print(f"{mistake or 'without ' + there}:\n{told.stderr[:2000] or 'it compiles'}")
 print(f"{len(mistakes) - failed} passed, {failed} failed")

@@ -48,8 +48,6 @@ expect "and nothing else of it" "$(find "$work/part" -name keelgate -type f -per
 other=$(nm -DC --defined-only "$libraries/libkeelgate.so" | awk '{$1=$2=""; print}' |
   grep -vE 'Keelgate::|VespKeelgateService::|^ *KEELGATE|^ *keelgate_' || true)
 expect "exports beside the API" "$other" ""
-expect "the library's name" \
-  "$(objdump -p "$libraries/libkeelgate.so" | awk '$1 == "SONAME" {print $2}')" libkeelgate.so.0
 
 # A stranger's service beside a copy of the command: as root nobody else's is started.
 unpack="unpack --record VespCommandResponse $root/examples/messages/command-response.xml"
