@@ -95,18 +95,6 @@ TEST_F(ServiceLocation, RefusesALinkThatAStrangerMade) {
   EXPECT_NE(outcome("link/inner/service").find("link belongs to user 12345"), String::npos);
 }
 
-/// Where a build is, nothing that is installed is meant.
-TEST_F(ServiceLocation, IsThatOfTheBuildThatTheCallerIsIn) {
-  const fs::path own = fs::read_symlink("/proc/self/exe").parent_path();
-  String found;
-  try {
-    found = locateService("", registry_).path;
-  } catch (const StartFailure& failure) {
-    found = failure.description;
-  }
-  EXPECT_NE(found.find(String(own / "../bin/VespKeelgateService")), String::npos) << found;
-}
-
 TEST_F(ServiceLocation, KeepsTheFileThatWasLookedAt) {
   const fs::path service = root_ / "outer/inner/service";
   struct stat before {};

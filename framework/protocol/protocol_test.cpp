@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The frames of both channels: what one end sends the other takes; anything that is not exactly
-/// right is refused. Replies in pieces and frames with another head are tried by the harness of
-/// frames.
+/// The control channel: what one end sends the other takes; anything that is not exactly right is
+/// refused. Replies in pieces and frames with another head are tried by the harness of frames.
 #include "framework/protocol/control_frames.h"
 #include "framework/protocol/data_frames.h"
 
@@ -9,7 +8,6 @@
 #include <gtest/gtest.h>
 #include <sys/socket.h>
 #include <unistd.h>
-#include <algorithm>
 #include <array>
 #include <cstring>
 #include <filesystem>
@@ -18,54 +16,6 @@
 
 namespace Keelgate::Protocol {
 namespace {
-
-using State = ReplyParser::State;
-
-constexpr std::uint32_t sequence = 7;
-constexpr std::uint64_t largestBody = 1000;
-
-Data octets(std::size_t size) {
-  return Data(size, std::byte{'x'});
-}
-
-Data replyOf(std::size_t logLines, std::size_t logLength, std::size_t bodyLength) {
-  Data reply;
-  for (std::size_t i = 0; i < logLines; ++i) {
-    appendReplyFrame(reply, sequence, ReplyKind::log, octets(logLength));
-  }
-  appendReplyFrame(reply, sequence, ReplyKind::record, octets(bodyLength));
-  return reply;
-}
-
-State parse(Bytes reply) {
-  return ReplyParser(sequence, largestBody).parse(reply);
-}
-
-TEST(Reply, KeepsItsLimits) {
-  EXPECT_EQ(parse(replyOf(maximumLogFrames, maximumLogLength, largestBody)), State::complete);
-  EXPECT_EQ(parse(replyOf(maximumLogFrames + 1, 1, 1)), State::malformed);
-  EXPECT_EQ(parse(replyOf(1, maximumLogLength + 1, 1)), State::malformed);
-  EXPECT_EQ(parse(replyOf(0, 0, largestBody + 1)), State::malformed);
-  Data longer = replyOf(0, 0, 1);
-  longer.push_back({});
-  EXPECT_EQ(parse(longer), State::malformed);
-}
-
-TEST(Request, IsExpectedWithinItsLimits) {
-  const RequestHeader right = makeRequestHeader(1, 2, maximumServiceLength, 100, sequence);
-  EXPECT_TRUE(isExpected(right, sequence, 100));
-  EXPECT_FALSE(isExpected(right, sequence, 99));
-  EXPECT_FALSE(isExpected(right, sequence + 1, 100));
-  for (const auto change : std::initializer_list<void (*)(RequestHeader&)>{
-           [](auto& h) { h.magic ^= 1; }, [](auto& h) { ++h.version; },
-           [](auto& h) {
-             ++h.serviceLength;
-           }}) {
-    RequestHeader wrong = right;
-    change(wrong);
-    EXPECT_FALSE(isExpected(wrong, sequence, 100));
-  }
-}
 
 /// Both ends of a control channel.
 class Control : public testing::Test {

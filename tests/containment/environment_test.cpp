@@ -187,6 +187,8 @@ const std::vector<Environment> environments{
     refusing("prctl refused", "allow prctl", {{SYS_prctl, EPERM}}),
     {"capabilities kept", {{SYS_capset, EPERM}}, 0, root, userNamespaces, nothingTaken, "capset"},
     refusing("no process to be had", "ulimit -u", {{SYS_clone, EAGAIN}}),
+    refusing("not even for the service", "pids.max); it is not tried again",
+             {{SYS_clone, EAGAIN}, {SYS_clone3, EAGAIN}}),
     refusing("too little stack", "ulimit -H -s", {}, allowOnly<RLIMIT_STACK, 1 << 20>),
     refusing("an address space that is too small", "ulimit -v", {}, allowOnly<RLIMIT_AS, 64 << 20>),
 };

@@ -3,7 +3,6 @@
 #pragma once
 
 #include <array>
-#include <csignal>
 #include <cstddef>
 
 namespace Keelgate::Test {
@@ -15,9 +14,6 @@ using RawCall = std::array<long, 7>;
 
 /// Ways into the kernel beside the one that a filter is written for.
 inline constexpr bool hasOtherGates = true;
-/// What a compiler's trap ends a process with.
-inline constexpr int trapSignal = SIGILL;
-inline constexpr unsigned returnInstruction = 0xc3;
 
 inline long callKernel(const RawCall& a) {
   long result = a[0];
@@ -49,8 +45,6 @@ inline long callVsyscall(long slot) {
 #elif defined __aarch64__
 
 inline constexpr bool hasOtherGates = false;
-inline constexpr int trapSignal = SIGTRAP;
-inline constexpr unsigned returnInstruction = 0xd65f03c0;
 
 inline long callKernel(const RawCall& a) {
   register long x8 asm("x8") = a[0];

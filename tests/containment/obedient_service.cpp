@@ -13,7 +13,7 @@
 ///                      lie
 ///     count            how many of these this process has been given
 ///     log N LENGTH     logs N lines of that length, and answers
-///     fault | recurse | spin | throw | execute
+///     fault | spin
 ///     answer           behaves
 #include "framework/contracts/log.h"
 #include "framework/contracts/process.h"
@@ -53,27 +53,11 @@ long addressOf(long what) {
   return all[what];
 }
 
-/// Calls itself until the stack ends; no message has this many levels.
-// NOLINTNEXTLINE(misc-no-recursion)
-long recurse(long levels) {
-  volatile char here[4096];
-  here[0] = static_cast<char>(levels);
-  return levels == 0 ? 0 : recurse(levels - 1) + here[0];
-}
-
 void misbehave(const std::string& how) {
   // Volatile, so that no compiler sees through it.
   volatile std::size_t address = 8;
   if (how == "fault") *reinterpret_cast<volatile int*>(address) = 1;
-  if (how == "recurse") recurse(1'000'000);
-  if (how == "throw") throw 1;
   while (how == "spin") asm volatile("");
-  if (how == "execute") {
-    // In memory that can be written.
-    volatile unsigned code = returnInstruction;
-    address = reinterpret_cast<std::size_t>(&code);
-    reinterpret_cast<void (*)()>(address)();
-  }
 }
 
 /// What a message could leave behind for the next.

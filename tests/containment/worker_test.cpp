@@ -207,14 +207,6 @@ TEST_F(Worker, C5ProcessorTimeIsLimitedWithoutTheClient) {
   EXPECT_EQ(service.obey("spin").second.signal(), SIGXCPU);
 }
 
-TEST_F(Worker, FaultsEndItOnTheSpot) {
-  for (const char* order : {"fault", "recurse", "execute"}) {
-    EXPECT_EQ(service_.obey(order).second.signal(), SIGSEGV) << order;
-  }
-  // Nobody catches it.
-  EXPECT_EQ(service_.obey("throw").second.signal(), trapSignal);
-}
-
 TEST_F(Worker, LogIsCutInNumberAndLength) {
   EXPECT_EQ(service_.obey("log 2 5").first.log, std::vector<std::string>(2, "xxxxx"));
   EXPECT_EQ(service_.obey("log 9 513").first.log,
@@ -223,11 +215,19 @@ TEST_F(Worker, LogIsCutInNumberAndLength) {
 }
 
 TEST_F(Worker, WrongHeadersEndItAndMissingOnesDoNot) {
+  const auto right = Protocol::makeRequestHeader(0, 0, 0, 0, 0);
+  auto otherMagic = right, otherVersion = right;
+  ++otherMagic.magic;
+  ++otherVersion.version;
   // Another's sequence, longer than what the worker was made for, and right but cut short.
   const std::tuple<Protocol::RequestHeader, std::size_t, int> rows[] = {
       {Protocol::makeRequestHeader(0, 0, 0, 0, 1), 0, Protocol::protocolExitStatus},
       {Protocol::makeRequestHeader(0, 0, 0, shortMessage + 1, 0), 0, Protocol::protocolExitStatus},
-      {Protocol::makeRequestHeader(0, 0, 0, 0, 0), 1, 0}};
+      {Protocol::makeRequestHeader(0, 0, Protocol::maximumServiceLength + 1, 0, 0), 0,
+       Protocol::protocolExitStatus},
+      {otherMagic, 0, Protocol::protocolExitStatus},
+      {otherVersion, 0, Protocol::protocolExitStatus},
+      {right, 1, 0}};
   for (const auto& [header, missing, status] : rows) {
     const int channel = service_.fork(0);
     send(channel, &header, sizeof header - missing, MSG_NOSIGNAL);

@@ -52,6 +52,8 @@ std::vector<Attack> attacks() {
   longer.push_back({});
   const Data vast = frameSaying(1u << 20);
   const Data large(8u << 20);
+  Script talkative;
+  for (std::size_t i = 0; i <= Protocol::maximumLogFrames; ++i) talkative.log("a line");
   std::vector<Attack> all{
       {"SIGXCPU", Script().then(Op::raise, SIGXCPU), "timedOut"},
       {"SIGSYS", Script().then(Op::raise, SIGSYS), "crashed"},
@@ -64,6 +66,10 @@ std::vector<Attack> attacks() {
       {"bytes that keep coming", Script().write(vast).then(Op::trickle), "timedOut"},
       {"bytes that mean nothing", Script().then(Op::trickle), "protocolViolation"},
       {"endless", Script().then(Op::endless), "protocolViolation"},
+      {"a line too many", talkative.answer(7), "protocolViolation"},
+      {"a line too long", Script().log(String(Protocol::maximumLogLength + 1, 'x')).answer(7),
+       "protocolViolation"},
+      {"more than a reply may have", Script().write(frameSaying(1u << 30)), "protocolViolation"},
       {"two answers", Script().write(twice), "protocolViolation"},
       {"a byte behind a long answer", Script().write(longer), "protocolViolation"},
       {"longer than sent", Script().write(frameSaying(good.size() - headerSize + 1)).then(Op::exit),

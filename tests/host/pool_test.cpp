@@ -11,7 +11,6 @@
 #include <sys/stat.h>
 #include <sys/un.h>
 
-#include <array>
 #include <deque>
 #include <future>
 #include <limits>
@@ -120,19 +119,6 @@ TEST(Start, ThereMayBeTooFewDescriptors) {
   EXPECT_EQ(wait(), "record 1");
 }
 
-TEST(Start, ThereMayBeTooFewProcesses) {
-  EXPECT_EQ(inFork([] {
-              const rlimit none{};
-              setrlimit(RLIMIT_NPROC, &none);
-              if (geteuid() == 0 && setresuid(65'534, 65'534, 65'534) != 0) return 2;
-              Client::Options options = fakeOptions();
-              options.servicePath = "/bin/true";
-              return startOf(options).find("pids.max); it is not tried again") != String::npos ? 0
-                                                                                               : 1;
-            }),
-            0);
-}
-
 TEST(Pool, AMachineWithoutProcessesIsNotTheMessagesFault) {
   Client client(fakeOptions("barren"));
   EXPECT_EQ(outcomeOf(client, good), "startFailed");
@@ -215,15 +201,19 @@ TEST(Application, ItsForkHasAServiceAndCallsOfItsOwn) {
     ++told;
   };
   client.start<VespCommandResponse>({.message = good}, note);
+  // It has a number that a channel had before.
+  const int own = dup(STDERR_FILENO);
   EXPECT_EQ(inFork([&] {
               const auto inherited = openDescriptors();
               client.start<VespCommandResponse>({.message = good}, note);
               const bool answered = comesTrue([&] { return client.dispatch(), told > 0; });
               const bool right = outcomeOf(client, Script().answer(2)) == "record 2" &&
-                                 children().size() == 1 && openDescriptors() == inherited;
+                                 children().size() == 1 && openDescriptors() == inherited &&
+                                 fcntl(own, F_GETFD) >= 0;
               return answered && told == 1 && right ? 0 : 1;
             }),
             0);
+  close(own);
   EXPECT_TRUE(comesTrue([&] { return client.dispatch(), told == 1; }));
   const std::set<pid_t> after = children();
   EXPECT_TRUE(std::includes(after.begin(), after.end(), before.begin(), before.end()));
@@ -245,25 +235,6 @@ TEST(Application, MayHaveNoStandardDescriptors) {
               return 0;
             }),
             0);
-}
-
-TEST(Application, ItsForkClosesWhatWasOpenOnce) {
-  DescriptorRegistry registry(2);
-  const auto before = openDescriptors();
-  const auto open = [&] {
-    return Descriptor(registry, dup(STDERR_FILENO));
-  };
-  Descriptor first = open(), second = open(), beyond = open();
-  second = Descriptor();
-  Descriptor third = open();
-  EXPECT_EQ(openDescriptors(), before + 3);
-  registry.closeAll();
-  EXPECT_EQ(openDescriptors(), before + 1) << "what had no room stays";
-  // Nothing else has these numbers' place.
-  const int again = dup(STDERR_FILENO);
-  registry.closeAll();
-  EXPECT_EQ(openDescriptors(), before + 2);
-  EXPECT_EQ(again, first.get());
 }
 
 /// A process number may be the same in another namespace.
@@ -300,70 +271,34 @@ TEST(Application, GetsBackWhatItHadWhenTheClientEnds) {
   }
 }
 
-/// Serves connections of a socket as a service manager does: each gets a service on descriptor 3.
-class Activator {
- public:
-  /// `user` listens; the service is started under the name `manner`.
-  explicit Activator(uid_t user = geteuid(), const char* manner = "fake_service") {
-    options.socket = temporaryPath("socket");
-    listener_ = boundTo(options.socket);
-    if (seteuid(user) != 0 || listen(listener_, 8) != 0 || seteuid(getuid()) != 0) abort();
-    pid_ = fork();
-    signal(SIGCHLD, pid_ == 0 ? SIG_IGN : SIG_DFL);
-    while (pid_ == 0) {
-      const int connection = accept(listener_, nullptr, nullptr);
-      if (fork() == 0) {
-        signal(SIGCHLD, SIG_DFL);
-        dup2(connection, 3);
-        for (const int standard : {0, 1, 2}) close(standard);
-        closefrom(4);
-        execle(KEELGATE_FAKE_SERVICE, manner, nullptr, std::array<char*, 1>().data());
-        _exit(1);
-      }
-      close(connection);
-    }
-  }
-  ~Activator() {
-    kill(pid_, SIGKILL);
-    waitpid(pid_, nullptr, 0);
-    close(listener_);
-    std::filesystem::remove(options.socket);
-  }
-
-  Client::Options options = fakeOptions();
-
- private:
-  int listener_;
-  pid_t pid_;
-};
-
 /// Whoever gets the messages of a client must not be just anybody.
 TEST(Application, TrustsTheListenersThatItNames) {
   if (geteuid() != 0) GTEST_SKIP() << "only root can listen as somebody else";
-  Activator activator(65'534);
-  for (const Optional<unsigned> named : {Optional<unsigned>(), Optional<unsigned>(65'533)}) {
-    activator.options.socketUser = named;
-    EXPECT_NE(startOf(activator.options).find("User 65534 listens"), String::npos);
-  }
-  activator.options.socketUser = 65'534;
-  EXPECT_EQ(startOf(activator.options), "started");
-  // Everybody trusts root and himself.
-  for (const uid_t trusted : {0U, 65'533U}) {
-    EXPECT_EQ(inFork([trusted] {
-                const Activator known(trusted);
-                chmod(known.options.socket.c_str(), 0777);
-                const bool isUser = seteuid(65'533) == 0;
-                const bool started = startOf(known.options) == "started";
-                return seteuid(0) == 0 && isUser && started ? 0 : 1;
-              }),
-              0);
-  }
-}
-
-TEST(Application, IsToldWhereAnActivatedServiceSaysWhyNot) {
-  const String outcome = startOf(Activator(geteuid(), "fake_service.dies").options);
-  for (const char* hint : {"journalctl -u", "MaxConnections"}) {
-    EXPECT_NE(outcome.find(hint), String::npos) << outcome;
+  // Everybody trusts root and himself. Whoever is connected is hung up on.
+  const std::tuple<uid_t, uid_t, Optional<unsigned>, bool> rows[] = {{65'534, 0, {}, false},
+                                                                     {65'534, 0, 65'533, false},
+                                                                     {65'534, 0, 65'534, true},
+                                                                     {0, 65'533, {}, true},
+                                                                     {65'533, 65'533, {}, true}};
+  for (const auto& [listens, calls, named, trusted] : rows) {
+    Client::Options options = fakeOptions();
+    options.socket = temporaryPath("socket");
+    options.socketUser = named;
+    const int listener = boundTo(options.socket);
+    chmod(options.socket.c_str(), 0777);
+    ASSERT_TRUE(seteuid(listens) == 0 && listen(listener, 8) == 0);
+    std::thread hangsUp([listener] {
+      for (int end; (end = accept(listener, nullptr, nullptr)) >= 0;) close(end);
+    });
+    EXPECT_TRUE(seteuid(0) == 0 && seteuid(calls) == 0);
+    const String outcome = startOf(options);
+    EXPECT_EQ(seteuid(0), 0);
+    const char* sentence = trusted ? "'journalctl -u keelgate@*' says why" : "User 65534 listens";
+    EXPECT_NE(outcome.find(sentence), String::npos) << outcome;
+    shutdown(listener, SHUT_RDWR);
+    hangsUp.join();
+    close(listener);
+    std::filesystem::remove(options.socket);
   }
 }
 

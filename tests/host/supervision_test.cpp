@@ -116,18 +116,6 @@ TEST(Supervision, APeakIsForgottenAfterAWhile) {
   }
 }
 
-TEST(Permits, AQuarterIsKeptForSmallMessages) {
-  EXPECT_EQ(processesFor(fakeOptions("honest", milliseconds(100), 1000)), 128U);
-  for (const auto& [permits, forLarge] :
-       {std::pair(1u, 1), {2u, 1}, {3u, 2}, {4u, 3}, {5u, 3}, {8u, 6}, {9u, 6}}) {
-    Pool pool(fakeOptions("honest", milliseconds(100), permits));
-    EXPECT_TRUE(pool.isLarge(4u << 20) && !pool.isLarge((4u << 20) - 1));
-    std::deque<Permit> all;
-    for (unsigned i = 0; i < permits; ++i) all.emplace_back(pool.permits(), true);
-    EXPECT_EQ(std::ranges::count_if(all, &Permit::isAdmitted), forLarge) << permits;
-  }
-}
-
 TEST(Permits, AreGivenInTurnAndSomeAreKeptForSmallOnes) {
   DescriptorRegistry registry(16);
   FairSemaphore semaphore(2, 1, registry);
