@@ -3,6 +3,7 @@
 #include "cli/nearest.h"
 #include "cli/ordered_work.h"
 #include "cli/request_line.h"
+#include "cli/table.h"
 
 #include <gtest/gtest.h>
 
@@ -130,6 +131,14 @@ TEST(Suggestion, IsWhatAThirdOfTheNameMayBeMistypedFor) {
   for (const auto& [names, name, said] : table) {
     EXPECT_EQ(suggestion(names, name, "nothing"), said);
   }
+}
+
+TEST(Table, BreaksItsLastColumnWhereThatLeavesRoomForSomeWords) {
+  Table words({"N", "T"});
+  words.add({"x", "aaaa bbbb cccc dddd eeee ffff gggg hhhh"});
+  EXPECT_EQ(words.text(35, false),
+            "  N  T\n  x  aaaa bbbb cccc dddd eeee ffff\n         gggg hhhh\n");
+  EXPECT_EQ(words.text(34, false), "  N  T\n  x  aaaa bbbb cccc dddd eeee ffff\n      gggg hhhh\n");
 }
 
 using Job = OrderedWork::Job;
