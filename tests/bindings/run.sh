@@ -22,6 +22,10 @@ cc -std=c11 -Wall -Wextra -Wpedantic -Wconversion -Werror \
 LD_LIBRARY_PATH=$libraries "$work/unpack" "$root/examples/messages/push-payload.bplist" |
   grep -q '^{"record":"PulseUserPayload","value":{"command":100,'
 
+symbols=$(nm -D --defined-only "$libraries/libkeelgate.so" | awk '/ keelgate_/ {print $3}' | sed 's/@.*//' | sort)
+[ "$symbols" = "$(sort "$root/tests/bindings/symbols.txt")" ] ||
+  { printf 'The C interface exports\n%s\n' "$symbols"; exit 1; }
+
 python3 "$root/tests/bindings/abi.py" "$root" "$work"
 
 export KEELGATE_MESSAGES="$root/examples/messages"
