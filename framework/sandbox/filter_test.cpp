@@ -184,6 +184,19 @@ TEST(Filter, ZygoteHasNoCallThatOpensOrExecutes) {
   expectAllowed(rules, allowed);
 }
 
+TEST(Filter, OfAWorkerThatReturnsOnlyTwoEndsAreKept) {
+  const std::vector<sock_filter> program = compile(returningRules(), SECCOMP_RET_ALLOW);
+  forAllCalls([&](const seccomp_data& data) {
+    unsigned wanted = SECCOMP_RET_ALLOW;
+    if (data.arch == nativeCalls && data.nr == SYS_exit_group) {
+      const auto status = static_cast<unsigned>(data.args[0]);
+      if (status == 0) wanted = SECCOMP_RET_TRACE;
+      if (status == waitingStatus) wanted = SECCOMP_RET_USER_NOTIF;
+    }
+    EXPECT_EQ(run(program, data), wanted) << data.arch << ' ' << data.nr << ' ' << data.args[0];
+  });
+}
+
 #ifndef KEELGATE_UNSEALED
 TEST(Filter, IsProvedToBeInForce) {
   prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0);
