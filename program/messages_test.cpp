@@ -84,6 +84,30 @@ TEST(Payloads, SharedOnesAreRefusedBeforeTheyTakeMemoryOrTime) {
   EXPECT_TRUE(shared("mml", 100, 20).ends_with("[99].command=1"));
 }
 
+TEST(PropertyLists, ComeOutAsTheTreesThatTheyAre) {
+  using Value = Keelgate::PropertyListValue;
+  using Values = Keelgate::Array<Value>;
+  using Entries = Keelgate::Array<Keelgate::PropertyListEntry>;
+  const auto unpacked = [](Keelgate::Bytes message) {
+    return PropertyListUnpacker().unpack(message).value;
+  };
+  constexpr std::uint64_t large = std::uint64_t{1} << 63;
+  const Tree tree = Dictionary{{"z", Array{true, -1, large - 1, large, 2.5, PropertyList::Date{5}}},
+                               {"a", Dictionary{{"b", "c"}, {"", data("d")}}}};
+  const Value value =
+      Entries{{"z", Values{true, Keelgate::Int64{-1}, Keelgate::Int64{large - 1},
+                           Keelgate::UInt64{large}, 2.5, Keelgate::Date{5}}},
+              {"a", Entries{{"b", Keelgate::String("c")}, {"", Keelgate::Data{std::byte{'d'}}}}}};
+  EXPECT_EQ(unpacked(PropertyList::writeBinary(tree)), value);
+  EXPECT_EQ(unpacked(PropertyList::bytesOf(PropertyList::writeXml(tree))), value);
+  // Which XML has not.
+  const std::string set = PropertyList::binary(
+      {"\xc2\x01\x02", PropertyList::bytes("\0"), "\x8f" + std::string("0123456789abcdef")});
+  EXPECT_EQ(unpacked(PropertyList::bytesOf(set)),
+            Value(Keelgate::PropertyListSet{
+                {nullptr, Keelgate::PropertyListUID{0x3031323334353637, 0x3839616263646566}}}));
+}
+
 TEST(PropertyLists, SharedObjectsAreRefusedBeforeTheyTakeMemory) {
   // One long text, as a value or as a key, and a level of containers that doubles at each step.
   const auto shared = [](const std::string& object, const std::string& marker,
