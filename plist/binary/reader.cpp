@@ -71,7 +71,7 @@ class BinaryReader {
 };
 
 /// Of offsets and references. The commonest are compiled in, which takes a sixth off the check of a
-/// message: a shift by a number that a register has to hold is slower, and there are three a key.
+/// message: a shift by a number that a register has to hold is slower, and each object takes two.
 struct AnyWidths {
   static Objects of(const Objects& objects) { return objects; }
 };
