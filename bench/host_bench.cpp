@@ -70,7 +70,7 @@ Client::Options options(std::size_t messagesPerProcess, Isolation isolation = Is
 /// Of the body that a service answers the message with.
 std::size_t replyLength() {
   Client client(options(1));
-  return Transport::encodeRecord(client.unpack<VespCommandResponse>(message())).size();
+  return Transport::lendRecord(client.unpack<VespCommandResponse>(message())).joined().size();
 }
 
 double bareFork() {

@@ -27,7 +27,7 @@ namespace VespKeelgateService::Bench {
 namespace {
 
 using Keelgate::Transport::decodeRecord;
-using Keelgate::Transport::encodeRecord;
+using Keelgate::Transport::lendRecord;
 
 /// Inputs of one kind, made when the first benchmark that runs asks for them.
 template <class Input>
@@ -112,12 +112,12 @@ void add(const std::string& name, std::function<std::vector<Message>()> make, Un
   });
   measure(name + "/reply", messages, [unpack](const Message& message) {
     const AtWork atWork;
-    DoNotOptimize(encodeRecord(unpack(message.binary)).data());
+    DoNotOptimize(lendRecord(unpack(message.binary)).joined().data());
   });
   const auto replies = std::make_shared<Inputs<Data>>([messages, unpack] {
     std::vector<Data> all;
     for (const Message& message : messages->all()) {
-      all.push_back(encodeRecord(unpack(message.binary)));
+      all.push_back(lendRecord(unpack(message.binary)).joined());
     }
     return all;
   });

@@ -4,6 +4,7 @@
 #include "framework/protocol/control_frames.h"
 #include "framework/protocol/data_frames.h"
 #include "fuzz/require.h"
+#include "tests/reply_frame.h"
 
 #include <sys/socket.h>
 #include <unistd.h>
@@ -18,6 +19,7 @@ namespace {
 using namespace Keelgate;
 using namespace Keelgate::Protocol;
 using Fuzz::require;
+using Testing::appendReplyFrame;
 
 /// What is made of the whole reply, or of what arrives of it in pieces of `step` bytes.
 std::optional<ReplyParser> parsed(Bytes reply, std::size_t step, ReplyParser::State& state) {

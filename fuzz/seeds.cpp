@@ -5,6 +5,7 @@
 #include "framework/protocol/data_frames.h"
 #include "fuzz/messages/round_trip.h"
 #include "plist/writer.h"
+#include "tests/reply_frame.h"
 
 #include <algorithm>
 #include <array>
@@ -82,9 +83,9 @@ void addReply(Folder& folder, const Target& target, const Reply& reply) {
   // Of the frames' harness: a reply, in pieces of 41 bytes.
   Data frames{std::byte{0}, std::byte{40}};
   for (const String& line : reply.log) {
-    Protocol::appendReplyFrame(frames, 7, Protocol::ReplyKind::log, std::as_bytes(std::span(line)));
+    Testing::appendReplyFrame(frames, 7, Protocol::ReplyKind::log, std::as_bytes(std::span(line)));
   }
-  Protocol::appendReplyFrame(frames, 7, reply.kind, reply.body.bytes);
+  Testing::appendReplyFrame(frames, 7, reply.kind, reply.body.bytes);
   folder.add("frames_fuzz", frames);
 }
 
@@ -142,9 +143,9 @@ void addFrames(Folder& folder) {
   for (const bool isLast : {false, true}) {
     Data reply(2);
     for (int i = 0; i < 2 * isLast; ++i) {
-      Protocol::appendReplyFrame(reply, 7, ReplyKind::log, Data(5));
+      Testing::appendReplyFrame(reply, 7, ReplyKind::log, Data(5));
     }
-    Protocol::appendReplyFrame(reply, 7, ReplyKind::record, Data(20), isLast);
+    Testing::appendReplyFrame(reply, 7, ReplyKind::record, Data(20), isLast);
     addFrame(folder, reply);
     // In pieces of every size.
     for (std::size_t step = 1; step < reply.size(); ++step) {

@@ -23,14 +23,6 @@ ReplyHeader makeReplyHeader(std::uint32_t sequence, ReplyKind kind, std::uint64_
           .bodyLength = bodyLength};
 }
 
-void appendReplyFrame(Data& frames, std::uint32_t sequence, ReplyKind kind, Bytes body, bool last) {
-  const ReplyHeader header = makeReplyHeader(sequence, kind, body.size(), last);
-  const Bytes headerBytes = std::as_bytes(std::span(&header, 1));
-  frames.reserve(frames.size() + headerBytes.size() + body.size());
-  frames.insert(frames.end(), headerBytes.begin(), headerBytes.end());
-  frames.insert(frames.end(), body.begin(), body.end());
-}
-
 bool readAll(int channel, std::span<std::byte> bytes) noexcept {
   while (!bytes.empty()) {
     // read and write, and not recv and send: these two are all that the filter leaves a worker.

@@ -23,10 +23,6 @@ bool isExpected(const RequestHeader& header, std::uint32_t sequence,
 ReplyHeader makeReplyHeader(std::uint32_t sequence, ReplyKind kind, std::uint64_t bodyLength,
                             bool last = false) noexcept;
 
-/// Adds a frame of a reply to others. Throws std::bad_alloc.
-void appendReplyFrame(Data& frames, std::uint32_t sequence, ReplyKind kind, Bytes body,
-                      bool last = false);
-
 /// Fills `bytes`. False at the end of the channel; an error is an end too, because a process with
 /// three system calls has nothing to do about it.
 bool readAll(int channel, std::span<std::byte> bytes) noexcept;

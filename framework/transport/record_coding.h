@@ -284,13 +284,6 @@ Body lendRecord(T record) {
   if (!body.loans.empty()) body.lender = std::make_shared<const T>(std::move(record));
   return body;
 }
-/// The same in one piece.
-template <Record T>
-Data encodeRecord(T record) {
-  Writer to;
-  write(to, record);
-  return std::move(to).take().joined();
-}
 
 /// The record that a body holds. Throws MalformedReply, ReadLimitReached, std::bad_alloc, or what
 /// the record's constructor throws.

@@ -45,7 +45,7 @@ std::string readRecord(Bytes body) {
   auto record = Transport::decodeRecord<R>(body);
   JSON::Writer out(JSON::Layout::compact);
   JSON::write(out, record);
-  const Data again = Transport::encodeRecord(std::move(record));
+  const Data again = Transport::lendRecord(std::move(record)).joined();
   require(std::ranges::equal(again, body), "one spelling of a record");
   std::string text;
   for (const String& piece : std::move(out).take()) text += piece;

@@ -101,7 +101,7 @@ for one in targets.values():
 ARROWS = {"plist": "include program framework fuzz tests", "text": "include plist program framework",
           "framework": "program plist cli",
           "framework/client": "framework/server framework/sandbox",
-          "framework/sandbox": "framework/server framework/client",
+          "framework/sandbox": "framework/server framework/client framework/protocol framework/transport",
           "framework/transport": "framework/server framework/sandbox",
           "program": "framework/transport framework/sandbox framework/client cli",
           **{f"program/{room.name}": "framework/server" for room in (root / "program").iterdir()

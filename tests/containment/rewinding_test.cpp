@@ -11,6 +11,7 @@
 #include "framework/server/worker.h"
 #include "tests/containment/marks.h"
 #include "tests/processes.h"
+#include "tests/reply_frame.h"
 
 #include <fcntl.h>
 #include <gtest/gtest.h>
@@ -192,8 +193,8 @@ void tryMark(const Mark& mark) {
   ASSERT_TRUE(worker.goOn() && worker.send("nothing"));
   // What an honest worker answers to a message that is nothing.
   Data frame;
-  Protocol::appendReplyFrame(frame, 0, Protocol::ReplyKind::record,
-                             Transport::encodeRecord(VespCommandResponse{}));
+  Testing::appendReplyFrame(frame, 0, Protocol::ReplyKind::record,
+                            Transport::lendRecord(VespCommandResponse{}).joined());
   EXPECT_EQ(worker.received(), std::string(reinterpret_cast<char*>(frame.data()), frame.size()));
 }
 

@@ -1,8 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 // Batches, and calls that an event loop of the application drives.
-#include "framework/protocol/data_frames.h"
 #include "framework/transport/error_coding.h"
 #include "tests/host/host_testing.h"
+#include "tests/reply_frame.h"
 
 #include <gtest/gtest.h>
 
@@ -97,14 +97,15 @@ TEST(Batch, TakesLongMessagesAndRepliesWhole) {
       for (const int beside : {-200, -20, 0, 20}) {
         Response record{};
         record.applicationId = String(size + static_cast<std::size_t>(beside), 'a');
-        scripts.push_back(Script().answer(Transport::encodeRecord(record)));
+        scripts.push_back(Script().answer(Transport::lendRecord(record).joined()));
       }
     }
     std::vector<Client::Request> requests;
     for (const Script& script : scripts) requests.push_back({.message = script});
     std::size_t next = 0;
     for (auto& outcome : client.unpackBatch<Response>(requests)) {
-      EXPECT_TRUE(Script().answer(Transport::encodeRecord(outcome.record())) == scripts[next++]);
+      EXPECT_TRUE(Script().answer(Transport::lendRecord(outcome.record()).joined()) ==
+                  scripts[next++]);
     }
   }
 }
@@ -196,8 +197,8 @@ TEST(Async, ManyThreadsShareAClientAndEachMessageCompletesOnce) {
 
 TEST(Statistics, CountEveryOutcomeOfEveryKindOfCall) {
   Data rejection;
-  Protocol::appendReplyFrame(rejection, 0, Protocol::ReplyKind::error,
-                             Transport::encodeError(Breach("domain", "type")));
+  Testing::appendReplyFrame(rejection, 0, Protocol::ReplyKind::error,
+                            Transport::encodeError(Breach("domain", "type")));
   const std::pair<Data, UInt64 Statistics::*> rows[] = {
       {answer(1), &Statistics::records},
       {Script().write(rejection), &Statistics::rejections},

@@ -7,6 +7,7 @@
 #include "framework/protocol/control_frames.h"
 #include "framework/protocol/data_frames.h"
 #include "tests/host/script.h"
+#include "tests/reply_frame.h"
 
 #include <fcntl.h>
 #include <poll.h>
@@ -34,7 +35,7 @@ void write(Bytes bytes) {
 
 void writeFrame(std::uint32_t sequence, Bytes body, ReplyKind kind = ReplyKind::record) {
   Data frame;
-  appendReplyFrame(frame, sequence, kind, body);
+  Testing::appendReplyFrame(frame, sequence, kind, body);
   write(frame);
 }
 

@@ -5,6 +5,7 @@
 #include "framework/contracts/memory_budget.h"
 #include "framework/protocol/data_frames.h"
 #include "tests/host/host_testing.h"
+#include "tests/reply_frame.h"
 
 #include <gtest/gtest.h>
 
@@ -21,7 +22,7 @@ constexpr std::size_t headerSize = sizeof(ReplyHeader);
 
 Data frameOf(Bytes body, ReplyKind kind = ReplyKind::record) {
   Data frame;
-  Protocol::appendReplyFrame(frame, 0, kind, body);
+  appendReplyFrame(frame, 0, kind, body);
   return frame;
 }
 
@@ -48,7 +49,7 @@ std::vector<Attack> attacks() {
   // Read into a buffer of its size, or the byte would have to wait for the next.
   VespCommandResponse response{};
   response.applicationId = String(100'000, 'a');
-  Data longer = frameOf(Transport::encodeRecord(response));
+  Data longer = frameOf(Transport::lendRecord(response).joined());
   longer.push_back({});
   const Data vast = frameSaying(1u << 20);
   const Data large(8u << 20);

@@ -47,7 +47,7 @@ inline Data recordNumbered(Int number) {
   VespCommandResponse record{};
   record.command = number;
   record.applicationId = "application " + std::to_string(number);
-  return Transport::encodeRecord(record);
+  return Transport::lendRecord(record).joined();
 }
 
 class Script : public Data {

@@ -161,7 +161,7 @@ TEST(Stack, WhatIsPromisedIsEnoughAndLessIsRefused) {
     outer.ostrelMessageList.push_back(std::move(nested));
     nested = std::move(outer);
   }
-  const Script deepest = Script().answer(Transport::encodeRecord(nested));
+  const Script deepest = Script().answer(Transport::lendRecord(nested).joined());
   const auto runWith = [&](std::size_t stack) {
     pthread_attr_t attributes;
     pthread_attr_init(&attributes);
