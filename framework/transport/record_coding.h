@@ -77,31 +77,36 @@ FieldSet<FieldsOf<T>::size> presentIn(const T& record) {
   return FieldSet<FieldsOf<T>::size>(words);
 }
 
-/// The functions for the fields of T by their positions, of which `Coding` has one for each type,
-/// as `Coding::template field<V>`.
+/// The functions for the fields of T by their types: `Coding::template fields<V>`.
 template <class T, class Coding>
 constexpr auto codingsOf = [] {
-  std::array<typename Coding::Function, FieldsOf<T>::size> functions{};
+  FieldFunctions<typename Coding::Function, FieldsOf<T>::size> functions;
   std::size_t position = 0;
-  FieldsOf<T>::each(
-      [&]<class V>(Field<T, V>) { functions[position++] = Coding::template field<V>; });
+  FieldsOf<T>::each([&]<class V>(Field<T, V>) {
+    functions.insert(firstOf<T, V>, Coding::template fields<V>, byType<T>.places[position++]);
+  });
   return functions;
 }();
+template <class T, class Coding>
+constexpr auto usedCodingsOf = codingsOf<T, Coding>.template of<codingsOf<T, Coding>.count>();
 
 template <class T>
 struct Writing {
-  using Function = void (*)(Writer& to, T& record, std::size_t position);
+  using Fields = FieldSet<FieldsOf<T>::size>;
+  using Function = void (*)(const Fields&, Writer& to, T& record);
   template <class V>
-  static void field(Writer& to, T& record, std::size_t position) {
-    V& member = record.*membersOf<T, V>.data()[position];
-    if constexpr (std::same_as<V, Optional<String>> || std::same_as<V, Optional<Data>>) {
-      write(to, *member);
-      if (!Writer::borrows(member->size())) member.reset();
-    } else if constexpr (isOptional<V>) {
-      write(to, *member);
-    } else {
-      write(to, member);
-    }
+  static void fields(const Fields& fields, Writer& to, T& record) {
+    fields.each([&](std::size_t place) {
+      V& member = record.*membersOf<T, V>.data()[byType<T>.positions.data()[place]];
+      if constexpr (std::same_as<V, Optional<String>> || std::same_as<V, Optional<Data>>) {
+        write(to, *member);
+        if (!Writer::borrows(member->size())) member.reset();
+      } else if constexpr (isOptional<V>) {
+        write(to, *member);
+      } else {
+        write(to, member);
+      }
+    });
   }
 };
 
@@ -109,10 +114,7 @@ template <class T>
 void writeRecord(Writer& to, T& record) {
   const auto present = presentIn(record);
   for (std::size_t i = 0; i < presenceWords<T>; ++i) to.word(present.words()[i]);
-  present.each([&](std::size_t place) {
-    const std::size_t position = byType<T>.positions.data()[place];
-    codingsOf<T, Writing<T>>.data()[position](to, record, position);
-  });
+  usedCodingsOf<T, Writing<T>>.call(present, to, record);
 }
 
 /// Behind its count, which the reader holds against the bytes that follow.
@@ -203,22 +205,25 @@ void readCase(Reader& from, T& value, int depth, std::index_sequence<i...>) {
 
 template <class T>
 struct Reading {
-  using Function = void (*)(Reader& from, T& record, std::size_t position, int depth);
+  using Fields = FieldSet<FieldsOf<T>::size>;
+  using Function = void (*)(const Fields&, Reader& from, T& record, const int& depth);
   template <class V>
-  static void field(Reader& from, T& record, std::size_t position, int depth) {
-    V& member = record.*membersOf<T, V>.data()[position];
-    if constexpr (std::same_as<V, Optional<String>>) {
-      // Made where it stays.
-      member.emplace(from.text());
-    } else if constexpr (isOptional<V>) {
-      read(from, member.emplace(), depth);
-    } else {
-      read(from, member, depth);
-    }
-    // A second spelling of the same record, too.
-    if constexpr (isArray<V>) {
-      if (member.empty()) throw MalformedReply();
-    }
+  static void fields(const Fields& fields, Reader& from, T& record, const int& depth) {
+    fields.each([&](std::size_t place) {
+      V& member = record.*membersOf<T, V>.data()[byType<T>.positions.data()[place]];
+      if constexpr (std::same_as<V, Optional<String>>) {
+        // Made where it stays.
+        member.emplace(from.text());
+      } else if constexpr (isOptional<V>) {
+        read(from, member.emplace(), depth);
+      } else {
+        read(from, member, depth);
+      }
+      // A second spelling of the same record, too.
+      if constexpr (isArray<V>) {
+        if (member.empty()) throw MalformedReply();
+      }
+    });
   }
 };
 
@@ -233,10 +238,7 @@ void readRecord(Reader& from, T& value, int depth) {
   // A bit that no field has is a second spelling of the same record.
   const bool isSpeltOtherwise = (words.back() & ~allFields<T>.words().back()) != 0;
   if (isSpeltOtherwise || present.firstMissing(requiredFields<T>) < size) throw MalformedReply();
-  present.each([&](std::size_t place) {
-    const std::size_t position = byType<T>.positions.data()[place];
-    codingsOf<T, Reading<T>>.data()[position](from, value, position, depth);
-  });
+  usedCodingsOf<T, Reading<T>>.call(present, from, value, depth);
   // What the framework refuses in the service is refused here too.
   constructInPlace(value);
 }

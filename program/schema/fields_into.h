@@ -59,17 +59,16 @@ struct Places {
   }
 };
 
-/// For each field of a schema the function that decodes it.
+/// For each kind of fields of a schema the function that decodes them.
 template <class Function, std::size_t size>
 struct Decoders {
-  std::array<Function, size> functions{};
-  /// The position of a member that cannot hold what its field does, or `size`. A function cannot be
-  /// compared with null at compile time where sanitizers are on.
+  Keelgate::FieldFunctions<Function, size> functions{};
+  /// The position of a member that cannot hold what its field does, or `size`.
   std::size_t misfit = size;
 };
 
 /// Into the place in R at the position of the field of S. `Decode` gives, as `Decode::template
-/// into<W, V>`, the function for a field of type W and a member of type V.
+/// into<W, V>`, the function for fields of type W and members of type V.
 template <Keelgate::Schema S, class R, class Decode>
 constexpr auto decodersOf = [] {
   using From = Keelgate::FieldsOf<S>;
@@ -85,7 +84,10 @@ constexpr auto decodersOf = [] {
     From::each([&]<class W>(Keelgate::Field<S, W>) {
       To::at(position, [&]<class V>(Keelgate::Field<Listed, V>) {
         if constexpr (fills<W, V>) {
-          decoders.functions[position] = Decode::template into<W, V>;
+          constexpr std::size_t kind =
+              Keelgate::firstOf<S, W> * From::size + Keelgate::firstOf<Listed, V>;
+          decoders.functions.insert(kind, Decode::template into<W, V>,
+                                    Keelgate::byType<S>.places[position]);
         } else {
           decoders.misfit = position;
         }

@@ -141,30 +141,35 @@ constexpr auto requiredFields = [] {
   return required;
 }();
 
-/// One field of a schema, into a member of R. A function for each type of field and no code for
+/// The fields of one kind, into members of R. A function for each type of field and no code for
 /// each field, so that a struct of 156 fields does not make a frame of 156 fields' temporaries:
 /// payloads nest 256 deep, and a sealed worker's stack is small.
 template <Keelgate::Schema S, class R>
 struct FieldDecoder {
-  using Function = void (*)(Decoding&, PropertyList::Value, const CodingPath& outer,
-                            std::size_t position, R&);
+  using Values = FieldValues<S>;
+  using Fields = typename Values::Fields;
+  using Function = void (*)(const Fields&, Decoding&, const Values&, const CodingPath& outer, R&);
 
   template <class W, class V>
-  static void into(Decoding& decoding, PropertyList::Value value, const CodingPath& outer,
-                   std::size_t position, R& record) {
-    V& member = Places<R>::template at<V>(record, position);
-    const std::string_view key = S::CodingKeys::keys[position];
-    using Present = PresentOf<W>;
-    if (Keelgate::isOptional<W> && value.type() == PropertyList::Type::null) return;
-    if constexpr (isScalar<Present>) {
-      const Scalars::Fault fault = Scalars::decode(decoding.budget, value, member);
-      if (fault == Scalars::Fault::none) return;
-      Scalars::refuse(fault, outer, key, Scalars::expectation<Present>(), value.type());
-    } else if constexpr (Keelgate::isOptional<V>) {
-      decodeValue<Present>(decoding, value, CodingPath(outer, key), member.emplace());
-    } else {
-      decodeValue<Present>(decoding, value, CodingPath(outer, key), member);
-    }
+  static void into(const Fields& fields, Decoding& decoding, const Values& values,
+                   const CodingPath& outer, R& record) {
+    fields.each([&](std::size_t place) {
+      const PropertyList::Value value = values.at(place);
+      if (Keelgate::isOptional<W> && value.type() == PropertyList::Type::null) return;
+      const std::size_t position = Keelgate::byType<S>.positions.data()[place];
+      V& member = Places<R>::template at<V>(record, position);
+      const std::string_view key = S::CodingKeys::keys.data()[position];
+      using Present = PresentOf<W>;
+      if constexpr (isScalar<Present>) {
+        const Scalars::Fault fault = Scalars::decode(decoding.budget, value, member);
+        if (fault == Scalars::Fault::none) return;
+        Scalars::refuse(fault, outer, key, Scalars::expectation<Present>(), value.type());
+      } else if constexpr (Keelgate::isOptional<V>) {
+        decodeValue<Present>(decoding, value, CodingPath(outer, key), member.emplace());
+      } else {
+        decodeValue<Present>(decoding, value, CodingPath(outer, key), member);
+      }
+    });
   }
 
  private:
@@ -183,20 +188,18 @@ void decodeFields(Decoding& decoding, const PropertyList::Value& value, const Co
   constexpr std::size_t size = S::CodingKeys::size;
   static_assert(decoders.misfit == size,
                 "a field of the record cannot hold what the schema's field does");
+  static constexpr auto functions = decoders.functions.template of<decoders.functions.count>();
   const FieldValues<S> values(value);
-  const auto decode = [&](std::size_t place) {
-    const std::size_t position = Keelgate::byType<S>.positions.data()[place];
-    // NOLINTNEXTLINE(clang-analyzer-core.CallAndMessage): none is null, which was asserted.
-    decoders.functions.data()[position](decoding, values.at(place), path, position, into);
-  };
   if (decoding.isByType && values.present().firstMissing(requiredFields<S>) == size) {
-    return values.present().each(decode);
+    return functions.call(values.present(), decoding, values, path, into);
   }
   // What stands before the first field that is missing may be wrong, too.
   for (std::size_t position = 0; position < size; ++position) {
     const std::size_t place = Keelgate::byType<S>.places.data()[position];
     if (values.present().contains(place)) {
-      decode(place);
+      typename FieldValues<S>::Fields one;
+      one.insert(place);
+      functions.call(one, decoding, values, path, into);
     } else if (requiredFields<S>.contains(place)) {
       throw Errors::keyNotFound(path, S::CodingKeys::keys[position]);
     }
