@@ -21,28 +21,31 @@ void KeelgateServer::add(std::size_t record, Handler handler) {
   handlers_.at(record) = std::move(handler);
 }
 
-Reply KeelgateServer::answer(const ReceivedMessage& request) const {
+void KeelgateServer::answer(const ReceivedMessage& request, const Give& give) const {
   // Outside the try, so that what was logged before an error travels with it.
   LogCapture capture;
-  Reply reply{.kind = ReplyKind::error, .body = {}, .log = {}};
+  const auto giveAs = [&](ReplyKind kind, Transport::Body body) {
+    give({.kind = kind, .body = std::move(body), .log = std::move(capture.lines)});
+  };
+  const auto giveError = [&](const auto& error) {
+    giveAs(ReplyKind::error, {.bytes = Transport::encodeError(error), .loans = {}});
+  };
   try {
     if (request.record >= handlers_.size() || !handlers_[request.record]) {
       // The number comes from the client, of which another build may know more records.
       throw Breach("com.tessen.Keelgate.KeelgateServer", "No unpacker for the record");
     }
-    reply.body = handlers_[request.record](request);
-    reply.kind = ReplyKind::record;
+    handlers_[request.record](
+        request, [&](Transport::Body body) { giveAs(ReplyKind::record, std::move(body)); });
   } catch (const DecodingError& error) {
-    reply.body.bytes = Transport::encodeError(error);
+    giveError(error);
   } catch (const Breach& error) {
-    reply.body.bytes = Transport::encodeError(error);
+    giveError(error);
   } catch (const VespClientMessageUnpackingError& error) {
-    reply.body.bytes = Transport::encodeError(error);
+    giveError(error);
   }
   // Anything else that is thrown is a defect of the program, or an end of memory: no reply hides
   // it.
-  reply.log = std::move(capture.lines);
-  return reply;
 }
 
 }  // namespace Keelgate

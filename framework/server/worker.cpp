@@ -115,10 +115,16 @@ void send(const Reply& reply, std::uint32_t sequence, bool last) {
   reply.body.eachPart([](Bytes part) { channel.give(part); });
 }
 
-/// From the first byte of the body on, this is the part that a stranger may take over. False when
-/// the worker has nothing more to give: a process cannot give back memory under its filter, so one
+/// At once: whatever would run at an orderly exit is for who goes on.
+[[noreturn]] void end() {
+  channel.flush();
+  _exit(0);
+}
+
+/// From the first byte of the body on, this is the part that a stranger may take over. Returns
+/// where there may be another message. A process cannot give back memory under its filter, so one
 /// that has taken more than any short message may ends.
-bool answer(const KeelgateServer& server, const RequestHeader& header) {
+void answer(const KeelgateServer& server, const RequestHeader& header, bool isLast) {
   MessageMemory::begin(allocationLimit(header.bodyLength));
   const std::size_t size = header.serviceLength + header.bodyLength;
   std::unique_ptr<std::byte[]> large;
@@ -132,14 +138,15 @@ bool answer(const KeelgateServer& server, const RequestHeader& header) {
     bytes = {large.get(), size};
   }
   const Bytes service = bytes.first(header.serviceLength);
-  const Reply reply =
-      server.answer({.record = header.record,
-                     .message = bytes.subspan(header.serviceLength),
-                     .command = header.command,
-                     .service = {reinterpret_cast<const char*>(service.data()), service.size()}});
-  const bool last = MessageMemory::peak() > allocationLimit(0);
-  send(reply, header.sequence, last);
-  return !last;
+  server.answer({.record = header.record,
+                 .message = bytes.subspan(header.serviceLength),
+                 .command = header.command,
+                 .service = {reinterpret_cast<const char*>(service.data()), service.size()}},
+                [&](const Reply& reply) {
+                  const bool isLarge = MessageMemory::peak() > allocationLimit(0);
+                  send(reply, header.sequence, isLarge);
+                  if (isLarge || isLast) end();
+                });
 }
 
 }  // namespace
@@ -148,10 +155,9 @@ void work(const KeelgateServer& server, std::uint64_t messages,
           const Sandbox::WorkerSeal& seal) try {
   Sandbox::sealWorker(seal);
   for (std::uint32_t sequence = 0; sequence != messages; ++sequence) {
-    if (!answer(server, receiveHeader(sequence, seal.longestMessage))) break;
+    answer(server, receiveHeader(sequence, seal.longestMessage), sequence + 1 == messages);
   }
-  channel.flush();
-  _exit(0);
+  end();
 } catch (const std::bad_alloc&) {
   // At once: whatever would run at an orderly exit wants memory, and calls that are forbidden.
   _exit(Protocol::resourceExitStatus);

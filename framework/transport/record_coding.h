@@ -28,11 +28,9 @@ namespace Keelgate::Transport {
 
 // ---------------------------------------------------------------------------------- writing
 
-// Declared before its special cases: they and it call one another. Optional texts and data that
-// were copied are given back at once, field by field in the order by type: a destructor that comes
-// to them in the order as declared has jumps that no processor foresees.
+// Declared before its special cases: they and it call one another.
 template <class T>
-void write(Writer& to, T& value);
+void write(Writer& to, const T& value);
 
 /// Whether a field may be absent.
 template <class V>
@@ -93,15 +91,12 @@ constexpr auto usedCodingsOf = codingsOf<T, Coding>.template of<codingsOf<T, Cod
 template <class T>
 struct Writing {
   using Fields = FieldSet<FieldsOf<T>::size>;
-  using Function = void (*)(const Fields&, Writer& to, T& record);
+  using Function = void (*)(const Fields&, Writer& to, const T& record);
   template <class V>
-  static void fields(const Fields& fields, Writer& to, T& record) {
+  static void fields(const Fields& fields, Writer& to, const T& record) {
     fields.each([&](std::size_t place) {
-      V& member = record.*membersOf<T, V>.data()[byType<T>.positions.data()[place]];
-      if constexpr (std::same_as<V, Optional<String>> || std::same_as<V, Optional<Data>>) {
-        write(to, *member);
-        if (!Writer::borrows(member->size())) member.reset();
-      } else if constexpr (isOptional<V>) {
+      const V& member = record.*membersOf<T, V>.data()[byType<T>.positions.data()[place]];
+      if constexpr (isOptional<V>) {
         write(to, *member);
       } else {
         write(to, member);
@@ -111,7 +106,7 @@ struct Writing {
 };
 
 template <class T>
-void writeRecord(Writer& to, T& record) {
+void writeRecord(Writer& to, const T& record) {
   const auto present = presentIn(record);
   for (std::size_t i = 0; i < presenceWords<T>; ++i) to.word(present.words()[i]);
   usedCodingsOf<T, Writing<T>>.call(present, to, record);
@@ -119,13 +114,13 @@ void writeRecord(Writer& to, T& record) {
 
 /// Behind its count, which the reader holds against the bytes that follow.
 template <class T>
-requires(isArray<Array<T>>) void write(Writer& to, Array<T>& values) {
+requires(isArray<Array<T>>) void write(Writer& to, const Array<T>& values) {
   to.word(values.size());
-  for (T& value : values) write(to, value);
+  for (const T& value : values) write(to, value);
 }
 
 template <class T>
-void write(Writer& to, T& value) {
+void write(Writer& to, const T& value) {
   if constexpr (std::same_as<T, std::nullptr_t>) {
     // Its case says it all.
   } else if constexpr (std::same_as<T, Bool>) {
@@ -145,7 +140,7 @@ void write(Writer& to, T& value) {
   } else if constexpr (CaseKeyed<T>) {
     // A byte is enough: the largest of these enumerations has twelve cases.
     to.byte(static_cast<std::uint8_t>(value.index()));
-    std::visit([&](auto& payload) { write(to, payload); }, value);
+    std::visit([&](const auto& payload) { write(to, payload); }, value);
   } else {
     writeRecord(to, value);
   }
@@ -276,15 +271,13 @@ void read(Reader& from, T& value, int depth) {
   }
 }
 
-/// The body of a record frame. For the service. Throws std::bad_alloc.
+/// The body of a record frame, which borrows from the record. For the service. Throws
+/// std::bad_alloc.
 template <Record T>
-Body lendRecord(T record) {
+Body lendRecord(const T& record) {
   Writer to;
   write(to, record);
-  Body body = std::move(to).take();
-  // What is long has a block of its own, and stays there when the record is moved.
-  if (!body.loans.empty()) body.lender = std::make_shared<const T>(std::move(record));
-  return body;
+  return std::move(to).take();
 }
 
 /// The record that a body holds. Throws MalformedReply, ReadLimitReached, std::bad_alloc, or what

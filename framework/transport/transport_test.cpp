@@ -155,7 +155,7 @@ TEST(Reply, HasTheFormThatTheProtocolsVersionStandsFor) {
       << "Replies have changed: raise protocolVersion, and put both numbers here.";
 }
 
-TEST(Reply, WhatIsLongIsLentAndOutlivesItsRecord) {
+TEST(Reply, WhatIsLongIsLent) {
   VespCommandWebTunnelResponse record{};
   record.contentType = String(100'000, 'a');
   record.messageUUID = Data(100'000, std::byte{7});

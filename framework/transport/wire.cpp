@@ -15,6 +15,9 @@ constexpr std::size_t blockHeader = 8;
 constexpr std::size_t blockStep = 16;
 constexpr std::size_t smallestBlock = 32;
 
+/// What is longer costs more to copy than to be written by a call of its own.
+constexpr std::size_t longestCopied = std::size_t{16} << 10;
+
 constexpr unsigned readsPerClock = 1024;
 
 }  // namespace
@@ -35,7 +38,7 @@ Data Body::joined() && {
 
 void Writer::octets(Bytes value) {
   word(value.size());
-  if (borrows(value.size())) {
+  if (value.size() > longestCopied) {
     loans_.push_back({.position = size_, .octets = value});
   } else if (!value.empty()) {
     std::memcpy(room(value.size()), value.data(), value.size());

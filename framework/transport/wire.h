@@ -16,7 +16,6 @@
 #include <cstddef>
 #include <cstring>
 #include <exception>
-#include <memory>
 #include <string_view>
 
 namespace Keelgate::Transport {
@@ -59,8 +58,6 @@ struct Body {
   };
   Data bytes;
   Array<Loan> loans;
-  /// Of what is on loan; null where that is its user's business.
-  std::shared_ptr<const void> lender;
 
   [[nodiscard]] std::size_t size() const noexcept;
   /// Calls `visitor(Bytes)` for each part.
@@ -85,8 +82,6 @@ class Writer {
   void byte(std::uint8_t value) { *room(1) = std::byte{value}; }
   /// As it lies in memory.
   void word(std::uint64_t value) { std::memcpy(room(sizeof value), &value, sizeof value); }
-  /// What is longer costs more to copy than to be written by a call of its own.
-  static constexpr bool borrows(std::size_t size) { return size > std::size_t{16} << 10; }
   /// Behind their length, so that no octet needs escaping. Long ones are borrowed.
   void octets(Bytes value);
   void text(std::string_view value) {
@@ -94,7 +89,7 @@ class Writer {
   }
   [[nodiscard]] Body take() && {
     out_.resize(size_);
-    return {.bytes = std::move(out_), .loans = std::move(loans_), .lender = nullptr};
+    return {.bytes = std::move(out_), .loans = std::move(loans_)};
   }
 
  private:

@@ -45,7 +45,7 @@ std::string readRecord(Bytes body) {
   auto record = Transport::decodeRecord<R>(body);
   JSON::Writer out(JSON::Layout::compact);
   JSON::write(out, record);
-  const Data again = Transport::lendRecord(std::move(record)).joined();
+  const Data again = Transport::lendRecord(record).joined();
   require(std::ranges::equal(again, body), "one spelling of a record");
   std::string text;
   for (const String& piece : std::move(out).take()) text += piece;
@@ -82,11 +82,15 @@ std::string readError(Bytes body) try {
 }  // namespace
 
 Reply replyTo(const Target& target, Bytes message) {
-  Reply reply = server().answer({.record = target.record,
-                                 .message = message,
-                                 .command = target.command,
-                                 .service = target.service});
-  reply.body = {.bytes = std::move(reply.body).joined(), .loans = {}, .lender = nullptr};
+  Reply reply;
+  server().answer({.record = target.record,
+                   .message = message,
+                   .command = target.command,
+                   .service = target.service},
+                  [&](const Reply& given) {
+                    reply = given;
+                    reply.body = {.bytes = std::move(reply.body).joined(), .loans = {}};
+                  });
   return reply;
 }
 
