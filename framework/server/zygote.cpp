@@ -17,7 +17,6 @@
 #include <sys/signalfd.h>
 #include <sys/wait.h>
 #include <unistd.h>
-#include <algorithm>
 #include <csignal>
 #include <ctime>
 
@@ -60,7 +59,7 @@ void Zygote::serve() {
                     {.fd = -1, .events = POLLIN, .revents = 0}};
   for (;;) {
     pollfd& deaths = channels[2];
-    channels[3].fd = rewinding_.startStep();
+    channels[3].fd = workers_.startStep();
     const bool isBusy = deaths.fd < 0;
     // ppoll and not poll: the kernel takes it up again after a stop without a call of its own.
     const int ready =
@@ -73,7 +72,7 @@ void Zygote::serve() {
       signalfd_siginfo death;
       static_cast<void>(!read(deaths.fd, &death, sizeof death));
     }
-    if (channels[3].revents != 0) rewinding_.takeStep();
+    if (channels[3].revents != 0) workers_.takeStep();
     reap();
     deaths.fd = ready == 0 ? seal_.childDeaths : -1;
   }
@@ -85,9 +84,9 @@ void Zygote::greet() {
   if (hello->frame.kind != ControlKind::hello) throw StartError(StartStep::readFrame, 0);
   messages_ = hello->frame.numbers[0];
   workerSeal_.cpuSeconds = hello->frame.numbers[1];
-  rewinding_ = Rewinding(workerSeal_.cpuSeconds);
+  workers_ = WorkerList(workerSeal_.cpuSeconds);
   const bool rewinds = hello->frame.numbers[2] == 0 && messages_ == 1 &&
-                       Sandbox::mayHaveProcessorTime(rewinding_.cpuLimit());
+                       Sandbox::mayHaveProcessorTime(workers_.cpuLimit());
   if (seal_.canRewind && !rewinds) renounceRewinding();
   send(Protocol::makeControlFrame(ControlKind::ready, 0, {seal_.layers, Protocol::ownVersion()}));
 }
@@ -126,20 +125,20 @@ bool Zygote::takeFrame() {
 
 void Zygote::fork(std::uint32_t slot, int channel) {
   // Two workers on one slot: an exit could be told of the wrong one.
-  if (processOf(slot) != 0) throw StartError(StartStep::readFrame, 0);
+  if (workers_.processOf(slot) != 0) throw StartError(StartStep::readFrame, 0);
   // Workers for long messages write to more memory than it pays to restore.
   if (!seal_.canRewind || workerSeal_.longestMessage > shortMessage) {
     forkOnce(slot, channel);
     return;
   }
-  if (rewinding_.give(slot, channel)) return;
+  if (workers_.give(slot, channel)) return;
   // One may have ended just now.
   reap();
-  if (rewinding_.give(slot, channel)) return;
+  if (workers_.give(slot, channel)) return;
   forkOnce(slot, channel);
-  if (rewinding_.isHopeless() && rewinding_.isEmpty()) {
+  if (workers_.isRewindingHopeless()) {
     renounceRewinding();
-  } else if (rewinding_.isAnotherWorthIt()) {
+  } else if (workers_.isAnotherWorthIt()) {
     forkToRewind();
   }
 }
@@ -150,10 +149,10 @@ void Zygote::forkToRewind() {
   seal.channel = -1;
   // One for all short messages.
   seal.longestMessage = shortMessage;
-  seal.cpuSeconds = rewinding_.cpuLimit();
+  seal.cpuSeconds = workers_.cpuLimit();
   const pid_t process = Sandbox::forkSelf(0);
   if (process == 0) work(server_, messages_, seal);
-  rewinding_.add(process);
+  workers_.addRewindable(process);
 }
 
 void Zygote::renounceRewinding() {
@@ -168,7 +167,7 @@ void Zygote::forkOnce(std::uint32_t slot, int channel) {
   if (process == 0) work(server_, messages_, workerSeal_);
   close(channel);
   if (process > 0) {
-    children_.push_back({.slot = slot, .process = process});
+    workers_.add(slot, process);
   } else {
     // Every fork gets its exit, also one that came to nothing: nobody waits for a worker in vain.
     ControlFrame none = exitFrame(slot, 0, rusage{});
@@ -177,18 +176,11 @@ void Zygote::forkOnce(std::uint32_t slot, int channel) {
   }
 }
 
-pid_t Zygote::processOf(std::uint32_t slot) const noexcept {
-  for (const Child& child : children_) {
-    if (child.slot == slot) return child.process;
-  }
-  return rewinding_.processOf(slot);
-}
-
 void Zygote::kill(std::uint32_t slot) {
   // One that has just answered may be rewound yet.
   reap();
   // Not reaped yet, so the number is still this worker's.
-  if (const pid_t process = processOf(slot); process != 0) ::kill(process, SIGKILL);
+  if (const pid_t process = workers_.processOf(slot); process != 0) ::kill(process, SIGKILL);
 }
 
 void Zygote::reap() {
@@ -197,15 +189,9 @@ void Zygote::reap() {
   for (;;) {
     const pid_t process = wait4(-1, &status, WNOHANG, &used);
     if (process <= 0) return;
-    const auto child = std::find_if(children_.begin(), children_.end(),
-                                    [process](const Child& c) { return c.process == process; });
-    if (child != children_.end()) {
-      send(exitFrame(child->slot, status, used));
-      children_.erase(child);
-    } else if (const auto end = rewinding_.note(process, status, used)) {
+    if (const auto end = workers_.note(process, status, used)) {
       send(exitFrame(end->slot, end->status, end->used));
     }
-    // Others are orphans that the first process of a namespace inherits; nobody asked for those.
   }
 }
 

@@ -6,11 +6,10 @@
 #include "framework/protocol/frames.h"
 #include "framework/sandbox/seal.h"
 #include "framework/server/keelgate_server.h"
-#include "framework/server/rewinding.h"
+#include "framework/server/worker_list.h"
 
 #include <sys/types.h>
 #include <cstdint>
-#include <vector>
 
 namespace Keelgate {
 
@@ -29,12 +28,6 @@ class Zygote {
   void serve();
 
  private:
-  /// Until it is reaped: its number cannot be another's before that.
-  struct Child {
-    std::uint32_t slot;
-    pid_t process;
-  };
-
   struct Received {
     Protocol::ControlFrame frame;
     /// Ours to close, or Protocol::noDescriptor.
@@ -53,8 +46,6 @@ class Zygote {
   void forkToRewind();
   /// From here on it forks and does nothing else.
   void renounceRewinding();
-  /// The worker of a slot, forked or rewound, or 0.
-  [[nodiscard]] pid_t processOf(std::uint32_t slot) const noexcept;
   void kill(std::uint32_t slot);
   /// Tells the client of every worker that has ended.
   void reap();
@@ -65,8 +56,7 @@ class Zygote {
   std::uint64_t messages_ = 0;
   /// Of the next worker.
   Sandbox::WorkerSeal workerSeal_;
-  std::vector<Child> children_;
-  Rewinding rewinding_;
+  WorkerList workers_;
 };
 
 }  // namespace Keelgate

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "framework/server/rewinding.h"
+#include "framework/server/worker_list.h"
 
 #include <sys/ptrace.h>
 #include <sys/time.h>
@@ -32,61 +32,69 @@ bool isAtEnd(int status) {
 
 }  // namespace
 
-bool Rewinding::give(std::uint32_t slot, int channel) {
+bool WorkerList::give(std::uint32_t slot, int channel) {
   for (Member& member : members_) {
-    if (member.slot || !member.worker.isReady() || !member.worker.give(channel)) continue;
+    if (member.slot || !member.rewindable->isReady() || !member.rewindable->give(channel)) continue;
     member.slot = slot;
     return true;
   }
   return false;
 }
 
-bool Rewinding::isAnotherWorthIt() {
-  const bool isOneStarting = std::any_of(members_.begin(), members_.end(),
-                                         [](const Member& m) { return !m.worker.isReady(); });
-  if (isOneStarting || isHopeless() || members_.size() >= maximumWorkers) return false;
+bool WorkerList::isAnotherWorthIt() {
+  const bool isOneStarting = std::ranges::any_of(
+      members_, [](const Member& m) { return m.rewindable && !m.rewindable->isReady(); });
+  if (isOneStarting || failures_ >= maximumFailures || rewindableCount() >= maximumWorkers) {
+    return false;
+  }
   missed_ = (missed_ + 1) % missesPerWorker;
   return missed_ == 0;
 }
 
-void Rewinding::add(pid_t process) {
+void WorkerList::addRewindable(pid_t process) {
   if (process < 0) return;
-  members_.push_back({.worker = RewindableWorker(process), .slot = {}});
+  members_.push_back({.process = process, .slot = {}, .rewindable = RewindableWorker(process)});
 }
 
-int Rewinding::startStep() const noexcept {
+std::size_t WorkerList::rewindableCount() const noexcept {
+  return static_cast<std::size_t>(std::count_if(
+      members_.begin(), members_.end(), [](const Member& m) { return m.rewindable.has_value(); }));
+}
+
+int WorkerList::startStep() const noexcept {
   for (const Member& member : members_) {
-    if (const int step = member.worker.startStep(); step >= 0) return step;
+    const int step = member.rewindable ? member.rewindable->startStep() : -1;
+    if (step >= 0) return step;
   }
   return -1;
 }
 
-void Rewinding::takeStep() {
+void WorkerList::takeStep() {
   for (Member& member : members_) {
-    if (member.worker.startStep() < 0) continue;
-    if (!member.worker.takeStep()) throwAway(member);
+    if (!member.rewindable || member.rewindable->startStep() < 0) continue;
+    if (!member.rewindable->takeStep()) throwAway(member);
     return;
   }
 }
 
-pid_t Rewinding::processOf(std::uint32_t slot) const noexcept {
+pid_t WorkerList::processOf(std::uint32_t slot) const noexcept {
   for (const Member& member : members_) {
-    if (member.slot == slot) return member.worker.process();
+    if (member.slot == slot) return member.process;
   }
   return 0;
 }
 
-Optional<Rewinding::End> Rewinding::note(pid_t process, int status, const rusage& used) {
-  const auto member = std::find_if(members_.begin(), members_.end(), [process](const Member& m) {
-    return m.worker.process() == process;
-  });
+Optional<WorkerList::End> WorkerList::note(pid_t process, int status, const rusage& used) {
+  const auto member = std::ranges::find(members_, process, &Member::process);
+  // An orphan, which the first process of a namespace inherits.
   if (member == members_.end()) return std::nullopt;
-  if (WIFSTOPPED(status)) return noteStop(*member, status, used);
+  const auto& rewindable = member->rewindable;
+  if (rewindable && WIFSTOPPED(status)) return noteStop(*member, status, used);
   Optional<End> end;
   if (member->slot) {
     end = {.slot = *member->slot, .status = status, .used = difference(used, member->usedBefore)};
   }
-  if (!member->worker.isReady()) {
+  if (rewindable && !rewindable->isReady()) {
     ++failures_;
     RewindableWorker::forgetHandedOver();
   }
@@ -94,8 +102,8 @@ Optional<Rewinding::End> Rewinding::note(pid_t process, int status, const rusage
   return end;
 }
 
-Optional<Rewinding::End> Rewinding::noteStop(Member& member, int status, const rusage& used) {
-  RewindableWorker& worker = member.worker;
+Optional<WorkerList::End> WorkerList::noteStop(Member& member, int status, const rusage& used) {
+  RewindableWorker& worker = *member.rewindable;
   if (!worker.isReady()) {
     if (!worker.keep() || !worker.goOn()) throwAway(member);
     return std::nullopt;
@@ -120,14 +128,14 @@ Optional<Rewinding::End> Rewinding::noteStop(Member& member, int status, const r
 }
 
 /// What is left then is what a message may have, and no less than that.
-bool Rewinding::isTired(const rusage& used) const noexcept {
+bool WorkerList::isTired(const rusage& used) const noexcept {
   const auto seconds = used.ru_utime.tv_sec + used.ru_stime.tv_sec;
   return static_cast<std::uint64_t>(seconds) >= cpuSeconds_;
 }
 
 /// Its end is noticed like any other, and nobody is told of it who knows of its end already.
-void Rewinding::throwAway(const Member& member) noexcept {
-  kill(member.worker.process(), SIGKILL);
+void WorkerList::throwAway(const Member& member) noexcept {
+  kill(member.process, SIGKILL);
 }
 
 }  // namespace Keelgate

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The workers of a zygote that are rewound instead of being forked: who they are, when another
-/// one is worth it, and when it is over with one of them.
+/// The workers of a zygote: those that are forked for a message, and those that are rewound instead
+/// of being forked; when another of these is worth it, and when it is over with one of them.
 ///
 /// For one thread, the zygote's.
 #pragma once
@@ -16,10 +16,10 @@
 
 namespace Keelgate {
 
-class Rewinding {
+class WorkerList {
  public:
   /// `cpuSeconds`: what a message may have of the processor.
-  explicit Rewinding(std::uint64_t cpuSeconds = 0) noexcept : cpuSeconds_(cpuSeconds) {}
+  explicit WorkerList(std::uint64_t cpuSeconds = 0) noexcept : cpuSeconds_(cpuSeconds) {}
 
   /// The limit of a worker that each of its messages has as much of as it would have in a fork.
   [[nodiscard]] std::uint64_t cpuLimit() const noexcept { return 2 * cpuSeconds_ + 2; }
@@ -27,13 +27,19 @@ class Rewinding {
   /// Gives a channel to a worker that waits for one, which owns it then. False where none does.
   bool give(std::uint32_t slot, int channel);
 
+  /// A fork for the messages of a slot.
+  void add(std::uint32_t slot, pid_t process) {
+    members_.push_back({.process = process, .slot = slot, .rewindable = {}});
+  }
+
   /// Called for each message that had to be forked for: whether to fork one to be rewound as well.
   bool isAnotherWorthIt();
   /// Such a fork, or -1 where it failed.
-  void add(pid_t process);
-  /// Whether it has turned out that the machine does not let it.
-  [[nodiscard]] bool isHopeless() const noexcept { return failures_ >= maximumFailures; }
-  [[nodiscard]] bool isEmpty() const noexcept { return members_.empty(); }
+  void addRewindable(pid_t process);
+  /// Whether none is rewound, and it has turned out that the machine does not let it.
+  [[nodiscard]] bool isRewindingHopeless() const noexcept {
+    return failures_ >= maximumFailures && rewindableCount() == 0;
+  }
 
   /// What the one that is getting ready waits for, or -1; and what to do when it is readable.
   [[nodiscard]] int startStep() const noexcept;
@@ -55,12 +61,15 @@ class Rewinding {
   static constexpr unsigned maximumFailures = 3;
 
   struct Member {
-    RewindableWorker worker;
-    /// Whoever has none is on its way back, or waits.
+    /// Until it is reaped: its number cannot be another's before that.
+    pid_t process;
+    /// Whoever has none is rewindable, and on its way back, or waits.
     Optional<std::uint32_t> slot;
+    Optional<RewindableWorker> rewindable;
     rusage usedBefore{};
   };
 
+  [[nodiscard]] std::size_t rewindableCount() const noexcept;
   Optional<End> noteStop(Member& member, int status, const rusage& used);
   [[nodiscard]] bool isTired(const rusage& used) const noexcept;
   static void throwAway(const Member& member) noexcept;
