@@ -5,6 +5,7 @@
 #include "cli/request_line.h"
 
 #include "framework/json/writer.h"
+#include "text/ascii.h"
 #include "text/base64.h"
 #include "text/utf8.h"
 
@@ -52,10 +53,6 @@ using Members = std::array<Optional<std::span<char>>, none>;
 
 std::string_view textOf(std::span<const char> characters) {
   return {characters.data(), characters.size()};
-}
-
-constexpr bool isDigit(char c) {
-  return c >= '0' && c <= '9';
 }
 
 /// The value of four hexadecimal digits; nothing where they are not that.
@@ -202,7 +199,7 @@ class Reader {
     }
     if (c == '"') {
       string();
-    } else if (c == '-' || isDigit(c)) {
+    } else if (c == '-' || Text::isDigit(c)) {
       number();
     } else {
       literal();
@@ -236,8 +233,8 @@ class Reader {
   }
 
   void digits() {
-    if (!isDigit(peek())) fail("not a number");
-    while (isDigit(peek())) ++at_;
+    if (!Text::isDigit(peek())) fail("not a number");
+    while (Text::isDigit(peek())) ++at_;
   }
 
   void number() {

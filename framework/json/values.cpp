@@ -9,7 +9,6 @@
 #include <array>
 #include <charconv>
 #include <cstddef>
-#include <variant>
 
 namespace Keelgate::JSON {
 

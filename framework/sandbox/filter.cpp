@@ -164,19 +164,10 @@ void noteTrap(int, siginfo_t* about, void*) {
 
 }  // namespace
 
-std::span<const Rule> workerRules() noexcept {
-  return worker;
-}
-std::span<const Rule> zygoteRules() noexcept {
-  return zygote;
-}
-
-std::span<const Rule> rewindingRules() noexcept {
-  return rewinding;
-}
-std::span<const Rule> returningRules() noexcept {
-  return returning;
-}
+constinit const std::span<const Rule> workerRules = worker;
+constinit const std::span<const Rule> zygoteRules = zygote;
+constinit const std::span<const Rule> rewindingRules = rewinding;
+constinit const std::span<const Rule> returningRules = returning;
 
 std::vector<sock_filter> compile(std::span<const Rule> rules, unsigned deniedAction) {
   const sock_filter denied = answer(deniedAction);

@@ -56,17 +56,17 @@ struct Rule {
 };
 
 /// All that a worker can do from before it reads the first byte of a message: C1.
-std::span<const Rule> workerRules() noexcept;
+extern const std::span<const Rule> workerRules;
 
 /// All that the zygote can do, and a worker until its own filter stands.
-std::span<const Rule> zygoteRules() noexcept;
+extern const std::span<const Rule> zygoteRules;
 
 /// What a zygote that rewinds workers can do besides, and such a worker until its own filter
 /// stands.
-std::span<const Rule> rewindingRules() noexcept;
+extern const std::span<const Rule> rewindingRules;
 
 /// What becomes of such a worker's ends; its own filter decides about all other calls.
-std::span<const Rule> returningRules() noexcept;
+extern const std::span<const Rule> returningRules;
 
 /// The kernel's program for a table. `denied` is what it answers to calls that are not listed.
 std::vector<sock_filter> compile(std::span<const Rule> rules,

@@ -140,7 +140,7 @@ void expectAllowed(std::span<const Rule> rules, const std::vector<Allowed>& allo
 }
 
 TEST(Filter, C1WorkerReadsWritesAndExits) {
-  expectAllowed(workerRules(), {{SYS_read, {3}}, {SYS_write, {3}}, {SYS_exit_group}});
+  expectAllowed(workerRules, {{SYS_read, {3}}, {SYS_write, {3}}, {SYS_exit_group}});
 }
 
 TEST(Filter, ZygoteHasNoCallThatOpensOrExecutes) {
@@ -159,7 +159,7 @@ TEST(Filter, ZygoteHasNoCallThatOpensOrExecutes) {
                          SYS_getppid, SYS_read, SYS_write, SYS_exit_group}) {
     allowed.push_back({call});
   }
-  std::vector<Rule> rules(zygoteRules().begin(), zygoteRules().end());
+  std::vector<Rule> rules(zygoteRules.begin(), zygoteRules.end());
   expectAllowed(rules, allowed);
   for (const Allowed& more : std::initializer_list<Allowed>{
            {SYS_ptrace,
@@ -180,12 +180,12 @@ TEST(Filter, ZygoteHasNoCallThatOpensOrExecutes) {
            {SYS_shutdown}}) {
     allowed.push_back(more);
   }
-  rules.insert(rules.end(), rewindingRules().begin(), rewindingRules().end());
+  rules.insert(rules.end(), rewindingRules.begin(), rewindingRules.end());
   expectAllowed(rules, allowed);
 }
 
 TEST(Filter, OfAWorkerThatReturnsOnlyTwoEndsAreKept) {
-  const std::vector<sock_filter> program = compile(returningRules(), SECCOMP_RET_ALLOW);
+  const std::vector<sock_filter> program = compile(returningRules, SECCOMP_RET_ALLOW);
   forAllCalls([&](const seccomp_data& data) {
     unsigned wanted = SECCOMP_RET_ALLOW;
     if (data.arch == nativeCalls && data.nr == SYS_exit_group) {
@@ -211,7 +211,7 @@ TEST(Filter, IsProvedToBeInForce) {
   };
   constexpr Rule call{SYS_getppid, Verdict::allow};
   constexpr Rule end{SYS_exit_group, Verdict::allow};
-  EXPECT_EQ(stepOf({workerRules().begin(), workerRules().end()}), StartStep{});
+  EXPECT_EQ(stepOf({workerRules.begin(), workerRules.end()}), StartStep{});
   EXPECT_EQ(stepOf({call, end}), StartStep::proveFilter);
   // It cannot even say that the call was made, or is trapped for another one.
   EXPECT_EQ(stepOf({call}), StartStep::proveFilter);

@@ -157,7 +157,7 @@ void abandonRewinding() {
 
 void renounceRewinding() {
   abandonRewinding();
-  enforce(compile(zygoteRules()));
+  enforce(compile(zygoteRules));
 }
 
 void handOver() {
@@ -172,7 +172,7 @@ void handOver() {
   prctl(PR_SET_DUMPABLE, 0, 0, 0, 0);
   const int tracking = track(areas);
   const int notices =
-      enforce(compile(returningRules(), SECCOMP_RET_ALLOW), SECCOMP_FILTER_FLAG_NEW_LISTENER);
+      enforce(compile(returningRules, SECCOMP_RET_ALLOW), SECCOMP_FILTER_FLAG_NEW_LISTENER);
   send(areas, {tracking, memory, pages, notices});
 }
 

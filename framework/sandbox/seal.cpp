@@ -86,10 +86,10 @@ ZygoteSeal sealZygote() {
   layers |= layerLimits;
 
   prepareHeap();
-  proveEnforced(workerRules());
-  seal.workerFilter = compile(workerRules());
-  std::vector<Rule> rules(zygoteRules().begin(), zygoteRules().end());
-  if (seal.canRewind) rules.insert(rules.end(), rewindingRules().begin(), rewindingRules().end());
+  proveEnforced(workerRules);
+  seal.workerFilter = compile(workerRules);
+  std::vector<Rule> rules(zygoteRules.begin(), zygoteRules.end());
+  if (seal.canRewind) rules.insert(rules.end(), rewindingRules.begin(), rewindingRules.end());
   enforce(compile(rules));
   abandonFirstHeap();
   reserveHeap(heapFor(shortMessage));

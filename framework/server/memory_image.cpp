@@ -4,7 +4,6 @@
 #include "framework/sandbox/limits.h"
 
 #include <sys/ioctl.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <array>

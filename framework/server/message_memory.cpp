@@ -3,7 +3,6 @@
 
 #include <malloc.h>
 #include <algorithm>
-#include <cstddef>
 #include <cstdlib>
 #include <functional>
 #include <limits>

@@ -8,7 +8,6 @@
 #include "framework/server/keelgate_server.h"
 #include "framework/server/worker_list.h"
 
-#include <sys/types.h>
 #include <cstdint>
 
 namespace Keelgate {

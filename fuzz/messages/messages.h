@@ -7,8 +7,8 @@
 
 #include "fuzz/messages/choices.h"
 #include "plist/tree.h"
-#include "program/schema/mirror_encoding.h"
 #include "program/service/tables.h"
+#include "text/uuid.h"
 
 #include <keelgate/describe.h>
 #include <keelgate/records.h>
@@ -164,7 +164,7 @@ Tree valueFor(Choices& choices, int depth) {
   } else if constexpr (std::same_as<T, UUID>) {
     UUID uuid{};
     for (std::uint8_t& octet : uuid.octets) octet = choices.byte();
-    return VespKeelgateService::uuidText(uuid);
+    return Text::uuidText(uuid.octets);
   } else if constexpr (std::same_as<T, Data>) {
     return ::PropertyList::Data(choices.below(70), std::byte{choices.byte()});
   } else {

@@ -16,7 +16,6 @@
 
 #include <cstddef>
 #include <exception>
-#include <string>
 #include <utility>
 #include <variant>
 

@@ -4,6 +4,7 @@
 #include "program/invitation/vesp_invitation_unpacker.h"
 
 #include "framework/contracts/construct.h"
+#include "framework/contracts/unpacker.h"
 #include "program/schema/property_list_decoder.h"
 
 #include <keelgate/errors.h>
@@ -133,7 +134,7 @@ VespStrideSharingInvitation convertKind(VespStrideSharingInvitationSchema&& sche
 
 using Keys = VespInvitationContextSchema::CodingKeys;
 
-template <class Payload>
+template <VespInvitationClientPayload Payload>
 VespDictionaryContextData decodeKind(const KeyedContainer& container) {
   return VespDictionaryContextClientSchema(
       container.decode<Payload>(Keys::keyOf(&VespInvitationContextSchema::contextData)));

@@ -2,7 +2,6 @@
 /// Invitations: the envelope's schema string chooses one of five kinds.
 #pragma once
 
-#include "framework/contracts/unpacker.h"
 #include "program/invitation/vesp_invitation_schemas.h"
 
 #include <keelgate/records/vesp_invitation.h>
@@ -19,12 +18,5 @@ struct VespInvitationUnpacker {
   /// Throws what the records' constructors and token decoders throw.
   static Keelgate::VespDictionaryContext convertContext(VespDictionaryContextClientSchema&& kind);
 };
-
-// Here, where the framework's contract is known; the schemas themselves know nothing of it.
-static_assert(Keelgate::VespInvitationClientPayload<VespSampleInvitationSchema>);
-static_assert(Keelgate::VespInvitationClientPayload<VespHearthInvitationSchema>);
-static_assert(Keelgate::VespInvitationClientPayload<VespCofferSharingInvitationSchema>);
-static_assert(Keelgate::VespInvitationClientPayload<VespVitalsInvitationSchema>);
-static_assert(Keelgate::VespInvitationClientPayload<VespStrideSharingInvitationSchema>);
 
 }  // namespace VespKeelgateService

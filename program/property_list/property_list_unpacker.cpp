@@ -9,7 +9,6 @@
 #include "plist/expansion_budget.h"
 #include "program/schema/property_list_decoder.h"
 
-#include <algorithm>
 #include <utility>
 
 namespace VespKeelgateService {

@@ -10,19 +10,16 @@
 #pragma once
 
 #include "plist/tree.h"
+#include "text/uuid.h"
 
 #include <keelgate/describe.h>
 
 #include <concepts>
 #include <string>
-#include <string_view>
 #include <utility>
 #include <variant>
 
 namespace VespKeelgateService {
-
-/// The textual form, in upper case.
-std::string uuidText(const Keelgate::UUID& uuid);
 
 /// Pure; callable from any thread. Throws std::bad_alloc.
 template <class T>
@@ -33,7 +30,7 @@ PropertyList::Tree mirror(const T& value) {
   } else if constexpr (std::same_as<T, Keelgate::Date>) {
     return PropertyList::Date{value.secondsSinceReferenceDate};
   } else if constexpr (std::same_as<T, Keelgate::UUID>) {
-    return uuidText(value);
+    return Keelgate::Text::uuidText(value.octets);
   } else if constexpr (Keelgate::isArray<T>) {
     PropertyList::Array elements;
     for (const auto& element : value) elements.push_back(mirror(element));

@@ -117,7 +117,7 @@ class Laboratory {
     Sandbox::prepareHeap();
     Sandbox::reserveHeap(heapFor(shortMessage));
     Sandbox::becomeUndumpable();
-    const std::vector<sock_filter> filter = Sandbox::compile(Sandbox::workerRules());
+    const std::vector<sock_filter> filter = Sandbox::compile(Sandbox::workerRules);
     const pid_t zygote = getpid();
     const pid_t process = Sandbox::forkSelf(0);
     if (process == 0) {
