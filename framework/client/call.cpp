@@ -119,9 +119,8 @@ bool Call::advance() noexcept {
         return true;
       }
     } catch (const std::bad_alloc&) {
-      const char* const what = state_ == State::begun ? "this process has no memory for the message"
-                                                      : "this process has no memory for the reply";
-      finish(std::make_exception_ptr(HostError(Reason::resourcesExhausted, what)));
+      finish(std::make_exception_ptr(
+          HostError(Reason::resourcesExhausted, "this process has no memory for it")));
     } catch (...) {
       finish(std::current_exception());
     }

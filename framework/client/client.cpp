@@ -16,8 +16,8 @@ using std::chrono::milliseconds;
 
 namespace {
 
-/// For the first start, when no message is waiting yet; a service has 10 s to get ready.
-constexpr milliseconds firstStartPatience{10'100};
+/// For the first start, when no message is waiting yet: a service that is slow is to be told of.
+constexpr milliseconds firstStartPatience = startPatience + milliseconds(100);
 
 /// What a client has in one process.
 struct Engine {

@@ -61,9 +61,8 @@ class ReceiveBuffer {
 class Exchange {
  public:
   /// `channel` is borrowed. `sequence` is that of the first request: a reply that repeats its own
-  /// cannot be one that was prepared for an earlier request.
-  Exchange(int channel, std::uint32_t sequence) noexcept
-      : channel_(channel), nextSequence_(sequence) {}
+  /// cannot be one that was prepared for an earlier request. Throws std::bad_alloc.
+  Exchange(int channel, std::uint32_t sequence) : channel_(channel), nextSequence_(sequence) {}
   Exchange(const Exchange&) = delete;
   Exchange& operator=(const Exchange&) = delete;
 

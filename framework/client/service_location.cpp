@@ -12,6 +12,7 @@
 #include <array>
 #include <cerrno>
 #include <cstdlib>
+#include <filesystem>
 #include <memory>
 
 namespace Keelgate {
@@ -120,17 +121,16 @@ class Walk {
 /// Of the library or program that this code is in; empty where nobody says.
 String ownFolder() {
   Dl_info info;
-  void* extra = nullptr;
+  void* map;
   String whole;
-  if (dladdr1(serviceName, &info, &extra, RTLD_DL_LINKMAP) != 0 && extra != nullptr) {
-    whole = static_cast<link_map*>(extra)->l_name;
+  if (dladdr1(serviceName, &info, &map, RTLD_DL_LINKMAP) != 0) {
+    whole = static_cast<link_map*>(map)->l_name;
   }
   // The main program has no name there. A relative one was relative to a folder that may have been
   // left since.
   if (whole.empty()) {
-    std::array<char, 4096> path;
-    const ssize_t n = readlink("/proc/self/exe", path.data(), path.size());
-    whole.assign(path.data(), n < 0 ? 0 : static_cast<std::size_t>(n));
+    std::error_code nowhere;
+    whole = std::filesystem::read_symlink("/proc/self/exe", nowhere);
   }
   return whole.starts_with('/') ? whole.substr(0, whole.rfind('/') + 1) : String();
 }

@@ -29,9 +29,6 @@ using std::chrono::milliseconds;
 
 namespace {
 
-/// From its start until it is ready.
-constexpr milliseconds startPatience{10'000};
-
 /// An honest worker is gone so long after its last answer; the slots are looked at as often.
 constexpr milliseconds leavePatience{4};
 
@@ -91,7 +88,7 @@ Optional<StartFailure> ServiceProcess::startFailure() const {
   return startFailure_;
 }
 
-void ServiceProcess::readNews() noexcept {
+void ServiceProcess::readNews(Deadline now) noexcept {
   const std::lock_guard lock(mutex_);
   for (ControlFrame frame; state_ != State::lost;) {
     switch (Protocol::receiveControl(handles_.control.get(), frame, Waiting::no)) {
@@ -110,7 +107,6 @@ void ServiceProcess::readNews() noexcept {
     }
     break;
   }
-  const Deadline now = Clock::now();
   if (state_ == State::starting && now >= startedAt_ + startPatience) {
     failToStart({"The service did not get ready in time: the machine may be overloaded", true});
   }

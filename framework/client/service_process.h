@@ -34,6 +34,9 @@ struct ServiceSettings {
   std::size_t maximumWorkers;
 };
 
+/// How long a service may take from its start until it is ready.
+constexpr std::chrono::milliseconds startPatience{10'000};
+
 /// All members may be called from any thread.
 class ServiceProcess {
  public:
@@ -77,7 +80,7 @@ class ServiceProcess {
   void release(std::uint32_t slot, Leaving how) noexcept;
 
   /// Takes note of what the zygote has said, without waiting, and of workers that should have left.
-  void readNews() noexcept;
+  void readNews(Deadline now = Clock::now()) noexcept;
   /// What to wait for before readNews() is called again, `until` at the latest.
   [[nodiscard]] Wait waitForNews(Deadline until) const noexcept;
 

@@ -1,10 +1,37 @@
 // SPDX-License-Identifier: Apache-2.0
 // Batches, and calls that an event loop of the application drives.
+#include "framework/client/exchange.h"
 #include "framework/transport/error_coding.h"
 #include "tests/host/host_testing.h"
 #include "tests/reply_frame.h"
 
 #include <gtest/gtest.h>
+
+#include <cstdlib>
+#include <ctime>
+#include <new>
+
+namespace {
+/// How many allocations of this thread succeed before one fails; below 0 all do.
+thread_local int allocationsLeft = -1;
+
+/// Not inlined: g++ 14 would take `free` for the other half of `new`.
+[[gnu::noinline]] void giveBack(void* block) noexcept {
+  std::free(block);
+}
+}  // namespace
+
+void* operator new(std::size_t size) {
+  void* const block = allocationsLeft >= 0 && allocationsLeft-- == 0 ? nullptr : std::malloc(size);
+  if (block == nullptr) throw std::bad_alloc();
+  return block;
+}
+void operator delete(void* block) noexcept {
+  giveBack(block);
+}
+void operator delete(void* block, std::size_t) noexcept {
+  giveBack(block);
+}
 
 namespace Keelgate::Host {
 namespace {
@@ -43,6 +70,8 @@ struct Sent {
       const bool lies = i % 17 == 5;
       scripts.push_back(dies ? Script().then(Op::raise, SIGSEGV) : answer(i, i % 3 == 0 ? 5 : 0));
       if (lies) scripts.back() = Script().answer(Data(3));
+      // In all they are longer than what may be on the way at a time.
+      scripts.back().resize(4000);
       expected.push_back(dies   ? "crashed"
                          : lies ? "protocolViolation"
                                 : "record " + std::to_string(i));
@@ -55,10 +84,40 @@ struct Sent {
   }
 };
 
+/// In pieces of any size: the end of one reply and the beginning of the next often come together.
+TEST(Exchange, GivesEachReplyWhole) {
+  constexpr std::uint32_t first = 7;
+  const std::size_t sizes[] = {0, 70'000, 3, 200'000, 1};
+  const OutgoingMessage request{.record = 0, .command = 1, .service = "s", .message = {}};
+  for (const std::size_t piece : {1'000U, 69'999U, 300'000U}) {
+    int ends[2];
+    ASSERT_EQ(socketpair(AF_UNIX, SOCK_STREAM, 0, ends), 0);
+    Exchange exchange(ends[0], first);
+    Data replies;
+    for (std::uint32_t i = 0; i < std::size(sizes); ++i) {
+      exchange.add(request);
+      Protocol::appendReplyFrame(replies, first + i, Protocol::ReplyKind::record,
+                                 Data(sizes[i], std::byte(i)));
+    }
+    Bytes left = replies;
+    for (std::size_t i = 0; i < std::size(sizes); ++i) {
+      while (exchange.advance() != Exchange::State::answered) {
+        const ssize_t n = send(ends[1], left.data(), std::min(piece, left.size()), MSG_DONTWAIT);
+        ASSERT_GT(n, 0) << piece << ' ' << i;
+        left = left.subspan(static_cast<std::size_t>(n));
+      }
+      EXPECT_TRUE(std::ranges::equal(exchange.body(), Data(sizes[i], std::byte(i)))) << i;
+      exchange.drop();
+    }
+    for (const int end : ends) close(end);
+  }
+}
+
 TEST(Batch, GivesEachMessageItsOwnOutcomeInOrder) {
   for (const auto& [processes, allowed] : {std::pair(1u, 1u), {3u, 1u}, {1u, 100u}, {2u, 9u}}) {
     Client::Options options = fakeOptions("honest", milliseconds(20'000), processes);
     options.messagesPerProcess = allowed;
+    options.requireLayers = true;
     Client client(options);
     const Sent sent(50);
     std::vector<Outcome<Response>> outcomes = client.unpackBatch<Response>(sent.requests);
@@ -114,11 +173,12 @@ TEST(Batch, TakesLongMessagesAndRepliesWhole) {
 /// theirs behind one that goes alone.
 TEST(Batch, HoldsEachMessageToItsTimeLimit) {
   for (const std::size_t allowed : {1U, 100U}) {
-    Client::Options options = fakeOptions("honest", milliseconds(1500), 1);
+    const std::clock_t before = std::clock();
+    Client::Options options = fakeOptions("honest", milliseconds(900), 1);
     options.messagesPerProcess = allowed;
     Client client(options);
-    std::vector<Script> scripts(6, answer(1, 700));
-    scripts[0] = answer(1, 900);
+    std::vector<Script> scripts(6, answer(1, 420));
+    scripts[0] = answer(1, 540);
     scripts[0].resize(std::size_t{4} << 20);
     scripts[2] = scripts[5] = Script().then(Op::pause, 60'000);
     std::vector<Client::Request> requests;
@@ -127,6 +187,7 @@ TEST(Batch, HoldsEachMessageToItsTimeLimit) {
     for (std::size_t i = 0; i < outcomes.size(); ++i) {
       EXPECT_EQ(outcomeOf(outcomes[i]), i % 3 == 2 ? "timedOut" : "record 1") << i;
     }
+    EXPECT_LT(std::clock() - before, CLOCKS_PER_SEC) << "busy while it waits";
   }
 }
 
@@ -168,6 +229,47 @@ TEST(Async, CompletionsMayStartMessagesAndThrow) {
     }
   }
   EXPECT_EQ(thrown, 4);
+}
+
+/// Whichever it is: the message may be lost with it, or told to be, and nothing else.
+TEST(Memory, AnAllocationThatFailsCostsItsMessageAlone) {
+  const Script script = answer(1);
+  for (const std::size_t allowed : {1U, 100U}) {
+    Client::Options options = fakeOptions();
+    options.messagesPerProcess = allowed;
+    Client client(options);
+    const Client::Request request[] = {{.message = script}};
+    String told;
+    const auto batch = [&] {
+      for (auto& outcome : client.unpackBatch<Response>(request)) told = outcomeOf(outcome);
+    };
+    const auto event = [&] {
+      client.start<Response>(request[0], [&](auto outcome) { told = outcomeOf(outcome); });
+      loopUntil(client, [&] { return !told.empty(); });
+    };
+    const auto single = [&] {
+      told = Host::outcomeOf(client, script);
+    };
+    for (const std::function<void()>& call : {std::function<void()>(single), {batch}, {event}}) {
+      bool failed = true;
+      for (int next = 0; failed; ++next) {
+        told.clear();
+        allocationsLeft = next;
+        try {
+          call();
+        } catch (const std::bad_alloc&) {
+          allocationsLeft = -1;
+          // What was given up is told of too, once it was taken.
+          loopUntil(
+              client, [&] { return !told.empty(); }, milliseconds(50));
+          if (told.empty()) told = "resourcesExhausted";
+        }
+        failed = std::exchange(allocationsLeft, -1) < 0;
+        EXPECT_TRUE(told == "record 1" || told == "resourcesExhausted") << next << ' ' << told;
+        EXPECT_EQ(Host::outcomeOf(client, script), "record 1") << next;
+      }
+    }
+  }
 }
 
 TEST(Async, ManyThreadsShareAClientAndEachMessageCompletesOnce) {

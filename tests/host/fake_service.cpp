@@ -165,7 +165,7 @@ int main(int, char** arguments) {
     ready.numbers = {static_cast<std::uint64_t>(StartStep::loadFilter), EPERM, 0, 0};
   }
   if (manner == "babbles") ready.magic = 0;
-  if (manner != "mute") send(ready);
-  while (manner == "mute" || manner == "stuck") pause();
+  send(ready);
+  while (manner == "stuck") pause();
   Zygote{hello.numbers[0], manner}.serve();
 }

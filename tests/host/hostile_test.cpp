@@ -99,12 +99,12 @@ std::vector<Attack> attacks() {
   return all;
 }
 
+/// Where workers are used again a short message goes with others first.
 String outcomeOf(Client& client, const Attack& attack) {
-  if (attack.command == none) return Host::outcomeOf(client, attack.message);
-  return Host::outcomeOf([&] {
-    client.unpackClientMessage(attack.message, {.command = attack.command, .service = "s"});
-    return 0;
-  });
+  const Client::Request request[] = {
+      {.message = attack.message, .context = {.command = attack.command, .service = "s"}}};
+  return Host::outcomeOf(
+      [&] { return client.unpackBatch<VespCommandResponse>(request)[0].record().command; });
 }
 
 class Hostile : public testing::TestWithParam<std::size_t> {
@@ -119,7 +119,11 @@ INSTANTIATE_TEST_SUITE_P(Messages, Hostile, testing::Values(1, 100));
 
 TEST_P(Hostile, EveryAttackHasItsOutcomeInTimeAndCostsItsLayout) {
   Client client(options(fakeOptions("honest", limit)));
-  for (const Attack& attack : attacks()) {
+  std::vector<Attack> all = attacks();
+  // An answer to the first message, and not to one that follows it.
+  if (GetParam() > 1)
+    all.push_back({"early", Script().write(frameOf(recordNumbered(7))), "record 7"});
+  for (const Attack& attack : all) {
     const pid_t before = zygoteOf(client);
     const auto start = steady_clock::now();
     EXPECT_EQ(outcomeOf(client, attack), attack.outcome) << attack.name;
@@ -155,8 +159,12 @@ TEST(C6, AWorkerSeesOneMessageUnlessMoreAreAllowed) {
     std::vector<Client::Request> requests(9, {.message = bytesOf("count")});
     requests[4].message = bytesOf(fifth);
     std::vector<Int64> counts;
-    for (auto& outcome : client.unpackBatch<VespCommandResponse>(requests)) {
-      counts.push_back(outcome.record().messageId.value_or(-1));
+    // The next batch goes on with the worker of the one before.
+    const std::span all(requests);
+    for (const auto batch : {all.first(2), all.subspan(2)}) {
+      for (auto& outcome : client.unpackBatch<VespCommandResponse>(batch)) {
+        counts.push_back(outcome.record().messageId.value_or(-1));
+      }
     }
     EXPECT_EQ(counts, expected);
   }

@@ -146,7 +146,8 @@ TEST(Permits, AreGivenInTurnAndSomeAreKeptForSmallOnes) {
     std::deque<Permit> many;
     for (int i = 0; i < 10; ++i) many.emplace_back(semaphore, false);
   }
-  EXPECT_LE(openDescriptors(), before + 2);
+  // Of two one was there, and is not used just now.
+  EXPECT_EQ(openDescriptors(), before + 1);
 }
 
 // A sanitizer makes frames larger: nothing of this holds there.
