@@ -58,11 +58,12 @@ TEST(Document, Utf16) {
     EXPECT_EQ(read(message), text);
     EXPECT_EQ(treeOf(writeBinary(text)), text);
   }
-  for (const std::string& message :
-       {utf16({0xDC00}), utf16({0xD800}), utf16({0xDBFF}), utf16({0xDFFF, 0x41}),
-        utf16({0xD800, 0x41}), utf16({0xD800, 0xDBFF}), utf16({0xD800, 0xE000}),
-        utf16({0xDC00, 0xDC00}), utf16({0x41, 0xD800})}) {
-    EXPECT_EQ(problemIn(message), Problem::straySurrogate);
+}
+
+TEST(Document, NumbersOfItsObjectsMayBeOfAnyWidth) {
+  for (std::size_t size = 1; size <= 8; ++size) {
+    const Raw raw{{"\xA2" + bigEndian(2, size) + bigEndian(1, size), "\x09", "\x08"}, size, size};
+    EXPECT_EQ(read(raw.message()), Tree(Array{false, true})) << size;
   }
 }
 
@@ -100,9 +101,6 @@ TEST(Numbers, BinaryIntegers) {
                                                 {"\x14" + ones + ones, -1},
                                                 {"\x14" + ones + top, lowest}};
   for (const auto& [object, number] : sound) EXPECT_EQ(read(binary({object})), number) << object;
-  EXPECT_EQ(problemIn(binary({"\x14" + ones + zeros})), Problem::integerTooLarge);
-  EXPECT_EQ(problemIn(binary({"\x14" + bigEndian(1, 8) + zeros})), Problem::integerTooLarge);
-  EXPECT_EQ(problemIn(binary({"\x14" + top + ones})), Problem::integerTooLarge);
 }
 
 TEST(Numbers, XmlIntegers) {
@@ -120,11 +118,6 @@ TEST(Numbers, XmlIntegers) {
                                                 {"18446744073709551615", highest},
                                                 {"-9223372036854775808", lowest}};
   for (const auto& [text, number] : sound) EXPECT_EQ(read(element("integer", text)), number);
-  for (const char* text :
-       {"", " ", "+", "-", "1 2", "1.0", "1e3", "0x", "0x1G", "0X1F", "-0x1", "+0x1", "0x-1", "x1",
-        "+-1", "18446744073709551616", "-9223372036854775809", "0x00000000000000001", "\xD9\xA1"}) {
-    EXPECT_EQ(problemIn(element("integer", text)), Problem::badInteger) << text;
-  }
 }
 
 TEST(Numbers, Reals) {
@@ -136,10 +129,6 @@ TEST(Numbers, Reals) {
     EXPECT_TRUE(std::isnan(std::get<double>(read(element("real", text)).value))) << text;
   }
   EXPECT_TRUE(std::signbit(std::get<double>(read(element("real", "-0.0")).value)));
-  for (const char* text : {"", ".", "+", "e5", "1e", "1e+", "0x1p3", "1,5", "1.2.3", "nan(1)",
-                           "infi", "1 e5", "--1", "1e309", "-1e99999", "1e-400", "1f"}) {
-    EXPECT_EQ(problemIn(element("real", text)), Problem::badReal) << text;
-  }
   EXPECT_EQ(read(binary({bytes("\x22\xBF\x00\x00\x00")})), Tree(-0.5));
   EXPECT_EQ(read(binary({"\x23\x7F\xF0" + std::string(6, '\0')})),
             Tree(std::numeric_limits<double>::infinity()));
@@ -149,7 +138,6 @@ TEST(Numbers, Reals) {
 
 TEST(Numbers, Dates) {
   EXPECT_EQ(read(element("date", " 2000-12-31T23:59:59Z\n")), Tree(Date{-1}));
-  EXPECT_EQ(problemIn(element("date", "2001-02-29T00:00:00Z")), Problem::badDate);
 }
 
 }  // namespace

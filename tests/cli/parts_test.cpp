@@ -1,13 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
-// The parts of the command that need no service: request lines, suggestions and ordered work.
+// The parts of the command that need no service: suggestions, tables and ordered work.
 #include "cli/nearest.h"
 #include "cli/ordered_work.h"
-#include "cli/request_line.h"
 #include "cli/table.h"
 
 #include <gtest/gtest.h>
 
-#include <algorithm>
 #include <atomic>
 #include <semaphore>
 #include <thread>
@@ -15,106 +13,6 @@
 
 namespace Keelgate::CLI {
 namespace {
-
-/// "ok", or why the line is not a request.
-String problemOf(const RequestLine& line) {
-  const auto* problem = std::get_if<String>(&line.content);
-  return problem == nullptr ? "ok" : *problem;
-}
-
-struct LineCase {
-  std::string_view line;
-  /// A part of the problem.
-  const char* problem;
-  Optional<String> id;
-};
-
-TEST(RequestLine, IsReadStrictly) {
-  constexpr auto absent = std::nullopt;
-  using namespace std::string_view_literals;
-  std::vector<LineCase> table = {
-      {R"({"record":"VespInvitation","message":""})", "ok", absent},
-      {" {\"id\" : null ,\t\"message\":\"Zg==\",\"command\":0,\"service\":\"\"} \r", "ok", "null"},
-      {R"({"service":"s","command":18446744073709551615,"message":"","id":{"b":[1.0,-0,1e5],"a":"\u00e9"}})",
-       "ok", R"({"b":[1.0,-0,1e5],"a":"\u00e9"})"},
-      {R"({"record":"VespInvitation","message":"","id":123456789012345678901234567890.10})", "ok",
-       "123456789012345678901234567890.10"},
-      {R"({"id":1})", "neither", "1"},
-      {R"({"record":"VespInvitation","id":1})", "\"message\" is missing", "1"},
-      {R"({"record":"VespClientMessageResult","message":"","id":1})", "unknown record", "1"},
-      {R"({"record":"VespInvitation","command":1,"message":"","id":1})", "excludes", "1"},
-      {R"({"record":"VespInvitation","service":"","message":"","id":1})", "excludes", "1"},
-      {R"({"record":"VespInvitation","typed":true,"message":"","id":1})", "belongs to", "1"},
-      {R"({"service":"s","command":1,"typed":true,"message":"","id":1})", "\"typed\" needs", "1"},
-      {R"({"record":5,"message":"","id":1})", "\"record\" must be a string", "1"},
-      {R"({"record":{"id":2},"message":"","id":1})", "\"record\" must be a string", "1"},
-      {R"({"service":"s","message":""})", "needs \"command\"", absent},
-      {R"({"command":1,"message":""})", "needs \"service\"", absent},
-      {R"({"service":"s","command":"1","message":""})", "must be a number", absent},
-      {R"({"service":"s","message":"","command":-1})", "must be an integer", absent},
-      {R"({"service":"s","message":"","command":1.0})", "must be an integer", absent},
-      {R"({"service":"s","message":"","command":18446744073709551616})", "must be an integer",
-       absent},
-      {R"({"record":"VespInvitation","message":"Zg"})", "not base64", absent},
-      {R"({"record":"VespInvitation","message":"","extra":[{"id":7}],"id":[]})", "unknown key",
-       "[]"},
-      {R"({"record":"VespInvitation","record":"VespInvitation","message":"","id":1})",
-       "stands twice", "1"},
-      {R"({"record":"VespInvitation","message":"","id":1,"id":2})", "stands twice", absent},
-      {"[]", "object", absent},
-      {"{\"id\":1}\0x"sv, "more than one value", absent},
-      {R"({"id":["\udc00","\u0041\" ", [ ], { } ,1E400 ],"record":"VespInvitation","message":""})",
-       "ok", R"(["\udc00","\u0041\" ",[],{},1E400])"},
-      {"{\"id\":\"\x7f\u009b\u2028\\n\u00e9\",\"record\":\"VespInvitation\",\"message\":\"\"}",
-       "ok", "\"\\u007f\\u009b\\u2028\\n\u00e9\""},
-      {"{\"id\":\"0123456789012345678901234567890\x1f\"}", "control character", absent},
-  };
-  for (const char* line : {"", "\r", R"({"id":1)", R"({"id":1} {})", "{\"id\":\"\xff\"}",
-                           R"({"id":NaN})", R"({"id":1,})", R"({"id":[1,]})", R"({"id":[1}})",
-                           R"({"id":{"a":1,}})", R"({"id":{"a" 1}})", R"({"id":01})"}) {
-    table.push_back({line, "not readable", absent});
-  }
-  // Which takes no stack.
-  const String nest = String(1'000'000, '[') + String(1'000'000, ']');
-  const String nested = R"({"record":"VespInvitation","message":"","id":)" + nest + "}";
-  table.push_back({nested, "ok", nest});
-  for (const LineCase& entry : table) {
-    String text(entry.line);
-    const RequestLine line = readRequestLine(text);
-    EXPECT_NE(problemOf(line).find(entry.problem), String::npos) << entry.line << problemOf(line);
-    EXPECT_EQ(line.id, entry.id) << entry.line;
-  }
-}
-
-TEST(RequestLine, AStringStandsForItsCharacters) {
-  const auto lineOf = [](const char* spelt) {
-    return String(R"({"service":")") + spelt + R"(","command":7,"message":"Zm9v"})";
-  };
-  const std::pair<const char*, const char*> table[] = {
-      {R"(a\"\\\/\b\f\n\r\tz)", "a\"\\/\b\f\n\r\tz"},
-      {R"(\u0041\u00e9\u20AC\ud7ff\ue000)", "A\u00e9\u20ac\ud7ff\ue000"},
-      {R"(\ud800\udc00\uDBFF\uDFFF!)", "\U00010000\U0010ffff!"}};
-  for (const auto& [spelt, text] : table) {
-    String line = lineOf(spelt);
-    const RequestLine read = readRequestLine(line);
-    ASSERT_EQ(problemOf(read), "ok") << spelt;
-    const auto& request = std::get<StreamRequest>(read.content);
-    const auto& context = std::get<VespClientMessageContext>(request.subject);
-    EXPECT_TRUE(context.service == text && context.command == 7) << spelt;
-    EXPECT_TRUE(std::ranges::equal(request.message, std::as_bytes(std::span("foo", 3))));
-  }
-  const std::pair<const char*, std::vector<const char*>> refused[] = {
-      {"half of a surrogate pair",
-       {R"(\ud800)", R"(\ud800x)", R"(\ud800\n)", R"(\ud800\udbff)", R"(\udfff)", R"(\ud800\ue000)",
-        R"(\udc00\udc00)", R"(\ud7ff\udc00)"}},
-      {"not an escape", {R"(\x)", R"(\u12g4)", R"(\u123)", R"(\U0041)", R"(\u-123)"}}};
-  for (const auto& [problem, all] : refused) {
-    for (const char* spelt : all) {
-      String line = lineOf(spelt);
-      EXPECT_NE(problemOf(readRequestLine(line)).find(problem), String::npos) << spelt;
-    }
-  }
-}
 
 TEST(Suggestion, IsWhatAThirdOfTheNameMayBeMistypedFor) {
   const std::tuple<Array<std::string_view>, const char*, const char*> table[] = {

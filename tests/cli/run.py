@@ -312,22 +312,18 @@ def request(identity, message=good_message):
 
 
 def stream():
-    # However a string is spelt.
-    spelt = request(0).replace("A", "\\u0041").replace("/", "\\/")
-    lines = [spelt, "", request({"a": [1, None]}), request(2, "!"),
-             '{"service": "none", "command": 1, "message": "", "id": 3.50}', request(4, "") + "\r"]
-    status, out, err = run("stream", stdin="\n".join(lines).encode())
-    replies = objects(out)
-    check([r.get("id") for r in replies] == [0, None, {"a": [1, None]}, 2, 3.5, 4], "ids in order")
-    check(all(next(iter(r)) == "id" for r in replies if "id" in r), "the id comes first")
-    check(b'"id":3.50,' in out, "an id as it was written")
-    check(replies[4]["error"] == {
-        "kind": "unpacking", "domain": "VespKeelgateService.VespClientMessageUnpackingError", "code": 1,
-        "case": "noUnpackerForService", "service": "none"}, f"all of an error: {replies[4]}")
-    check([r["error"]["kind"] if "error" in r else r["record"] for r in replies]
-          == ["VespCommandResponse", "request", "VespCommandResponse", "request", "unpacking",
-              "dataCorrupted"], f"outcomes: {replies}")
+    # Of everything that a line may be, with every part of its reply.
+    requests, replies = ((root / f"tests/cli/{name}.jsonl").read_bytes().split(b"\n")
+                         for name in ("requests", "replies"))
+    status, out, err = run("stream", stdin=b"\n".join(requests))
     check((status, err) == (2, ""), f"invalid requests: {status} {err}")
+    for request_line, reply, expected in zip(requests, out.split(b"\n"), replies, strict=True):
+        check(reply == expected, f"{request_line}: {reply}")
+    # Which takes no stack.
+    nest = "[" * 10**6 + "]" * 10**6
+    line = f'{{"record":"Nothing","message":"","id":{nest}}}'
+    out = run("stream", stdin=line.encode())[1].decode()
+    check(nest in out and "unknown record" in out, "a deep id")
     check(run("stream", stdin=request(1, "").encode())[:1] == (0,), "rejection is an answer")
     check(run("stream") == (0, b"", ""), "an empty stream")
     status, out, _ = run("stream", stdin=b"\xef\xbb\xbf" + request(1).encode())
