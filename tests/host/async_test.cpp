@@ -96,8 +96,8 @@ TEST(Exchange, GivesEachReplyWhole) {
     Data replies;
     for (std::uint32_t i = 0; i < std::size(sizes); ++i) {
       exchange.add(request);
-      Protocol::appendReplyFrame(replies, first + i, Protocol::ReplyKind::record,
-                                 Data(sizes[i], std::byte(i)));
+      Testing::appendReplyFrame(replies, first + i, Protocol::ReplyKind::record,
+                                Data(sizes[i], std::byte(i)));
     }
     Bytes left = replies;
     for (std::size_t i = 0; i < std::size(sizes); ++i) {
