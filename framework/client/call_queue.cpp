@@ -109,7 +109,8 @@ void CallQueue::advancePipelines() noexcept {
   // Before anything is completed: workers have their next messages meanwhile.
   begin();
   for (Pipeline& pipeline : pipelines_) {
-    if (pipeline.wait() && pipeline.wait()->until == Deadline()) pipeline.advance(done_, alone);
+    // Up to the end of its work: a worker that is not given back by then is lost.
+    while (pipeline.wait() && pipeline.wait()->until == Deadline()) pipeline.advance(done_, alone);
   }
   const std::lock_guard lock(mutex_);
   waiting_.splice(waiting_.begin(), alone);
