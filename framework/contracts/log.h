@@ -25,8 +25,7 @@ inline constexpr LogHandle keelgate;
 }  // namespace Log
 
 /// Takes the lines that are logged on this thread for as long as it lives: a sealed worker has no
-/// standard error, so that its lines travel with its reply. Captures nest: the innermost takes the
-/// lines. Made and destroyed on one thread, last one first.
+/// standard error, so that its lines travel with its reply. One at a time on a thread.
 class LogCapture {
  public:
   LogCapture();
@@ -36,9 +35,6 @@ class LogCapture {
 
   /// In the order of logging. As many as were logged; the sender of the reply bounds them.
   Array<String> lines;
-
- private:
-  LogCapture* outer_;
 };
 
 /// Renders an optional number for a log line.

@@ -35,10 +35,6 @@ bool readGeneral(pid_t process, elf_gregset_t& general) {
 
 }  // namespace
 
-bool Registers::operator==(const Registers& other) const noexcept {
-  return std::memcmp(&general, &other.general, sizeof general) == 0 && extended == other.extended;
-}
-
 bool readRegisters(pid_t process, Registers& registers) {
   registers.extended.resize(largestExtended);
   iovec set{.iov_base = registers.extended.data(), .iov_len = registers.extended.size()};

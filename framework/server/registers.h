@@ -16,8 +16,6 @@ struct Registers {
   /// x87, vector and mask registers, protection keys, their control words: all that the processor
   /// saves as one block, with the mask of what is in use.
   std::vector<std::byte> extended;
-
-  bool operator==(const Registers& other) const noexcept;
 };
 
 /// False when it cannot be done, or is not complete: a process that has switched to 32-bit code has

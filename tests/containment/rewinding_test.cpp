@@ -103,7 +103,10 @@ std::string compare(State before, State after) {
     before.pages[address].resize(page);
     if (before.pages[address] != bytes) different += "page " + std::to_string(address) + ' ';
   }
-  if (!(before.registers == after.registers)) different += "registers ";
+  if (!std::ranges::equal(before.registers.general, after.registers.general) ||
+      before.registers.extended != after.registers.extended) {
+    different += "registers ";
+  }
   return before.figures == after.figures ? different : different + "figures";
 }
 
