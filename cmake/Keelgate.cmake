@@ -19,7 +19,7 @@ set(CMAKE_ARCHIVE_OUTPUT_DIRECTORY ${PROJECT_BINARY_DIR}/lib)
 
 # Whether a warning is an error is for the presets to say (CMAKE_COMPILE_WARNING_AS_ERROR).
 add_compile_options(-Wall -Wextra -Wpedantic -Wconversion)
-add_compile_options(-fno-omit-frame-pointer -fstack-protector-strong)
+add_compile_options(-fstack-protector-strong)
 if(CMAKE_CXX_COMPILER_ID STREQUAL "GNU")
   add_compile_options(-Werror=missing-field-initializers)
   # g++ 12 sees an overlap in "literal" + std::string when it optimises (its bug 105651).

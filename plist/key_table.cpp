@@ -35,13 +35,6 @@ KeyTable::KeyTable(Store& store) : store_(store), known_(*store.known), collidin
   last_.zero(known_.count);
 }
 
-void KeyTable::addOther(const Other& key) {
-  // Of a large table the cache has few.
-  __builtin_prefetch(slots_.data() + keyHash(key.digest, bits_), 1);
-  waiting_[waitingCount_++] = key;
-  if (waitingCount_ == waiting_.size()) addWaiting();
-}
-
 void KeyTable::addWaiting() {
   for (const Other& key : std::span(waiting_).first(std::exchange(waitingCount_, 0))) {
     note(number(key), key.position);

@@ -92,7 +92,12 @@ class KeyTable {
     if (last == dictionary_) refuse(position);
     last = dictionary_;
   }
-  void addOther(const Other& key);
+  [[gnu::always_inline]] void addOther(const Other& key) {
+    // Of a large table the cache has few.
+    __builtin_prefetch(slots_.data() + keyHash(key.digest, bits_), 1);
+    waiting_.data()[waitingCount_++] = key;
+    if (waitingCount_ == waiting_.size()) addWaiting();
+  }
   void addWaiting();
   [[noreturn]] void refuse(std::size_t position);
   std::uint32_t number(const Other& key);

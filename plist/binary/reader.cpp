@@ -50,7 +50,11 @@ class BinaryReader {
   [[gnu::always_inline]] inline bool load(const Objects& objects, std::uint32_t number);
   template <class Widths>
   void open(std::uint32_t number);
-  void revisit(Node& node, std::size_t position);
+  void revisit(Node& node, std::size_t position) {
+    node.set(Node::shared);
+    if (isContainer(node.type)) revisitContainer(node, position);
+  }
+  void revisitContainer(const Node& node, std::size_t position);
   Node readObject(std::size_t offset);
   Node readInteger(Cursor& object, unsigned width);
   Node readDouble(Cursor& object, Type type, unsigned width);
@@ -193,7 +197,7 @@ void BinaryReader::readKeys(Frame& frame) try {
 
 /// Another reference to what was read before. Heights make the limit exact although every object is
 /// walked once: a chain of containers that is joined lower down counts by what it was found to be.
-void BinaryReader::revisit(Node& node, std::size_t position) {
+void BinaryReader::revisitContainer(const Node& node, std::size_t position) {
   // Open is every container on the stack, and none beside.
   if (node.has(Node::open)) throw MalformedDocument(Problem::selfContaining, position);
   if (depth_ + node.height > Limits::nestedContainers) {
@@ -201,7 +205,6 @@ void BinaryReader::revisit(Node& node, std::size_t position) {
   }
   Frame& frame = frames_[depth_ - 1];
   frame.highest = std::max(frame.highest, node.height);
-  node.set(Node::shared);
 }
 
 /// All children are checked: the container is, too.
