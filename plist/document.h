@@ -87,7 +87,7 @@ class Value {
 
   /// Whether this object, or any container on the way to it, is referenced more than once, so that
   /// it may be reached more often than its bytes can justify. Never in XML.
-  bool isShared() const noexcept { return isInShared_ || node().has(Node::shared); }
+  bool isShared() const noexcept { return isShared_; }
   /// Where its content stands in the message, in bytes from 0; 0 where the node does not tell.
   std::size_t position() const noexcept;
 
@@ -97,7 +97,9 @@ class Value {
   friend class Range<Entry>;
 
   Value(const Store& store, std::uint32_t number, bool isInShared) noexcept
-      : store_(&store), number_(number), isInShared_(isInShared) {}
+      : store_(&store),
+        number_(number),
+        isShared_(isInShared || store.nodes[number].has(Node::shared)) {}
 
   const Node& node() const noexcept { return store_->nodes[number_]; }
   const Node& expect(Type type) const {
@@ -110,8 +112,8 @@ class Value {
 
   const Store* store_;
   std::uint32_t number_;
-  /// Whether a container on the way to it is shared.
-  bool isInShared_;
+  /// Looked up once, since each child asks.
+  bool isShared_;
 };
 
 /// What a dictionary holds under one key. Every key occurs once: that was checked.

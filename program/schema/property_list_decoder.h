@@ -158,16 +158,17 @@ struct FieldDecoder {
       if (Keelgate::isOptional<W> && value.type() == PropertyList::Type::null) return;
       const std::size_t position = Keelgate::byType<S>.positions.data()[place];
       V& member = Places<R>::template at<V>(record, position);
-      const std::string_view key = S::CodingKeys::keys.data()[position];
+      constexpr auto& keys = S::CodingKeys::keys;
       using Present = PresentOf<W>;
       if constexpr (isScalar<Present>) {
         const Scalars::Fault fault = Scalars::decode(decoding.budget, value, member);
         if (fault == Scalars::Fault::none) return;
-        Scalars::refuse(fault, outer, key, Scalars::expectation<Present>(), value.type());
+        Scalars::refuse(fault, outer, keys[position], Scalars::expectation<Present>(),
+                        value.type());
       } else if constexpr (Keelgate::isOptional<V>) {
-        decodeValue<Present>(decoding, value, CodingPath(outer, key), member.emplace());
+        decodeValue<Present>(decoding, value, CodingPath(outer, keys[position]), member.emplace());
       } else {
-        decodeValue<Present>(decoding, value, CodingPath(outer, key), member);
+        decodeValue<Present>(decoding, value, CodingPath(outer, keys[position]), member);
       }
     });
   }

@@ -140,7 +140,8 @@ struct Places<FoldedCheckIn> {
     using Keelgate::WaymarkMessage;
     if constexpr (std::same_as<V, Optional<String>>) {
       const Fold::Place& place = Fold::numbered.data()[position];
-      if (place.to != nullptr) return (*checkIn.message.groupFields)[place.group].*place.to;
+      // Unchecked: all groups are there from the start.
+      if (place.to != nullptr) return checkIn.message.groupFields->data()[place.group].*place.to;
     }
     if constexpr (std::same_as<V, UInt> || std::same_as<V, Optional<UInt>>) {
       const auto code = Fold::namesakes<WaymarkCodes, V>.data()[position];
