@@ -78,7 +78,7 @@ struct Unpacker {
 
 TEST(StartUpDeathTest, TheSameServiceTwiceEndsTheProcess) {
   using Twice = Keelgate::TypeList<Service<"a", Unpacker>, Service<"a", Unpacker>>;
-  EXPECT_DEATH(ServiceToUnpackerMap{Twice()}, "");
+  EXPECT_DEATH(VespClientMessageUnpacker{Twice()}, "");
 }
 
 }  // namespace

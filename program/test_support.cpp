@@ -46,7 +46,7 @@ std::string unpackedBy(const Target& target, Keelgate::Bytes message) {
     found = joined(flatten(U().unpack(message)));
   });
   if (!found.empty()) return found;
-  static const VespClientMessageUnpacker router((ServiceToUnpackerMap(Services())));
+  static const VespClientMessageUnpacker router{Services()};
   return joined(flatten(
       router.unpack(message, {.command = target.command, .service = target.recordOrService})));
 }

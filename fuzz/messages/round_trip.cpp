@@ -25,8 +25,7 @@ const KeelgateServer& server() {
     MessageUnpackers::each([&]<class U>(std::type_identity<U>) {
       fresh.registerUnpacker<typename U::SchemaType>(U());
     });
-    fresh.registerUnpacker<VespClientMessageResult>(
-        VespClientMessageUnpacker(ServiceToUnpackerMap(Services())));
+    fresh.registerUnpacker<VespClientMessageResult>(VespClientMessageUnpacker(Services()));
     return fresh;
   }();
   return made;

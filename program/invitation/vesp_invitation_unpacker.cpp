@@ -180,7 +180,8 @@ VespInvitationContextSchema VespInvitationContextSchema::decode(const KeyedConta
 VespInvitation VespInvitationUnpacker::unpack(Bytes from) const {
   auto schema = PropertyListDecoder().decode<VespInvitationSchema>(from);
   auto& client = std::get<VespDictionaryContextClientSchema>(schema.context.contextData);
-  VespDictionaryContext context = convertContext(std::move(client));
+  VespDictionaryContext context = std::visit(
+      [](auto& kind) -> VespDictionaryContext { return convertKind(std::move(kind)); }, client);
 
   return construct<VespInvitation>({
       .context = construct<VespInvitationContext>({
@@ -193,12 +194,6 @@ VespInvitation VespInvitationUnpacker::unpack(Bytes from) const {
       .expiration = schema.expiration,
       .identifier = std::move(schema.identifier),
   });
-}
-
-VespDictionaryContext VespInvitationUnpacker::convertContext(
-    VespDictionaryContextClientSchema&& kind) {
-  return std::visit(
-      [](auto& schema) -> VespDictionaryContext { return convertKind(std::move(schema)); }, kind);
 }
 
 }  // namespace VespKeelgateService

@@ -14,9 +14,6 @@ struct VespInvitationUnpacker {
 
   /// Throws DecodingError, or Breach for a kind that nobody knows.
   SchemaType unpack(Bytes from) const;
-
-  /// Throws what the records' constructors and token decoders throw.
-  static Keelgate::VespDictionaryContext convertContext(VespDictionaryContextClientSchema&& kind);
 };
 
 }  // namespace VespKeelgateService

@@ -27,8 +27,7 @@ int startUp() {
     server.template registerUnpacker<typename U::SchemaType>(U());
   });
   // Deliberate: the router comes last.
-  server.template registerUnpacker<VespClientMessageResult>(
-      VespClientMessageUnpacker(ServiceToUnpackerMap(Services())));
+  server.template registerUnpacker<VespClientMessageResult>(VespClientMessageUnpacker(Services()));
 
   server.resume(Keelgate::SandboxID::keelgate);
   // Where there was no sandbox to serve in.

@@ -4,42 +4,12 @@
 
 #include "program/service_unpacker/vesp_service_unpacker.h"
 
+#include <exception>
 #include <functional>
 #include <map>
-#include <utility>
+#include <string_view>
 
 namespace VespKeelgateService {
-
-/// Any service unpacker, by value.
-using AnyServiceUnpacker =
-    std::function<VespClientMessageResult(Bytes from, const VespClientMessageContext& with)>;
-
-/// From service identifiers to unpackers; never changed once it is made. Its keys are the
-/// program's own, and a look-up compares with each of them at most: nothing in a message can make
-/// it slow.
-class ServiceToUnpackerMap {
- public:
-  /// One entry for each row, in the order of the rows. The same identifier twice is a programming
-  /// error and ends the process.
-  template <class... Row>
-  explicit ServiceToUnpackerMap(Keelgate::TypeList<Row...>) {
-    (insert(
-         String(Row::identifier),
-         [unpacker = typename Row::Unpacker()](Bytes from, const VespClientMessageContext& with) {
-           return unpacker.unpack(from, with);
-         }),
-     ...);
-    static_assert((VespServiceUnpacker<typename Row::Unpacker> && ...));
-  }
-
-  /// The unpacker for exactly this identifier, or nullptr.
-  [[nodiscard]] const AnyServiceUnpacker* find(const String& service) const;
-
- private:
-  void insert(String service, AnyServiceUnpacker unpacker);
-
-  std::map<String, AnyServiceUnpacker> entries_;
-};
 
 /// Stateless but for the map, which is never written after start-up: callable from any thread.
 class VespClientMessageUnpacker {
@@ -47,15 +17,31 @@ class VespClientMessageUnpacker {
   using SchemaType = VespClientMessageResult;
   using Context = VespClientMessageContext;
 
-  explicit VespClientMessageUnpacker(ServiceToUnpackerMap serviceToUnpackerMap)
-      : serviceToUnpackerMap_(std::move(serviceToUnpackerMap)) {}
+  /// For the services of a table. The same identifier twice is a programming error and ends the
+  /// process.
+  template <class... Row>
+  explicit VespClientMessageUnpacker(Keelgate::TypeList<Row...>) {
+    (add(Row::identifier, typename Row::Unpacker()), ...);
+  }
 
   /// What the service's unpacker gives or throws, unchanged; or
   /// VespClientMessageUnpackingError::noUnpackerForService.
   VespClientMessageResult unpack(Bytes from, const Context& with) const;
 
  private:
-  ServiceToUnpackerMap serviceToUnpackerMap_;
+  template <VespServiceUnpacker U>
+  void add(std::string_view identifier, U unpacker) {
+    const auto unpack = [unpacker](Bytes from, const Context& with) {
+      return unpacker.unpack(from, with);
+    };
+    // Better no service than one whose second row is never asked.
+    if (!serviceToUnpackerMap_.emplace(identifier, unpack).second) std::terminate();
+  }
+
+  /// Its keys are the program's own, and a look-up compares with each of them at most: nothing in a
+  /// message can make it slow.
+  std::map<String, std::function<VespClientMessageResult(Bytes from, const Context& with)>>
+      serviceToUnpackerMap_;
 };
 
 }  // namespace VespKeelgateService
