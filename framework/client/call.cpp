@@ -285,7 +285,6 @@ void Call::fail(const HostError& why) {
   const auto exit = worker_->exit();
   const bool abnormal = !exit || !exit->neverStarted;
   if (abnormal) worker_->service().retire();
-  exchange_.reset();
   worker_.reset();
   // It may have been the doing of the messages before: this one gets a worker to itself. A message
   // that was alone with its worker has had its only try.
@@ -304,7 +303,6 @@ void Call::fail(const HostError& why) {
 
 void Call::finish(std::exception_ptr error) noexcept {
   exchange_.reset();
-  worker_.reset();
   error_ = std::move(error);
   state_ = State::done;
   permit_.reset();

@@ -52,7 +52,7 @@ std::atomic<int>* DescriptorRegistry::enter(int descriptor) noexcept {
 void DescriptorRegistry::closeAll() noexcept {
   for (std::atomic<int>& entry : entries_) {
     // Exchanged, so that each is closed once even if two threads of the child do this.
-    if (const int descriptor = entry.exchange(none); descriptor != none) ::close(descriptor);
+    ::close(entry.exchange(none));
   }
 }
 

@@ -198,17 +198,17 @@ Exchange::State Exchange::receive() {
     if (sign == WorkerSign::talking) return State::violated;
     return sign == WorkerSign::gone ? State::died : State::sending;
   }
-  for (int i = 0; i < callsPerStep; ++i) {
+  for (int i = 0;; ++i) {
     // What has arrived with the reply before may be all that there is to the next.
     if (const State state = parse(); state != State::receiving) return state;
+    if (i == callsPerStep) break;
     const std::span<std::byte> room = buffer_.room(parser_->needed());
     const ssize_t n = recv(channel_, room.data(), room.size(), MSG_DONTWAIT);
     if (n == 0 || (n < 0 && !wouldBlock())) return State::died;
-    if (n < 0) return hasUnsent() ? State::sending : State::receiving;
+    if (n < 0) break;
     buffer_.add(static_cast<std::size_t>(n));
   }
-  const State state = parse();
-  return state == State::receiving && hasUnsent() ? State::sending : state;
+  return hasUnsent() ? State::sending : State::receiving;
 }
 
 Exchange::State Exchange::parse() {

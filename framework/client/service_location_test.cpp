@@ -66,6 +66,7 @@ TEST_F(ServiceLocation, FollowsLinksDotsAndRelativePaths) {
   EXPECT_TRUE(locateService("inner/service", registry_).file);
   EXPECT_TRUE(locateService("../link/inner/service", registry_).file);
   fs::current_path(here);
+  EXPECT_TRUE(locateService("", registry_).file) << "that of the tree that the test was built in";
 }
 
 TEST_F(ServiceLocation, RefusesWhatOthersCanReplaceAndSaysWhere) {

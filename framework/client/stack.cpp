@@ -34,7 +34,8 @@ void requireStack() {
   // Once for each thread: for the first one the C library reads a file to find out.
   thread_local const Bounds bounds = boundsOfThread();
   const auto here = reinterpret_cast<std::uintptr_t>(__builtin_frame_address(0));
-  if (here < bounds.low || here >= bounds.high || here - bounds.low >= minimumStack) return;
+  // Below the stack that is more than any stack has.
+  if (here - bounds.low >= minimumStack || here >= bounds.high) return;
   throw HostError(HostError::Reason::resourcesExhausted,
                   "the calling thread has " + std::to_string((here - bounds.low) / 1024) +
                       " KiB of stack left, and a call needs " +

@@ -72,8 +72,6 @@ std::variant<Supervisor::Service, Wait> Supervisor::demand(Deadline deadline) {
     }
   }
   start(current_);
-  const std::lock_guard lock(mutex_);
-  if (state_ == State::backingOff && !lastFailure_->mayPass) giveUp(deadline);
   return Wait{};
 }
 

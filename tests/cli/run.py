@@ -274,6 +274,9 @@ def without_service():
                       ["--connect", "/nonexistent"]):
             status, out, err = run(*words, *where)
             check((status, out) == (3, b"") and err.startswith("keelgate: "), f"{where}: {status}")
+    with tempfile.TemporaryDirectory() as folder:
+        alone = subprocess.run([shutil.copy(keelgate, folder), *record, fine], capture_output=True)
+        check(alone.returncode == 3 and b"There is no VespKeelgateService at" in alone.stderr, alone)
     pause, raise_signal = 3, 4
     script = lambda operation, amount: struct.pack("<BxxxI", operation, amount)
     with tempfile.TemporaryDirectory() as folder:

@@ -151,6 +151,9 @@ TEST(Pool, OnlyAMessageThatFollowedOthersIsTriedAgain) {
   EXPECT_EQ(triesOf(good, "record 7"), 0u);
   EXPECT_EQ(triesOf(dies, "crashed"), 2u);
   EXPECT_EQ(triesOf(good, "record 7"), 0u);
+  // Whoever has used up the processor's time is late.
+  EXPECT_EQ(triesOf(Script().log("try").then(Op::raise, SIGXCPU), "timedOut"), 1u);
+  EXPECT_EQ(triesOf(good, "record 7"), 0u);
   EXPECT_EQ(triesOf(Script().log("try").then(Op::raiseIfUsed, SIGSEGV).answer(5), "record 5"), 2u);
   // Nobody is before it in a worker of its own, in a batch either.
   tries = 0;
@@ -227,30 +230,52 @@ TEST(Application, ItsForkHasAServiceAndCallsOfItsOwn) {
 
 /// What it writes there is not to reach a channel.
 TEST(Application, MayHaveNoStandardDescriptors) {
-  EXPECT_EQ(inFork([] {
-              closefrom(0);
-              Client client(fakeOptions());
-              if (client.descriptor() <= 2) return 1;
-              for (const auto& [script, outcome] :
-                   {std::pair(good, "record 7"), {fault, "crashed"}, {good, "record 7"}}) {
-                if (outcomeOf(client, script) != outcome) return 2;
-              }
-              for (const int standard : {0, 1, 2}) {
-                if (fcntl(standard, F_GETFD) >= 0) return 3;
-              }
-              return 0;
-            }),
-            0);
+  for (const int first : {0, 2}) {
+    const auto trial = [first] {
+      closefrom(first);
+      Client client(fakeOptions());
+      if (client.descriptor() <= 2) return 1;
+      for (const auto& [script, outcome] :
+           {std::pair(good, "record 7"), {fault, "crashed"}, {good, "record 7"}}) {
+        if (outcomeOf(client, script) != outcome) return 2;
+      }
+      for (int standard = first; standard <= 2; ++standard) {
+        if (fcntl(standard, F_GETFD) >= 0) return 3;
+      }
+      return 0;
+    };
+    EXPECT_EQ(inFork(trial), 0) << first;
+  }
+}
+
+TEST(Application, IsToldHowAWorkerEnded) {
+  Client client(fakeOptions());
+  const std::pair<Script, const char*> rows[] = {
+      {Script().then(Op::exit, 3), "it ended with status 3 and no answer"},
+      {Script().then(Op::exit, Protocol::refusedExitStatus), "the machine has no memory for it"},
+      {Script().then(Op::raise, SIGXCPU), "it used up its processor time"},
+      {fault, "signal 11 (Segmentation fault)"}};
+  for (const auto& [script, sentence] : rows) {
+    try {
+      client.unpack<VespCommandResponse>(script);
+    } catch (const HostError& error) {
+      EXPECT_TRUE(error.description.starts_with(sentence)) << error.description;
+    }
+  }
 }
 
 TEST(Application, KeepsANumberThatAChannelHadBefore) {
-  DescriptorRegistry registry(2);
+  DescriptorRegistry registry(1);
+  for (int i = 0; i < 3; ++i) const Descriptor before(registry, dup(STDERR_FILENO));
   Descriptor channel(registry, dup(STDERR_FILENO));
   const int number = channel.get();
   channel = Descriptor();
   EXPECT_EQ(dup(STDERR_FILENO), number);
   registry.closeAll();
   EXPECT_EQ(close(number), 0);
+  channel = Descriptor(registry, dup(STDERR_FILENO));
+  registry.closeAll();
+  EXPECT_LT(fcntl(channel.get(), F_GETFD), 0) << "one that is in use";
 }
 
 /// A process number may be the same in another namespace.
