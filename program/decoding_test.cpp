@@ -19,34 +19,6 @@ using PropertyList::Tree;
 const std::string sampleRecord = ".result.vespSampleMessage";
 const Dictionary sampleMessage{{"command", 7}, {"client", "a"}};
 
-TEST(Decoding, ReadsFieldsByTheirKeysAndStopsAtTheFirstFailureInDeclarationOrder) {
-  const std::string least = sampleRecord + ".command=7 " + sampleRecord + ".clientName=a";
-  const auto changed = [](Dictionary changes) {
-    return with(std::move(changes), sampleMessage);
-  };
-  const std::uint64_t largest = std::numeric_limits<std::uint64_t>::max();
-  const std::tuple<const char*, Tree, std::string> rows[] = {
-      {"least", sampleMessage, least},
-      {"unknown keys are ignored", changed({{"x", Dictionary{{"client", 1}}}}), least},
-      {"another order", Dictionary{{"client", "a"}, {"command", 7}}, least},
-      {"the field's name is not a key", Dictionary{{"command", 7}, {"clientName", "a"}},
-       "keyNotFound client @"},
-      {"a mistyped optional", changed({{"version", "3"}}), "typeMismatch @version"},
-      {"declaration order", Dictionary{{"version", "3"}, {"command", 7}}, "keyNotFound client @"},
-      {"no boolean for an integer", changed({{"command", true}}), "typeMismatch @command"},
-      {"no real for an integer", changed({{"command", 7.0}}), "typeMismatch @command"},
-      {"too large for a sign", changed({{"command", largest}}), "dataCorrupted @command"},
-      {"an array at the top", Array{sampleMessage}, "typeMismatch @"}};
-  for (const auto& [name, message, expected] : rows) {
-    EXPECT_EQ(outcome(sample, message), expected) << name;
-  }
-  // Also of faults in fields of different types.
-  const Dictionary faults{{"c", 1}, {"s", "x"}, {"P", 1}};
-  EXPECT_EQ(outcome(payload, faults), "typeMismatch @P");
-  EXPECT_EQ(outcome(payload, Dictionary{{"c", 1}, {"mml", Array{faults}}}),
-            "typeMismatch @mml.0.P");
-}
-
 /// Which XML has not.
 TEST(Decoding, TellsNullFromAbsentAndFromValues) {
   const std::tuple<Target, Tree, std::string> rows[] = {
@@ -104,25 +76,6 @@ TEST(Decoding, NumbersFillTheFieldsThatHoldThemExactly) {
   expectExactly(std::numeric_limits<std::uint64_t>::max(), false);
   EXPECT_EQ(sent(-2.5), "-2.500000");
   EXPECT_EQ(sent(true), "typeMismatch @sendDate");
-}
-
-TEST(Routing, FindsTheServiceAndChecksTheCommandFirst) {
-  const auto refused = [](const char* service, std::uint64_t command, const std::string& error) {
-    EXPECT_EQ(outcome({service, command}, Keelgate::Bytes()), "unpacking " + error) << service;
-  };
-  for (const char* service :
-       {"com.tessen.private.braid.viso.Video", "com.tessen.private.braid.waymark ", "", "x"}) {
-    refused(service, 232, std::string("1: ") + service);
-    refused(service, 999, std::string("1: ") + service);
-  }
-  // Below the calls, the gap between them, above them.
-  for (const std::uint64_t command : {231u, 236u, 239u}) {
-    refused(video, command, "0: " + std::to_string(command));
-  }
-  refused(livePhoto, 232, "0: 232");
-  // A live photo is never read.
-  EXPECT_EQ(outcome({livePhoto, 245}, Keelgate::Bytes()),
-            ".result.messageTypeRestricted.messageType=1");
 }
 
 TEST(Routing, AnUnknownCommandIsLoggedAndRefusedUnread) {

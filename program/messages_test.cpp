@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// What each kind of message gives, and which error, in tables. Every row runs in both encodings.
+// What single kinds of message have of their own. What plain messages give, and which error, the
+// files of tests/examples say.
 #include "framework/transport/wire.h"
 #include "plist/limits.h"
 #include "plist/test_messages.h"
@@ -21,37 +22,6 @@ namespace {
 using PropertyList::Array;
 using PropertyList::Dictionary;
 using PropertyList::Tree;
-
-TEST(Sessions, TheCommandAloneSelectsTheSchema) {
-  const Dictionary offer{{"t", 1}, {"v", 2}, {"p", "P"}, {"d", true}, {"s", "S"}};
-  const Dictionary triple{{"v", 1}, {"s", "S"}, {"p", "P"}};
-  const Target accept{video, 233}, decline{video, 234}, cancel{audio, 235}, reinitiate{video, 238};
-  check({
-      {"an offer sent as an accept", accept, offer,
-       ".result.sessionAccept.version=2 .result.sessionAccept.sessionID=S "
-       ".result.sessionAccept.participantID=P"},
-      {"unknown transport", {video, 232}, with({{"t", 3}}, offer), "dataCorrupted @t"},
-      {"unknown subcommand", reinitiate, with({{"ri", 4}}, triple), "dataCorrupted @ri"},
-      {"unknown end reason", cancel, with({{"e", 77}}, triple), "dataCorrupted @e"},
-      {"negative end reason", cancel, with({{"e", -1}}, triple), "dataCorrupted @e"},
-      {"decline sent as reinitiate", reinitiate, triple, "keyNotFound ri @"},
-      {"empty octets are not absent", decline, with({{"c", data("")}}, triple),
-       ".result.sessionDecline.version=1 .result.sessionDecline.sessionID=S "
-       ".result.sessionDecline.participantID=P .result.sessionDecline.sessionMessageContext="},
-  });
-}
-
-TEST(Payloads, AreStrictAtEveryDepth) {
-  check({
-      {"deep in the headers", payload,
-       Dictionary{{"c", 1},
-                  {"mml", Array{Dictionary{{"c", 1}},
-                                Dictionary{{"c", 1}, {"h", Dictionary{{"ri", 1}}}}}}},
-       "typeMismatch @mml.1.h.ri"},
-      {"empty headers", tunnel, Dictionary{{"c", 1}, {"h", Dictionary{}}},
-       ".command=1 .httpHeaders={}"},
-  });
-}
 
 TEST(Payloads, SharedOnesAreRefusedBeforeTheyTakeMemoryOrTime) {
   // Many references to one payload are cheap to make. Each would be a record of 156 fields; and one
@@ -140,47 +110,6 @@ TEST(PropertyLists, SharedObjectsAreRefusedBeforeTheyTakeMemory) {
   const std::string message = PropertyList::binary(doubling);
   EXPECT_EQ(errorOf([&] { PropertyListUnpacker().unpack(PropertyList::bytesOf(message)); }),
             "dataCorrupted @");
-}
-
-TEST(Invitations, FailInTheOrderOfTheirFields) {
-  const auto envelope = [](Dictionary context) {
-    return Dictionary{{"c", std::move(context)}, {"s", -5}, {"uID", "u"}};
-  };
-  const auto unknown = [](const std::string& schema) {
-    return "breach com.tessen.Keelgate.VespKeelgateService: Unknown invitation schema: (" + schema +
-           ")";
-  };
-  const auto kind = [&](const char* schema, Tree contents) {
-    return envelope(Dictionary{{"cS", schema}, {"cT", 1}, {"cD", std::move(contents)}});
-  };
-  const Dictionary coffer{
-      {"groupID", "g"}, {"shareURL", "u"}, {"invitationToken", data("t")}, {"inviteeHandle", "h"}};
-  const char* const cofferSchema = "com.tessen.coffersharingmessagingd";
-  const std::string token = "breach com.tessen.Keelgate.SkyvaultSharingToken: ";
-  const auto home = [&](const char* key, Tree value) {
-    return kind("ht-invite-v1", Dictionary{{key, std::move(value)}});
-  };
-  const std::tuple<const char*, Tree, std::string> rows[] = {
-      {"type before schema", envelope(Dictionary{{"cS", "x"}, {"cT", 2}}), "dataCorrupted @c.cT"},
-      {"schema before data", envelope(Dictionary{{"cS", "x"}, {"cT", 1}}), unknown("x")},
-      {"letter case", kind("Stride-sharing-invite", Dictionary{}),
-       unknown("Stride-sharing-invite")},
-      {"no data", envelope(Dictionary{{"cS", "1"}, {"cT", 1}}), "keyNotFound cD @c"},
-      {"context before state", Dictionary{{"c", Dictionary{}}}, "keyNotFound cS @c"},
-      {"data of another type", kind("1", "text"), "typeMismatch @c.cD"},
-      {"text for octets", kind("1", Dictionary{{"ObjectDataKey", "x"}}),
-       "typeMismatch @c.cD.ObjectDataKey"},
-      {"a UUID without dashes", home("kHomeUUID", "0f8fad5bd9cb469fa16570867728950e"),
-       "dataCorrupted @c.cD.kHomeUUID"},
-      {"an empty home token", home("HRDHomeInvitationShareTokenKey", data("")),
-       token + "Empty sharing token"},
-      {"an empty coffer token", kind(cofferSchema, with({{"invitationToken", data("")}}, coffer)),
-       token + "Empty sharing token"},
-      {"an empty share URL", kind(cofferSchema, with({{"shareURL", ""}}, coffer)),
-       token + "Empty share URL"}};
-  for (const auto& [name, message, expected] : rows) {
-    EXPECT_EQ(outcome(invitation, message), expected) << name;
-  }
 }
 
 TEST(Invitations, TheMirrorOfAContextIsCaseKeyedAndDoesNotComeBack) {

@@ -104,10 +104,6 @@ PropertyList::Dictionary with(PropertyList::Dictionary changes, PropertyList::Di
   return changes;
 }
 
-void check(const std::vector<Row>& rows) {
-  for (const Row& row : rows) EXPECT_EQ(outcome(row.target, row.message), row.expected) << row.name;
-}
-
 Refusing::Refusing(std::string_view name) {
   refused = name;
 }

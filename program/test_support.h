@@ -101,16 +101,6 @@ PropertyList::Tree data(std::string_view text);
 /// Entries of the first over those of the second.
 PropertyList::Dictionary with(PropertyList::Dictionary changes, PropertyList::Dictionary base);
 
-/// A row of a table: this message is expected to give this outcome in both encodings.
-struct Row {
-  const char* name;
-  Target target;
-  PropertyList::Tree message;
-  std::string expected;
-};
-
-void check(const std::vector<Row>& rows);
-
 /// `name` as the only record whose constructor refuses, for as long as this lives.
 class Refusing {
  public:

@@ -180,15 +180,6 @@ def said_of_a_run():
             check(run("check", *record, "--files0-from", "-", stdin=wrong)[0] == 2, f"{wrong}")
 
 
-def property_lists():
-    """How each value is shown, the examples show."""
-    message = base64.b64encode((messages / "push-payload.bplist").read_bytes()).decode()
-    lines = [json.dumps({"record": "PropertyList", "message": message, **typed})
-             for typed in ({}, {"typed": False}, {"typed": True})]
-    replies = objects(run("stream", stdin="\n".join(lines).encode())[1])
-    check([reply["value"].get("type") for reply in replies] == [None, None, "dictionary"], "stream")
-
-
 def measured(*words, stdin=subprocess.DEVNULL, **more):
     """The status, what is written, and the memory that it took, in bytes."""
     process = subprocess.Popen([keelgate, *map(str, words)], stdin=stdin, stdout=subprocess.PIPE,
@@ -315,13 +306,6 @@ def request(identity, message=good_message):
 
 
 def stream():
-    # Of everything that a line may be, with every part of its reply.
-    requests, replies = ((root / f"tests/cli/{name}.jsonl").read_bytes().split(b"\n")
-                         for name in ("requests", "replies"))
-    status, out, err = run("stream", stdin=b"\n".join(requests))
-    check((status, err) == (2, ""), f"invalid requests: {status} {err}")
-    for request_line, reply, expected in zip(requests, out.split(b"\n"), replies, strict=True):
-        check(reply == expected, f"{request_line}: {reply}")
     # Which takes no stack.
     nest = "[" * 10**6 + "]" * 10**6
     line = f'{{"record":"Nothing","message":"","id":{nest}}}'
@@ -516,7 +500,7 @@ def completion():
                   f"{shell} completes {words}: {completed(shell, *words)}")
 
 
-for group in (wrong_usage, many_files, said_of_a_run, property_lists, long_replies, metrics, memory,
+for group in (wrong_usage, many_files, said_of_a_run, long_replies, metrics, memory,
               without_service, stream, unblocked, long_stream, described, json_schema, terminal,
               completion):
     group()
