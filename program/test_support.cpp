@@ -83,7 +83,7 @@ std::string outcome(const Target& target, Keelgate::Bytes message) {
 std::string outcome(const Target& target, const PropertyList::Tree& tree) {
   const auto binary = PropertyList::writeBinary(tree);
   const std::string xml = PropertyList::writeXml(tree);
-  const std::string fromBinary = outcome(target, Keelgate::Bytes(binary));
+  std::string fromBinary = outcome(target, Keelgate::Bytes(binary));
   const std::string fromXml = outcome(target, std::as_bytes(std::span(xml)));
   EXPECT_EQ(fromBinary, fromXml) << "binary and XML disagree about\n" << xml;
   return fromBinary;
