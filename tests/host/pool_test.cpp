@@ -155,12 +155,6 @@ TEST(Pool, OnlyAMessageThatFollowedOthersIsTriedAgain) {
   EXPECT_EQ(triesOf(Script().log("try").then(Op::raise, SIGXCPU), "timedOut"), 1u);
   EXPECT_EQ(triesOf(good, "record 7"), 0u);
   EXPECT_EQ(triesOf(Script().log("try").then(Op::raiseIfUsed, SIGSEGV).answer(5), "record 5"), 2u);
-  // Nobody is before it in a worker of its own, in a batch either.
-  tries = 0;
-  options.messagesPerProcess = 1;
-  const Client::Request request[] = {{.message = dies}};
-  EXPECT_EQ(Client(options).unpackBatch<VespCommandResponse>(request).size(), 1u);
-  EXPECT_EQ(tries, 2u) << "one is of the layers";
 }
 
 TEST(Pool, WhatCannotBeAnsweredIsNotSent) {
@@ -233,6 +227,8 @@ TEST(Application, MayHaveNoStandardDescriptors) {
   for (const int first : {0, 2}) {
     const auto trial = [first] {
       closefrom(first);
+      DescriptorRegistry registry(1);
+      if (Descriptor(registry, open("/", O_PATH)).get() <= 2) return 4;
       Client client(fakeOptions());
       if (client.descriptor() <= 2) return 1;
       for (const auto& [script, outcome] :
@@ -266,13 +262,14 @@ TEST(Application, IsToldHowAWorkerEnded) {
 
 TEST(Application, KeepsANumberThatAChannelHadBefore) {
   DescriptorRegistry registry(1);
-  for (int i = 0; i < 3; ++i) const Descriptor before(registry, dup(STDERR_FILENO));
   Descriptor channel(registry, dup(STDERR_FILENO));
   const int number = channel.get();
   channel = Descriptor();
   EXPECT_EQ(dup(STDERR_FILENO), number);
   registry.closeAll();
   EXPECT_EQ(close(number), 0);
+  for (int i = 0; i < 3; ++i) channel = Descriptor(registry, dup(STDERR_FILENO));
+  channel = Descriptor();
   channel = Descriptor(registry, dup(STDERR_FILENO));
   registry.closeAll();
   EXPECT_LT(fcntl(channel.get(), F_GETFD), 0) << "one that is in use";

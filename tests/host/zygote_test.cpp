@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // What a client tells a zygote and makes of its frames, step by step: the zygote is this test.
-#include "framework/client/pool.h"
+#include "framework/client/call_queue.h"
 #include "framework/contracts/memory_budget.h"
 #include "framework/protocol/control_frames.h"
 #include "tests/host/host_testing.h"
@@ -325,6 +325,8 @@ TEST_F(Zygote, WorkersAreForkedAheadAndUsedWhileTheyAreQuiet) {
     options_.largestMessage = 1u << 20;
     options_.processes = 3;
     Pool pool(options_);
+    // Those of a batch go together where a worker may have more than one.
+    EXPECT_EQ(CallQueue(pool).window() > options_.processes, messages > 1);
     const auto take = [&](std::size_t length = 10, bool fresh = false,
                           Deadline until = Deadline::max()) {
       return std::get<Worker>(pool.take(length, fresh, until));
