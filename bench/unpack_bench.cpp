@@ -24,6 +24,7 @@
 #include <new>
 #include <optional>
 #include <pugixml.hpp>
+#include <type_traits>
 
 namespace VespKeelgateService::Bench {
 
@@ -89,8 +90,8 @@ struct MadeBy {
 template <class Make>
 MadeBy(Make) -> MadeBy<Make>;
 
-/// The same for what a worker makes and never destroys: it exits with its answer. What destroying
-/// it takes is not counted. Four at a time, so that the clock's own time is little.
+/// Like `measure`, for what a worker makes and never destroys: it exits with its answer. What
+/// destroying it takes is not counted. Four at a time, so that the clock's own time is little.
 template <class Input, class Make>
 void measureKept(const std::string& name, const SharedInputs<Input>& inputs, Make make) {
   benchmark::RegisterBenchmark(
@@ -105,7 +106,6 @@ void measureKept(const std::string& name, const SharedInputs<Input>& inputs, Mak
           const AtWork atWork;
           const auto begin = Clock::now();
           for (auto& one : made) {
-            // Made in its place.
             one.emplace(MadeBy{[&]() -> Made {
               return make(all[next]);
             }});
@@ -134,6 +134,22 @@ struct Answer {
   Record record;
   Data reply;
 };
+
+/// The columns for XML.
+template <class Unpack>
+void addXml(const std::string& name, const SharedInputs<Message>& messages, Unpack unpack) {
+  using benchmark::DoNotOptimize;
+  measure(name + "/pugixml", messages, [](const Message& message) {
+    pugi::xml_document document;
+    DoNotOptimize(document.load_buffer(message.xml.data(), message.xml.size()).status);
+  });
+  measure(name + "/xml-check", messages, [](const Message& message) {
+    const PropertyList::Document document(bytesOf(message.xml));
+    DoNotOptimize(document.top().count());
+  });
+  measureKept(name + "/xml-record", messages,
+              [unpack](const Message& message) { return unpack(bytesOf(message.xml)); });
+}
 
 /// The columns of the table for one kind of message. `unpack(bytes)` gives its record.
 template <class S, class Protobuf, class Unpack>
@@ -173,16 +189,7 @@ void add(const std::string& name, std::function<std::vector<Message>()> make, Un
   });
   measure(name + "/client", replies,
           [](const Data& reply) { DoNotOptimize(decodeRecord<Record>(reply)); });
-  measure(name + "/pugixml", messages, [](const Message& message) {
-    pugi::xml_document document;
-    DoNotOptimize(document.load_buffer(message.xml.data(), message.xml.size()).status);
-  });
-  measure(name + "/xml-check", messages, [](const Message& message) {
-    const PropertyList::Document document(bytesOf(message.xml));
-    DoNotOptimize(document.top().count());
-  });
-  measureKept(name + "/xml-record", messages,
-              [unpack](const Message& message) { return unpack(bytesOf(message.xml)); });
+  addXml(name, messages, unpack);
 }
 
 template <class Change>

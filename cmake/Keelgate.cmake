@@ -47,6 +47,8 @@ add_link_options(-Wl,-z,relro,-z,now)
 
 if(KEELGATE_SANITIZE)
   add_compile_options(-fsanitize=${KEELGATE_SANITIZE} -fno-sanitize-recover=all)
+  # By them it finds who allocated.
+  add_compile_options(-fno-omit-frame-pointer)
   add_link_options(-fsanitize=${KEELGATE_SANITIZE})
   # The seal kills what a sanitizer's runtime needs, so such a build is made without it.
   add_compile_definitions(KEELGATE_UNSEALED)

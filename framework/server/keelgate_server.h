@@ -28,7 +28,7 @@ struct ReceivedMessage {
 };
 
 /// The one answer to a request: the body of a record frame or of an error frame, and what was
-/// logged on the way. It borrows from the record.
+/// logged on the way. Its body may borrow from the record.
 struct Reply {
   Protocol::ReplyKind kind;
   Transport::Body body;
@@ -45,22 +45,18 @@ class KeelgateServer {
   template <OutputRecord R, MessageUnpacker U>
   requires std::same_as<typename U::SchemaType, R>
   void registerUnpacker(U unpacker) {
-    add(recordNumber<R>,
-        [unpacker = std::move(unpacker)](const ReceivedMessage& request, const GiveBody& give) {
-          const R record = unpacker.unpack(request.message);
-          give(Transport::lendRecord(record));
-        });
+    add<R>([unpacker = std::move(unpacker)](const ReceivedMessage& request) {
+      return unpacker.unpack(request.message);
+    });
   }
   template <OutputRecord R, ContextualUnpacker U>
   requires std::same_as<typename U::SchemaType, R>
   void registerUnpacker(U unpacker) {
-    add(recordNumber<R>,
-        [unpacker = std::move(unpacker)](const ReceivedMessage& request, const GiveBody& give) {
-          const R record = unpacker.unpack(
-              request.message,
-              typename U::Context{.command = request.command, .service = String(request.service)});
-          give(Transport::lendRecord(record));
-        });
+    add<R>([unpacker = std::move(unpacker)](const ReceivedMessage& request) {
+      return unpacker.unpack(
+          request.message,
+          typename U::Context{.command = request.command, .service = String(request.service)});
+    });
   }
 
   /// Serves under this identifier until the channel closes. Without one there is no sandbox to
@@ -73,14 +69,23 @@ class KeelgateServer {
   /// Errors of the message are in the reply; std::bad_alloc comes through. A request for a record
   /// that nobody is registered for gives a Breach.
   ///
-  /// `give` need not return: who has no other message to answer exits in it, and never destroys the
-  /// record, which would take a seventh of the time that it took to make.
+  /// What `give` throws must not be an error of a message. It need not return: a caller that
+  /// expects no further message exits in it and never destroys the record, which would take a
+  /// seventh of the time that it took to make.
   void answer(const ReceivedMessage& request, const Give& give) const;
 
  private:
   using GiveBody = std::function<void(Transport::Body)>;
   using Handler = std::function<void(const ReceivedMessage&, const GiveBody&)>;
 
+  template <OutputRecord R, class Unpack>
+  void add(Unpack unpack) {
+    add(recordNumber<R>,
+        [unpack = std::move(unpack)](const ReceivedMessage& request, const GiveBody& give) {
+          const R record = unpack(request);
+          give(Transport::lendRecord(record));
+        });
+  }
   void add(std::size_t record, Handler handler);
 
   /// By the number of the record; empty where nobody is registered.

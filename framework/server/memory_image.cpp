@@ -4,6 +4,7 @@
 #include "framework/sandbox/limits.h"
 
 #include <sys/ioctl.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <array>

@@ -115,14 +115,14 @@ void send(const Reply& reply, std::uint32_t sequence, bool last) {
   reply.body.eachPart([](Bytes part) { channel.give(part); });
 }
 
-/// At once: whatever would run at an orderly exit is for who goes on.
+/// At once: nothing is destroyed.
 [[noreturn]] void end() {
   channel.flush();
   _exit(0);
 }
 
 /// From the first byte of the body on, this is the part that a stranger may take over. Returns
-/// where there may be another message. A process cannot give back memory under its filter, so one
+/// only if another message may follow. A process cannot give back memory under its filter, so one
 /// that has taken more than any short message may ends.
 void answer(const KeelgateServer& server, const RequestHeader& header, bool isLast) {
   MessageMemory::begin(allocationLimit(header.bodyLength));
@@ -143,6 +143,7 @@ void answer(const KeelgateServer& server, const RequestHeader& header, bool isLa
                  .command = header.command,
                  .service = {reinterpret_cast<const char*>(service.data()), service.size()}},
                 [&](const Reply& reply) {
+                  // The client counts messages itself, and is told of an earlier end alone.
                   const bool isLarge = MessageMemory::peak() > allocationLimit(0);
                   send(reply, header.sequence, isLarge);
                   if (isLarge || isLast) end();

@@ -85,8 +85,6 @@ constexpr auto codingsOf = [] {
   });
   return functions;
 }();
-template <class T, class Coding>
-constexpr auto usedCodingsOf = codingsOf<T, Coding>.template of<codingsOf<T, Coding>.count>();
 
 template <class T>
 struct Writing {
@@ -109,7 +107,7 @@ template <class T>
 void writeRecord(Writer& to, const T& record) {
   const auto present = presentIn(record);
   for (std::size_t i = 0; i < presenceWords<T>; ++i) to.word(present.words()[i]);
-  usedCodingsOf<T, Writing<T>>.call(present, to, record);
+  callEach(trimmed<codingsOf<T, Writing<T>>>, present, to, record);
 }
 
 /// Behind its count, which the reader holds against the bytes that follow.
@@ -201,9 +199,9 @@ void readCase(Reader& from, T& value, int depth, std::index_sequence<i...>) {
 template <class T>
 struct Reading {
   using Fields = FieldSet<FieldsOf<T>::size>;
-  using Function = void (*)(const Fields&, Reader& from, T& record, const int& depth);
+  using Function = void (*)(const Fields&, Reader& from, T& record, int depth);
   template <class V>
-  static void fields(const Fields& fields, Reader& from, T& record, const int& depth) {
+  static void fields(const Fields& fields, Reader& from, T& record, int depth) {
     fields.each([&](std::size_t place) {
       V& member = record.*membersOf<T, V>.data()[byType<T>.positions.data()[place]];
       if constexpr (std::same_as<V, Optional<String>>) {
@@ -233,7 +231,7 @@ void readRecord(Reader& from, T& value, int depth) {
   // A bit that no field has is a second spelling of the same record.
   const bool isSpeltOtherwise = (words.back() & ~allFields<T>.words().back()) != 0;
   if (isSpeltOtherwise || present.firstMissing(requiredFields<T>) < size) throw MalformedReply();
-  usedCodingsOf<T, Reading<T>>.call(present, from, value, depth);
+  callEach(trimmed<codingsOf<T, Reading<T>>>, present, from, value, depth);
   // What the framework refuses in the service is refused here too.
   constructInPlace(value);
 }

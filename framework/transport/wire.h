@@ -49,7 +49,8 @@ struct ReadLimits {
 /// honest one.
 constexpr int maximumNesting = 512;
 
-/// The body of a reply, in parts: what is long is borrowed from where it lies, and never copied.
+/// The body of a reply, in parts: what is long is borrowed from where it lies, and never copied. As
+/// good as what was written lives.
 struct Body {
   struct Loan {
     /// Behind so many of `bytes`.
@@ -82,7 +83,8 @@ class Writer {
   void byte(std::uint8_t value) { *room(1) = std::byte{value}; }
   /// As it lies in memory.
   void word(std::uint64_t value) { std::memcpy(room(sizeof value), &value, sizeof value); }
-  /// Behind their length, so that no octet needs escaping. Long ones are borrowed.
+  /// Behind their length, so that no octet needs escaping. Long ones are borrowed, and have to
+  /// outlive the body.
   void octets(Bytes value);
   void text(std::string_view value) {
     octets(std::as_bytes(std::span(value.data(), value.size())));

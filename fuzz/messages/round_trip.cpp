@@ -81,7 +81,7 @@ std::string readError(Bytes body) try {
 }  // namespace
 
 Reply replyTo(const Target& target, Bytes message) {
-  Reply reply;
+  Reply reply{};
   server().answer({.record = target.record,
                    .message = message,
                    .command = target.command,

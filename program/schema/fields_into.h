@@ -14,7 +14,6 @@
 #include <keelgate/describe.h>
 
 #include <algorithm>
-#include <array>
 #include <concepts>
 #include <cstddef>
 
@@ -61,8 +60,7 @@ struct Places {
 
 /// For each kind of fields of a schema the function that decodes them.
 template <class Function, std::size_t size>
-struct Decoders {
-  Keelgate::FieldFunctions<Function, size> functions{};
+struct Decoders : Keelgate::FieldFunctions<Function, size> {
   /// The position of a member that cannot hold what its field does, or `size`.
   std::size_t misfit = size;
 };
@@ -86,8 +84,7 @@ constexpr auto decodersOf = [] {
         if constexpr (fills<W, V>) {
           constexpr std::size_t kind =
               Keelgate::firstOf<S, W> * From::size + Keelgate::firstOf<Listed, V>;
-          decoders.functions.insert(kind, Decode::template into<W, V>,
-                                    Keelgate::byType<S>.places[position]);
+          decoders.insert(kind, Decode::template into<W, V>, Keelgate::byType<S>.places[position]);
         } else {
           decoders.misfit = position;
         }

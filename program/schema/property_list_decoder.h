@@ -52,8 +52,7 @@ constexpr bool isScalar = !Keelgate::CaseKeyed<T> && !Keelgate::Schema<T> && !Ke
 /// What the readers of one message share. Handed down by reference; lives as long as the decoding.
 struct Decoding {
   PropertyList::ExpansionBudget budget;
-  /// Whether fields are read in the order by type, in which a processor foresees the jumps to their
-  /// code, or as declared.
+  /// Whether fields are read type by type, with one call for each, or as declared.
   bool isByType = true;
 };
 
@@ -189,10 +188,10 @@ void decodeFields(Decoding& decoding, const PropertyList::Value& value, const Co
   constexpr std::size_t size = S::CodingKeys::size;
   static_assert(decoders.misfit == size,
                 "a field of the record cannot hold what the schema's field does");
-  static constexpr auto functions = decoders.functions.template of<decoders.functions.count>();
+  constexpr auto& functions = Keelgate::trimmed<decoders>;
   const FieldValues<S> values(value);
   if (decoding.isByType && values.present().firstMissing(requiredFields<S>) == size) {
-    return functions.call(values.present(), decoding, values, path, into);
+    return callEach(functions, values.present(), decoding, values, path, into);
   }
   // What stands before the first field that is missing may be wrong, too.
   for (std::size_t position = 0; position < size; ++position) {
@@ -200,7 +199,7 @@ void decodeFields(Decoding& decoding, const PropertyList::Value& value, const Co
     if (values.present().contains(place)) {
       typename FieldValues<S>::Fields one;
       one.insert(place);
-      functions.call(one, decoding, values, path, into);
+      callEach(functions, one, decoding, values, path, into);
     } else if (requiredFields<S>.contains(place)) {
       throw Errors::keyNotFound(path, S::CodingKeys::keys[position]);
     }

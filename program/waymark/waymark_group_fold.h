@@ -125,6 +125,13 @@ static_assert(std::ranges::count_if(numbered,
                                     [](const Place& place) { return place.to != nullptr; }) ==
                   numberedFields,
               "not every group has all of its fields");
+// A record is looked up without a check.
+static_assert(std::ranges::all_of(numbered,
+                                  [](const Place& place) {
+                                    return place.group <=
+                                           FoldedCheckIn::last - FoldedCheckIn::first;
+                                  }),
+              "a numbered field has no group");
 // The list of groups is the record's alone.
 static_assert(WaymarkSchema::CodingKeys::size - numberedFields + 1 ==
                   Keelgate::FieldsOf<Keelgate::WaymarkMessage>::size,
@@ -140,7 +147,7 @@ struct Places<FoldedCheckIn> {
     using Keelgate::WaymarkMessage;
     if constexpr (std::same_as<V, Optional<String>>) {
       const Fold::Place& place = Fold::numbered.data()[position];
-      // Unchecked: all groups are there from the start.
+      // All groups are there from the start.
       if (place.to != nullptr) return checkIn.message.groupFields->data()[place.group].*place.to;
     }
     if constexpr (std::same_as<V, UInt> || std::same_as<V, Optional<UInt>>) {
