@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-/// The control channel: anything that is not exactly right is refused. What one end sends and the
-/// other takes the host's tests of zygotes show; replies in pieces and frames with another head are
-/// tried by the harness of frames.
+/// The control channel: what one end sends the other takes; anything that is not exactly right is
+/// refused. Replies in pieces and frames with another head are tried by the harness of frames.
 #include "framework/protocol/control_frames.h"
 #include "framework/protocol/data_frames.h"
 
@@ -12,6 +11,7 @@
 #include <array>
 #include <cstring>
 #include <filesystem>
+#include <utility>
 #include <vector>
 
 namespace Keelgate::Protocol {
@@ -42,10 +42,7 @@ class Control : public testing::Test {
     both.second = receiveControl(ends_[1], frame, descriptor, Waiting::no);
     EXPECT_EQ(descriptor != noDescriptor,
               both.second == Transfer::complete && !descriptors.empty());
-    if (descriptor != noDescriptor) {
-      EXPECT_EQ(fcntl(descriptor, F_GETFD), FD_CLOEXEC);
-      close(descriptor);
-    }
+    if (descriptor != noDescriptor) close(descriptor);
     EXPECT_EQ(openDescriptors(), before);
     return both;
   }
@@ -76,6 +73,29 @@ class Control : public testing::Test {
 template <class T>
 Bytes bytesOf(const T& value) {
   return std::as_bytes(std::span(&value, 1));
+}
+
+TEST_F(Control, FramesArriveWholeWithTheirDescriptorUntilTheEnd) {
+  const ControlFrame fork = makeControlFrame(ControlKind::fork, 5, {1, 2, 3, 4});
+  ASSERT_EQ(sendControl(ends_[0], fork, STDERR_FILENO, Waiting::no), Transfer::complete);
+  ControlFrame received{};
+  int descriptor = noDescriptor;
+  ASSERT_EQ(receiveControl(ends_[1], received, descriptor, Waiting::yes), Transfer::complete);
+  EXPECT_EQ(std::memcmp(&received, &fork, sizeof fork), 0);
+  EXPECT_EQ(fcntl(descriptor, F_GETFD), FD_CLOEXEC);
+  close(descriptor);
+  EXPECT_EQ(receiveControl(ends_[1], received, Waiting::no), Transfer::wouldBlock);
+  // A channel that is full is told from one that has ended.
+  Transfer sent = Transfer::complete;
+  while (sent == Transfer::complete) sent = sendControl(ends_[1], fork, noDescriptor, Waiting::no);
+  EXPECT_EQ(sent, Transfer::wouldBlock);
+  std::array<std::byte, 10> bytes{};
+  ASSERT_TRUE(writeAll(ends_[0], bytes));
+  EXPECT_TRUE(readAll(ends_[1], bytes));
+  close(std::exchange(ends_[0], -1));
+  EXPECT_EQ(receiveControl(ends_[1], received, Waiting::yes), Transfer::ended);
+  EXPECT_EQ(sendControl(ends_[1], fork, noDescriptor, Waiting::yes), Transfer::ended);
+  EXPECT_FALSE(readAll(ends_[1], bytes) || writeAll(ends_[1], bytes));
 }
 
 TEST_F(Control, OnlyAForkBringsADescriptorAndOnlyOne) {
