@@ -119,8 +119,7 @@ bool Call::advance() noexcept {
         return true;
       }
     } catch (const std::bad_alloc&) {
-      finish(std::make_exception_ptr(
-          HostError(Reason::resourcesExhausted, "this process has no memory for it")));
+      finish(client_.noMemory);
     } catch (...) {
       finish(std::current_exception());
     }

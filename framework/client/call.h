@@ -13,6 +13,7 @@
 #include "framework/client/outcome_counts.h"
 #include "framework/client/pool.h"
 
+#include <exception>
 #include <list>
 #include <memory>
 
@@ -21,7 +22,10 @@ namespace Keelgate {
 /// What the calls of a client share, in whatever process.
 struct ClientState {
   const Client::Options options;
-  OutcomeCounts outcomes;
+  OutcomeCounts outcomes{};
+  /// Made beforehand: there may be no memory for it when it is needed.
+  const std::exception_ptr noMemory = std::make_exception_ptr(
+      HostError(HostError::Reason::resourcesExhausted, "this process has no memory for it"));
 };
 
 /// One thread at a time. It stays where it is. Dropped before it is done it gives its message up.

@@ -58,7 +58,7 @@ class CallersRecord final : public Detail::Sink {
 class Client::Implementation {
  public:
   explicit Implementation(Options options)
-      : state{.options = bounded(std::move(options)), .outcomes = {}},
+      : state{.options = bounded(std::move(options))},
         engine_(new Engine(state.options)) {}
 
   ~Implementation() {
