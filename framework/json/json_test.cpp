@@ -27,16 +27,8 @@ String compact(const T& value) {
   return textIn(std::move(out));
 }
 
-Data dataOf(std::string_view text) {
-  const Bytes bytes = std::as_bytes(std::span(text));
-  return {bytes.begin(), bytes.end()};
-}
-
-TEST(JSON, DatesAndArraysAreAsTheContractHasThem) {
-  // Dates are text within the calendar and numbers outside.
-  EXPECT_EQ(compact(Date{0.1}), "\"2001-01-01T00:00:00.1Z\"");
+TEST(JSON, DatesOutsideTheCalendarAreNumbers) {
   EXPECT_EQ(compact(Date{-63113904001}), "-63113904001.0");
-  EXPECT_EQ(compact(Array<Bool>{true, false}), "[true,false]");
 }
 
 TEST(JSON, StringsCanNeitherEndNorDriveATerminal) {
@@ -71,7 +63,6 @@ TEST(JSON, LongValuesAreWholeWhateverPiecesTheyAreMadeIn) {
     if (size % 3 != 0) encoded += size % 3 == 1 ? "AA==" : "AAA=";
     EXPECT_TRUE(compact(Data(size)) == '"' + encoded + '"') << size;
   }
-  EXPECT_EQ(compact(dataOf("\xfb\xff")), "\"+/8=\"");
 }
 
 TEST(JSON, TheBudgetIsKeptToTheByte) {
