@@ -58,8 +58,7 @@ class CallersRecord final : public Detail::Sink {
 class Client::Implementation {
  public:
   explicit Implementation(Options options)
-      : state{.options = bounded(std::move(options))},
-        engine_(new Engine(state.options)) {}
+      : state{.options = bounded(std::move(options))}, engine_(new Engine(state.options)) {}
 
   ~Implementation() {
     Engine* engine = engine_.load();
