@@ -133,7 +133,7 @@ TEST(Exchange, BoundsTheReplyByItsMessage) {
           {.record = 0, .command = 1, .service = "s", .message = Bytes(message).first(length)});
       Data taken(2 * mebibyte);
       while (exchange.advance() == Exchange::State::sending)
-        read(ends[1], taken.data(), taken.size());
+        recv(ends[1], taken.data(), taken.size(), 0);
       const auto header =
           Protocol::makeReplyHeader(0, Protocol::ReplyKind::record, bound + above, false);
       EXPECT_EQ(write(ends[1], &header, sizeof header), sizeof header);
