@@ -7,7 +7,7 @@
 
 namespace Keelgate {
 
-/// What the deepest reply takes, 116 KB, and as much again.
+/// What the deepest reply takes in an optimised build, 116 KB, and as much again.
 constexpr std::size_t minimumStack = std::size_t{256} << 10;
 
 /// Throws HostError (resourcesExhausted) where the calling thread has less than that left. A stack

@@ -8,7 +8,7 @@
 namespace Keelgate::Sandbox {
 
 /// Bytes of stack. The deepest message, 256 payloads each in a list of the other, takes 0.34 MB, or
-/// 0.45 MB in an unoptimised build; a sanitizer multiplies that.
+/// 0.45 MB in an unoptimised build.
 constexpr rlim_t stackLimit = rlim_t{8} << 20;
 
 /// Descriptors of the zygote: the channel, its signals, the launcher's tether, and the one that a
